@@ -1,0 +1,45 @@
+# How everything here is compiled: the language, the warnings, the hardening and the instrumentation
+# (a sanitizer or coverage). Link `MountPoint::Options` privately; it is never installed.
+
+set(CMAKE_CXX_STANDARD 20)
+set(CMAKE_CXX_STANDARD_REQUIRED ON)
+set(CMAKE_CXX_EXTENSIONS OFF)
+set(CMAKE_POSITION_INDEPENDENT_CODE ON)
+set(CMAKE_EXPORT_COMPILE_COMMANDS ON)
+
+add_library(compiler-options INTERFACE)
+add_library(MountPoint::Options ALIAS compiler-options)
+
+target_compile_options(compiler-options INTERFACE
+  -Wall -Wextra -Wpedantic -Wshadow -Wconversion -Wsign-conversion -Wold-style-cast
+  -Wnon-virtual-dtor -Woverloaded-virtual -Wcast-align -Wformat=2 -Wundef -Wunused
+  $<$<CXX_COMPILER_ID:GNU>:-Wduplicated-cond -Wlogical-op -Wuseless-cast>
+  $<$<CXX_COMPILER_ID:Clang,AppleClang>:-Wthread-safety -Wthread-safety-beta>
+  $<$<BOOL:${MOUNT_POINT_WARNINGS_AS_ERRORS}>:-Werror>)
+
+# Hardening that costs next to nothing, in every build. Fortification needs the optimiser, and the
+# sanitizers bring checks of their own that it would hide.
+target_compile_options(compiler-options INTERFACE
+  -fstack-protector-strong
+  $<$<PLATFORM_ID:Linux>:-fstack-clash-protection>
+  $<$<PLATFORM_ID:Linux>:-fcf-protection=full>)
+target_compile_definitions(compiler-options INTERFACE _GLIBCXX_ASSERTIONS)
+if(NOT MOUNT_POINT_INSTRUMENTATION)
+  target_compile_options(compiler-options INTERFACE
+    $<$<NOT:$<CONFIG:Debug>>:-U_FORTIFY_SOURCE> $<$<NOT:$<CONFIG:Debug>>:-D_FORTIFY_SOURCE=2>)
+endif()
+target_link_options(compiler-options INTERFACE
+  $<$<PLATFORM_ID:Linux>:-Wl,-z,relro,-z,now,-z,noexecstack,-z,separate-code>)
+
+if(MOUNT_POINT_INSTRUMENTATION STREQUAL "address")
+  set(instrumentation -fsanitize=address,undefined -fno-sanitize-recover=all -fno-omit-frame-pointer)
+elseif(MOUNT_POINT_INSTRUMENTATION STREQUAL "thread")
+  set(instrumentation -fsanitize=thread -fno-omit-frame-pointer)
+elseif(MOUNT_POINT_INSTRUMENTATION STREQUAL "coverage")
+  set(instrumentation --coverage -fprofile-update=atomic)
+elseif(MOUNT_POINT_INSTRUMENTATION)
+  message(FATAL_ERROR "MOUNT_POINT_INSTRUMENTATION is \"${MOUNT_POINT_INSTRUMENTATION}\"; "
+    "it takes address, thread, coverage or nothing.")
+endif()
+target_compile_options(compiler-options INTERFACE ${instrumentation})
+target_link_options(compiler-options INTERFACE ${instrumentation})

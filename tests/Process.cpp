@@ -45,11 +45,13 @@ void drain(int& descriptor, std::string& text) {
                                 const std::function<void()>& beforeExec, const std::string& program,
                                 const Pipe& output, const Pipe& error) {
   const int nothing = open("/dev/null", O_RDONLY);
+  if (nothing < 0) _exit(126);
   dup2(nothing, STDIN_FILENO);
   dup2(output.writeEnd, STDOUT_FILENO);
   dup2(error.writeEnd, STDERR_FILENO);
   if (nothing > STDERR_FILENO) close(nothing);
   std::vector<char*> argumentVector;
+  argumentVector.reserve(arguments.size() + 1);
   for (const std::string& argument : arguments) argumentVector.push_back(const_cast<char*>(argument.c_str()));
   argumentVector.push_back(nullptr);
   try {

@@ -1,0 +1,63 @@
+// The whole command, from its start to its end, beside coreutils doing the same to the same directory.
+// Run it in a private root (script/bench does): it works in the real /Volumes.
+
+#include <benchmark/benchmark.h>
+#include <spawn.h>
+#include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <chrono>
+
+#include "Comparison.h"
+
+namespace {
+
+constexpr const char* kDirectory = "/Volumes/benchmark";
+
+// Seconds from the start of the program to its end; negative when it did not succeed.
+double run(const char* const* arguments) {
+  char* const noEnvironment[] = {nullptr};
+  const auto begin = std::chrono::steady_clock::now();
+  pid_t process = 0;
+  int status = -1;
+  if (posix_spawn(&process, arguments[0], nullptr, nullptr, const_cast<char* const*>(arguments),
+                  noEnvironment) == 0) {
+    waitpid(process, &status, 0);
+  }
+  const std::chrono::duration<double> elapsed = std::chrono::steady_clock::now() - begin;
+  return status == 0 ? elapsed.count() : -1;
+}
+
+void create(benchmark::State& state, const char* const* arguments) {
+  rmdir(kDirectory);
+  for (auto _ : state) {
+    const double seconds = run(arguments);
+    if (seconds < 0 || rmdir(kDirectory) != 0) return state.SkipWithError("the directory was not made");
+    state.SetIterationTime(seconds);
+  }
+}
+
+void remove(benchmark::State& state, const char* const* arguments) {
+  for (auto _ : state) {
+    mkdir(kDirectory, 0700);
+    const double seconds = run(arguments);
+    if (seconds < 0) return state.SkipWithError("the directory was not removed");
+    state.SetIterationTime(seconds);
+  }
+}
+
+constexpr const char* kCreateOurs[] = {MOUNT_POINT, "benchmark", nullptr};
+constexpr const char* kCreateTheirs[] = {"/bin/mkdir", "-m", "700", kDirectory, nullptr};
+constexpr const char* kRemoveOurs[] = {MOUNT_POINT, "benchmark", "--remove", nullptr};
+constexpr const char* kRemoveTheirs[] = {"/bin/rmdir", kDirectory, nullptr};
+
+BENCHMARK_CAPTURE(create, ours, kCreateOurs)->Name("StartUp/create/ours")->UseManualTime();
+BENCHMARK_CAPTURE(create, theirs, kCreateTheirs)->Name("StartUp/create/mkdir")->UseManualTime();
+BENCHMARK_CAPTURE(remove, ours, kRemoveOurs)->Name("StartUp/remove/ours")->UseManualTime();
+BENCHMARK_CAPTURE(remove, theirs, kRemoveTheirs)->Name("StartUp/remove/rmdir")->UseManualTime();
+
+const Bound kCreateBound{"StartUp/create", "mkdir", 1.0};
+const Bound kRemoveBound{"StartUp/remove", "rmdir", 1.0};
+
+}  // namespace

@@ -81,7 +81,8 @@ void enter() {
   require(umount2(scratch.c_str(), MNT_DETACH) == 0, "cannot detach the scratch");
   fs::remove(scratch);
 
-  fs::current_path(workingDirectory);
+  std::error_code inaccessible;
+  fs::current_path(workingDirectory, inaccessible);
   hasEntered = true;
   mountVolumes();
 }

@@ -14,7 +14,8 @@ namespace PrivateRoot {
 
 /// Moves this process, and the children it starts later, into new mount and (unless it is root) user
 /// namespaces, and makes the private root theirs, with an empty /Volumes. An ordinary user becomes
-/// root there, with only its own user and group mapped. The working directory stays. After an
+/// root there, with only its own user and group mapped. The working directory stays, or
+/// becomes "/" where the new root may not enter it. After an
 /// exception the process must not go on as if its file system were private.
 void enter();
 

@@ -34,6 +34,9 @@ constexpr std::string_view kInstrumentation = INSTRUMENTATION;
 constexpr uid_t kOrdinaryUser = 1000;
 constexpr gid_t kOrdinaryGroup = 1001;
 
+// The command under test: a copy in the private root, where an ordinary user may run it whoever built it.
+constexpr const char* kCommand = "/mount-point";
+
 // Why no private root could be made; empty when there is one.
 std::string refusal;
 // Whether the suite runs as the machine's root, with all identifiers at hand, and not as the root of
@@ -53,7 +56,7 @@ class MountPointTest : public testing::Test {
   }
 
   static ProcessResult run(std::vector<std::string> arguments, const std::function<void()>& beforeExec = {}) {
-    arguments.insert(arguments.begin(), MOUNT_POINT);
+    arguments.insert(arguments.begin(), kCommand);
     return runProcess(arguments, beforeExec);
   }
 
@@ -69,7 +72,7 @@ class MountPointTest : public testing::Test {
                                       "trace=" + calls,
                                       "-e",
                                       "inject=" + calls + ":error=" + error,
-                                      MOUNT_POINT};
+                                      kCommand};
     whole.insert(whole.end(), arguments.begin(), arguments.end());
     // The leak checker of an instrumented build cannot work below a tracer.
     return runProcess(whole, [] { setenv("ASAN_OPTIONS", "detect_leaks=0", 1); });
@@ -77,7 +80,7 @@ class MountPointTest : public testing::Test {
 
   // Runs the command with none of root's capabilities.
   static ProcessResult runPowerless(std::vector<std::string> arguments) {
-    std::vector<std::string> whole = {"setpriv", "--bounding-set", "-all", "--inh-caps", "-all", MOUNT_POINT};
+    std::vector<std::string> whole = {"setpriv", "--bounding-set", "-all", "--inh-caps", "-all", kCommand};
     whole.insert(whole.end(), arguments.begin(), arguments.end());
     return runProcess(whole);
   }
@@ -120,7 +123,7 @@ TEST_F(MountPointTest, WithoutArgumentsReportsThatThereIsNoSubdirectory) {
 }
 
 TEST_F(MountPointTest, SurvivesAnArgumentVectorWithoutTheProgramsName) {
-  expectResult(runProcess({}, {}, MOUNT_POINT), 22, "No subdirectory specified.\n");
+  expectResult(runProcess({}, {}, kCommand), 22, "No subdirectory specified.\n");
 }
 
 TEST_F(MountPointTest, RefusesANameWithASlashWithoutANewline) {
@@ -295,9 +298,8 @@ TEST_F(MountPointTest, LeavesTheDirectoryWhereItCouldNotBeHandedOver) {
 TEST_F(MountPointTest, HandsTheDirectoryToTheRealUserAndGroup) {
   if (!isMachineRoot)
     GTEST_SKIP() << "a real user other than the effective one needs root: only one is mapped here";
-  expectSuccess(
-      runProcess({"setpriv", "--ruid", std::to_string(kOrdinaryUser), "--euid", "0", "--rgid",
-                  std::to_string(kOrdinaryGroup), "--egid", "0", "--clear-groups", MOUNT_POINT, "a"}));
+  expectSuccess(runProcess({"setpriv", "--ruid", std::to_string(kOrdinaryUser), "--euid", "0", "--rgid",
+                            std::to_string(kOrdinaryGroup), "--egid", "0", "--clear-groups", kCommand, "a"}));
   EXPECT_EQ(statusOf("/Volumes/a").st_uid, kOrdinaryUser);
   EXPECT_EQ(statusOf("/Volumes/a").st_gid, kOrdinaryGroup);
   EXPECT_EQ(statusOf("/Volumes/a").st_mode & 07777U, 0700U);
@@ -305,13 +307,11 @@ TEST_F(MountPointTest, HandsTheDirectoryToTheRealUserAndGroup) {
 
 TEST_F(MountPointTest, WorksForAnOrdinaryUserWhenInstalledSetUserIdentifier) {
   if (!isMachineRoot) GTEST_SKIP() << "a program owned by another user needs root: only one is mapped here";
-  const std::string installed = "/mount-point";
-  fs::copy_file(MOUNT_POINT, installed, fs::copy_options::overwrite_existing);
-  ASSERT_EQ(chmod(installed.c_str(), 04755), 0);
+  ASSERT_EQ(chmod(kCommand, 04755), 0);
   const auto runAsOrdinaryUser = [&](std::vector<std::string> arguments) {
     std::vector<std::string> whole = {
         "setpriv",        "--reuid", std::to_string(kOrdinaryUser), "--regid", std::to_string(kOrdinaryGroup),
-        "--clear-groups", installed};
+        "--clear-groups", kCommand};
     whole.insert(whole.end(), arguments.begin(), arguments.end());
     return runProcess(whole);
   };
@@ -320,13 +320,14 @@ TEST_F(MountPointTest, WorksForAnOrdinaryUserWhenInstalledSetUserIdentifier) {
   EXPECT_EQ(statusOf("/Volumes/a").st_gid, kOrdinaryGroup);
   expectSuccess(runAsOrdinaryUser({"a", "--remove"}));
   EXPECT_THAT(volumes(), IsEmpty());
+  ASSERT_EQ(chmod(kCommand, 0755), 0);
 }
 
 TEST_F(MountPointTest, FailsToHandTheDirectoryOverWithoutTheRight) {
   if (!isMachineRoot)
     GTEST_SKIP() << "a real user other than the effective one needs root: only one is mapped here";
   expectResult(runProcess({"setpriv", "--ruid", std::to_string(kOrdinaryUser), "--euid", "0",
-                           "--bounding-set", "-chown", "--inh-caps", "-chown", MOUNT_POINT, "a"}),
+                           "--bounding-set", "-chown", "--inh-caps", "-chown", kCommand, "a"}),
                1, "Failed to chown [/Volumes/a], errno: 1\n");
   EXPECT_EQ(statusOf("/Volumes/a").st_uid, 0U);
 }
@@ -484,7 +485,7 @@ TEST_F(MountPointTest, WaitsForAFullPipeWithOneThreadAndLosesNothing) {
   const pid_t child = fork();
   if (child == 0) {
     dup2(pipe.ends[1], STDERR_FILENO);
-    execl(MOUNT_POINT, MOUNT_POINT, "a", nullptr);
+    execl(kCommand, kCommand, "a", nullptr);
     _exit(127);
   }
   close(pipe.ends[1]);
@@ -515,7 +516,7 @@ TEST_F(MountPointTest, WaitsForAFullPipeWithOneThreadAndLosesNothing) {
 TEST_F(MountPointTest, WritesEachLineInOnePiece) {
   expectSuccess(run({"a"}));
   const std::string trace = "/trace";
-  runProcess({"strace", "-f", "-qq", "-o", trace, "-e", "trace=write,writev", MOUNT_POINT, "a"},
+  runProcess({"strace", "-f", "-qq", "-o", trace, "-e", "trace=write,writev", kCommand, "a"},
              [] { setenv("ASAN_OPTIONS", "detect_leaks=0", 1); });
   std::ifstream file(trace);
   std::vector<std::string> writes;
@@ -531,6 +532,24 @@ void becomeOrdinaryUser() {
   require(prctl(PR_SET_DUMPABLE, 1) == 0);
 }
 
+// Enters a private root, as an ordinary user if asked, and puts the command there. Throws where the
+// machine does not allow it.
+void enterPrivateRoot(bool asOrdinaryUser) {
+  if (asOrdinaryUser && geteuid() != 0) {
+    throw std::runtime_error("this is an ordinary user already; the other run of this suite was its");
+  }
+  if (asOrdinaryUser && kInstrumentation == "coverage") {
+    throw std::runtime_error("a coverage build writes its counts where only its builder may");
+  }
+  std::ifstream built(MOUNT_POINT, std::ios::binary);
+  if (asOrdinaryUser) becomeOrdinaryUser();
+  isMachineRoot = geteuid() == 0;
+  PrivateRoot::enter();
+  std::ofstream copy(kCommand, std::ios::binary);
+  copy << built.rdbuf() << std::flush;
+  require(copy.good() && chmod(kCommand, 0755) == 0);
+}
+
 }  // namespace
 
 int main(int argumentCount, char** arguments) {
@@ -538,18 +557,10 @@ int main(int argumentCount, char** arguments) {
   if (testing::GTEST_FLAG(list_tests)) return RUN_ALL_TESTS();
 
   const bool asOrdinaryUser = argumentCount > 1 && std::string(arguments[1]) == "--as-ordinary-user";
-  if (asOrdinaryUser && geteuid() != 0) {
-    refusal = "this is an ordinary user already, and the other run of this suite ran as it";
-  } else {
-    try {
-      if (asOrdinaryUser) becomeOrdinaryUser();
-      isMachineRoot = geteuid() == 0;
-      if (access(MOUNT_POINT, X_OK) != 0)
-        throw std::runtime_error("an ordinary user may not run " MOUNT_POINT);
-      PrivateRoot::enter();
-    } catch (const std::exception& problem) {
-      refusal = std::string("no private root: ") + problem.what();
-    }
+  try {
+    enterPrivateRoot(asOrdinaryUser);
+  } catch (const std::exception& problem) {
+    refusal = std::string("no private root: ") + problem.what();
   }
   return RUN_ALL_TESTS();
 }

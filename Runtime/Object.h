@@ -90,7 +90,8 @@ class Object {
   constexpr Object() noexcept = default;
 
   /// Says that the object is a constant that is never destroyed, as a string literal is: counting its
-  /// references writes nothing. Such an object is `constexpr`, so that nothing runs for it at exit.
+  /// references writes nothing. Such an object is declared `constexpr`, so that nothing is registered to
+  /// run for it at exit; g++ wants its class to write out `constexpr ~Self() override {}` for that.
   struct Immortal {};
   explicit constexpr Object(Immortal) noexcept : count_(kImmortal) {}
 

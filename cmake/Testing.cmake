@@ -15,3 +15,31 @@ function(mount_point_test name)
   target_compile_definitions(${name} PRIVATE ${test_DEFINITIONS})
   gtest_discover_tests(${name} TEST_PREFIX "${name}." DISCOVERY_TIMEOUT 60)
 endfunction()
+
+# mount_point_must_not_compile(NAME SOURCE FILE MESSAGE REGEX [DEFINITION MACRO] [COMPILER ID])
+#
+# Adds the ctest entry NAME: FILE compiles as it is, and with MACRO defined (MUST_NOT_COMPILE unless
+# named) it does not, and the compiler's complaint matches REGEX. So FILE holds what is right and, between
+# `#ifdef MUST_NOT_COMPILE` and `#endif`, the mistake. Nothing is linked; includes are from the
+# repository's root. With COMPILER (GNU or Clang) the entry is left out under any other.
+function(mount_point_must_not_compile name)
+  cmake_parse_arguments(PARSE_ARGV 1 test "" "SOURCE;MESSAGE;DEFINITION;COMPILER" "")
+  if(test_COMPILER AND NOT CMAKE_CXX_COMPILER_ID STREQUAL test_COMPILER)
+    return()
+  endif()
+  if(NOT test_DEFINITION)
+    set(test_DEFINITION MUST_NOT_COMPILE)
+  endif()
+  set(command "${CMAKE_CXX_COMPILER}" -std=c++20 -fsyntax-only -Wall -Wextra -Werror -fno-caret-diagnostics
+    "-I${PROJECT_SOURCE_DIR}")
+  if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU")
+    list(REMOVE_ITEM command -fno-caret-diagnostics)
+    list(APPEND command -fno-diagnostics-show-caret)
+  else()
+    list(APPEND command -Wthread-safety -Wthread-safety-beta)
+  endif()
+  cmake_path(ABSOLUTE_PATH test_SOURCE)
+  add_test(NAME ${name} COMMAND "${CMAKE_COMMAND}"
+    "-DCOMMAND_LINE=${command}" "-DSOURCE=${test_SOURCE}" "-DDEFINITION=${test_DEFINITION}"
+    "-DMESSAGE=${test_MESSAGE}" -P "${PROJECT_SOURCE_DIR}/cmake/must-not-compile.cmake")
+endfunction()

@@ -1,0 +1,121 @@
+#include "Runtime/AssertionHandler.h"
+
+#include <gtest/gtest.h>
+
+#include <thread>
+#include <vector>
+
+#include "Runtime/Exception.h"
+
+namespace {
+
+using namespace rt::literals;
+
+std::uint64_t recordersAlive = 0;
+
+class Recorder final : public rt::Implements<Recorder, rt::AssertionHandler> {
+ public:
+  Recorder() { ++recordersAlive; }
+  ~Recorder() override { --recordersAlive; }
+
+  void handleFailureInFunction(const rt::String& function, const rt::String& file, std::uint64_t lineNumber,
+                               const rt::String& description) override {
+    failures.push_back({function, file, lineNumber, description});
+  }
+
+  struct Failure {
+    rt::String function;
+    rt::String file;
+    std::uint64_t lineNumber;
+    rt::String description;
+  };
+  std::vector<Failure> failures;
+};
+
+class Asserting final : public rt::Implements<Asserting, rt::Object> {};
+
+class AssertionHandlerTest : public testing::Test {
+ protected:
+  void TearDown() override {
+    rt::AssertionHandler::setCurrentHandler(nullptr);
+    EXPECT_EQ(recordersAlive, 0U);
+  }
+};
+
+TEST_F(AssertionHandlerTest, RecordsTheFailureAndRaises) {
+  testing::internal::CaptureStderr();
+  bool isRaised = false;
+  try {
+    rt::AssertionHandler::currentHandler()->handleFailureInFunction("f(int)"_s, "a/b"_s, 64, "no\nway"_s);
+  } catch (const rt::InternalInconsistencyException& exception) {
+    isRaised = true;
+    EXPECT_EQ(exception.name(), "InternalInconsistencyException");
+    EXPECT_EQ(exception.reason(), "no\nway");
+    EXPECT_EQ(exception.function(), "f(int)");
+    EXPECT_EQ(exception.file(), "a/b");
+    EXPECT_EQ(exception.lineNumber(), 64U);
+  }
+  EXPECT_EQ(testing::internal::GetCapturedStderr(), "Assertion failed in f(int), a/b:64: no\nway\n");
+  EXPECT_TRUE(isRaised);
+}
+
+TEST_F(AssertionHandlerTest, NamesTheOperationOfAnObject) {
+  testing::internal::CaptureStderr();
+  const rt::Ref<Asserting> object = rt::make<Asserting>();
+  EXPECT_THROW(
+      rt::AssertionHandler::currentHandler()->handleFailureInMethod("set:to:"_s, *object, "a/b"_s, 2, "no"_s),
+      rt::InternalInconsistencyException);
+  EXPECT_EQ(testing::internal::GetCapturedStderr(), "Assertion failed in -[Asserting set:to:], a/b:2: no\n");
+}
+
+TEST_F(AssertionHandlerTest, SaysWhatIsUnknown) {
+  testing::internal::CaptureStderr();
+  try {
+    rt::AssertionHandler::currentHandler()->handleFailureInFunction(nullptr, nullptr, 0, nullptr);
+    ADD_FAILURE() << "nothing was raised";
+  } catch (const rt::InternalInconsistencyException& exception) {
+    EXPECT_EQ(exception.function(), "<Unknown Function>");
+    EXPECT_EQ(exception.file(), "<Unknown File>");
+    EXPECT_TRUE(exception.description().isNull());
+  }
+  EXPECT_EQ(testing::internal::GetCapturedStderr(),
+            "Assertion failed in <Unknown Function>, <Unknown File>:0: \n");
+}
+
+TEST_F(AssertionHandlerTest, CanBeReplacedAndMayReturn) {
+  const rt::Ref<Recorder> recorder = rt::make<Recorder>();
+  rt::AssertionHandler::setCurrentHandler(recorder);
+  EXPECT_EQ(rt::AssertionHandler::currentHandler(), recorder);
+  rt::AssertionHandler::currentHandler()->handleFailureInFunction("f"_s, "a"_s, 1, "x"_s);
+  const rt::Ref<Asserting> object = rt::make<Asserting>();
+  rt::AssertionHandler::currentHandler()->handleFailureInMethod("run"_s, *object, "b"_s, 2, "y"_s);
+  ASSERT_EQ(recorder->failures.size(), 2U);
+  EXPECT_EQ(recorder->failures[0].function, "f");
+  EXPECT_EQ(recorder->failures[1].function, "-[Asserting run]");
+  EXPECT_EQ(recorder->failures[1].file, "b");
+  EXPECT_EQ(recorder->failures[1].lineNumber, 2U);
+  EXPECT_EQ(recorder->failures[1].description, "y");
+  rt::AssertionHandler::setCurrentHandler(nullptr);
+  EXPECT_FALSE(rt::AssertionHandler::currentHandler()->isKindOf(rt::classInfo<Recorder>()));
+}
+
+TEST_F(AssertionHandlerTest, IsEachThreadsOwnAndGoesWithIt) {
+  rt::AssertionHandler::setCurrentHandler(rt::make<Recorder>());
+  std::thread([] {
+    EXPECT_TRUE(rt::AssertionHandler::currentHandler()->isMemberOf(rt::classInfo<rt::AssertionHandler>()));
+    rt::AssertionHandler::setCurrentHandler(rt::make<Recorder>());
+    EXPECT_EQ(recordersAlive, 2U);
+  }).join();
+  EXPECT_EQ(recordersAlive, 1U);
+  EXPECT_TRUE(rt::AssertionHandler::currentHandler()->isMemberOf(rt::classInfo<Recorder>()));
+}
+
+// The default handler is one for all threads, made once.
+TEST_F(AssertionHandlerTest, IsTheSameForAllThreadsThatSetNone) {
+  const rt::Ref<rt::AssertionHandler> here = rt::AssertionHandler::currentHandler();
+  rt::Ref<rt::AssertionHandler> there;
+  std::thread([&] { there = rt::AssertionHandler::currentHandler(); }).join();
+  EXPECT_EQ(here, there);
+}
+
+}  // namespace

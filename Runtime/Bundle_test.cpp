@@ -1,0 +1,49 @@
+#include "Runtime/Bundle.h"
+
+#include <gtest/gtest.h>
+
+#include <thread>
+
+// Bundle_test is built with an identifier, Bundle_none_test without one.
+#ifdef BUNDLE_IDENTIFIER
+extern "C" const char kMainBundleIdentifier[];
+extern "C" const char kMainBundleIdentifier[] = BUNDLE_IDENTIFIER;
+#else
+#define BUNDLE_IDENTIFIER ""
+#endif
+
+namespace {
+
+using namespace rt::literals;
+
+TEST(Bundle, HasTheIdentifierThatTheHostWasBuiltWith) {
+  EXPECT_FALSE(rt::Bundle::mainIdentifier().isNull());
+  EXPECT_EQ(rt::Bundle::mainIdentifier(), BUNDLE_IDENTIFIER);
+}
+
+TEST(Bundle, TakesAnIdentifierWhenTheHostStarts) {
+  rt::Bundle::setMainIdentifier("com.example.Started"_s);
+  EXPECT_EQ(rt::Bundle::mainIdentifier(), "com.example.Started");
+  rt::Bundle::setMainIdentifier(""_s);
+  EXPECT_EQ(rt::Bundle::mainIdentifier(), "");
+  rt::Bundle::setMainIdentifier(nullptr);
+  EXPECT_EQ(rt::Bundle::mainIdentifier(), BUNDLE_IDENTIFIER);
+}
+
+// Every answer is one of the identifiers that were set, whole.
+TEST(Bundle, IsAskedAndSetByAllThreadsAtOnce) {
+  const auto first = rt::String::fromUTF8("com.example.First");
+  const auto second = rt::String::fromUTF8("com.example.Second");
+  rt::Bundle::setMainIdentifier(first);
+  std::thread setter([&] {
+    for (int i = 0; i < 2000; ++i) rt::Bundle::setMainIdentifier(i % 2 == 0 ? second : first);
+  });
+  for (int i = 0; i < 2000; ++i) {
+    const rt::String identifier = rt::Bundle::mainIdentifier();
+    ASSERT_TRUE(identifier == first || identifier == second);
+  }
+  setter.join();
+  rt::Bundle::setMainIdentifier(nullptr);
+}
+
+}  // namespace

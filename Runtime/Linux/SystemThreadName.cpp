@@ -1,0 +1,53 @@
+#include "Runtime/SystemThreadName.h"
+
+#include <fcntl.h>
+#include <sys/prctl.h>
+#include <unistd.h>
+
+#include <array>
+#include <cstring>
+#include <string_view>
+
+namespace rt::detail {
+
+namespace {
+
+// The kernel keeps 15 bytes and a NUL.
+constexpr std::size_t kCapacity = 16;
+using Text = std::array<char, kCapacity>;
+
+// The name of the main thread, which new threads inherit until they are given another: the process's own.
+Text processName() noexcept {
+  Text text{};
+  const int file = open("/proc/self/comm", O_RDONLY | O_CLOEXEC);
+  if (file < 0) return text;
+  const ssize_t length = read(file, text.data(), text.size());
+  close(file);
+  // The kernel ends the line.
+  text[length > 0 ? static_cast<std::size_t>(length) - 1 : 0] = '\0';
+  return text;
+}
+
+}  // namespace
+
+String systemThreadName() {
+  Text name{};
+  prctl(PR_GET_NAME, name.data());
+  const Text inherited = processName();
+  if (std::strcmp(name.data(), inherited.data()) == 0) return nullptr;
+  return String::fromUTF8Repaired(name.data());
+}
+
+void setSystemThreadName(const String& name) noexcept {
+  const Text inherited = processName();
+  const std::string_view text = name.isNull() ? std::string_view(inherited.data()) : name.view();
+  std::size_t length = text.size() < kCapacity ? text.size() : kCapacity - 1;
+  // A byte of the form 10xxxxxx goes on with a character that must not be cut in two.
+  while (length > 0 && length < text.size() && (static_cast<unsigned char>(text[length]) & 0xC0U) == 0x80U)
+    --length;
+  Text shortened{};
+  text.copy(shortened.data(), length);
+  prctl(PR_SET_NAME, shortened.data());
+}
+
+}  // namespace rt::detail

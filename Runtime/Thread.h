@@ -1,0 +1,29 @@
+#pragma once
+
+/// The calling thread: its name and its handle.
+///
+///     rt::Thread::setCurrentName("Importer"_s);
+///     rt::Thread::currentName();        // "Importer"
+///     rt::Thread::currentHandle();      // as "%p" prints it
+///
+/// Not for: starting threads (std::thread); telling threads apart quickly (Runtime/ThreadIdentifier.h).
+
+#include "Runtime/String.h"
+
+namespace rt::Thread {
+
+/// The calling thread's name; null when it has none. That is the last one given with `setCurrentName`. A
+/// thread that was never given one is looked at once, the first time it is asked, for a name that the
+/// system knows: on Linux, where every thread bears a text, one that differs from the process's own.
+/// Costs a look at a variable from then on.
+String currentName();
+
+/// Names the calling thread; null takes its name away. The system shows the name too, on Linux the first
+/// 15 bytes of it, less where they would end within a character.
+void setCurrentName(const String& name);
+
+/// The calling thread as the system's thread library knows it (pthread_self); never null, and the same as
+/// long as the thread lives.
+const void* currentHandle() noexcept;
+
+}  // namespace rt::Thread

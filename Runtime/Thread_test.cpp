@@ -1,0 +1,100 @@
+#include "Runtime/Thread.h"
+
+#include <gtest/gtest.h>
+#include <pthread.h>
+
+#include <array>
+#include <thread>
+
+#include "tests/AllocationCount.h"
+
+namespace {
+
+using namespace rt::literals;
+
+template <class Body>
+void onNewThread(Body body) {
+  std::thread(body).join();
+}
+
+std::string systemName() {
+  std::array<char, 64> name{};
+  pthread_getname_np(pthread_self(), name.data(), name.size());
+  return name.data();
+}
+
+TEST(Thread, HasNoNameWhereNobodyGaveOne) {
+  EXPECT_TRUE(rt::Thread::currentName().isNull());
+  onNewThread([] { EXPECT_TRUE(rt::Thread::currentName().isNull()); });
+}
+
+TEST(Thread, HasTheNameThatItWasGiven) {
+  onNewThread([] {
+    rt::Thread::setCurrentName("Importer"_s);
+    EXPECT_EQ(rt::Thread::currentName(), "Importer");
+    EXPECT_EQ(systemName(), "Importer");
+    rt::Thread::setCurrentName("Exporter"_s);
+    EXPECT_EQ(rt::Thread::currentName(), "Exporter");
+  });
+  EXPECT_TRUE(rt::Thread::currentName().isNull());
+}
+
+TEST(Thread, KeepsAnEmptyNameApartFromNone) {
+  onNewThread([] {
+    rt::Thread::setCurrentName(""_s);
+    EXPECT_FALSE(rt::Thread::currentName().isNull());
+    EXPECT_EQ(rt::Thread::currentName(), "");
+  });
+}
+
+TEST(Thread, LosesItsName) {
+  onNewThread([] {
+    const std::string before = systemName();
+    rt::Thread::setCurrentName("Importer"_s);
+    rt::Thread::setCurrentName(nullptr);
+    EXPECT_TRUE(rt::Thread::currentName().isNull());
+    EXPECT_EQ(systemName(), before);
+  });
+}
+
+TEST(Thread, IsCalledWhatTheSystemCallsIt) {
+  onNewThread([] {
+#ifdef __APPLE__
+    pthread_setname_np("worker");
+#else
+    pthread_setname_np(pthread_self(), "worker");
+#endif
+    EXPECT_EQ(rt::Thread::currentName(), "worker");
+  });
+}
+
+TEST(Thread, KeepsALongNameWholeAndTellsTheSystemWholeCharacters) {
+  onNewThread([] {
+    // The bytes 15 and 16 are one character.
+    const rt::String name = "abcdefghijklmn\xc3\xa9 and more"_s;
+    rt::Thread::setCurrentName(name);
+    EXPECT_EQ(rt::Thread::currentName(), name);
+#ifndef __APPLE__
+    EXPECT_EQ(systemName(), "abcdefghijklmn");
+#endif
+  });
+}
+
+TEST(Thread, TellsItsNameWithoutAllocating) {
+  if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
+  onNewThread([] {
+    rt::Thread::setCurrentName("Importer"_s);
+    const AllocationCount count;
+    const rt::String name = rt::Thread::currentName();
+    EXPECT_EQ(count.allocations(), 0);
+  });
+}
+
+TEST(Thread, HasAHandleOfItsOwn) {
+  const void* const here = rt::Thread::currentHandle();
+  EXPECT_NE(here, nullptr);
+  EXPECT_EQ(rt::Thread::currentHandle(), here);
+  onNewThread([&] { EXPECT_NE(rt::Thread::currentHandle(), here); });
+}
+
+}  // namespace

@@ -9,7 +9,7 @@
 
 namespace rt {
 
-constinit const ClassInfo Object::kRecord{"Object", nullptr, {}};
+constinit const ClassInfo Object::kInfo{"Object", nullptr, {}};
 
 bool Object::isEqual(const Object* other) const {
   return this == other;
@@ -21,7 +21,7 @@ std::uint64_t Object::hash() const {
 }
 
 const ClassInfo& Object::classInfo() const noexcept {
-  return kRecord;
+  return kInfo;
 }
 
 bool Object::retainUnlessDestroyed() const noexcept {
@@ -35,7 +35,7 @@ bool Object::retainUnlessDestroyed() const noexcept {
 
 void Object::destroy() const noexcept {
   count_.store(kDestroying, std::memory_order_relaxed);
-  // A cell that is made from now on finds the object destroyed, so there is none to come.
+  // No cell comes from now on: a weak reference made in a destructor refers to nothing.
   if (detail::WeakCell* cell = weakCell_.load(std::memory_order_acquire)) {
     cell->clear();
     cell->release();

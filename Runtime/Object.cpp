@@ -1,10 +1,12 @@
 #include "Runtime/Object.h"
 
+#include <array>
 #include <cinttypes>
 #include <cstdio>
 #include <cstdlib>
 
 #include "Runtime/Class.h"
+#include "Runtime/StringBuilder.h"
 #include "Runtime/Weak.h"
 
 namespace rt {
@@ -18,6 +20,18 @@ bool Object::isEqual(const Object* other) const {
 std::uint64_t Object::hash() const {
   // The low bits of an address are the same for all objects.
   return reinterpret_cast<std::uintptr_t>(this) >> 4;
+}
+
+String Object::description() const {
+  std::array<char, 32> address{};
+  std::snprintf(address.data(), address.size(), "%p", static_cast<const void*>(this));
+  StringBuilder builder;
+  builder.append('<');
+  builder.append(classInfo().name);
+  builder.append(": ");
+  builder.append(address.data());
+  builder.append('>');
+  return builder.string();
 }
 
 const ClassInfo& Object::classInfo() const noexcept {

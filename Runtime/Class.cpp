@@ -1,74 +1,83 @@
 #include "Runtime/Class.h"
 
 #include <array>
+#include <atomic>
 #include <cstdint>
 #include <cstdio>
-#include <mutex>
+
+#include "Runtime/UnfairLock.h"
 
 namespace rt {
 
 namespace {
 
-/// Records by name. Constant-initialised and never destroyed, so that it may be used before `main` and
-/// after it; holds the entries that the records bring along, so that nothing is allocated.
-template <class Record>
-class Names {
+/// Records by name. Ready before anything runs and never destroyed; made of the entries that the records
+/// bring along, so that nothing is allocated. Looking up takes no lock.
+template <class Info>
+class NameTable {
  public:
-  explicit constexpr Names(const char* kind) : kind_(kind) {}
+  /// `kind` is what to call the records in a report.
+  explicit constexpr NameTable(const char* kind) noexcept : kind_(kind) {}
 
-  void add(detail::Named<Record>& entry) noexcept {
-    const std::scoped_lock lock(mutex_);
-    detail::Named<Record>** place = &bucket(entry.record->name);
-    for (; *place != nullptr; place = &(*place)->next) {
-      detail::Named<Record>& known = **place;
-      if (known.record == entry.record) return;
-      if (known.record->name != entry.record->name) continue;
-      if (!known.isReported) {
-        known.isReported = true;
-        std::fprintf(stderr, "rt: two %s are named \"%.*s\"; the first is kept\n", kind_,
-                     static_cast<int>(entry.record->name.size()), entry.record->name.data());
-      }
-      return;
+  void add(detail::NamedEntry<Info>& entry) noexcept {
+    const LockGuard guard(lock_);
+    std::atomic<Entry*>* place = &bucket(entry.info->name);
+    for (Entry* known = nullptr; (known = place->load(std::memory_order_relaxed)) != nullptr;
+         place = &known->next) {
+      if (known->info == entry.info) return;
+      if (known->info->name == entry.info->name) return reportClash(*known);
     }
-    *place = &entry;
+    place->store(&entry, std::memory_order_release);
   }
 
-  const Record* find(std::string_view name) noexcept {
-    const std::scoped_lock lock(mutex_);
-    for (detail::Named<Record>* each = bucket(name); each != nullptr; each = each->next) {
-      if (each->record->name == name) return each->record;
-    }
-    return nullptr;
+  const Info* find(std::string_view name) const noexcept {
+    const Entry* entry = bucket(name).load(std::memory_order_acquire);
+    while (entry != nullptr && entry->info->name != name) entry = entry->next.load(std::memory_order_acquire);
+    return entry != nullptr ? entry->info : nullptr;
   }
 
  private:
-  detail::Named<Record>*& bucket(std::string_view name) noexcept {
+  using Entry = detail::NamedEntry<Info>;
+
+  static std::size_t bucketOf(std::string_view name) noexcept {
     std::uint32_t hash = 2166136261U;
     for (const char character : name) hash = (hash ^ static_cast<unsigned char>(character)) * 16777619U;
-    return buckets_[hash % buckets_.size()];
+    return hash % kBucketCount;
+  }
+  std::atomic<Entry*>& bucket(std::string_view name) noexcept { return buckets_[bucketOf(name)]; }
+  const std::atomic<Entry*>& bucket(std::string_view name) const noexcept { return buckets_[bucketOf(name)]; }
+
+  void reportClash(Entry& first) const noexcept {
+    if (first.isClashReported) return;
+    first.isClashReported = true;
+    std::fprintf(stderr, "rt: two %s are called \"%.*s\"; the first is kept\n", kind_,
+                 static_cast<int>(first.info->name.size()), first.info->name.data());
   }
 
+  static constexpr std::size_t kBucketCount = 256;
+
   const char* kind_;
-  std::mutex mutex_;
-  std::array<detail::Named<Record>*, 256> buckets_{};
+  UnfairLock lock_;
+  std::array<std::atomic<Entry*>, kBucketCount> buckets_{};
 };
 
-constinit Names<ClassInfo> classes("classes");
-constinit Names<ProtocolInfo> protocols("protocols");
+constinit NameTable<ClassInfo> classes("classes");
+constinit NameTable<ProtocolInfo> protocols("protocols");
 
-[[gnu::constructor(101)]] void announceObject() {
-  static constinit detail::Named<ClassInfo> entry{&classInfo<Object>()};
-  classes.add(entry);
+constinit detail::NamedEntry<ClassInfo> objectEntry{&classInfo<Object>()};
+
+[[gnu::constructor(detail::kAnnouncing)]] void announceObject() {
+  classes.add(objectEntry);
 }
 
 }  // namespace
 
 namespace detail {
 
-void announce(Named<ClassInfo>& entry) noexcept {
+void announce(NamedEntry<ClassInfo>& entry) noexcept {
   classes.add(entry);
 }
-void announce(Named<ProtocolInfo>& entry) noexcept {
+void announce(NamedEntry<ProtocolInfo>& entry) noexcept {
   protocols.add(entry);
 }
 

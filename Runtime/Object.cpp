@@ -1,15 +1,17 @@
 #include "Runtime/Object.h"
 
+#include <array>
 #include <cinttypes>
 #include <cstdio>
 #include <cstdlib>
 
 #include "Runtime/Class.h"
+#include "Runtime/StringBuilder.h"
 #include "Runtime/Weak.h"
 
 namespace rt {
 
-constinit const ClassInfo Object::kRecord{"Object", nullptr, {}};
+constinit const ClassInfo Object::kInfo{"Object", nullptr, {}};
 
 bool Object::isEqual(const Object* other) const {
   return this == other;
@@ -20,8 +22,20 @@ std::uint64_t Object::hash() const {
   return reinterpret_cast<std::uintptr_t>(this) >> 4;
 }
 
+String Object::description() const {
+  std::array<char, 32> address{};
+  std::snprintf(address.data(), address.size(), "%p", static_cast<const void*>(this));
+  StringBuilder builder;
+  builder.append('<');
+  builder.append(classInfo().name);
+  builder.append(": ");
+  builder.append(address.data());
+  builder.append('>');
+  return builder.string();
+}
+
 const ClassInfo& Object::classInfo() const noexcept {
-  return kRecord;
+  return kInfo;
 }
 
 bool Object::retainUnlessDestroyed() const noexcept {
@@ -35,7 +49,7 @@ bool Object::retainUnlessDestroyed() const noexcept {
 
 void Object::destroy() const noexcept {
   count_.store(kDestroying, std::memory_order_relaxed);
-  // A cell that is made from now on finds the object destroyed, so there is none to come.
+  // No cell comes from now on: a weak reference made in a destructor refers to nothing.
   if (detail::WeakCell* cell = weakCell_.load(std::memory_order_acquire)) {
     cell->clear();
     cell->release();

@@ -84,7 +84,7 @@ class Object {
   bool conformsTo(const ProtocolInfo& protocol) const noexcept;
 
   /// The record of this class.
-  static constexpr const ClassInfo& classRecord() noexcept { return kRecord; }
+  static constexpr const ClassInfo& classRecord() noexcept { return kInfo; }
 
  protected:
   constexpr Object() noexcept = default;
@@ -98,14 +98,17 @@ class Object {
  private:
   friend class detail::WeakCell;
 
-  // The count is below both bits as long as the object lives. While the object is being destroyed the
-  // count stands at kDestroying, so that references which come and go in a destructor do not destroy
-  // it again. A count that runs over ends in kImmortal: the object leaks, which harms nobody.
+  // The count is below both bits as long as the object lives. While the object is being destroyed
+  // kDestroying is set, so that references which come and go in a destructor do not destroy it again. A
+  // count that runs over ends in kImmortal: the object leaks, which harms nobody.
   static constexpr std::uint32_t kImmortal = 0x80000000;
   static constexpr std::uint32_t kDestroying = 0x40000000;
-  static const ClassInfo kRecord;
+  static const ClassInfo kInfo;
 
   bool isImmortal() const noexcept { return (count_.load(std::memory_order_relaxed) & kImmortal) != 0; }
+  bool isBeingDestroyed() const noexcept {
+    return (count_.load(std::memory_order_relaxed) & (kImmortal | kDestroying)) == kDestroying;
+  }
   bool retainUnlessDestroyed() const noexcept;
   [[gnu::cold, gnu::noinline]] void destroy() const noexcept;
   void checkNotEscaped() const noexcept;

@@ -52,7 +52,7 @@ class Ref {
 
   /// From a reference to a protocol to one to the object behind it.
   template <std::derived_from<AnyProtocol> Other>
-    requires std::same_as<T, Object>
+    requires(std::same_as<T, Object> && !std::derived_from<Other, Object>)
   Ref(const Ref<Other>& other) noexcept : Ref(other ? other->asObject() : nullptr) {}
 
   ~Ref() { drop(pointer_); }
@@ -85,6 +85,7 @@ class Ref {
   explicit operator bool() const noexcept { return pointer_ != nullptr; }
 
   friend bool operator==(const Ref& ref, std::nullptr_t) noexcept { return ref.pointer_ == nullptr; }
+  friend bool operator==(const Ref& ref, const T* pointer) noexcept { return ref.pointer_ == pointer; }
 
  private:
   void retain() const noexcept {

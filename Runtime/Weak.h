@@ -14,10 +14,15 @@
 ///
 /// Not for: a look at an object that is certainly alive, where a plain pointer will do.
 
+#include <atomic>
+#include <concepts>
+#include <cstddef>
+#include <cstdint>
 #include <utility>
 
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
+#include "Runtime/UnfairLock.h"
 
 namespace rt {
 
@@ -42,12 +47,9 @@ class WeakCell {
  private:
   explicit WeakCell(const Object& object) noexcept : object_(&object) {}
 
-  void lock() noexcept;
-  void unlock() noexcept;
-
   std::atomic<std::uint32_t> count_{2};  // the caller's and the object's
-  std::atomic<bool> isLocked_{false};
-  const Object* object_;
+  UnfairLock lock_;
+  const Object* object_ RT_GUARDED_BY(lock_);
 };
 
 }  // namespace detail

@@ -1,0 +1,52 @@
+#include "Runtime/LoadedImages.h"
+
+#include <link.h>
+
+#include <cstddef>
+#include <cstdint>
+#include <cstring>
+
+namespace rt::detail {
+
+namespace {
+
+constexpr std::size_t aligned(std::size_t size, std::size_t alignment) {
+  return (size + alignment - 1) / alignment * alignment;
+}
+
+/// Whether the notes from `note` to `end` have no mark of an image that has yet to announce anything.
+bool areAnnounced(const std::byte* note, const std::byte* end, std::size_t alignment) noexcept {
+  while (static_cast<std::size_t>(end - note) >= sizeof(ElfW(Nhdr))) {
+    ElfW(Nhdr) header;
+    std::memcpy(&header, note, sizeof header);
+    const std::byte* const name = note + sizeof header;
+    const std::byte* const description = note + aligned(sizeof header + header.n_namesz, alignment);
+    if (header.n_type == kImageMarkType && header.n_namesz == sizeof kImageMarkName &&
+        std::memcmp(name, kImageMarkName, sizeof kImageMarkName) == 0) {
+      std::int64_t distance = 0;
+      std::memcpy(&distance, description, sizeof distance);
+      if (!reinterpret_cast<const ImageState*>(description + distance)->isAnnounced) return false;
+    }
+    note = description + aligned(header.n_descsz, alignment);
+  }
+  return true;
+}
+
+/// 0 to go on with the next image, another value to end.
+int inspect(dl_phdr_info* image, std::size_t /*size*/, void* /*context*/) {
+  for (std::size_t i = 0; i < image->dlpi_phnum; ++i) {
+    const ElfW(Phdr)& segment = image->dlpi_phdr[i];
+    if (segment.p_type != PT_NOTE) continue;
+    const auto* notes = reinterpret_cast<const std::byte*>(image->dlpi_addr + segment.p_vaddr);
+    if (!areAnnounced(notes, notes + segment.p_memsz, segment.p_align == 8 ? 8 : 4)) return 1;
+  }
+  return 0;
+}
+
+}  // namespace
+
+bool areAllImagesAnnounced() noexcept {
+  return dl_iterate_phdr(&inspect, nullptr) == 0;
+}
+
+}  // namespace rt::detail

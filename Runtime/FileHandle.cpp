@@ -1,0 +1,108 @@
+#include "Runtime/FileHandle.h"
+
+#include <fcntl.h>
+#include <poll.h>
+#include <sys/uio.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <string>
+#include <system_error>
+
+namespace rt {
+
+namespace {
+
+iovec pieceOf(std::string_view text) noexcept {
+  return {const_cast<char*>(text.data()), text.size()};
+}
+
+// The pieces of a line that are still to be written.
+class Pieces {
+ public:
+  Pieces(std::string_view before, std::string_view line) noexcept
+      : pieces_{pieceOf(before), pieceOf(line), pieceOf("\n")} {
+    skip(0);
+  }
+
+  bool isEmpty() const noexcept { return first_ == pieces_.size(); }
+
+  // Hands all of them to the system at once; gives what `writev` gives.
+  ssize_t write(int descriptor) const noexcept {
+    return writev(descriptor, pieces_.data() + first_, static_cast<int>(pieces_.size() - first_));
+  }
+
+  void skip(std::size_t count) noexcept {
+    for (; first_ < pieces_.size(); ++first_) {
+      iovec& piece = pieces_[first_];
+      if (count < piece.iov_len) {
+        piece.iov_base = static_cast<char*>(piece.iov_base) + count;
+        piece.iov_len -= count;
+        return;
+      }
+      count -= piece.iov_len;
+    }
+  }
+
+ private:
+  std::array<iovec, 3> pieces_;
+  std::size_t first_ = 0;
+};
+
+void waitUntilWritable(int descriptor) noexcept {
+  pollfd request{descriptor, POLLOUT, 0};
+  poll(&request, 1, -1);
+}
+
+}  // namespace
+
+FileHandle::~FileHandle() {
+  if (closing_ == Closing::closes) close(descriptor_);
+}
+
+Ref<FileHandle> FileHandle::standardOutput() {
+  // Never destroyed: programs write until the process is gone.
+  static FileHandle* const handle = make<FileHandle>(STDOUT_FILENO, Closing::leavesOpen).detach();
+  return handle;
+}
+
+Ref<FileHandle> FileHandle::standardError() {
+  static FileHandle* const handle = make<FileHandle>(STDERR_FILENO, Closing::leavesOpen).detach();
+  return handle;
+}
+
+Ref<FileHandle> FileHandle::openForAppending(const String& path, std::uint16_t mode) {
+  if (path.isNull() || path.view().find('\0') != std::string_view::npos) {
+    errno = EINVAL;
+    return nullptr;
+  }
+  const std::string terminated(path.view());
+  int descriptor = -1;
+  do {
+    descriptor = open(terminated.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC, mode);
+  } while (descriptor < 0 && errno == EINTR);
+  return descriptor < 0 ? nullptr : make<FileHandle>(descriptor, Closing::closes);
+}
+
+void FileHandle::writeLine(std::string_view line) {
+  const LockGuard guard(lock_);
+  Pieces pieces(isInLine_ ? "\n" : "", line);
+  bool isBegun = false;
+  while (!pieces.isEmpty()) {
+    const ssize_t count = pieces.write(descriptor_);
+    if (count > 0) {
+      pieces.skip(static_cast<std::size_t>(count));
+      isBegun = true;
+    } else if (count < 0 && errno == EAGAIN && isBegun) {
+      waitUntilWritable(descriptor_);
+    } else if (count == 0 || errno != EINTR) {
+      const int error = count == 0 ? EIO : errno;
+      isInLine_ = isInLine_ || isBegun;
+      throw std::system_error(error, std::generic_category(), "cannot write a line");
+    }
+  }
+  isInLine_ = false;
+}
+
+}  // namespace rt

@@ -4,6 +4,7 @@
 #include <limits>
 
 #include "Runtime/PropertyList.h"
+#include "Runtime/UTF8.h"
 
 namespace rt {
 
@@ -23,25 +24,6 @@ std::uint64_t unsignedNumber(Bytes bytes) {
   std::uint64_t number = 0;
   for (const std::byte byte : bytes) number = number << 8U | std::to_integer<std::uint64_t>(byte);
   return number;
-}
-
-void appendUtf8(std::string& text, char32_t point) {
-  const auto append = [&text](char32_t byte) { text.push_back(static_cast<char>(byte)); };
-  if (point < 0x80) {
-    append(point);
-  } else if (point < 0x800) {
-    append(0xC0 | point >> 6U);
-    append(0x80 | (point & 0x3F));
-  } else if (point < 0x10000) {
-    append(0xE0 | point >> 12U);
-    append(0x80 | (point >> 6U & 0x3F));
-    append(0x80 | (point & 0x3F));
-  } else {
-    append(0xF0 | point >> 18U);
-    append(0x80 | (point >> 12U & 0x3F));
-    append(0x80 | (point >> 6U & 0x3F));
-    append(0x80 | (point & 0x3F));
-  }
 }
 
 // Reads each object of the table once. Every length is compared with the bytes that are there before
@@ -192,7 +174,8 @@ class Reader {
         if (point >= 0xDC00 || low2 < 0xDC00 || low2 >= 0xE000) fail("half a character in a text", start_);
         point = 0x10000 + ((point - 0xD800) << 10U) + (low2 - 0xDC00);
       }
-      appendUtf8(text, point);
+      char character[kMaximumUTF8Length];
+      text.append(character, encodeUTF8(point, character));
     }
     list_.add(std::move(text));
   }

@@ -1,9 +1,9 @@
 // PropertyList::encoded.
 #include <algorithm>
 #include <bit>
-#include <ranges>
 
 #include "Runtime/PropertyList.h"
+#include "Runtime/UTF8.h"
 
 namespace rt {
 
@@ -20,31 +20,21 @@ unsigned log2Size(std::uint64_t number) {
 
 // `text` in UTF-16. Throws std::invalid_argument if it is no valid UTF-8.
 std::u16string utf16(std::string_view text) {
+  if (!isValidUTF8(text)) throw std::invalid_argument("a text in a property list is no valid UTF-8");
   std::u16string units;
   units.reserve(text.size());
-  std::size_t position = 0;
-  while (position < text.size()) {
-    const auto first = static_cast<unsigned char>(text[position]);
-    const int length = first < 0x80 ? 1 : std::countl_one(first);
-    char32_t point = first < 0x80 ? first : first & (0x7FU >> static_cast<unsigned>(length));
-    bool isValid = first < 0x80 || (length >= 2 && length <= 4);
-    for (int i = 1; isValid && i < length; ++i) {
-      const std::size_t next = position + static_cast<std::size_t>(i);
-      const unsigned byte = next < text.size() ? static_cast<unsigned char>(text[next]) : 0U;
-      isValid = (byte & 0xC0U) == 0x80U;
-      point = point << 6U | (byte & 0x3FU);
-    }
-    constexpr char32_t kSmallest[] = {0, 0, 0x80, 0x800, 0x10000};
-    if (!isValid || point < kSmallest[length] || point > 0x10FFFF || (point >= 0xD800 && point < 0xE000)) {
-      throw std::invalid_argument("a text in a property list is no valid UTF-8");
-    }
-    if (point < 0x10000) {
-      units.push_back(static_cast<char16_t>(point));
-    } else {
+  for (std::size_t position = 0; position < text.size();) {
+    const auto at = [&](std::size_t i) { return char32_t{static_cast<unsigned char>(text[position + i])}; };
+    const std::size_t length = nextUTF8(text.substr(position)).length;
+    // The first byte of a character of several says by its leading ones how many.
+    char32_t point = length == 1 ? at(0) : at(0) & (0x7FU >> length);
+    for (std::size_t i = 1; i < length; ++i) point = point << 6U | (at(i) & 0x3F);
+    if (point >= 0x10000) {
       units.push_back(static_cast<char16_t>(0xD800 + ((point - 0x10000) >> 10U)));
-      units.push_back(static_cast<char16_t>(0xDC00 + (point & 0x3FF)));
+      point = 0xDC00 + (point & 0x3FF);
     }
-    position += static_cast<std::size_t>(length);
+    units.push_back(static_cast<char16_t>(point));
+    position += length;
   }
   return units;
 }

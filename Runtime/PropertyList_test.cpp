@@ -13,7 +13,7 @@
 #include <limits>
 #include <random>
 
-#include "Process.h"
+#include "tests/Process.h"
 
 namespace {
 

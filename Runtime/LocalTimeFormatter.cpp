@@ -120,16 +120,21 @@ bool LocalTimeFormatter::renderSecond(std::time_t second) {
 }
 
 String LocalTimeFormatter::stringFromTime(std::chrono::system_clock::time_point time) {
-  const auto whole = std::chrono::floor<std::chrono::seconds>(time);
-  const std::int64_t milliseconds =
-      std::chrono::duration_cast<std::chrono::milliseconds>(time - whole).count();
-  const std::time_t second = std::chrono::system_clock::to_time_t(whole);
+  // Rounded down by hand: rounding towards minus infinity in one step would overflow at the clock's start.
+  auto whole = std::chrono::duration_cast<std::chrono::seconds>(time.time_since_epoch());
+  auto rest = std::chrono::duration_cast<std::chrono::nanoseconds>(time.time_since_epoch() - whole);
+  if (rest.count() < 0) {
+    whole -= std::chrono::seconds(1);
+    rest += std::chrono::seconds(1);
+  }
+  const std::time_t second = whole.count();
 
   const LockGuard guard(lock_);
   if (hasZoneChanged() || !isRendered_ || second != second_) {
     if (!renderSecond(second)) return nullptr;
   }
-  for (const std::size_t place : milliseconds_) putMilliseconds(text_.data() + place, milliseconds);
+  for (const std::size_t place : milliseconds_)
+    putMilliseconds(text_.data() + place, rest.count() / 1'000'000);
   return String::fromUTF8(std::string_view(text_));
 }
 

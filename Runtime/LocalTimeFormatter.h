@@ -45,7 +45,8 @@ class LocalTimeFormatter final : public Implements<LocalTimeFormatter, Object> {
   /// without its partner.
   static Ref<LocalTimeFormatter> initWithPattern(const String& pattern);
 
-  /// `time` as text. Null where its year is more than the system can count. Throws std::bad_alloc.
+  /// `time` as text. Null where the system cannot count its year, which no time of the clock is known to
+  /// have. Throws std::bad_alloc.
   String stringFromTime(std::chrono::system_clock::time_point time);
 
  private:

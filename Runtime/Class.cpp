@@ -66,7 +66,7 @@ constinit NameTable<ProtocolInfo> protocols("protocols");
 
 constinit detail::NamedEntry<ClassInfo> objectEntry{&classInfo<Object>()};
 
-[[gnu::constructor(detail::kAnnouncing)]] void announceObject() {
+[[gnu::constructor(101)]] void announceObject() {
   classes.add(objectEntry);
 }
 

@@ -1,5 +1,6 @@
 #include "Runtime/ClassMethod.h"
 
+#include <algorithm>
 #include <utility>
 
 #include "Runtime/UnfairLock.h"

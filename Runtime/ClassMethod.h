@@ -21,26 +21,17 @@
 ///
 /// Not for: functions that can be called by their C++ names.
 
-#include <algorithm>
 #include <atomic>
 #include <cstddef>
 #include <string_view>
 #include <vector>
 
 #include "Runtime/Class.h"
+#include "Runtime/String.h"
 
 namespace rt {
 
 namespace detail {
-
-/// A string literal as a template argument.
-template <std::size_t size>
-struct LiteralArgument {
-  consteval LiteralArgument(const char (&literal)[size]) { std::copy_n(literal, size, characters); }
-  constexpr std::string_view view() const noexcept { return {characters, size - 1}; }
-
-  char characters[size]{};
-};
 
 /// Has one address for each type. Not constant, since linkers may fold constants of equal value.
 template <class>
@@ -61,7 +52,7 @@ class ClassMethod {
   }
 
  private:
-  template <ClassType, detail::LiteralArgument, auto>
+  template <ClassType, detail::StringLiteral, auto>
   friend struct AddedClassMethod;
 
   template <class Function>
@@ -95,22 +86,17 @@ void announce(ClassMethodEntry& entry) noexcept;
 
 /// Adds the function to the class's methods under `selector`, where it is instantiated explicitly as
 /// above.
-template <ClassType Class, detail::LiteralArgument selector, auto function>
+template <ClassType Class, detail::StringLiteral selector, auto function>
 struct [[gnu::visibility("default")]] AddedClassMethod {
  private:
-  static constexpr auto kSelector = selector;
+  static ClassMethod method() { return {selector.view(), function}; }
 
-  static ClassMethod method() { return {kSelector.view(), function}; }
-
-  [[gnu::constructor(detail::kAnnouncing)]] static void announceSelf() {
-    static_cast<void>(&detail::announceImage);
-    detail::announce(entry_);
-  }
+  static void mention() { static_cast<void>(&detail::AnnouncedOnLoading<entry_>::run); }
 
   static constinit detail::ClassMethodEntry entry_;
 };
 
-template <ClassType Class, detail::LiteralArgument selector, auto function>
+template <ClassType Class, detail::StringLiteral selector, auto function>
 constinit detail::ClassMethodEntry AddedClassMethod<Class, selector, function>::entry_{&classInfo<Class>(),
                                                                                        &method};
 

@@ -83,7 +83,7 @@ consteval std::string_view protocolName() {
 template <class T>
 struct [[gnu::visibility("default")]] ProtocolRecord {
   static constexpr const ProtocolInfo& get() noexcept {
-    static_cast<void>(&announceSelf);
+    static_cast<void>(&AnnouncedOnLoading<entry_>::run);
     return kInfo;
   }
 
@@ -94,11 +94,6 @@ struct [[gnu::visibility("default")]] ProtocolRecord {
     } else {
       return &ProtocolRecord<typename T::ProtocolInherited>::get();
     }
-  }
-
-  [[gnu::constructor(kAnnouncing)]] static void announceSelf() {
-    static_cast<void>(&announceImage);
-    announce(entry_);
   }
 
   static const ProtocolInfo kInfo;
@@ -145,16 +140,11 @@ inline constexpr auto kConformances = [] {
 template <class T, class... Protocols>
 struct [[gnu::visibility("default")]] ClassRecord {
   static constexpr const ClassInfo& get() noexcept {
-    static_cast<void>(&announceSelf);
+    static_cast<void>(&AnnouncedOnLoading<entry_>::run);
     return kInfo;
   }
 
  private:
-  [[gnu::constructor(kAnnouncing)]] static void announceSelf() {
-    static_cast<void>(&announceImage);
-    announce(entry_);
-  }
-
   static const ClassInfo kInfo;
   static constinit NamedEntry<ClassInfo> entry_;
 };

@@ -42,9 +42,9 @@ struct [[gnu::visibility("default")]] LoadHook {
  private:
   static void run() { Class::load(); }
 
-  [[gnu::constructor(detail::kAnnouncing)]] static void announceSelf() {
-    static_cast<void>(&detail::announceImage);
-    detail::announce(entry_);
+  static void mention() {
+    static_cast<void>(&detail::AnnouncedOnLoading<entry_>::run);
+    static_cast<void>(classInfo<Class>());
   }
 
   static constinit detail::LoadHookEntry entry_;

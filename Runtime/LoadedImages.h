@@ -11,9 +11,8 @@
 
 namespace rt::detail {
 
-/// The priorities of the two rounds. What the compiler arranges for static objects comes after both.
-inline constexpr int kAnnouncing = 101;
-inline constexpr int kAnnounced = 102;
+// The rounds are priorities of [[gnu::constructor]]: 101, the first that is free to use, and 102. What the
+// compiler arranges for static objects comes after both.
 
 /// Whether every image that bears a mark has announced what it has. Called while images are loaded, so
 /// that none comes or goes meanwhile.

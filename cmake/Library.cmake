@@ -13,7 +13,9 @@ function(mount_point_library name public_name)
   target_include_directories(${name} PUBLIC
     "$<BUILD_INTERFACE:${PROJECT_SOURCE_DIR}>" "$<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}/mount-point>")
   target_compile_features(${name} PUBLIC cxx_std_20)
-  target_link_libraries(${name} PRIVATE $<BUILD_INTERFACE:MountPoint::Options>)
+  # Not linked, since programs would then be linked with the options too: they choose theirs.
+  target_compile_options(${name} PRIVATE $<TARGET_PROPERTY:MountPoint::Options,INTERFACE_COMPILE_OPTIONS>)
+  target_compile_definitions(${name} PRIVATE $<TARGET_PROPERTY:MountPoint::Options,INTERFACE_COMPILE_DEFINITIONS>)
   set_target_properties(${name} PROPERTIES OUTPUT_NAME mount-point-${name} EXPORT_NAME ${public_name}Archive)
 
   add_library(${name}-whole INTERFACE)

@@ -11,12 +11,15 @@ struct ImageState {
 };
 [[gnu::used, gnu::section("__DATA,__rt_image")]] static constinit ImageState imageState;
 
-[[gnu::used, gnu::constructor(kAnnounced)]] static void announceSourceFile() {
+[[gnu::used, gnu::constructor(102)]] static void announceSourceFile() {
   imageState.isAnnounced = true;
   runLoadHooksWhenComplete();
 }
 
-/// What records refer to so that their image is marked; here it is in any case.
-inline void announceImage() {}
+/// Emitted where it is mentioned: announces `entry` in the first round.
+template <auto& entry>
+struct AnnouncedOnLoading {
+  [[gnu::constructor(101)]] static void run() { announce(entry); }
+};
 
 }  // namespace rt::detail

@@ -16,7 +16,7 @@ inline constexpr unsigned kImageMarkType = 1;
 /// Emitted into each image that refers to it, together with the mark: an ELF note, which no linker
 /// discards and which can be found from the image's program headers. It holds the distance from itself
 /// to the image's state, since a pointer would have to be written when the image is loaded.
-[[gnu::constructor(kAnnounced), gnu::visibility("hidden")]] inline void announceImage() {
+[[gnu::constructor(102), gnu::visibility("hidden")]] inline void announceImage() {
   asm volatile(
       ".pushsection .note.rt-image, \"a\", %%note\n"
       "  .balign 4\n"
@@ -31,5 +31,23 @@ inline constexpr unsigned kImageMarkType = 1;
   imageState.isAnnounced = true;
   runLoadHooksWhenComplete();
 }
+
+/// Emitted where it is mentioned: announces `entry` in the first round when the image is loaded. g++ forgets
+/// the priority of [[gnu::constructor]] in templates, so what that would do is written out. Hidden, since
+/// only such a function has an address that the operand may be.
+template <auto& entry>
+struct AnnouncedOnLoading {
+  [[gnu::used, gnu::visibility("hidden")]] static void run() {
+    asm volatile(
+        ".pushsection .init_array.00101, \"aw\", %%init_array\n"
+        "  .balign 8\n"
+        "  .quad %c0\n"
+        ".popsection"
+        :
+        : "i"(&run));
+    static_cast<void>(&announceImage);
+    announce(entry);
+  }
+};
 
 }  // namespace rt::detail

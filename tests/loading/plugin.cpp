@@ -1,0 +1,26 @@
+// Opened by plugin-host: adds a method and has a class with a load hook of its own.
+#include "Runtime/ClassMethod.h"
+#include "Runtime/LoadHook.h"
+#include "Registry.h"
+
+namespace {
+
+constinit char seen[256] = "";
+
+class D : public rt::Implements<D, rt::Object> {
+ public:
+  static void load() { Registry::look().copy(seen, sizeof seen - 1); }
+};
+
+int method() {
+  return 4;
+}
+
+}  // namespace
+
+template struct rt::LoadHook<D>;
+template struct rt::AddedClassMethod<Registry, "add_D", &method>;
+
+extern "C" [[gnu::visibility("default")]] const char* seenByPlugin() {
+  return seen;
+}

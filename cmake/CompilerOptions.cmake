@@ -26,7 +26,8 @@ target_compile_options(compiler-options INTERFACE
 target_compile_definitions(compiler-options INTERFACE _GLIBCXX_ASSERTIONS)
 if(NOT MOUNT_POINT_INSTRUMENTATION)
   target_compile_options(compiler-options INTERFACE
-    $<$<NOT:$<CONFIG:Debug>>:-U_FORTIFY_SOURCE> $<$<NOT:$<CONFIG:Debug>>:-D_FORTIFY_SOURCE=2>)
+    $<$<CONFIG:Release,RelWithDebInfo,MinSizeRel>:-U_FORTIFY_SOURCE>
+    $<$<CONFIG:Release,RelWithDebInfo,MinSizeRel>:-D_FORTIFY_SOURCE=2>)
 endif()
 target_link_options(compiler-options INTERFACE
   $<$<PLATFORM_ID:Linux>:-Wl,-z,relro,-z,now,-z,noexecstack,-z,separate-code>)

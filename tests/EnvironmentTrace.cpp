@@ -8,6 +8,7 @@
 
 #include <cerrno>
 #include <csignal>
+#include <filesystem>
 #include <fstream>
 #include <map>
 #include <sstream>
@@ -78,8 +79,14 @@ bool waitForStop(pid_t process) {
 
 }  // namespace
 
-std::set<std::string> environmentVariablesReadBy(const std::string& path) {
+std::set<std::string> environmentVariablesReadBy(const std::vector<std::string>& arguments) {
+  const std::string path = std::filesystem::canonical(arguments.at(0));
   const std::set<Address> offsets = lookUps(path);
+  std::vector<char*> argumentVector;
+  argumentVector.reserve(arguments.size() + 1);
+  for (const std::string& argument : arguments) argumentVector.push_back(const_cast<char*>(argument.c_str()));
+  argumentVector.push_back(nullptr);
+
   const pid_t process = fork();
   require(process >= 0, "cannot fork");
   if (process == 0) {
@@ -88,10 +95,13 @@ std::set<std::string> environmentVariablesReadBy(const std::string& path) {
     dup2(nowhere, STDOUT_FILENO);
     dup2(nowhere, STDERR_FILENO);
     ptrace(PTRACE_TRACEME, 0, nullptr, nullptr);
-    execl(path.c_str(), path.c_str(), nullptr);
+    execv(path.c_str(), argumentVector.data());
     _exit(127);
   }
   require(waitForStop(process), "the program cannot be traced");
+  // Whatever goes wrong from here on, no stopped program stays behind.
+  require(ptrace(PTRACE_SETOPTIONS, process, nullptr, PTRACE_O_EXITKILL) == 0,
+          "the program cannot be traced");
 
   const Address base = loadAddress(process, path);
   std::map<Address, Address> originals;

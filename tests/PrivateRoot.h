@@ -3,7 +3,7 @@
 #include <string>
 
 /// A root file system of one's own, in which /Volumes is a fresh tmpfs that nobody else sees and
-/// everything else is the machine's.
+/// every other directory is the machine's.
 ///
 ///     PrivateRoot::enter();
 ///     PrivateRoot::mountVolumes("nr_inodes=2");    // instead of the empty one: one that is soon full

@@ -91,3 +91,8 @@ ProcessResult runProcess(const std::vector<std::string>& arguments, const std::f
   if (WIFSIGNALED(status)) result.signal = WTERMSIG(status);
   return result;
 }
+
+std::string tracingRefusal() {
+  const ProcessResult result = runProcess({"strace", "-o", "/dev/null", "true"});
+  return result.exitStatus == 0 ? "" : "no program can be traced here: " + result.standardError;
+}

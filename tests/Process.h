@@ -27,3 +27,6 @@ struct ProcessResult {
 /// the program starts: the place to close a stream, set a umask or drop an identity.
 ProcessResult runProcess(const std::vector<std::string>& arguments,
                          const std::function<void()>& beforeExec = {}, const std::string& program = "");
+
+/// Why this machine does not let one program trace another, as strace does; "" when it does.
+std::string tracingRefusal();

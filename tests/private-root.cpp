@@ -1,7 +1,7 @@
 // private-root COMMAND [ARGUMENT…]
 //
-// Runs COMMAND in a private root: /Volumes is an empty directory that nobody else sees, everything
-// else is the machine's. Exits as COMMAND does; 77, with the reason, where the machine forbids it.
+// Runs COMMAND in a private root: /Volumes is an empty directory that nobody else sees, every
+// other directory is the machine's. Exits as COMMAND does; 77, with the reason, where the machine forbids it.
 
 #include <unistd.h>
 

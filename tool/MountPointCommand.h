@@ -21,5 +21,6 @@
 /// handed over stays.
 ///
 /// Calls the operating system directly, keeps no state, starts no thread, reads no environment
-/// variable.
+/// variable. With raised privileges it is safe only where its callers can neither write in "/Volumes" nor
+/// remove it: the new directory is handed over by its path.
 int runMountPointCommand(int argumentCount, const char* const* arguments);

@@ -87,7 +87,7 @@ struct OrderedEntry {
 
 std::vector<OrderedEntry> ordered(std::span<const DescribedEntry> entries) {
   std::vector<OrderedEntry> result(entries.begin(), entries.end());
-  std::stable_sort(result.begin(), result.end());
+  std::sort(result.begin(), result.end());
   return result;
 }
 

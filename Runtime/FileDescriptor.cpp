@@ -2,11 +2,8 @@
 
 #include <fcntl.h>
 #include <poll.h>
-#include <sys/uio.h>
 #include <unistd.h>
 
-#include <algorithm>
-#include <array>
 #include <cerrno>
 #include <stdexcept>
 #include <system_error>
@@ -28,32 +25,21 @@ FileDescriptor FileDescriptor::open(const std::string& path, int flags, mode_t m
   return FileDescriptor(descriptor);
 }
 
-void FileDescriptor::write(int descriptor, std::string_view first, std::string_view second,
-                           std::size_t* written) {
-  std::size_t count = 0;
-  const std::size_t total = first.size() + second.size();
-  if (written != nullptr) *written = 0;
-  while (count < total) {
-    const auto part = [](std::string_view text) {
-      return iovec{const_cast<char*>(text.data()), text.size()};
-    };
-    const std::size_t ofFirst = std::min(count, first.size());
-    const std::array<iovec, 2> parts{part(first.substr(ofFirst)), part(second.substr(count - ofFirst))};
-    const ssize_t result = ::writev(descriptor, parts.data(), parts.size());
-    if (result > 0) {
-      count += static_cast<std::size_t>(result);
-      if (written != nullptr) *written = count;
+void FileDescriptor::write(std::string_view bytes) const {
+  while (!bytes.empty()) {
+    const ssize_t count = ::write(descriptor_, bytes.data(), bytes.size());
+    if (count > 0) {
+      bytes.remove_prefix(static_cast<std::size_t>(count));
       continue;
     }
     // A device that takes nothing and complains of nothing would be asked for ever.
-    const int error = result == 0 ? EIO : errno;
-    if (error == EINTR) continue;
+    const int error = count == 0 ? EIO : errno;
     if (error == EAGAIN) {
-      pollfd ready{descriptor, POLLOUT, 0};
+      pollfd ready{descriptor_, POLLOUT, 0};
       ::poll(&ready, 1, -1);
-      continue;
+    } else if (error != EINTR) {
+      throw std::system_error(error, std::generic_category(), "cannot write");
     }
-    throw std::system_error(error, std::generic_category(), "cannot write");
   }
 }
 

@@ -39,12 +39,9 @@ class FileDescriptor {
   int get() const noexcept { return descriptor_; }
   explicit operator bool() const noexcept { return descriptor_ >= 0; }
 
-  /// Writes all of `first` and then all of `second`, in one system call if the system takes them whole. A
-  /// descriptor that does not block is waited for. On failure throws std::system_error, and `written`,
-  /// if given, says how many bytes were.
-  static void write(int descriptor, std::string_view first, std::string_view second = {},
-                    std::size_t* written = nullptr);
-  void write(std::string_view bytes) const { write(descriptor_, bytes); }
+  /// Writes all of `bytes`. A descriptor that does not block is waited for. Throws std::system_error; some
+  /// of the bytes may have been written then.
+  void write(std::string_view bytes) const;
 
  private:
   int descriptor_ = -1;

@@ -1,9 +1,9 @@
 #include "Runtime/Object.h"
 
 #include <array>
-#include <cinttypes>
 #include <cstdio>
 #include <cstdlib>
+#include <string_view>
 
 #include "Runtime/Class.h"
 #include "Runtime/StringBuilder.h"
@@ -50,20 +50,26 @@ bool Object::retainUnlessDestroyed() const noexcept {
 void Object::destroy() const noexcept {
   count_.store(kDestroying, std::memory_order_relaxed);
   // No cell comes from now on: a weak reference made in a destructor refers to nothing.
-  if (detail::WeakCell* cell = weakCell_.load(std::memory_order_acquire)) {
+  if (auto* cell = static_cast<detail::WeakCell*>(cellOrClass_.load(std::memory_order_acquire))) {
     cell->clear();
     cell->release();
   }
+  cellOrClass_.store(const_cast<ClassInfo*>(&classInfo()), std::memory_order_relaxed);
   delete this;
 }
 
 void Object::checkNotEscaped() const noexcept {
-  // 1 is an object on the stack, or one whose constructor threw.
   const std::uint32_t count = count_.load(std::memory_order_relaxed);
-  if (count == kDestroying || count == 1) [[likely]]
+  if (count == kDestroying) [[likely]]
     return;
-  std::fprintf(stderr, "rt: a reference to the object at %p outlives its destructor\n",
-               static_cast<const void*>(this));
+  // On the stack, or left by its constructor with an exception.
+  if (count == 1) return;
+  std::string_view name = "object";
+  if ((count & kDestroying) != 0) {
+    name = static_cast<const ClassInfo*>(cellOrClass_.load(std::memory_order_relaxed))->name;
+  }
+  std::fprintf(stderr, "rt: a reference to the %.*s at %p outlives its destructor\n",
+               static_cast<int>(name.size()), name.data(), static_cast<const void*>(this));
   std::abort();
 }
 

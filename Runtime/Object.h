@@ -113,7 +113,9 @@ class Object {
   [[gnu::cold, gnu::noinline]] void destroy() const noexcept;
   void checkNotEscaped() const noexcept;
 
-  mutable std::atomic<detail::WeakCell*> weakCell_{nullptr};
+  // The cell of the weak references, if there are any; while the object is being destroyed, its class's
+  // record instead, which ~Object would not know.
+  mutable std::atomic<void*> cellOrClass_{nullptr};
   mutable std::atomic<std::uint32_t> count_{1};
 };
 

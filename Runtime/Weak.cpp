@@ -6,14 +6,15 @@ namespace rt::detail {
 
 WeakCell* WeakCell::of(const Object& object) {
   if (object.isBeingDestroyed()) return nullptr;
-  WeakCell* cell = object.weakCell_.load(std::memory_order_acquire);
-  if (cell == nullptr) {
+  void* known = object.cellOrClass_.load(std::memory_order_acquire);
+  if (known == nullptr) {
     std::unique_ptr<WeakCell> made(new WeakCell(object));
-    if (object.weakCell_.compare_exchange_strong(cell, made.get(), std::memory_order_acq_rel,
-                                                 std::memory_order_acquire)) {
+    if (object.cellOrClass_.compare_exchange_strong(known, made.get(), std::memory_order_acq_rel,
+                                                    std::memory_order_acquire)) {
       return made.release();
     }
   }
+  auto* const cell = static_cast<WeakCell*>(known);
   cell->retain();
   return cell;
 }

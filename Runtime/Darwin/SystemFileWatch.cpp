@@ -1,0 +1,83 @@
+#include "Runtime/SystemFileWatch.h"
+
+#include <fcntl.h>
+#include <sys/event.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <filesystem>
+#include <system_error>
+#include <utility>
+
+namespace rt::detail {
+
+namespace {
+
+namespace fs = std::filesystem;
+
+constexpr unsigned kEvents = NOTE_WRITE | NOTE_EXTEND | NOTE_ATTRIB | NOTE_DELETE | NOTE_RENAME;
+
+[[noreturn]] void fail(const char* what) {
+  throw std::system_error(errno, std::generic_category(), what);
+}
+
+// Has `queue` tell of `path`; returns the descriptor by which it does, or -1.
+int watch(int queue, const char* path) {
+  const int file = open(path, O_EVTONLY | O_CLOEXEC);
+  if (file < 0) return -1;
+  struct kevent event;
+  EV_SET(&event, file, EVFILT_VNODE, EV_ADD | EV_CLEAR, kEvents, 0, nullptr);
+  if (kevent(queue, &event, 1, nullptr, 0, nullptr) != 0) fail("kevent");
+  return file;
+}
+
+}  // namespace
+
+SystemFileWatch::SystemFileWatch(const std::string& path) : path_(fs::absolute(path)), events_(kqueue()) {
+  if (!events_) fail("kqueue");
+  fcntl(events_.get(), F_SETFD, FD_CLOEXEC);
+  struct kevent event;
+  EV_SET(&event, 0, EVFILT_USER, EV_ADD | EV_CLEAR, 0, 0, nullptr);
+  if (kevent(events_.get(), &event, 1, nullptr, 0, nullptr) != 0) fail("kevent");
+  arm();
+}
+
+SystemFileWatch::~SystemFileWatch() {
+  for (const int file : watched_) close(file);
+}
+
+void SystemFileWatch::arm() {
+  // A folder tells of names that come and go in it, the file of what is written to it.
+  std::vector<int> watched;
+  fs::path folder = fs::path(path_).parent_path();
+  int file = watch(events_.get(), folder.c_str());
+  while (file < 0 && folder.has_relative_path()) {
+    folder = folder.parent_path();
+    file = watch(events_.get(), folder.c_str());
+  }
+  if (file < 0) fail("open");
+  watched.push_back(file);
+  const int target = watch(events_.get(), path_.c_str());
+  if (target >= 0) watched.push_back(target);
+  for (const int old : watched_) close(old);
+  watched_ = std::move(watched);
+}
+
+bool SystemFileWatch::wait() {
+  struct kevent event;
+  while (kevent(events_.get(), nullptr, 0, &event, 1, nullptr) < 0) {
+    if (errno != EINTR) fail("kevent");
+  }
+  if (isStopped_.load(std::memory_order_relaxed)) return false;
+  arm();
+  return true;
+}
+
+void SystemFileWatch::stop() noexcept {
+  isStopped_.store(true, std::memory_order_relaxed);
+  struct kevent event;
+  EV_SET(&event, 0, EVFILT_USER, 0, NOTE_TRIGGER, 0, nullptr);
+  kevent(events_.get(), &event, 1, nullptr, 0, nullptr);
+}
+
+}  // namespace rt::detail

@@ -1,0 +1,95 @@
+#pragma once
+
+// What user defaults are made of: the file, what was last read of it, and who wants to know of changes.
+
+#include <sys/types.h>
+
+#include <condition_variable>
+#include <exception>
+#include <memory>
+#include <optional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "Runtime/Block.h"
+#include "Runtime/DefaultsFile.h"
+#include "Runtime/DefaultsText.h"
+#include "Runtime/String.h"
+#include "Runtime/SystemFileWatch.h"
+#include "Runtime/ThreadIdentifier.h"
+#include "Runtime/UnfairLock.h"
+
+namespace rt::detail {
+
+/// Where reports of user defaults go; null is standard error.
+void setDefaultsReportHandler(Block<void(const String&)> handler);
+
+/// Says `line` there. No lock is held then.
+void reportDefaults(const std::string& line) noexcept;
+
+/// One who wants to know of changes. All but the key is the store's, under its lock.
+struct DefaultsObserver {
+  const std::string key;
+  Block<void()> block;
+  /// The value that it has been called for.
+  std::optional<std::string> seen;
+  /// The thread that calls it or is about to; 0 for none.
+  ThreadIdentifier caller = 0;
+  bool isRunning = false;
+  bool isRemoved = false;
+};
+
+/// Any thread may use it. See Runtime/UserDefaults.h for what its functions promise.
+class DefaultsStore : public std::enable_shared_from_this<DefaultsStore> {
+ public:
+  /// Over the file at `path`. Where that is empty there is no place for one, and `problem` says why.
+  DefaultsStore(std::string path, std::string problem);
+
+  std::optional<std::string> value(std::string_view key);
+
+  /// Sets the value of `key`, or takes it away where `value` is none, and tells observers.
+  void change(std::string_view key, std::optional<std::string_view> value);
+
+  std::shared_ptr<DefaultsObserver> observe(std::string_view key, bool alsoNow, Block<void()> block);
+  void remove(DefaultsObserver& observer) noexcept;
+
+  /// Lets the thread that waits for changes end.
+  void stop() noexcept;
+
+ private:
+  // Reads the file if it has changed. Returns what is to be reported, without the lock; "" for nothing.
+  [[nodiscard]] std::string refresh() RT_REQUIRES(lock_);
+  std::optional<std::string> find(std::string_view key) const RT_REQUIRES(lock_);
+
+  // Starts the thread if this process has none. Returns what is to be reported.
+  [[nodiscard]] std::string startWatching() RT_REQUIRES(lock_);
+  void watch(SystemFileWatch& watch) noexcept;
+
+  using Observers = std::vector<std::shared_ptr<DefaultsObserver>>;
+  // The observers whose value has changed and that no thread is about to call, which from now on this
+  // thread is. Held `changeLock_` keeps the thread that waits for changes from claiming those of another.
+  // `problem` becomes what is to be reported.
+  [[nodiscard]] Observers claim(std::string& problem) RT_REQUIRES(changeLock_) RT_EXCLUDES(lock_);
+  // Calls what has been claimed. Returns the first exception of theirs.
+  [[nodiscard]] std::exception_ptr call(const Observers& observers);
+  // Whether `observer`, which this thread has claimed, is to be called now, for the first time or again.
+  [[nodiscard]] bool isDue(DefaultsObserver& observer);
+
+  const DefaultsFile file_;
+  // Held while the file is being changed, until the observers are claimed; taken before `lock_`.
+  UnfairLock changeLock_;
+  UnfairLock lock_;
+  DefaultsText text_ RT_GUARDED_BY(lock_);
+  DefaultsFile::Version version_ RT_GUARDED_BY(lock_);
+  // What was reported last, until it is no longer so.
+  std::string problem_ RT_GUARDED_BY(lock_);
+  const std::string placeProblem_;
+  Observers observers_ RT_GUARDED_BY(lock_);
+  std::condition_variable_any callEnded_;
+  std::shared_ptr<SystemFileWatch> watch_ RT_GUARDED_BY(lock_);
+  // The process that has the thread.
+  pid_t watcher_ RT_GUARDED_BY(lock_) = 0;
+};
+
+}  // namespace rt::detail

@@ -3,7 +3,7 @@
 #include <cstdio>
 #include <cstdlib>
 
-#include "Runtime/Linux/Futex.h"
+#include "Runtime/AddressWait.h"
 
 namespace rt::detail {
 
@@ -12,14 +12,6 @@ namespace {
 // Each look at the lock while it is held takes its memory from the holder, so the looks become rarer; all
 // of them together take about as long as a short critical section.
 constexpr int kLongestPause = 16;
-
-void pause() noexcept {
-#if defined(__x86_64__) || defined(__i386__)
-  __builtin_ia32_pause();
-#elif defined(__aarch64__)
-  asm volatile("yield");
-#endif
-}
 
 }  // namespace
 
@@ -33,7 +25,7 @@ void SystemLock::lockSlow(ThreadIdentifier self) noexcept {
   for (int pauses = 1; pauses <= kLongestPause; pauses *= 2) {
     if (state == 0 && take(self)) return;
     if ((state & kHasWaiters) != 0) break;  // Others have waited in vain.
-    for (int i = 0; i < pauses; ++i) pause();
+    for (int i = 0; i < pauses; ++i) spinPause();
     state = state_.load(std::memory_order_relaxed);
   }
   // From here on the lock is taken with the bit set: others may still sleep, and who has taken the lock
@@ -47,13 +39,13 @@ void SystemLock::lockSlow(ThreadIdentifier self) noexcept {
       }
     } else if ((state & kHasWaiters) != 0 ||
                state_.compare_exchange_weak(state, state | kHasWaiters, std::memory_order_relaxed)) {
-      futexWait(state_, state | kHasWaiters);
+      waitAtAddress(state_, state | kHasWaiters);
     }
   }
 }
 
 void SystemLock::wakeOne() noexcept {
-  futexWake(&state_, 1);
+  wakeAtAddress(&state_);
 }
 
 void SystemLock::checkOwner(const char* verb) const noexcept {

@@ -1,0 +1,36 @@
+#pragma once
+
+#include <linux/futex.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <cerrno>
+#include <chrono>
+#include <cstdint>
+#include <ctime>
+
+namespace rt::detail {
+
+/// Sleeps while `word` is `expected`, until it is woken or, where that is not null, `timeout` is over.
+/// May return for no reason: look at the word again. Leaves `errno` alone.
+inline void waitAtAddress(const std::atomic<std::uint32_t>& word, std::uint32_t expected,
+                          const std::chrono::nanoseconds* timeout = nullptr) noexcept {
+  const int error = errno;
+  if (timeout == nullptr) {
+    syscall(SYS_futex, &word, FUTEX_WAIT_PRIVATE, expected, nullptr, nullptr, 0);
+  } else {
+    const auto seconds = std::chrono::duration_cast<std::chrono::seconds>(*timeout);
+    const timespec relative{.tv_sec = seconds.count(), .tv_nsec = (*timeout - seconds).count()};
+    syscall(SYS_futex, &word, FUTEX_WAIT_PRIVATE, expected, &relative, nullptr, 0);
+  }
+  errno = error;
+}
+
+/// Wakes one thread that sleeps at `word`, if any. The word is not looked at and may be gone: then
+/// whoever uses its place now is at worst woken for no reason.
+inline void wakeAtAddress(const std::atomic<std::uint32_t>* word) noexcept {
+  syscall(SYS_futex, word, FUTEX_WAKE_PRIVATE, 1, nullptr, nullptr, 0);
+}
+
+}  // namespace rt::detail

@@ -1,0 +1,66 @@
+#include "Runtime/MainQueue.h"
+
+#include <cstdio>
+#include <cstdlib>
+
+#include "Runtime/QueueRegistry.h"
+#include "Runtime/ThreadIdentifier.h"
+
+namespace rt {
+
+constinit detail::WakeDescriptor MainQueue::wakeDescriptor_;
+constinit std::atomic<bool> MainQueue::isStopping_ = false;
+
+MainQueue& MainQueue::instance() {
+  static MainQueue* const queue = new MainQueue;  // For ever: tasks are queued until the very end.
+  return *queue;
+}
+
+bool MainQueue::mayRunHere() const noexcept {
+  return isMainThread();
+}
+
+void MainQueue::schedule() noexcept {
+  detail::QueueRegistry::runTasksAtExit();
+  wakeDescriptor_.set();
+}
+
+void MainQueue::checkThread(const char* operation) const noexcept {
+  if (isMainThread()) return;
+  std::fprintf(stderr, "rt: MainQueue::%s on thread %u, which is not the main thread\n", operation,
+               currentThreadIdentifier());
+  std::abort();
+}
+
+void MainQueue::run() {
+  MainQueue& queue = instance();
+  queue.checkThread("run");
+  if (queue.isCurrent()) {
+    std::fprintf(stderr, "rt: MainQueue::run from a task of the main queue\n");
+    std::abort();
+  }
+  fileDescriptor();
+  while (!isStopping_.exchange(false, std::memory_order_acq_rel)) {
+    wakeDescriptor_.wait();
+    wakeDescriptor_.reset();
+    queue.runScheduled(&isStopping_);
+  }
+}
+
+void MainQueue::stop() noexcept {
+  isStopping_.store(true, std::memory_order_release);
+  wakeDescriptor_.set();
+}
+
+std::size_t MainQueue::drain() {
+  MainQueue& queue = instance();
+  queue.checkThread("drain");
+  wakeDescriptor_.reset();
+  return queue.runScheduled(nullptr);
+}
+
+int MainQueue::fileDescriptor() {
+  return wakeDescriptor_.open();
+}
+
+}  // namespace rt

@@ -1,0 +1,45 @@
+#pragma once
+
+// All queues there are, for what concerns them all: exit and fork. For rt::Queue only.
+
+#include <atomic>
+#include <chrono>
+
+#include "Runtime/ThreadSafety.h"
+#include "Runtime/UnfairLock.h"
+
+namespace rt {
+
+class Queue;
+
+namespace detail {
+
+class QueueRegistry {
+ public:
+  /// How long the program waits at exit for tasks that run, altogether.
+  static constinit std::atomic<std::chrono::nanoseconds::rep> exitPatience;
+
+  static void add(Queue& queue) RT_EXCLUDES(lock);
+  static void remove(Queue& queue) noexcept RT_EXCLUDES(lock);
+
+  /// Sees to it that what is queued runs before the process exits. Called when a queue gets work, not
+  /// when it is made: what tasks use has mostly been made by then, and is destroyed after they have run.
+  static void runTasksAtExit() noexcept {
+    if (!runsTasksAtExit_.load(std::memory_order_relaxed)) registerExitHandler();
+  }
+
+  /// Guards the list of all queues, which is in the queues.
+  static constinit UnfairLock lock;
+
+ private:
+  static void registerForkHandlers() noexcept;
+  static void registerExitHandler() noexcept;
+  static void drainAtExit();
+  static void resetAfterFork() noexcept;
+
+  static constinit std::atomic<bool> runsTasksAtExit_;
+  static constinit Queue* first_ RT_GUARDED_BY(lock);
+};
+
+}  // namespace detail
+}  // namespace rt

@@ -1,0 +1,51 @@
+// A logger with a delegate that it does not keep alive: it tells the delegate as long as there is one.
+
+#include <cstdio>
+
+#include "Runtime/Class.h"
+#include "Runtime/Object.h"
+#include "Runtime/Ref.h"
+#include "Runtime/String.h"
+#include "Runtime/Weak.h"
+
+using namespace rt::literals;
+
+struct LoggerDelegate : rt::Protocol<LoggerDelegate> {
+  virtual void didLog(const rt::String& message) = 0;
+
+ protected:
+  ~LoggerDelegate() = default;
+};
+
+class Logger final : public rt::Implements<Logger, rt::Object> {
+ public:
+  void setDelegate(const rt::Ref<LoggerDelegate>& delegate) { delegate_ = delegate; }
+
+  // Whether somebody was told.
+  bool log(const rt::String& message) {
+    // The reference keeps the delegate whole until it has been told.
+    const rt::Ref<LoggerDelegate> delegate = delegate_.lock();
+    if (!delegate) return false;
+    delegate->didLog(message);
+    return true;
+  }
+
+ private:
+  rt::Weak<LoggerDelegate> delegate_;
+};
+
+class Printer final : public rt::Implements<Printer, rt::Object, LoggerDelegate> {
+ public:
+  void didLog(const rt::String& message) override {
+    std::printf("logged: %.*s\n", static_cast<int>(message.length()), message.view().data());
+  }
+};
+
+int main() {
+  const rt::Ref<Logger> logger = rt::make<Logger>();
+  rt::Ref<Printer> printer = rt::make<Printer>();
+  logger->setDelegate(printer);
+  logger->log("started"_s);
+  printer = nullptr;
+  std::printf("%s\n", logger->log("stopped"_s) ? "somebody was told" : "nobody was told");
+}

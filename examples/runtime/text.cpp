@@ -1,0 +1,34 @@
+// Text: literals that cost nothing, formats that are checked while compiling, and collections that
+// describe themselves.
+
+#include <cstdio>
+
+#include "Runtime/Array.h"
+#include "Runtime/Dictionary.h"
+#include "Runtime/Format.h"
+#include "Runtime/Number.h"
+#include "Runtime/String.h"
+
+using namespace rt::literals;
+
+namespace {
+
+void print(const rt::String& text) {
+  std::printf("%.*s\n", static_cast<int>(text.length()), text.view().data());
+}
+
+}  // namespace
+
+int main() {
+  const rt::String name = rt::String::fromUTF8("  Ann \n").trimmed();
+  print(rt::format("%@ is %d years old (%.1f %%)."_s, name, 41, 99.5));
+
+  // Bytes that are not UTF-8 are no text.
+  if (rt::String::fromUTF8("\xff").isNull()) print("not UTF-8"_s);
+
+  const rt::Ref<rt::Dictionary> person =
+      rt::Dictionary::of({{"full name"_s, "Ann Smith"_s},
+                          {"age"_s, rt::Number::of(41)},
+                          {"children"_s, rt::Array::of("Bob"_s, "Zoe"_s)}});
+  print(person->description());
+}

@@ -61,7 +61,7 @@ template <class Function, class Result, class... Arguments>
 class CapturingBlock final : public BlockBody<Result, Arguments...> {
  public:
   template <class From>
-  explicit CapturingBlock(From&& function) : function_(std::forward<From>(function)) {}
+  CapturingBlock(std::in_place_t, From&& function) : function_(std::forward<From>(function)) {}
 
   Result call(Arguments... arguments) const override {
     return static_cast<Result>(std::invoke(function_, std::forward<Arguments>(arguments)...));
@@ -118,8 +118,8 @@ class Block<Result(Arguments...)> {
       if constexpr (std::is_pointer_v<Given> || std::is_member_pointer_v<Given>) {
         if (function == nullptr) return;
       }
-      body_ = Ref<const Body>::adopt(
-          new detail::CapturingBlock<Stored, Result, Arguments...>(std::forward<Function>(function)));
+      body_ = Ref<const Body>::adopt(new detail::CapturingBlock<Stored, Result, Arguments...>(
+          std::in_place, std::forward<Function>(function)));
     }
   }
 

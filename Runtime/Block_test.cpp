@@ -67,13 +67,13 @@ TEST(Block, PassesArgumentsAsTheyAreDeclared) {
 
 TEST(Block, CapturesWhatCanOnlyBeMoved) {
   const rt::Block<int()> block = [number = std::make_unique<int>(42)] { return *number; };
-  const rt::Block<int()> copy = block;
+  const rt::Block<int()> copy = block;  // NOLINT(performance-unnecessary-copy-initialization)
   EXPECT_EQ(copy(), 42);
 }
 
 TEST(Block, KeepsItsStateBetweenCalls) {
   const rt::Block<int()> counter = [count = 0]() mutable { return ++count; };
-  const rt::Block<int()> copy = counter;
+  const rt::Block<int()> copy = counter;  // NOLINT(performance-unnecessary-copy-initialization)
   EXPECT_EQ(counter(), 1);
   EXPECT_EQ(copy(), 2);
 }

@@ -51,10 +51,11 @@ class AnyProtocol {
   /// The object that conforms to the protocol. Never null; not retained.
   virtual Object* asObject() const noexcept = 0;
 
+  AnyProtocol(const AnyProtocol&) = delete;
+  AnyProtocol& operator=(const AnyProtocol&) = delete;
+
  protected:
   constexpr AnyProtocol() noexcept = default;
-  constexpr AnyProtocol(const AnyProtocol&) noexcept {}
-  constexpr AnyProtocol& operator=(const AnyProtocol&) noexcept { return *this; }
   constexpr ~AnyProtocol() = default;
 };
 
@@ -76,7 +77,8 @@ class Protocol : public Inherited {
   using ProtocolInherited = Inherited;
 
  protected:
-  constexpr Protocol() noexcept = default;
+  // Not private with `Self` as a friend: g++ would then take the destructor for accessible.
+  constexpr Protocol() noexcept = default;  // NOLINT(bugprone-crtp-constructor-accessibility)
   constexpr ~Protocol() = default;
 };
 
@@ -105,7 +107,6 @@ class Implements : public Super, public Protocols... {
 
  protected:
   using Super::Super;
-  constexpr Implements() = default;
   constexpr ~Implements() override = default;
 
   static_assert(ClassType<Super>, "the superclass must be rt::Object or name itself by rt::Implements");
@@ -114,6 +115,10 @@ class Implements : public Super, public Protocols... {
                 "the superclass conforms to one of these protocols already");
   static_assert((detail::isBaseOfOneOnly<Protocols, Protocols...>() && ...),
                 "one of these protocols is named twice or inherited by another");
+
+ private:
+  friend Self;
+  constexpr Implements() = default;
 };
 
 /// The same for a class that adds no protocol.
@@ -128,10 +133,13 @@ class Implements<Self, Super> : public Super {
 
  protected:
   using Super::Super;
-  constexpr Implements() = default;
   constexpr ~Implements() override = default;
 
   static_assert(ClassType<Super>, "the superclass must be rt::Object or name itself by rt::Implements");
+
+ private:
+  friend Self;
+  constexpr Implements() = default;
 };
 
 /// The record of the class T.
@@ -168,8 +176,8 @@ using CopyConst = std::conditional_t<std::is_const_v<From>, const To, To>;
 /// null where the object is none, and for null. Takes a few nanoseconds, allocates and locks nothing.
 /// The result is not retained.
 template <class T, class From>
-  requires(ClassType<T> || ProtocolType<T>)
 detail::CopyConst<From, T>* cast(From* from) noexcept {
+  static_assert(ClassType<T> || ProtocolType<T>, "rt::cast leads to a class or a protocol that names itself");
   if (from == nullptr) return nullptr;
   Object* object = detail::objectOf(from);
   if constexpr (ClassType<T>) {

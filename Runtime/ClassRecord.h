@@ -47,8 +47,8 @@ consteval std::string_view sourceName() {
   std::size_t start = 0;
   std::size_t depth = 0;
   for (std::size_t i = 0; i < text.size(); ++i) {
-    if (kOpening.find(text[i]) != text.npos) ++depth;
-    if (kClosing.find(text[i]) != text.npos) --depth;
+    if (kOpening.find(text[i]) != std::string_view::npos) ++depth;
+    if (kClosing.find(text[i]) != std::string_view::npos) --depth;
     if (text[i] == ':' && depth == 0) start = i + 1;
   }
   return text.substr(start);

@@ -33,7 +33,7 @@ class Point final : public rt::Implements<Point, rt::Object> {
     return point != nullptr && point->x_ == x_ && point->y_ == y_;
   }
   std::uint64_t hash() const override {
-    return 41 * static_cast<std::uint64_t>(x_) + static_cast<std::uint64_t>(y_);
+    return (41 * static_cast<std::uint64_t>(x_)) + static_cast<std::uint64_t>(y_);
   }
 
  private:

@@ -57,12 +57,8 @@ class Ref {
 
   ~Ref() { drop(pointer_); }
 
-  Ref& operator=(const Ref& other) noexcept {
-    Ref(other).swap(*this);
-    return *this;
-  }
-  Ref& operator=(Ref&& other) noexcept {
-    Ref(std::move(other)).swap(*this);
+  Ref& operator=(Ref other) noexcept {
+    swap(other);
     return *this;
   }
 
@@ -112,9 +108,14 @@ template <ClassType T, class... Arguments>
   return Ref<T>::adopt(new T(std::forward<Arguments>(arguments)...));
 }
 
+template <class T, class... Arguments>
+Ref<T> make(Arguments&&...) {
+  static_assert(ClassType<T>, "the class must name itself by rt::Implements");
+  return nullptr;
+}
+
 /// `ref` as a T; null where the object is none, and for null.
 template <class T, class From>
-  requires(ClassType<T> || ProtocolType<T>)
 Ref<T> cast(const Ref<From>& ref) noexcept {
   return cast<T>(ref.get());
 }
@@ -130,6 +131,6 @@ bool isEqual(const Ref<T>& first, const Ref<Other>& second) {
 
 /// Of the object's identity, as `==` compares references.
 template <class T>
-struct std::hash<rt::Ref<T>> {
+struct std::hash<rt::Ref<T>> {  // NOLINT(cert-dcl58-cpp): what it is for
   std::size_t operator()(const rt::Ref<T>& ref) const noexcept { return std::hash<T*>()(ref.get()); }
 };

@@ -82,12 +82,8 @@ class Weak {
     if (cell_ != nullptr) cell_->release();
   }
 
-  Weak& operator=(const Weak& other) noexcept {
-    Weak(other).swap(*this);
-    return *this;
-  }
-  Weak& operator=(Weak&& other) noexcept {
-    Weak(std::move(other)).swap(*this);
+  Weak& operator=(Weak other) noexcept {
+    swap(other);
     return *this;
   }
 

@@ -95,7 +95,7 @@ TEST(Weak, IsCopiedMovedAndReplaced) {
   rt::Weak<Listener> weak = one;
   const rt::Weak<Listener> copy = weak;
   rt::Weak<Listener> moved = std::move(weak);
-  EXPECT_FALSE(weak.lock());  // NOLINT(bugprone-use-after-move)
+  EXPECT_FALSE(weak.lock());  // NOLINT(bugprone-use-after-move,clang-analyzer-cplusplus.Move)
   EXPECT_EQ(copy.lock(), one);
   EXPECT_EQ(moved.lock(), one);
   moved = another;
@@ -154,7 +154,7 @@ TEST(Weak, AllocatesAtTheFirstReferenceOnly) {
   EXPECT_EQ(count.allocations(), 1);
   {
     const rt::Weak<Delegate> second = listener;
-    const rt::Weak<Delegate> third = second;
+    const rt::Weak<Delegate> third = second;  // NOLINT(performance-unnecessary-copy-initialization)
     EXPECT_TRUE(third.lock());
   }
   EXPECT_EQ(count.allocations(), 1);

@@ -18,8 +18,9 @@ endfunction()
 
 # mount_point_must_not_compile(NAME SOURCE FILE MESSAGE REGEX [DEFINITION MACRO] [COMPILER ID])
 #
-# Adds the ctest entry NAME: FILE compiles as it is, and with MACRO defined (MUST_NOT_COMPILE unless
-# named) it does not, and the compiler's complaint matches REGEX. So FILE holds what is right and, between
+# Adds the ctest entry NAME: with MACRO defined (MUST_NOT_COMPILE unless named) FILE does not compile, and
+# the compiler's complaint matches REGEX; and, once for each FILE, the entry must-compile.FILE: it compiles
+# as it is. So FILE holds what is right and, between
 # `#ifdef MUST_NOT_COMPILE` and `#endif`, the mistake. Nothing is linked; includes are from the
 # repository's root. With COMPILER (GNU or Clang) the entry is left out under any other.
 function(mount_point_must_not_compile name)
@@ -39,6 +40,11 @@ function(mount_point_must_not_compile name)
     list(APPEND command -Wthread-safety -Wthread-safety-beta)
   endif()
   cmake_path(ABSOLUTE_PATH test_SOURCE)
+  # That the file compiles as it is needs to be tried once only.
+  cmake_path(RELATIVE_PATH test_SOURCE BASE_DIRECTORY "${PROJECT_SOURCE_DIR}" OUTPUT_VARIABLE source)
+  if(NOT TEST "must-compile.${source}")
+    add_test(NAME "must-compile.${source}" COMMAND ${command} "${test_SOURCE}")
+  endif()
   add_test(NAME ${name} COMMAND "${CMAKE_COMMAND}"
     "-DCOMMAND_LINE=${command}" "-DSOURCE=${test_SOURCE}" "-DDEFINITION=${test_DEFINITION}"
     "-DMESSAGE=${test_MESSAGE}" -P "${PROJECT_SOURCE_DIR}/cmake/must-not-compile.cmake")

@@ -40,7 +40,7 @@ bool AllocationCount::isSupported() noexcept {
 #elif defined(__GLIBC__)
 
 // The C library lets a program bring its own malloc, and keeps its own under these names.
-// NOLINTBEGIN(bugprone-reserved-identifier,cert-dcl37-c,cert-dcl51-cpp,readability-identifier-naming)
+// NOLINTBEGIN(bugprone-reserved-identifier,cert-dcl37-c,cert-dcl51-cpp,readability-identifier-naming,readability-inconsistent-declaration-parameter-name)
 extern "C" {
 
 void* __libc_malloc(std::size_t size);
@@ -87,7 +87,7 @@ void free(void* block) {
 }
 
 }  // extern "C"
-// NOLINTEND(bugprone-reserved-identifier,cert-dcl37-c,cert-dcl51-cpp,readability-identifier-naming)
+// NOLINTEND(bugprone-reserved-identifier,cert-dcl37-c,cert-dcl51-cpp,readability-identifier-naming,readability-inconsistent-declaration-parameter-name)
 
 bool AllocationCount::isSupported() noexcept {
   return true;

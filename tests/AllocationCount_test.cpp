@@ -45,7 +45,7 @@ TEST_F(AllocationCountTest, CountsEveryWayToAllocate) {
   void* block = std::calloc(1, 100);
   use(block);
   EXPECT_EQ(count.allocations(), 3);
-  block = std::realloc(block, 100'000);
+  block = std::realloc(block, 100'000);  // NOLINT(bugprone-suspicious-realloc-usage)
   use(block);
   EXPECT_EQ(count.allocations(), 4);
   EXPECT_EQ(count.balance(), 3);

@@ -1,0 +1,38 @@
+# Run by ctest, with BUILD, COMPILER, FLAGS, WORK, WAY (find_package or pkg-config) and PKG_CONFIG: installs
+# what was built and builds program.cpp beside this file with nothing else, as a stranger would.
+
+function(run)
+  execute_process(COMMAND ${ARGN} RESULT_VARIABLE result OUTPUT_VARIABLE output ERROR_VARIABLE output)
+  if(NOT result EQUAL 0)
+    list(JOIN ARGN " " command)
+    message(FATAL_ERROR "${command}\nfailed with ${result}:\n${output}")
+  endif()
+  set(output "${output}" PARENT_SCOPE)
+endfunction()
+
+file(REMOVE_RECURSE "${WORK}")
+run("${CMAKE_COMMAND}" --install "${BUILD}" --component development --prefix "${WORK}/first")
+# What is installed may be moved.
+file(RENAME "${WORK}/first" "${WORK}/installed")
+
+separate_arguments(flags UNIX_COMMAND "${FLAGS}")
+if(WAY STREQUAL "find_package")
+  run("${CMAKE_COMMAND}" -S "${CMAKE_CURRENT_LIST_DIR}" -B "${WORK}/build" "-DCMAKE_CXX_COMPILER=${COMPILER}"
+    "-DCMAKE_CXX_FLAGS=${FLAGS}" "-DCMAKE_PREFIX_PATH=${WORK}/installed")
+  run("${CMAKE_COMMAND}" --build "${WORK}/build")
+  set(program "${WORK}/build/program")
+else()
+  file(GLOB_RECURSE description "${WORK}/installed/*/mount-point-runtime.pc")
+  cmake_path(GET description PARENT_PATH folder)
+  set(ENV{PKG_CONFIG_PATH} "${folder}")
+  run("${PKG_CONFIG}" --cflags --libs mount-point-runtime)
+  string(STRIP "${output}" output)
+  separate_arguments(package UNIX_COMMAND "${output}")
+  set(program "${WORK}/program")
+  run("${COMPILER}" -std=c++20 ${flags} "${CMAKE_CURRENT_LIST_DIR}/program.cpp" ${package} -o "${program}")
+endif()
+
+run("${program}")
+if(NOT output STREQUAL "42\n")
+  message(FATAL_ERROR "The program printed \"${output}\".")
+endif()

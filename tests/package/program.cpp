@@ -1,0 +1,47 @@
+// A program of somebody who has only what was installed. Prints the time that a class found by name knows.
+#include <cstdio>
+
+#include "Runtime/Block.h"
+#include "Runtime/Class.h"
+#include "Runtime/ClassMethod.h"
+#include "Runtime/LoadHook.h"
+#include "Runtime/Ref.h"
+#include "Runtime/String.h"
+#include "Runtime/Weak.h"
+
+struct Clock : rt::Protocol<Clock> {
+  virtual int now() const = 0;
+
+ protected:
+  ~Clock() = default;
+};
+
+class SystemClock final : public rt::Implements<SystemClock, rt::Object, Clock> {
+ public:
+  static inline rt::Ref<rt::Object> (*factory)() = nullptr;
+
+  static void load() {
+    for (const rt::ClassMethod& method : rt::classMethods(rt::classInfo<SystemClock>())) {
+      if (method.selector() == "make") factory = method.as<rt::Ref<rt::Object>()>();
+    }
+  }
+  int now() const override { return 42; }
+};
+
+rt::Ref<rt::Object> makeClock() {
+  return rt::make<SystemClock>();
+}
+
+template struct rt::LoadHook<SystemClock>;
+template struct rt::AddedClassMethod<SystemClock, "make", &makeClock>;
+
+int main() {
+  if (SystemClock::factory == nullptr || rt::classNamed("SystemClock") == nullptr) return 1;
+  // Only a runtime that is linked whole has a class of which nothing here knows.
+  if (rt::classNamed("String") == nullptr) return 2;
+  const rt::Ref<rt::Object> object = SystemClock::factory();
+  const rt::Weak<Clock> clock = rt::cast<Clock>(object.get());
+  const rt::Block<int()> ask = [clock] { return clock.lock()->now(); };
+  std::printf("%d\n", ask());
+  return 0;
+}

@@ -63,8 +63,8 @@ TEST(DefaultsText, SaysWhatIsMalformedAndWhere) {
   EXPECT_EQ(errorOf("a = \"1"), "line 1: a quotation mark without its other");
   EXPECT_EQ(errorOf("\"a = 1"), "line 1: a quotation mark without its other");
   EXPECT_EQ(errorOf("a = \"1\" 2"), "line 1: text behind a quoted value");
-  for (const char* text : {"a = \"\\", "a = \"\\x\"", "a = \"\\u12\"", "a = \"\\u12g4\"", "a = \"\\uD83D\"",
-                           "a = \"\\u+123\"", "a = \"\\u\""}) {
+  for (const char* text : {R"(a = "\)", R"(a = "\x")", R"(a = "\u12")", R"(a = "\u12g4")", R"(a = "\uD83D")",
+                           R"(a = "\u+123")", R"(a = "\u")"}) {
     EXPECT_EQ(errorOf(text), "line 1: a backslash that stands for no character") << text;
   }
   EXPECT_EQ(errorOf("a = \x01"), "line 1: a control character");

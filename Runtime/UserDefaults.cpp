@@ -68,7 +68,7 @@ std::shared_ptr<detail::DefaultsStore> standardStore() {
   const String application = identifier.isEmpty() ? Process::name() : identifier;
   const std::string_view name = application.view();
   if (name.empty() || name == "." || name == ".." ||
-      name.find_first_of(std::string_view("/\0", 2)) != name.npos) {
+      name.find_first_of(std::string_view("/\0", 2)) != std::string_view::npos) {
     return std::make_shared<detail::DefaultsStore>(
         "", "there are no user defaults: the application's name is none for a folder: " + std::string(name));
   }
@@ -85,7 +85,7 @@ UserDefaults::~UserDefaults() {
 }
 
 Ref<UserDefaults> UserDefaults::standardUserDefaults() {
-  static UserDefaults* const standard = new UserDefaults(standardStore());
+  static auto* const standard = new UserDefaults(standardStore());
   return standard;
 }
 

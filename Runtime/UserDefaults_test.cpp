@@ -49,6 +49,10 @@ void write(const fs::path& path, std::string_view content) {
   std::ofstream(path, std::ios::binary) << content;
 }
 
+void setMode(const fs::path& path, mode_t mode) {
+  ASSERT_EQ(chmod(path.c_str(), mode), 0);
+}
+
 // Has another process run `script`, in which $1 is `path`.
 void inShell(const std::string& script, const fs::path& path) {
   const ProcessResult result = runProcess({"sh", "-ec", script, "sh", path.string()});
@@ -120,12 +124,12 @@ TEST_F(UserDefaults, NeedPath) {
 TEST_F(UserDefaults, ReadBooleansAsPeopleWriteThem) {
   const auto defaults = this->defaults();
   for (const char* value : {"YES", "yes", "Yes", "TRUE", "true", "on", "ON", "y", "T", "1", "2", "-1", "0.5",
-                            "+1", "99999999999999999999", "\"yes\""}) {
+                            "+1", "99999999999999999999", R"("yes")"}) {
     write(path(), std::string("key = ") + value);
     EXPECT_TRUE(defaults->boolForKey("key")) << value;
   }
   for (const char* value : {"NO", "no", "false", "off", "n", "", "0", "0.0", "-0", "1a", "yesterday", "ye",
-                            "nan", "inf", "\" yes\"", "ÿes", "9\x79"}) {
+                            "nan", "inf", R"(" yes")", "ÿes", "9\x79"}) {
     write(path(), std::string("key = ") + value);
     EXPECT_FALSE(defaults->boolForKey("key")) << value;
   }
@@ -200,10 +204,11 @@ TEST_F(UserDefaults, ReadBackWhatIsSet) {
 
 TEST_F(UserDefaults, KeepRemarksModeAndOtherSettings) {
   write(path(), "# by hand\nkey = 1\nother = 2\n");
-  fs::permissions(path(), fs::perms(0640));
+  setMode(path(), 0640);
   defaults()->setInteger(3, "key");
   EXPECT_EQ(contentOf(path()), "# by hand\nkey = 3\nother = 2\n");
-  EXPECT_EQ(fs::status(path()).permissions(), fs::perms(0640));
+  EXPECT_EQ(fs::status(path()).permissions(),
+            fs::perms::owner_read | fs::perms::owner_write | fs::perms::group_read);
   // No temporary file is left.
   EXPECT_EQ(std::distance(fs::directory_iterator(folder_), {}), 1);
 }
@@ -430,15 +435,15 @@ TEST_F(UserDefaultsOfOthers, AreToldOf) {
   const auto defaults = this->defaults();
   const auto observation = observe(defaults);
   await(nullptr);
-  inShell("echo 'key = 1' > \"$1\"", path());
+  inShell(R"(echo 'key = 1' > "$1")", path());
   await("1"_s);
-  inShell("echo 'key = 2' > \"$1\"", path());
+  inShell(R"(echo 'key = 2' > "$1")", path());
   await("2"_s);
-  inShell("echo 'key = 3' > \"$1.new\"; mv \"$1.new\" \"$1\"", path());
+  inShell(R"(echo 'key = 3' > "$1.new"; mv "$1.new" "$1")", path());
   await("3"_s);
-  inShell("rm \"$1\"", path());
+  inShell(R"(rm "$1")", path());
   await(nullptr);
-  inShell("echo 'key = 4' > \"$1\"; echo 'not key' > \"$1\"; echo 'key = 5' > \"$1\"", path());
+  inShell(R"(echo 'key = 4' > "$1"; echo 'not key' > "$1"; echo 'key = 5' > "$1")", path());
   await("5"_s);
 }
 
@@ -457,12 +462,12 @@ TEST_F(UserDefaultsOfOthers, AreToldOfWhereTheFolderIsMissing) {
   const fs::path path = folder_ / "a" / "b" / "c" / "defaults.conf";
   const auto defaults = defaultsAt(path);
   const auto observation = observe(defaults);
-  inShell("mkdir -p \"${1%/*}\"; echo 'key = 1' > \"$1\"", path);
+  inShell(R"(mkdir -p "${1%/*}"; echo 'key = 1' > "$1")", path);
   await("1"_s);
-  inShell("rm -r \"${1%/b/*}/b\"", path);
+  inShell(R"(rm -r "${1%/b/*}/b")", path);
   await(nullptr);
-  inShell("mkdir -p \"${1%/*}\"", path);
-  inShell("echo 'key = 2' > \"$1\"", path);
+  inShell(R"(mkdir -p "${1%/*}")", path);
+  inShell(R"(echo 'key = 2' > "$1")", path);
   await("2"_s);
 }
 
@@ -473,12 +478,12 @@ TEST_F(UserDefaultsOfOthers, AreToldOfBehindASymbolicLink) {
   const auto defaults = this->defaults();
   const auto observation = observe(defaults);
   await("1"_s);
-  inShell("echo 'key = 2' > \"${1%/*}/elsewhere/target\"", path());
+  inShell(R"(echo 'key = 2' > "${1%/*}/elsewhere/target")", path());
   await("2"_s);
-  inShell("mkdir \"${1%/*}/third\"; echo 'key = 3' > \"${1%/*}/third/target\"; ln -snf third/target \"$1\"",
+  inShell(R"(mkdir "${1%/*}/third"; echo 'key = 3' > "${1%/*}/third/target"; ln -snf third/target "$1")",
           path());
   await("3"_s);
-  inShell("echo 'key = 4' > \"${1%/*}/third/target\"", path());
+  inShell(R"(echo 'key = 4' > "${1%/*}/third/target")", path());
   await("4"_s);
 }
 
@@ -495,7 +500,7 @@ TEST_F(UserDefaultsOfOthers, AreToldOfAfterAChildHasForked) {
   int status = 0;
   ASSERT_EQ(waitpid(child, &status, 0), child);
   ASSERT_EQ(status, 0);
-  inShell("echo 'key = 1' > \"$1\"", path());
+  inShell(R"(echo 'key = 1' > "$1")", path());
   await("1"_s);
 }
 
@@ -510,7 +515,7 @@ TEST_F(UserDefaultsOfOthers, AreToldOfOnAThreadThatTakesNoSignals) {
     thread = std::this_thread::get_id();
     called.release();
   });
-  inShell("echo 'key = 1' > \"$1\"", path());
+  inShell(R"(echo 'key = 1' > "$1")", path());
   called.acquire();
   EXPECT_NE(thread, std::this_thread::get_id());
   EXPECT_EQ(sigismember(&blocked, SIGTERM), 1);
@@ -529,11 +534,11 @@ TEST_F(UserDefaultsOfOthers, ReportWhatAnObserverThrows) {
   });
   const auto first = defaults->observe("key", Notify::kOnChange, [] { throw std::runtime_error("oh"); });
   const auto second = observe(defaults);
-  inShell("echo 'key = 1' > \"$1\"", path());
+  inShell(R"(echo 'key = 1' > "$1")", path());
   reported.acquire();
   EXPECT_EQ(report, "an observer of user defaults threw: oh");
   await("1"_s);
-  inShell("echo 'key = 2' > \"$1\"", path());
+  inShell(R"(echo 'key = 2' > "$1")", path());
   reported.acquire();
   await("2"_s);
   rt::UserDefaults::setReportHandler(nullptr);
@@ -543,14 +548,17 @@ TEST_F(UserDefaultsOfOthers, ReportWhatAnObserverThrows) {
 TEST_F(UserDefaultsOfOthers, MayBeLetGoOfByAnObserver) {
   auto defaults = this->defaults();
   const rt::Weak<rt::UserDefaults> weak = defaults;
+  std::binary_semaphore kept{0};
   std::binary_semaphore called{0};
   rt::UserDefaults::Observation observation;
   observation = defaults->observe("key", Notify::kOnChange, [&] {
+    kept.acquire();
     observation = {};
     called.release();
   });
+  kept.release();
   defaults = nullptr;
-  inShell("echo 'key = 1' > \"$1\"", path());
+  inShell(R"(echo 'key = 1' > "$1")", path());
   called.acquire();
   EXPECT_FALSE(weak.lock());
 }
@@ -563,6 +571,7 @@ TEST_F(UserDefaults, ConcurrentRemovalIsFinal) {
     for (int i = 0; !isDone; ++i) defaults->setInteger(i, "key");
   });
   std::vector<std::jthread> observers;
+  observers.reserve(2);
   for (int thread = 0; thread < 2; ++thread) {
     observers.emplace_back([&] {
       std::int64_t total = 0;
@@ -590,6 +599,7 @@ TEST_F(UserDefaults, ConcurrentChangesEndWithTheLastValueSeen) {
         defaults->observe("key", Notify::kAlsoNow, [&] { seen = defaults->integerForKey("key"); });
     {
       std::vector<std::jthread> setters;
+      setters.reserve(4);
       for (int thread = 0; thread < 4; ++thread) {
         setters.emplace_back([&, thread] {
           for (int i = 0; i < 5; ++i) defaults->setInteger((round * 100) + (thread * 10) + i, "key");
@@ -641,7 +651,7 @@ TEST_F(UserDefaults, ConcurrentChangesOfSeveralProcessesAllStand) {
 // `environment` has been put in place.
 class StandardUserDefaults : public UserDefaults {
  protected:
-  std::string inChild(const std::function<void()>& environment, const std::function<void()>& use) {
+  static std::string inChild(const std::function<void()>& environment, const std::function<void()>& use) {
     const ProcessResult result = runProcess({"true"}, [&] {
       rt::UserDefaults::setReportHandler(nullptr);
       unsetenv("XDG_CONFIG_HOME");
@@ -658,7 +668,7 @@ class StandardUserDefaults : public UserDefaults {
     EXPECT_EQ(result.exitStatus, 0);
     return result.standardError;
   }
-  void setEnvironment(const char* name, const fs::path& value) { setenv(name, value.c_str(), 1); }
+  static void setEnvironment(const char* name, const fs::path& value) { setenv(name, value.c_str(), 1); }
 };
 
 TEST_F(StandardUserDefaults, AreInTheUsersFolder) {
@@ -731,19 +741,19 @@ class RestrictedUserDefaults : public StandardUserDefaults {
 
 TEST_F(RestrictedUserDefaults, SayThatTheFolderIsNotWritable) {
   write(path(), "key = 1\n");
-  fs::permissions(folder_, fs::perms(0555));
+  setMode(folder_, 0555);
   EXPECT_EQ(inChild(&becomeOrdinary, [&] { change(path()); }),
             "cannot write " + path().string() + ": Permission denied");
   EXPECT_EQ(inChild(&becomeOrdinary, [&] { change(folder_ / "a" / "defaults.conf"); }),
             "cannot make the folder " + (folder_ / "a").string() + ": Permission denied");
   EXPECT_EQ(contentOf(path()), "key = 1\n");
-  fs::permissions(folder_, fs::perms(0755));
+  setMode(folder_, 0755);
 }
 
 TEST_F(RestrictedUserDefaults, LeaveAReadOnlyFileAlone) {
   write(path(), "key = 1\n");
-  fs::permissions(path(), fs::perms(0444));
-  fs::permissions(folder_, fs::perms(0777));
+  setMode(path(), 0444);
+  setMode(folder_, 0777);
   EXPECT_EQ(inChild(&becomeOrdinary, [&] { change(path()); }),
             "cannot write " + path().string() + ": Permission denied");
   EXPECT_EQ(contentOf(path()), "key = 1\n");
@@ -751,8 +761,8 @@ TEST_F(RestrictedUserDefaults, LeaveAReadOnlyFileAlone) {
 
 TEST_F(RestrictedUserDefaults, SayThatTheFileIsNotReadable) {
   write(path(), "key = 1\n");
-  fs::permissions(path(), fs::perms(0200));
-  fs::permissions(folder_, fs::perms(0755));
+  setMode(path(), 0200);
+  setMode(folder_, 0755);
   const std::string said = "cannot open " + path().string() + ": Permission denied";
   const auto read = [&] {
     const auto defaults = this->defaults();
@@ -763,7 +773,6 @@ TEST_F(RestrictedUserDefaults, SayThatTheFileIsNotReadable) {
 }
 
 TEST_F(RestrictedUserDefaults, SurviveAFullDisk) {
-  std::string refused;
   const std::string said = inChild([] {},
                                    [&] {
                                      try {

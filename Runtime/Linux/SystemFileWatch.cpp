@@ -1,6 +1,5 @@
 #include "Runtime/SystemFileWatch.h"
 
-#include <limits.h>
 #include <poll.h>
 #include <sys/eventfd.h>
 #include <sys/inotify.h>
@@ -9,6 +8,7 @@
 #include <algorithm>
 #include <array>
 #include <cerrno>
+#include <climits>
 #include <cstdint>
 #include <filesystem>
 #include <system_error>

@@ -1,0 +1,69 @@
+// Keyed archives: what can be read can be written, and is then read as the same.
+#include <cstddef>
+#include <cstdint>
+#include <cstdlib>
+#include <span>
+#include <vector>
+
+#include "Runtime/Array.h"
+#include "Runtime/Coding.h"
+#include "Runtime/Dictionary.h"
+#include "Runtime/KeyedArchiver.h"
+#include "Runtime/KeyedUnarchiver.h"
+#include "Runtime/PropertyList.h"
+
+namespace {
+
+class Tag final : public rt::Implements<Tag, rt::Object, rt::SecureCoding> {
+ public:
+  Tag(rt::String name, rt::Ref<rt::Object> other) : name_(std::move(name)), other_(std::move(other)) {}
+  void encodeWithCoder(rt::KeyedArchiver& coder) const override {
+    coder.encodeObject(name_, "name");
+    if (other_) coder.encodeObject(other_, "other");
+  }
+  static rt::Ref<Tag> initWithCoder(rt::KeyedUnarchiver& coder) {
+    rt::String name = coder.decodeString("name");
+    rt::Ref<rt::Object> other;
+    if (coder.containsValueForKey("other")) {
+      other = coder.decodeObjectOfClasses({&rt::classInfo<Tag>(), &rt::classInfo<rt::Array>()}, "other");
+    }
+    return rt::make<Tag>(std::move(name), std::move(other));
+  }
+
+ private:
+  rt::String name_;
+  rt::Ref<rt::Object> other_;
+};
+
+void require(bool condition) {
+  if (!condition) std::abort();
+}
+
+}  // namespace
+
+template struct rt::AddedClassMethod<Tag, "initWithCoder:", &rt::initWithCoder<Tag>>;
+
+extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
+  // A copy of just the size, so that a look beyond the end is noticed.
+  const std::span<const std::byte> given = std::as_bytes(std::span(data, size));
+  const std::vector<std::byte> bytes(given.begin(), given.end());
+  try {
+    const std::vector<std::byte> again = rt::PropertyList::decoded(bytes).encoded();
+    require(rt::PropertyList::decoded(again).encoded() == again);
+  } catch (const rt::MalformedPropertyList&) {
+    return 0;
+  }
+
+  rt::String error;
+  const rt::Ref<rt::Object> object =
+      rt::KeyedUnarchiver::unarchivedObjectOfClasses({&rt::classInfo<rt::Object>()}, bytes, &error);
+  require(!object || error.isNull());
+  if (!object) return 0;
+  // By bytes, since few of them can stand for more objects than can be compared one by one.
+  const std::vector<std::byte> first = rt::KeyedArchiver::archivedDataWithRootObject(object);
+  const rt::Ref<rt::Object> read =
+      rt::KeyedUnarchiver::unarchivedObjectOfClasses({&rt::classInfo<rt::Object>()}, first, &error);
+  require(read != nullptr);
+  require(rt::KeyedArchiver::archivedDataWithRootObject(read) == first);
+  return 0;
+}

@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <cstddef>
+#include <functional>
 #include <string_view>
 #include <vector>
 
@@ -87,7 +88,7 @@ struct OrderedEntry {
 
 std::vector<OrderedEntry> ordered(std::span<const DescribedEntry> entries) {
   std::vector<OrderedEntry> result(entries.begin(), entries.end());
-  std::sort(result.begin(), result.end());
+  std::ranges::sort(result, std::less());
   return result;
 }
 

@@ -1,5 +1,6 @@
 #include "Runtime/Dictionary.h"
 
+#include <algorithm>
 #include <stdexcept>
 #include <vector>
 
@@ -9,8 +10,11 @@ namespace rt {
 
 void Dictionary::Builder::set(const Ref<Object>& key, const Ref<Object>& value) {
   if (key == nullptr) throw std::invalid_argument("rt::Dictionary: a key is null");
-  if (value == nullptr) return remove(key.get());
-  entries_.insert_or_assign(key, value);
+  if (value != nullptr) {
+    entries_.insert_or_assign(key, value);
+  } else {
+    remove(key.get());
+  }
 }
 
 void Dictionary::Builder::remove(const Object* key) {
@@ -33,11 +37,10 @@ Object* Dictionary::objectForKey(const Object* key) const {
 bool Dictionary::isEqual(const Object* other) const {
   if (this == other) return true;
   const auto* dictionary = cast<Dictionary>(other);
-  if (dictionary == nullptr || dictionary->count() != count()) return false;
-  for (const auto& [key, value] : entries_) {
-    if (!value->isEqual(dictionary->objectForKey(key.get()))) return false;
-  }
-  return true;
+  return dictionary != nullptr && dictionary->count() == count() &&
+         std::ranges::all_of(entries_, [dictionary](const auto& entry) {
+           return entry.second->isEqual(dictionary->objectForKey(entry.first.get()));
+         });
 }
 
 std::uint64_t Dictionary::hash() const {

@@ -107,6 +107,7 @@ class PositionalArguments {
     return result;
   }
 
+  /// The argument at `position` of a directive that they suit.
   const Value& at(int position) const noexcept { return values_[static_cast<std::size_t>(position) - 1]; }
 
  private:
@@ -120,6 +121,32 @@ class PositionalArguments {
   std::array<Value, FormatDirective::kMaximumPosition> values_;
   std::size_t count_ = 0;
 };
+
+std::int64_t signedValue(Length length, const Value& value) noexcept {
+  switch (length) {
+    case Length::kByte:
+      return static_cast<signed char>(value.integer);
+    case Length::kShort:
+      return static_cast<short>(value.integer);
+    case Length::kDefault:
+      return value.integer;
+    default:
+      return value.wide;
+  }
+}
+
+std::uint64_t unsignedValue(Length length, const Value& value) noexcept {
+  switch (length) {
+    case Length::kByte:
+      return static_cast<unsigned char>(value.integer);
+    case Length::kShort:
+      return static_cast<unsigned short>(value.integer);
+    case Length::kDefault:
+      return static_cast<unsigned>(value.integer);
+    default:
+      return static_cast<std::uint64_t>(value.wide);
+  }
+}
 
 /// `text`, which goes on or not, without the character at its end of which only the beginning is there.
 std::string_view withoutCutCharacter(std::string_view text) noexcept {
@@ -159,7 +186,7 @@ class Formatter {
     return directive.flags == 0 && width_ == 0 && precision_ < 0;
   }
   const Value& argument(int position, FormatArgument type) noexcept {
-    return position == 0 ? list_.next(type) : positional_->at(position);
+    return position != 0 && positional_ ? positional_->at(position) : list_.next(type);
   }
   int number(const FormatDirective::Number& number) noexcept {
     return number.isArgument ? argument(number.position, FormatArgument::kInt).integer : number.value;
@@ -215,41 +242,43 @@ void Formatter::write(FormatDirective& directive) {
   switch (directive.conversion) {
     case 'd':
     case 'i':
-      if (directive.length == Length::kByte)
-        return writeSigned(directive, static_cast<signed char>(value.integer));
-      if (directive.length == Length::kShort)
-        return writeSigned(directive, static_cast<short>(value.integer));
-      return writeSigned(directive, type == FormatArgument::kLong ? value.wide : value.integer);
+      writeSigned(directive, signedValue(directive.length, value));
+      break;
     case 'u':
     case 'o':
     case 'x':
     case 'X':
-      if (directive.length == Length::kByte)
-        return writeUnsigned(directive, static_cast<unsigned char>(value.integer));
-      if (directive.length == Length::kShort)
-        return writeUnsigned(directive, static_cast<unsigned short>(value.integer));
-      return writeUnsigned(directive, type == FormatArgument::kLong ? static_cast<std::uint64_t>(value.wide)
-                                                                    : static_cast<unsigned>(value.integer));
+      writeUnsigned(directive, unsignedValue(directive.length, value));
+      break;
     case 'c':
     case 'C':
-      return writeCharacter(directive, value.integer);
+      writeCharacter(directive, value.integer);
+      break;
     case 's':
-      if (directive.length == Length::kDefault)
-        return writeBytes(directive, static_cast<const char*>(value.pointer));
-      return writeWide(directive, static_cast<const wchar_t*>(value.pointer));
     case 'S':
-      return writeWide(directive, static_cast<const wchar_t*>(value.pointer));
+      if (directive.isWide()) {
+        writeWide(directive, static_cast<const wchar_t*>(value.pointer));
+      } else {
+        writeBytes(directive, static_cast<const char*>(value.pointer));
+      }
+      break;
     case 'p':
-      return writePointer(directive, value.pointer);
+      writePointer(directive, value.pointer);
+      break;
     case '@':
-      return writeObject(directive, static_cast<const Object*>(value.pointer));
+      writeObject(directive, static_cast<const Object*>(value.pointer));
+      break;
     case 'n':
-      return;
+      break;
     case '%':
-      return out_.append('%');
+      out_.append('%');
+      break;
     default:
-      if (type == FormatArgument::kLongDouble) return writeAsC(directive, "L", value.longReal);
-      return writeAsC(directive, "", value.real);
+      if (type == FormatArgument::kLongDouble) {
+        writeAsC(directive, "L", value.longReal);
+      } else {
+        writeAsC(directive, "", value.real);
+      }
   }
 }
 
@@ -286,21 +315,25 @@ void Formatter::writeAsC(const FormatDirective& directive, std::string_view leng
 }
 
 void Formatter::writeSigned(const FormatDirective& directive, std::int64_t value) {
-  if (isPlain(directive)) return writeDigits(value, 10);
-  writeAsC(directive, "ll", static_cast<long long>(value));
+  if (isPlain(directive)) {
+    writeDigits(value, 10);
+  } else {
+    writeAsC(directive, "ll", static_cast<long long>(value));
+  }
 }
 
 void Formatter::writeUnsigned(const FormatDirective& directive, std::uint64_t value) {
   if (isPlain(directive) && directive.conversion != 'X') {
-    return writeDigits(value, directive.conversion == 'u' ? 10 : directive.conversion == 'o' ? 8 : 16);
+    const bool isOctal = directive.conversion == 'o';
+    writeDigits(value, directive.conversion == 'x' ? 16 : (isOctal ? 8 : 10));
+  } else {
+    writeAsC(directive, "ll", static_cast<unsigned long long>(value));
   }
-  writeAsC(directive, "ll", static_cast<unsigned long long>(value));
 }
 
 void Formatter::writeCharacter(const FormatDirective& directive, int value) {
   char bytes[kMaximumUTF8Length] = {static_cast<char>(value)};
-  const bool isByte = directive.conversion == 'c' && directive.length == Length::kDefault;
-  const std::size_t length = isByte ? 1 : encodeUTF8(static_cast<char32_t>(value), bytes);
+  const std::size_t length = directive.isWide() ? encodeUTF8(static_cast<char32_t>(value), bytes) : 1;
   writeText(directive, {bytes, length});
 }
 
@@ -312,24 +345,33 @@ void Formatter::writePointer(const FormatDirective& directive, const void* point
 }
 
 void Formatter::writeObject(const FormatDirective& directive, const Object* object) {
-  // The usual case by far, and one that need not count a reference.
-  if (object != nullptr && object->isMemberOf(classInfo<StringObject>())) {
-    return writeText(directive, cut(static_cast<const StringObject*>(object)->view()));
+  if (object == nullptr) {
+    writeText(directive, cut(kNullText));
+  } else if (object->isMemberOf(classInfo<StringObject>())) {
+    // The usual case by far, and one that need not count a reference.
+    writeText(directive, cut(static_cast<const StringObject*>(object)->view()));
+  } else {
+    const String description = object->description();
+    writeText(directive, cut(description ? description.view() : kNullText));
   }
-  const String description = object != nullptr ? object->description() : String();
-  writeText(directive, cut(description ? description.view() : kNullText));
 }
 
 void Formatter::writeBytes(const FormatDirective& directive, const char* text) {
-  if (text == nullptr) return writeText(directive, cut(kNullText));
-  if (precision_ < 0) return writeText(directive, text);
-  // There need be no NUL beyond the precision.
-  const auto limit = static_cast<std::size_t>(precision_);
-  writeText(directive, cut({text, ::strnlen(text, limit)}));
+  if (text == nullptr) {
+    writeText(directive, cut(kNullText));
+  } else if (precision_ < 0) {
+    writeText(directive, text);
+  } else {
+    // There need be no NUL beyond the precision.
+    writeText(directive, cut({text, ::strnlen(text, static_cast<std::size_t>(precision_))}));
+  }
 }
 
 void Formatter::writeWide(const FormatDirective& directive, const wchar_t* text) {
-  if (text == nullptr) return writeText(directive, cut(kNullText));
+  if (text == nullptr) {
+    writeText(directive, cut(kNullText));
+    return;
+  }
   const auto limit = precision_ < 0 ? SIZE_MAX : static_cast<std::size_t>(precision_);
   char bytes[kMaximumUTF8Length];
   std::size_t length = 0;

@@ -31,6 +31,7 @@ namespace rt {
 
 /// What one argument is. The numbers are part of the interface between programs and libraries. All but
 /// objects and the two last are passed like an integer of at most 64 bits.
+// NOLINTNEXTLINE(performance-enum-size): the size is part of the interface, too
 enum class ArgumentKind : std::uint32_t {
   kSigned = 0,
   /// An `rt::Object*`, or null.

@@ -92,10 +92,14 @@ struct FormatDirective {
     }
   }
 
+  /// Whether its character or text is a wide one.
+  constexpr bool isWide() const noexcept {
+    return conversion == 'C' || conversion == 'S' || length == Length::kLong;
+  }
+
   /// Whether any of its arguments is taken by position, and whether any is simply the next.
   constexpr bool hasPositions() const noexcept {
-    return (argument() != FormatArgument::kNone && position != 0) || width.position != 0 ||
-           precision.position != 0;
+    return position != 0 || width.position != 0 || precision.position != 0;
   }
   constexpr bool takesNext() const noexcept {
     return (argument() != FormatArgument::kNone && position == 0) ||
@@ -118,6 +122,11 @@ class FormatDirectiveParser {
   constexpr std::size_t next() const noexcept { return next_; }
 
   constexpr bool parse(FormatDirective& directive) noexcept {
+    // Most directives are a conversion and nothing else.
+    if (suits(Length::kDefault, peek())) {
+      directive.conversion = format_[next_++];
+      return true;
+    }
     if (!parsePosition(directive.position)) return false;
     while (const std::uint8_t flag = flagOf(peek())) {
       directive.flags |= flag;
@@ -131,6 +140,7 @@ class FormatDirectiveParser {
     }
     directive.length = parseLength();
     directive.conversion = peek();
+    if (directive.conversion == '%') directive.position = 0;  // it has no argument
     if (next_++ >= format_.size()) return false;
     return suits(directive.length, directive.conversion);
   }
@@ -168,7 +178,7 @@ class FormatDirectiveParser {
     for (; peek(count) >= '0' && peek(count) <= '9'; ++count) {
       const int digit = peek(count) - '0';
       if (count == 0) value = 0;
-      value = value > (kLargest - digit) / 10 ? kLargest : value * 10 + digit;
+      value = value > (kLargest - digit) / 10 ? kLargest : (value * 10) + digit;
     }
     return count;
   }

@@ -125,11 +125,8 @@ class FormatCheck {
       if (argument.kind != ArgumentKind::kObject && !argument.isNull) formatMistake::directiveTakesAnObject();
     } else if (directive.conversion == 'p') {
       if (argument.passedAs != FormatArgument::kPointer) formatMistake::directiveTakesAPointer();
-    } else if (directive.conversion == 'S' || directive.length == FormatDirective::Length::kLong) {
-      if (!(isText && argument.isWide) && !argument.isNull) {
-        formatMistake::directiveTakesAWideTextThatEndsWithNul();
-      }
-    } else if (!(isText && !argument.isWide) && !argument.isNull) {
+    } else if (!argument.isNull && !(isText && argument.isWide == directive.isWide())) {
+      if (directive.isWide()) formatMistake::directiveTakesAWideTextThatEndsWithNul();
       formatMistake::directiveTakesATextThatEndsWithNul();
     }
   }

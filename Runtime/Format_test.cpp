@@ -222,6 +222,14 @@ TEST(Format, PositionsWithoutSenseArePrintedAsTheyStand) {
   EXPECT_EQ(formatted("%% %1$d", 1), "% 1");
 }
 
+// It used to ask for an argument at a position before there were any.
+TEST(Format, PercentSignsWithPositions) {
+  EXPECT_EQ(formatted("%2$%|"), "%|");
+  EXPECT_EQ(formatted("%1$% %1$d %1$%", 1), "% 1 %");
+  EXPECT_EQ(formatted("%1$% %d", 1), "% 1");
+  EXPECT_EQ(formatted("%65$%"), "%65$%");
+}
+
 TEST(Format, SixtyFourPositions) {
   std::string format;
   for (int i = 64; i >= 1; --i) format += "%" + std::to_string(i) + "$d ";

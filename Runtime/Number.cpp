@@ -15,7 +15,9 @@ constexpr double kTwoTo63 = 9223372036854775808.0;
 constexpr double kTwoTo64 = 18446744073709551616.0;
 
 std::strong_ordering compareReals(double first, double second) noexcept {
-  if (std::isnan(first) || std::isnan(second)) return std::isnan(second) <=> std::isnan(first);
+  if (std::isnan(first) && std::isnan(second)) return std::strong_ordering::equal;
+  if (std::isnan(first)) return std::strong_ordering::less;
+  if (std::isnan(second)) return std::strong_ordering::greater;
   if (first == second) return std::strong_ordering::equal;
   return first < second ? std::strong_ordering::less : std::strong_ordering::greater;
 }
@@ -67,7 +69,8 @@ std::strong_ordering Number::compare(const Number& other) const noexcept {
   const bool isNegative = kind_ == Kind::kSigned && integer_ > kLargestSigned;
   if (other.kind_ == Kind::kReal) return compareWithReal(integer_, isNegative, other.real_);
   const bool isOtherNegative = other.kind_ == Kind::kSigned && other.integer_ > kLargestSigned;
-  if (isNegative != isOtherNegative) return isOtherNegative <=> isNegative;
+  if (isNegative && !isOtherNegative) return std::strong_ordering::less;
+  if (isOtherNegative && !isNegative) return std::strong_ordering::greater;
   return integer_ <=> other.integer_;
 }
 
@@ -95,7 +98,7 @@ String Number::description() const {
   // The longest is the negative least real number: "-0.", 323 zeros and up to 17 digits.
   std::array<char, 400> text{};
   char* const end = text.data() + text.size();
-  char* last = text.data();
+  char* last = nullptr;
   if (kind_ == Kind::kReal) {
     last = std::to_chars(text.data(), end, real_, std::chars_format::fixed).ptr;
   } else if (kind_ == Kind::kUnsigned) {

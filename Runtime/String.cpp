@@ -36,8 +36,7 @@ std::string_view withoutLeadingSpace(std::string_view text) {
 }  // namespace
 
 String String::fromUTF8(std::string_view bytes) {
-  if (bytes.empty()) return ""_s;
-  return isValidUTF8(bytes) ? from(StringObject::copy(bytes)) : String();
+  return isValidUTF8(bytes) ? copy(bytes) : String();
 }
 
 String String::fromUTF8(const char* text) {
@@ -45,7 +44,7 @@ String String::fromUTF8(const char* text) {
 }
 
 String String::fromUTF8Repaired(std::string_view bytes) {
-  if (isValidUTF8(bytes)) return fromUTF8(bytes);
+  if (isValidUTF8(bytes)) return copy(bytes);
   const auto visit = [bytes](auto&& put) {
     for (std::string_view rest = bytes; !rest.empty();) {
       const UTF8Sequence next = nextUTF8(rest);
@@ -57,7 +56,7 @@ String String::fromUTF8Repaired(std::string_view bytes) {
   visit([&](std::string_view piece) { length += piece.size(); });
   char* end = nullptr;
   String result = from(StringObject::make(length, end));
-  visit([&](std::string_view piece) { end = std::copy(piece.begin(), piece.end(), end); });
+  visit([&](std::string_view piece) { end = std::ranges::copy(piece, end).out; });
   return result;
 }
 
@@ -71,9 +70,12 @@ String String::from(const Object* object) noexcept {
   return String(string);
 }
 
+String String::copy(std::string_view text) {
+  return text.empty() ? ""_s : from(StringObject::copy(text));
+}
+
 String String::part(std::string_view part) const {
-  if (part.size() == length()) return *this;
-  return part.empty() ? ""_s : from(StringObject::copy(part));
+  return part.size() == length() ? *this : copy(part);
 }
 
 String String::trimmed() const {
@@ -89,11 +91,11 @@ String String::trimmed() const {
 String String::uppercased() const {
   const auto isLower = [](char c) { return c >= 'a' && c <= 'z'; };
   const std::string_view text = view();
-  if (std::none_of(text.begin(), text.end(), isLower)) return *this;
+  if (std::ranges::none_of(text, isLower)) return *this;
   char* bytes = nullptr;
   String result = from(StringObject::make(text.size(), bytes));
-  std::transform(text.begin(), text.end(), bytes,
-                 [&](char c) { return isLower(c) ? static_cast<char>(c - 'a' + 'A') : c; });
+  std::ranges::transform(text, bytes,
+                         [&](char c) { return isLower(c) ? static_cast<char>(c - 'a' + 'A') : c; });
   return result;
 }
 

@@ -105,7 +105,7 @@ class String {
 
   /// The object; null for null. Not retained.
   constexpr StringObject* object() const noexcept { return const_cast<StringObject*>(object_); }
-  operator Ref<Object>() const noexcept { return Ref<Object>(object()); }
+  operator Ref<Object>() const noexcept { return {object()}; }
 
   constexpr bool isNull() const noexcept { return object_ == nullptr; }
   constexpr explicit operator bool() const noexcept { return object_ != nullptr; }
@@ -157,8 +157,9 @@ class String {
 
   /// Null comes before all others.
   friend constexpr std::strong_ordering operator<=>(const String& first, const String& second) noexcept {
-    if (first.isNull() || second.isNull()) return second.isNull() <=> first.isNull();
-    return first.view() <=> second.view();
+    if (first && second) return first.view() <=> second.view();
+    if (first.isNull() && second.isNull()) return std::strong_ordering::equal;
+    return first.isNull() ? std::strong_ordering::less : std::strong_ordering::greater;
   }
 
   /// Whether the string has these bytes. Null equals none, not even "".
@@ -185,6 +186,9 @@ class String {
   constexpr void drop() const noexcept {
     if (!std::is_constant_evaluated() && object_ != nullptr) object_->release();
   }
+
+  /// A copy of `text`, which is valid UTF-8.
+  static String copy(std::string_view text);
 
   /// This string where `part`, of its bytes, is all of them; otherwise a copy of `part`.
   String part(std::string_view part) const;

@@ -29,7 +29,8 @@ class StringObject final : public Implements<StringObject, Object> {
   consteval StringObject(const char* bytes, std::size_t length)
       : Implements(Immortal()), bytes_(bytes), length_(length) {}
 
-  constexpr ~StringObject() override {}
+  // Written out, for g++ does not find a defaulted one in constants of templates.
+  constexpr ~StringObject() override {}  // NOLINT(modernize-use-equals-default)
 
   /// A copy of `text`, which is valid UTF-8, in one allocation. Throws std::bad_alloc.
   static Ref<StringObject> copy(std::string_view text);
@@ -53,6 +54,7 @@ class StringObject final : public Implements<StringObject, Object> {
 
   // The bytes of a copy follow the object, so its size is not what `delete` thinks. Constant only because
   // g++ has a constant's destructor mention it.
+  // NOLINTNEXTLINE(misc-new-delete-overloads,cert-dcl54-cpp): it goes with the one that takes a length
   static constexpr void operator delete(void* memory) noexcept {
     if (!std::is_constant_evaluated()) ::operator delete(memory);
   }

@@ -1,0 +1,50 @@
+#include <benchmark/benchmark.h>
+
+#include <string>
+
+#include "Comparison.h"
+#include "Runtime/String.h"
+
+namespace {
+
+using namespace rt::literals;
+
+// Short enough for std::string to hold it within itself, and not.
+constexpr const char* kShort = "short text";
+constexpr const char* kLong = "a text that is a good deal longer than any buffer within a string is";
+
+template <class Text>
+void copy(benchmark::State& state, Text text) {
+  for (auto _ : state) {
+    Text copied = text;
+    benchmark::DoNotOptimize(copied);
+  }
+}
+
+void literal(benchmark::State& state) {
+  for (auto _ : state) {
+    rt::String text = "a text that is a good deal longer than any buffer within a string is"_s;
+    benchmark::DoNotOptimize(text);
+  }
+}
+
+void literalOfStandardLibrary(benchmark::State& state) {
+  for (auto _ : state) {
+    std::string text = kLong;
+    benchmark::DoNotOptimize(text);
+  }
+}
+
+BENCHMARK_CAPTURE(copy, , rt::String::fromUTF8(kShort))->Name("String/copy short/ours");
+BENCHMARK_CAPTURE(copy, , std::string(kShort))->Name("String/copy short/std::string");
+BENCHMARK_CAPTURE(copy, , rt::String::fromUTF8(kLong))->Name("String/copy long/ours");
+BENCHMARK_CAPTURE(copy, , std::string(kLong))->Name("String/copy long/std::string");
+BENCHMARK_CAPTURE(copy, , "short text"_s)->Name("String/copy literal/ours");
+BENCHMARK_CAPTURE(copy, , std::string(kShort))->Name("String/copy literal/std::string");
+BENCHMARK(literal)->Name("String/from literal/ours");
+BENCHMARK(literalOfStandardLibrary)->Name("String/from literal/std::string");
+
+const Bound longBound("String/copy long", "std::string", 1.0);
+const Bound literalBound("String/from literal", "std::string", 1.0);
+
+}  // namespace

@@ -32,7 +32,7 @@ namespace rt {
 class MainQueue final : public Queue {
  public:
   /// Its label.
-  static constexpr const char* kLabel = "main";
+  static constexpr String kLabel = "main"_s;
 
   /// Runs the queue's tasks, and waits for more, until `stop` is called. Ends the program when called on
   /// another than the main thread or from a task of the main queue. Throws std::system_error when the

@@ -19,8 +19,8 @@ constinit std::atomic<Queue::UncaughtExceptionHandler> uncaughtExceptionHandler 
 
 void terminateForUncaughtException(const Queue& queue) noexcept {
   const auto report = [&](const char* what) {
-    std::fprintf(stderr, "rt: an exception has left a task of the queue \"%s\": %s\n", queue.label().data(),
-                 what);
+    std::fprintf(stderr, "rt: an exception has left a task of the queue \"%.*s\": %s\n",
+                 static_cast<int>(queue.label().length()), queue.label().view().data(), what);
     std::terminate();  // While the exception is being handled, so that it is seen there.
   };
   try {
@@ -68,8 +68,8 @@ class Queue::RunningScope {
 
 constinit thread_local Queue::RunningScope* Queue::RunningScope::innermost_ = nullptr;
 
-Queue::Queue(std::string_view label, QualityOfService qualityOfService, int relativePriority)
-    : label_(label),
+Queue::Queue(String label, QualityOfService qualityOfService, int relativePriority)
+    : label_(label ? std::move(label) : ""_s),
       qualityOfService_(qualityOfService),
       relativePriority_(static_cast<std::int8_t>(std::clamp(relativePriority, kLowestRelativePriority, 0))) {
   detail::QueueRegistry::add(*this);
@@ -113,8 +113,8 @@ void Queue::schedule() noexcept {
 void Queue::perform(detail::FunctionView function) {
   if (isCurrent()) {
     std::fprintf(stderr,
-                 "rt: sync on the queue \"%s\" from one of its own tasks, which would wait for itself\n",
-                 label_.c_str());
+                 "rt: sync on the queue \"%.*s\" from one of its own tasks, which would wait for itself\n",
+                 static_cast<int>(label_.length()), label_.view().data());
     std::abort();
   }
   const bool mayRun = mayRunHere();
@@ -238,13 +238,14 @@ bool Queue::isCurrent() const noexcept {
 
 void Queue::assertIsCurrent() const noexcept {
   if (isCurrent()) return;
-  std::fprintf(stderr, "rt: outside of the tasks of the queue \"%s\"\n", label_.c_str());
+  std::fprintf(stderr, "rt: outside of the tasks of the queue \"%.*s\"\n", static_cast<int>(label_.length()),
+               label_.view().data());
   std::abort();
 }
 
-std::string_view Queue::currentLabel() noexcept {
+String Queue::currentLabel() noexcept {
   const RunningScope* scope = RunningScope::innermost();
-  return scope != nullptr ? scope->queue().label() : std::string_view("");
+  return scope != nullptr ? scope->queue().label() : ""_s;
 }
 
 Queue::UncaughtExceptionHandler Queue::setUncaughtExceptionHandler(

@@ -3,7 +3,7 @@
 /// A serial queue: tasks run one after another, in the order in which they came, on threads that all
 /// queues share.
 ///
-///     rt::Ref<rt::Queue> queue = rt::make<rt::Queue>("Journal", rt::QualityOfService::kUtility);
+///     rt::Ref<rt::Queue> queue = rt::make<rt::Queue>("Journal"_s, rt::QualityOfService::kUtility);
 ///     queue->async([=] { journal->append(line); });                      // later, elsewhere
 ///     std::size_t size = queue->sync([&] { return journal->size(); });   // now: returns or rethrows
 ///     queue->barrierSync();                                              // all before has run
@@ -34,8 +34,6 @@
 #include <functional>
 #include <memory>
 #include <optional>
-#include <string>
-#include <string_view>
 #include <type_traits>
 #include <utility>
 
@@ -44,6 +42,7 @@
 #include "Runtime/QualityOfService.h"
 #include "Runtime/QueueTask.h"
 #include "Runtime/Ref.h"
+#include "Runtime/String.h"
 #include "Runtime/ThreadSafety.h"
 #include "Runtime/UnfairLock.h"
 #include "Runtime/WorkerPool.h"
@@ -59,9 +58,9 @@ class RT_CAPABILITY("queue") Queue : public Implements<Queue, Object>, private d
   /// How often what tasks queue at exit is run in turn.
   static constexpr int kExitRounds = 16;
 
-  /// An empty queue. `label` is for people and need not be unique. `relativePriority` is from 0 down to
-  /// -15, less urgent than others of the class; what is outside counts as the nearer end.
-  explicit Queue(std::string_view label, QualityOfService qualityOfService = QualityOfService::kDefault,
+  /// An empty queue. `label` is for people and need not be unique; null counts as empty. `relativePriority`
+  /// is from 0 down to -15, less urgent than others of the class; what is outside counts as the nearer end.
+  explicit Queue(String label, QualityOfService qualityOfService = QualityOfService::kDefault,
                  int relativePriority = 0);
   ~Queue() override;
 
@@ -69,7 +68,8 @@ class RT_CAPABILITY("queue") Queue : public Implements<Queue, Object>, private d
   /// same at every call.
   static Ref<Queue> main();
 
-  std::string_view label() const noexcept { return label_; }
+  /// Never null.
+  const String& label() const noexcept { return label_; }
   QualityOfService qualityOfService() const noexcept { return qualityOfService_; }
   int relativePriority() const noexcept { return relativePriority_; }
 
@@ -127,10 +127,10 @@ class RT_CAPABILITY("queue") Queue : public Implements<Queue, Object>, private d
   /// `RT_GUARDED_BY(*queue_)`, clang knows from here on that they may be touched.
   void assertIsCurrent() const noexcept RT_ASSERT_CAPABILITY(this);
 
-  /// The label of the queue whose task the caller is; "" where it is none. So it is "" on the main thread
-  /// outside the main queue's tasks: what the host does there on its own is no queue's work. The text
-  /// ends with a zero and is valid until the task returns.
-  static std::string_view currentLabel() noexcept;
+  /// The label of the queue whose task the caller is; "" where it is none, never null. So it is "" on the
+  /// main thread outside the main queue's tasks: what the host does there on its own is no queue's work.
+  /// Allocates nothing.
+  static String currentLabel() noexcept;
 
   /// Called on the thread of a task that an exception has left, where it is std::current_exception(); when
   /// it returns, the queue goes on with the next task. It must not throw.
@@ -171,7 +171,7 @@ class RT_CAPABILITY("queue") Queue : public Implements<Queue, Object>, private d
   bool hasReached(std::uint64_t goal) const noexcept RT_EXCLUDES(lock_);
   void resetAfterFork() noexcept;
 
-  const std::string label_;
+  const String label_;
   const QualityOfService qualityOfService_;
   const std::int8_t relativePriority_;
 

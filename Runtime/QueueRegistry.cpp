@@ -65,8 +65,8 @@ void QueueRegistry::drainAtExit() {
       if (count != 0) continue;
       if (Clock::now() >= deadline) {
         for (const Unfinished& each : all) {
-          std::fprintf(stderr, "rt: the queue \"%s\" still runs a task at exit; what it holds is lost\n",
-                       each.queue->label().data());
+          std::fprintf(stderr, "rt: the queue \"%.*s\" still runs a task at exit; what it holds is lost\n",
+                       static_cast<int>(each.queue->label().length()), each.queue->label().view().data());
         }
         return;
       }

@@ -29,13 +29,14 @@
 
 namespace {
 
+using namespace rt::literals;
 using rt::Queue;
 using rt::Ref;
 
 // Each kind makes a queue for a test and runs the test's body while the queue is being served.
 
 struct SerialQueue {
-  static constexpr std::string_view kLabel = "conformance";
+  static constexpr rt::String kLabel = "conformance"_s;
   static constexpr int kNiceness = 5;
   static Ref<Queue> make() { return rt::make<Queue>(kLabel, rt::QualityOfService::kUtility, -2); }
   template <class Body>
@@ -45,7 +46,7 @@ struct SerialQueue {
 };
 
 struct RunMainQueue {
-  static constexpr std::string_view kLabel = rt::MainQueue::kLabel;
+  static constexpr rt::String kLabel = rt::MainQueue::kLabel;
   static constexpr int kNiceness = 0;
   static Ref<Queue> make() { return Queue::main(); }
   template <class Body>
@@ -358,25 +359,25 @@ TYPED_TEST(QueueConformance, IsLikeRunningTasksAtOnceForOneThread) {
 }
 
 TYPED_TEST(QueueConformance, LabelIsTheCurrentOneInTasksOnly) {
-  EXPECT_EQ(Queue::currentLabel(), "");
+  EXPECT_EQ(Queue::currentLabel(), ""_s);
   this->serve([](Queue& queue) {
     EXPECT_EQ(queue.label(), TypeParam::kLabel);
-    EXPECT_EQ(Queue::currentLabel(), "");
-    std::string inAsync;
+    EXPECT_EQ(Queue::currentLabel(), ""_s);
+    rt::String inAsync;
     queue.async([&] { inAsync = Queue::currentLabel(); });
-    EXPECT_EQ(queue.sync([] { return std::string(Queue::currentLabel()); }), TypeParam::kLabel);
+    EXPECT_EQ(queue.sync([] { return Queue::currentLabel(); }), TypeParam::kLabel);
     EXPECT_EQ(inAsync, TypeParam::kLabel);
     EXPECT_THROW(queue.sync([] { throw std::runtime_error("of the task"); }), std::runtime_error);
-    EXPECT_EQ(Queue::currentLabel(), "");
+    EXPECT_EQ(Queue::currentLabel(), ""_s);
   });
-  EXPECT_EQ(Queue::currentLabel(), "");
+  EXPECT_EQ(Queue::currentLabel(), ""_s);
 }
 
 TYPED_TEST(QueueConformance, LabelOfTheInnerQueueIsTheCurrentOne) {
   this->serve([](Queue& queue) {
-    const Ref<Queue> inner = rt::make<Queue>("inner");
+    const Ref<Queue> inner = rt::make<Queue>("inner"_s);
     queue.sync([&] {
-      EXPECT_EQ(inner->sync([] { return std::string(Queue::currentLabel()); }), "inner");
+      EXPECT_EQ(inner->sync([] { return Queue::currentLabel(); }), "inner"_s);
       EXPECT_EQ(Queue::currentLabel(), TypeParam::kLabel);
     });
   });
@@ -384,7 +385,7 @@ TYPED_TEST(QueueConformance, LabelOfTheInnerQueueIsTheCurrentOne) {
 
 TYPED_TEST(QueueConformance, KnowsItsOwnTasks) {
   this->serve([](Queue& queue) {
-    const Ref<Queue> other = rt::make<Queue>("other");
+    const Ref<Queue> other = rt::make<Queue>("other"_s);
     EXPECT_FALSE(queue.isCurrent());
     queue.sync([&] {
       queue.assertIsCurrent();
@@ -487,8 +488,8 @@ template <class Kind>
 using QueueConformanceDeathTest = QueueConformance<Kind>;
 TYPED_TEST_SUITE(QueueConformanceDeathTest, Kinds, NameOfKind);
 
-std::string textOfRefusal(std::string_view label) {
-  return "rt: sync on the queue \"" + std::string(label) + "\" from one of its own tasks";
+std::string textOfRefusal(const rt::String& label) {
+  return "rt: sync on the queue \"" + std::string(label.view()) + "\" from one of its own tasks";
 }
 
 TYPED_TEST(QueueConformanceDeathTest, SyncFromASyncTaskIsRefused) {
@@ -505,7 +506,7 @@ TYPED_TEST(QueueConformanceDeathTest, BarrierFromAnAsyncTaskIsRefused) {
 
 TYPED_TEST(QueueConformanceDeathTest, SyncFromWithinAnotherQueuesTaskIsRefused) {
   EXPECT_DEATH(this->serve([](Queue& queue) {
-    queue.sync([&] { rt::make<Queue>("other")->sync([&] { queue.sync([] {}); }); });
+    queue.sync([&] { rt::make<Queue>("other"_s)->sync([&] { queue.sync([] {}); }); });
   }),
                textOfRefusal(TypeParam::kLabel));
 }
@@ -513,15 +514,15 @@ TYPED_TEST(QueueConformanceDeathTest, SyncFromWithinAnotherQueuesTaskIsRefused) 
 TYPED_TEST(QueueConformanceDeathTest, UncaughtExceptionsEndTheProgram) {
   EXPECT_DEATH(
       this->serve([](Queue& queue) { queue.async([] { throw std::runtime_error("what it says"); }); }),
-      "rt: an exception has left a task of the queue \"" + std::string(TypeParam::kLabel) +
+      "rt: an exception has left a task of the queue \"" + std::string(TypeParam::kLabel.view()) +
           "\": what it says");
   EXPECT_DEATH(this->serve([](Queue& queue) { queue.async([] { throw 1; }); }),
-               "\"" + std::string(TypeParam::kLabel) + "\": something that is no std::exception");
+               "\"" + std::string(TypeParam::kLabel.view()) + "\": something that is no std::exception");
 }
 
 TYPED_TEST(QueueConformanceDeathTest, AssertIsCurrentOutsideEndsTheProgram) {
   EXPECT_DEATH(this->serve([](Queue& queue) { queue.assertIsCurrent(); }),
-               "rt: outside of the tasks of the queue \"" + std::string(TypeParam::kLabel) + "\"");
+               "rt: outside of the tasks of the queue \"" + std::string(TypeParam::kLabel.view()) + "\"");
 }
 
 }  // namespace

@@ -15,6 +15,8 @@
 
 namespace {
 
+using namespace rt::literals;
+
 /// What one writes by hand: a thread, a mutex, a condition variable.
 class ConditionQueue {
  public:
@@ -68,7 +70,7 @@ class OurQueue {
   }
 
  private:
-  rt::Ref<rt::Queue> queue_ = rt::make<rt::Queue>("benchmark");
+  rt::Ref<rt::Queue> queue_ = rt::make<rt::Queue>("benchmark"_s);
 };
 
 template <class Queue>
@@ -149,7 +151,10 @@ BENCHMARK(payload<ConditionQueue>)->Name("Queue/async-payload/condition-variable
 BENCHMARK(roundTrip<OurQueue>)->Name("Queue/round-trip/ours")->UseRealTime();
 BENCHMARK(roundTrip<ConditionQueue>)->Name("Queue/round-trip/condition-variable")->UseRealTime();
 BENCHMARK(wakeUp<OurQueue>)->Name("Queue/wake-up/ours")->UseManualTime()->Iterations(1'000);
-BENCHMARK(wakeUp<ConditionQueue>)->Name("Queue/wake-up/condition-variable")->UseManualTime()->Iterations(1'000);
+BENCHMARK(wakeUp<ConditionQueue>)
+    ->Name("Queue/wake-up/condition-variable")
+    ->UseManualTime()
+    ->Iterations(1'000);
 
 const Bound asyncBound("Queue/async", "condition-variable", 1.0);
 const Bound asyncTwoThreadsBound("Queue/async-2-threads", "condition-variable", 1.0);

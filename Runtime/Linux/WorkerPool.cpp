@@ -12,6 +12,7 @@
 #include <new>
 
 #include "Runtime/AddressWait.h"
+#include "Runtime/SystemThreadName.h"
 #include "Runtime/ThreadSafety.h"
 #include "Runtime/UnfairLock.h"
 
@@ -178,6 +179,8 @@ void* runWorker(void* argument) {
   // system refuses, the worker stays as it is.
   const int ofProcess = getpriority(PRIO_PROCESS, static_cast<id_t>(getpid()));
   setpriority(PRIO_PROCESS, 0, ofProcess + static_cast<int>(levelOfCaller - levels.data()));
+  // Its creator's name, which it inherits, is not its own.
+  setSystemThreadName(nullptr);
   levelOfCaller->run();
   return nullptr;
 }

@@ -106,7 +106,8 @@ TEST(Number, OrdersAllKinds) {
     for (std::size_t j = 0; j < places.size(); ++j) {
       for (const auto& first : places[i]) {
         for (const auto& second : places[j]) {
-          EXPECT_EQ(first->compare(*second), i <=> j) << first->description().view() << ' ' << second->description().view();
+          EXPECT_EQ(first->compare(*second), i <=> j)
+              << first->description().view() << ' ' << second->description().view();
           EXPECT_EQ(first->isEqual(second.get()), i == j);
           if (i == j) {
             EXPECT_EQ(first->hash(), second->hash()) << first->description().view();

@@ -42,6 +42,9 @@ void QueueRegistry::registerExitHandler() noexcept {
 
 void QueueRegistry::drainAtExit() {
   using Clock = std::chrono::steady_clock;
+  // A thread may be making the main queue at this moment, which is in the list before it is whole: this
+  // waits until it is.
+  MainQueue::instance();
   const Clock::time_point deadline =
       Clock::now() + std::chrono::nanoseconds(exitPatience.load(std::memory_order_relaxed));
   struct Unfinished {

@@ -482,6 +482,7 @@ TEST_F(QueueTest, SyncInTheChildOfAForkNeedsNoThread) {
   }
   EXPECT_EQ(statusOf(child), 0);
   mayGoOn = true;
+  queue_->barrierSync();
 }
 
 TEST_F(QueueTest, ATaskMayFork) {

@@ -143,8 +143,8 @@ void PrivateJournal::start() {
   const int notifySocket = listenAt(kNotifySocket);
   // The shell knows its own process identifier, which is to become the daemon's.
   const std::string command = std::string("NOTIFY_SOCKET=") + kNotifySocket +
-                              (listeningSocket_ >= 0 ? " LISTEN_FDS=1 LISTEN_PID=$$" : "") + " exec setpriv --pdeathsig KILL " +
-                              kDaemon;
+                              (listeningSocket_ >= 0 ? " LISTEN_FDS=1 LISTEN_PID=$$" : "") +
+                              " exec setpriv --pdeathsig KILL " + kDaemon;
   const std::array<const char*, 4> arguments = {"sh", "-c", command.c_str(), nullptr};
   posix_spawn_file_actions_t actions;
   posix_spawn_file_actions_init(&actions);

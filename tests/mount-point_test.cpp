@@ -605,7 +605,8 @@ TEST_F(MountPointTest, WritesEachLineInOnePiece) {
   expectSuccess(run({"a"}));
   for (const std::string& name : {std::string("a"), std::string(8000, 'x')}) {
     int pieces = 0;
-    for (const std::string& call : systemCalls({name})) pieces += call.find("(2, ") != std::string::npos ? 1 : 0;
+    for (const std::string& call : systemCalls({name}))
+      pieces += call.find("(2, ") != std::string::npos ? 1 : 0;
     EXPECT_EQ(pieces, 1) << name.size();
   }
 }

@@ -7,6 +7,9 @@
 #include <stdexcept>
 
 #include "Runtime/Ref.h"
+#include "Runtime/String.h"
+
+using namespace rt::literals;
 
 class Account {
  public:
@@ -23,7 +26,7 @@ class Account {
   }
 
  private:
-  rt::Ref<rt::Queue> queue_ = rt::make<rt::Queue>("Account");
+  rt::Ref<rt::Queue> queue_ = rt::make<rt::Queue>("Account"_s);
   int balance_ = 0;
 };
 

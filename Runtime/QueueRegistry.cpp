@@ -73,6 +73,8 @@ void QueueRegistry::drainAtExit() {
         }
         return;
       }
+      // A task that is waited for may itself have come to wait for the main queue since.
+      MainQueue::instance().runHere();
       std::this_thread::sleep_for(std::chrono::milliseconds(1));
     }
   }

@@ -38,16 +38,17 @@ bool LocalTimeFormatter::parse(std::string_view pattern, std::vector<Piece>& pie
     pieces.back().text += text;
   };
 
+  bool isQuoted = false;
   while (!pattern.empty()) {
     const char character = pattern.front();
-    if (character == '\'') {
-      const std::size_t end = pattern.find('\'', 1);
-      if (end == std::string_view::npos) return false;
+    if (pattern.starts_with("''")) {
       // Two in a row are one that stands for itself, within a quoted text as well as outside.
-      appendLiteral(end == 1 ? "'" : pattern.substr(1, end - 1));
-      pattern.remove_prefix(end + 1);
-      if (end != 1 && pattern.starts_with('\'')) appendLiteral("'");
-    } else if (isLetter(character)) {
+      appendLiteral("'");
+      pattern.remove_prefix(2);
+    } else if (character == '\'') {
+      isQuoted = !isQuoted;
+      pattern.remove_prefix(1);
+    } else if (!isQuoted && isLetter(character)) {
       const std::size_t end = std::min(pattern.find_first_not_of(character), pattern.size());
       const auto* const field =
           std::ranges::find(kFields, pattern.substr(0, end), &std::pair<std::string_view, Field>::first);
@@ -59,7 +60,7 @@ bool LocalTimeFormatter::parse(std::string_view pattern, std::vector<Piece>& pie
       pattern.remove_prefix(1);
     }
   }
-  return true;
+  return !isQuoted;
 }
 
 Ref<LocalTimeFormatter> LocalTimeFormatter::initWithPattern(const String& pattern) {

@@ -84,6 +84,10 @@ TEST_F(LocalTimeFormatterTest, TakesPatternsApart) {
   EXPECT_EQ(format("SSS SSS"_s), "042 042");
   EXPECT_EQ(format("yyyyMMdd'T'HHmmss"_s), "19700101T010101");
   EXPECT_EQ(format("dd.MM.yyyy, HH 'o''clock' ''"_s), "01.01.1970, 01 o'clock '");
+  // Used to have one apostrophe too many: a quoted text that ends with one.
+  EXPECT_EQ(format("'a'''"_s), "a'");
+  EXPECT_EQ(format("'a''''b'HH"_s), "a''b01");
+  EXPECT_EQ(format("'''a'"_s), "'a");
   EXPECT_EQ(format("HH \xe2\x80\x94 mm"_s), "01 \xe2\x80\x94 01");
 }
 

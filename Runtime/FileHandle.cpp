@@ -87,18 +87,19 @@ Ref<FileHandle> FileHandle::openForAppending(const String& path, std::uint16_t m
 
 void FileHandle::writeLine(std::string_view line) {
   const LockGuard guard(lock_);
-  Pieces pieces(isInLine_ ? "\n" : "", line);
-  bool isBegun = false;
+  const std::string_view before = isInLine_ ? "\n" : "";
+  Pieces pieces(before, line);
+  std::size_t written = 0;
   while (!pieces.isEmpty()) {
     const ssize_t count = pieces.write(descriptor_);
     if (count > 0) {
       pieces.skip(static_cast<std::size_t>(count));
-      isBegun = true;
-    } else if (count < 0 && errno == EAGAIN && isBegun) {
+      written += static_cast<std::size_t>(count);
+    } else if (count < 0 && errno == EAGAIN && written > before.size()) {
       waitUntilWritable(descriptor_);
     } else if (count == 0 || errno != EINTR) {
       const int error = count == 0 ? EIO : errno;
-      isInLine_ = isInLine_ || isBegun;
+      if (written > 0) isInLine_ = written > before.size();
       throw std::system_error(error, std::generic_category(), "cannot write a line");
     }
   }

@@ -8,7 +8,9 @@
 ///
 /// Lines of different threads do not mix, and neither do those of processes that append to one file: a
 /// line and its end are handed to the system in one piece, and the rest of a piece that the system took
-/// only in part goes out before any other line of this handle. Every operation is safe on any thread.
+/// only in part goes out before any other line of this handle. Every operation is safe on any thread. In the
+/// child of a fork a handle goes on, unless another thread was writing a line with it as the process
+/// forked: then the child would wait for ever.
 ///
 /// Not for: reading; files that are rewritten in place.
 
@@ -46,7 +48,8 @@ class FileHandle final : public Implements<FileHandle, Object> {
   /// Writes `line` and a line feed. Waits where the system makes it wait; a descriptor that does not
   /// block is waited for only to end a line that it took in part. Throws std::system_error when the
   /// system does not take all; then what it took of the line, if anything, stays, and the next line
-  /// starts on a line of its own.
+  /// starts on a line of its own. For a pipe that nobody reads from any more, the system first sends
+  /// SIGPIPE, which ends a process that neither ignores nor handles it.
   void writeLine(std::string_view line);
 
  private:

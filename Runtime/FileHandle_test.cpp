@@ -173,6 +173,25 @@ TEST_F(FileHandleTest, StartsTheNextLineOnALineOfItsOwn) {
   EXPECT_EQ(contents(path()), "0123456789\nnext\nlast\n");
 }
 
+// Used to leave an empty line that nobody wrote: the torn line was ended, but the next one did not begin.
+TEST_F(FileHandleTest, EndsATornLineOnce) {
+  const rt::Ref<rt::FileHandle> handle = open();
+  rlimit before{};
+  ASSERT_EQ(getrlimit(RLIMIT_FSIZE, &before), 0);
+  const auto handler = std::signal(SIGXFSZ, SIG_IGN);
+  rlimit limit = before;
+  limit.rlim_cur = 10;
+  ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &limit), 0);
+  EXPECT_EQ(errorOf(*handle, "0123456789abcdef"), EFBIG);
+  limit.rlim_cur = 11;
+  ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &limit), 0);
+  EXPECT_EQ(errorOf(*handle, "lost"), EFBIG);
+  ASSERT_EQ(setrlimit(RLIMIT_FSIZE, &before), 0);
+  std::signal(SIGXFSZ, handler);
+  handle->writeLine("next");
+  EXPECT_EQ(contents(path()), "0123456789\nnext\n");
+}
+
 struct Pipe {
   Pipe() {
     if (pipe(ends) != 0) throw std::system_error(errno, std::generic_category());

@@ -9,6 +9,7 @@
 #include <cstdlib>
 #include <memory>
 #include <string>
+#include <string_view>
 
 namespace rt::CallStack {
 
@@ -55,6 +56,13 @@ std::string hexadecimal(std::uint64_t value, int width) {
   return text.data();
 }
 
+// Appends `text`, blanks up to `width`, and one that parts it from the next column.
+void appendColumn(std::string& line, std::string_view text, std::size_t width) {
+  line += text;
+  if (text.size() < width) line.append(width - text.size(), ' ');
+  line += ' ';
+}
+
 String symbol(std::size_t number, std::uint64_t address) {
   Dl_info information{};
   // A return address lies behind the call, which may have been the last thing in its function.
@@ -62,9 +70,10 @@ String symbol(std::size_t number, std::uint64_t address) {
   const bool isKnown = address != 0 && dladdr(call, &information) != 0 && information.dli_fname != nullptr;
   const char* const image = isKnown ? lastElement(information.dli_fname) : "???";
 
-  std::array<char, 128> columns{};
-  std::snprintf(columns.data(), columns.size(), "%-3zu %-35s ", number, image);
-  std::string line = columns.data() + hexadecimal(address, 16);
+  std::string line;
+  appendColumn(line, std::to_string(number), 3);
+  appendColumn(line, image, 35);
+  line += hexadecimal(address, 16);
   if (isKnown) {
     const bool isNamed = information.dli_sname != nullptr;
     const void* const start = isNamed ? information.dli_saddr : information.dli_fbase;

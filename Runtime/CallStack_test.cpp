@@ -1,11 +1,14 @@
 #include "Runtime/CallStack.h"
 
+#include <dlfcn.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <array>
+#include <cmath>
+#include <filesystem>
 #include <regex>
 #include <thread>
 
@@ -124,6 +127,27 @@ TEST(CallStackSymbols, SayWhatIsKnownOfAnAddressOfNoFunction) {
   ASSERT_EQ(lines.size(), 2U);
   EXPECT_EQ(lines[0], "0   ???                                 0x0000000000000000");
   EXPECT_EQ(lines[1], "1   ???                                 0x0000000000000010");
+}
+
+// Used to lose the end of the name, and the blank that parts it from the address.
+TEST(CallStackSymbols, NameAnImageWithALongNameInFull) {
+  namespace fs = std::filesystem;
+  Dl_info information{};
+  double (*const function)(double) = &std::cos;
+  if (dladdr(reinterpret_cast<const void*>(function), &information) == 0 ||
+      std::string(information.dli_fname).find(".so") == std::string::npos) {
+    GTEST_SKIP() << "the mathematical library is no image of its own";
+  }
+  const std::string name = std::string(200, 'x') + ".so";
+  const fs::path copy = fs::path(testing::TempDir()) / name;
+  fs::copy_file(information.dli_fname, copy, fs::copy_options::overwrite_existing);
+  void* const image = dlopen(copy.c_str(), RTLD_NOW | RTLD_LOCAL);
+  ASSERT_NE(image, nullptr) << dlerror();
+  const std::array addresses = {reinterpret_cast<std::uint64_t>(dlsym(image, "cos")) + 1};
+  EXPECT_THAT(std::string(rt::CallStack::symbols(addresses).at(0).view()),
+              testing::StartsWith("0   " + name + " 0x"));
+  dlclose(image);
+  fs::remove(copy);
 }
 
 TEST(CallStackSymbols, AreNoneForNoAddresses) {

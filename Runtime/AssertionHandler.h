@@ -29,7 +29,8 @@ class AssertionHandler : public Implements<AssertionHandler, Object> {
   /// an AssertionHandler itself and shared by all threads.
   static Ref<AssertionHandler> currentHandler();
 
-  /// Makes `handler` the calling thread's until the thread ends; null brings the default one back.
+  /// Makes `handler` the calling thread's until the thread ends; null brings the default one back. Does
+  /// nothing in destructors of the thread's own variables that run after the handler was given up.
   static void setCurrentHandler(Ref<AssertionHandler> handler);
 
   /// Told that an assertion failed in `function`, in `file` at `lineNumber`. Writes all of it to standard

@@ -110,6 +110,23 @@ TEST_F(AssertionHandlerTest, IsEachThreadsOwnAndGoesWithIt) {
   EXPECT_TRUE(rt::AssertionHandler::currentHandler()->isMemberOf(rt::classInfo<Recorder>()));
 }
 
+// Used to stay alive for ever: what is set when the thread has given its handler up already.
+TEST_F(AssertionHandlerTest, IsNotKeptByAThreadThatHasGivenUpItsOwn) {
+  struct SetsWhenDestroyed {
+    ~SetsWhenDestroyed() {
+      rt::AssertionHandler::setCurrentHandler(rt::make<Recorder>());
+      EXPECT_TRUE(rt::AssertionHandler::currentHandler()->isMemberOf(rt::classInfo<rt::AssertionHandler>()));
+    }
+  };
+  std::thread([] {
+    // Made before the handler is set, so destroyed after it is given up.
+    static thread_local const SetsWhenDestroyed late;
+    static_cast<void>(late);
+    rt::AssertionHandler::setCurrentHandler(rt::make<Recorder>());
+  }).join();
+  EXPECT_EQ(recordersAlive, 0U);
+}
+
 // The default handler is one for all threads, made once.
 TEST_F(AssertionHandlerTest, IsTheSameForAllThreadsThatSetNone) {
   const rt::Ref<rt::AssertionHandler> here = rt::AssertionHandler::currentHandler();

@@ -15,7 +15,8 @@ namespace rt::Thread {
 /// The calling thread's name; null when it has none. That is the last one given with `setCurrentName`. A
 /// thread that was never given one is looked at once, the first time it is asked, for a name that the
 /// system knows: on Linux, where every thread bears a text, one that differs from the process's own.
-/// Costs a look at a variable from then on.
+/// Costs a look at a variable from then on. Null in destructors of the thread's own variables that run
+/// after the name was given up.
 String currentName();
 
 /// Names the calling thread; null takes its name away. The system shows the name too, on Linux the first

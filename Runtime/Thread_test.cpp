@@ -2,8 +2,10 @@
 
 #include <gtest/gtest.h>
 #include <pthread.h>
+#include <sys/resource.h>
 
 #include <array>
+#include <semaphore>
 #include <thread>
 
 #include "tests/AllocationCount.h"
@@ -55,6 +57,39 @@ TEST(Thread, LosesItsName) {
     EXPECT_TRUE(rt::Thread::currentName().isNull());
     EXPECT_EQ(systemName(), before);
   });
+}
+
+// Used to be called by the process's former name: on Linux the main thread's name is the process's.
+TEST(Thread, HasNoNameWhenTheMainThreadGetsOne) {
+  const std::string before = systemName();
+  std::binary_semaphore isNamed(0);
+  std::thread older([&] {
+    isNamed.acquire();
+    EXPECT_TRUE(rt::Thread::currentName().isNull());
+  });
+  rt::Thread::setCurrentName("Main"_s);
+  isNamed.release();
+  older.join();
+  onNewThread([] { EXPECT_TRUE(rt::Thread::currentName().isNull()); });
+  rt::Thread::setCurrentName(nullptr);
+  EXPECT_TRUE(rt::Thread::currentName().isNull());
+  EXPECT_EQ(systemName(), before);
+}
+
+// Used to be called by the process's name where the system could not be asked for that.
+TEST(Thread, HasNoNameWhereNoFileCanBeOpened) {
+  rlimit before{};
+  ASSERT_EQ(getrlimit(RLIMIT_NOFILE, &before), 0);
+  rlimit none = before;
+  none.rlim_cur = 0;
+  bool isNull = false;
+  std::thread thread([&] {
+    ASSERT_EQ(setrlimit(RLIMIT_NOFILE, &none), 0);
+    isNull = rt::Thread::currentName().isNull();
+    setrlimit(RLIMIT_NOFILE, &before);
+  });
+  thread.join();
+  EXPECT_TRUE(isNull);
 }
 
 TEST(Thread, IsCalledWhatTheSystemCallsIt) {

@@ -5,6 +5,7 @@
 #include <unistd.h>
 
 #include <array>
+#include <cerrno>
 #include <cstring>
 #include <string_view>
 
@@ -20,7 +21,11 @@ using Text = std::array<char, kCapacity>;
 Text processName() noexcept {
   Text text{};
   const int file = open("/proc/self/comm", O_RDONLY | O_CLOEXEC);
-  if (file < 0) return text;
+  if (file < 0) {
+    // What the kernel named the process by, as good as always.
+    std::string_view(program_invocation_short_name).copy(text.data(), kCapacity - 1);
+    return text;
+  }
   const ssize_t length = read(file, text.data(), text.size());
   close(file);
   // The kernel ends the line.
@@ -28,19 +33,28 @@ Text processName() noexcept {
   return text;
 }
 
+// What the process was called before its main thread was given a name, which is then the process's, too.
+const Text& firstProcessName() noexcept {
+  static const Text name = processName();
+  return name;
+}
+
+bool isSame(const Text& first, const Text& second) noexcept {
+  return std::strcmp(first.data(), second.data()) == 0;
+}
+
 }  // namespace
 
 String systemThreadName() {
   Text name{};
   prctl(PR_GET_NAME, name.data());
-  const Text inherited = processName();
-  if (std::strcmp(name.data(), inherited.data()) == 0) return nullptr;
+  if (isSame(name, firstProcessName()) || isSame(name, processName())) return nullptr;
   return String::fromUTF8Repaired(name.data());
 }
 
 void setSystemThreadName(const String& name) noexcept {
-  const Text inherited = processName();
-  const std::string_view text = name.isNull() ? std::string_view(inherited.data()) : name.view();
+  const Text& unnamed = firstProcessName();
+  const std::string_view text = name.isNull() ? std::string_view(unnamed.data()) : name.view();
   std::size_t length = text.size() < kCapacity ? text.size() : kCapacity - 1;
   // A byte of the form 10xxxxxx goes on with a character that must not be cut in two.
   while (length > 0 && length < text.size() && (static_cast<unsigned char>(text[length]) & 0xC0U) == 0x80U)

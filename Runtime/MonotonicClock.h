@@ -7,7 +7,7 @@
 ///     const std::uint64_t duration = rt::MonotonicClock::nanoseconds() - start;
 ///
 /// Nobody sets it and nothing slews it, so that two durations can be compared. Where it starts is not
-/// defined. It does not count the time in which the machine sleeps.
+/// defined. The time in which the machine sleeps is counted on macOS, not on Linux.
 ///
 /// Not for: the time of day (Runtime/LocalTimeFormatter.h).
 

@@ -1,11 +1,10 @@
 #include "Runtime/AssertionHandler.h"
 
-#include <unistd.h>
-
-#include <cerrno>
+#include <chrono>
 #include <string>
 
 #include "Runtime/Exception.h"
+#include "Runtime/StandardError.h"
 #include "Runtime/ThreadReference.h"
 
 namespace rt {
@@ -14,16 +13,8 @@ namespace {
 
 using CurrentHandler = ThreadReference<AssertionHandler, struct CurrentHandlerTag>;
 
-void writeToStandardError(std::string_view text) noexcept {
-  while (!text.empty()) {
-    const ssize_t count = write(STDERR_FILENO, text.data(), text.size());
-    if (count > 0) {
-      text.remove_prefix(static_cast<std::size_t>(count));
-    } else if (count == 0 || errno != EINTR) {
-      return;  // There is nowhere left to say so.
-    }
-  }
-}
+// What the failure may hold the thread up for where nobody reads it.
+constexpr std::chrono::seconds kLongestWait{1};
 
 }  // namespace
 
@@ -45,7 +36,7 @@ void AssertionHandler::handleFailureInFunction(const String& function, const Str
   std::string line = "Assertion failed in ";
   line.append(knownFunction.view()).append(", ").append(knownFile.view()).append(":");
   line.append(std::to_string(lineNumber)).append(": ").append(description.view()).append("\n");
-  writeToStandardError(line);
+  StandardError::write(line, kLongestWait);
   throw InternalInconsistencyException(knownFunction, knownFile, lineNumber, description);
 }
 

@@ -34,8 +34,9 @@ class AssertionHandler : public Implements<AssertionHandler, Object> {
   static void setCurrentHandler(Ref<AssertionHandler> handler);
 
   /// Told that an assertion failed in `function`, in `file` at `lineNumber`. Writes all of it to standard
-  /// error, in one piece, and throws an InternalInconsistencyException with it. "<Unknown Function>" and
-  /// "<Unknown File>" stand for null.
+  /// error, the description as it stands, however many lines it has, and throws an
+  /// InternalInconsistencyException with it, also where standard error is closed, has lost its reader or
+  /// takes nothing for a second. "<Unknown Function>" and "<Unknown File>" stand for null.
   ///
   /// One that overrides this may return: then whoever found the failure goes on after it, as its own
   /// description says. It may be called by any thread that it is the handler of, at once.

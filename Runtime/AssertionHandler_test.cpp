@@ -1,11 +1,14 @@
 #include "Runtime/AssertionHandler.h"
 
 #include <gtest/gtest.h>
+#include <unistd.h>
 
+#include <string>
 #include <thread>
 #include <vector>
 
 #include "Runtime/Exception.h"
+#include "tests/StandardErrorPipe.h"
 
 namespace {
 
@@ -80,6 +83,41 @@ TEST_F(AssertionHandlerTest, SaysWhatIsUnknown) {
   }
   EXPECT_EQ(testing::internal::GetCapturedStderr(),
             "Assertion failed in <Unknown Function>, <Unknown File>:0: \n");
+}
+
+void fail(const rt::String& description) {
+  rt::AssertionHandler::currentHandler()->handleFailureInFunction("f"_s, "a"_s, 1, description);
+}
+
+// Used to end the process by SIGPIPE, with no exception for anybody to catch.
+TEST_F(AssertionHandlerTest, RaisesWhereNobodyReadsStandardError) {
+  for (const auto kind : {StandardErrorPipe::Kind::pipe, StandardErrorPipe::Kind::socket}) {
+    StandardErrorPipe standardError(kind);
+    standardError.closeReader();
+    EXPECT_THROW(fail("broken"_s), rt::InternalInconsistencyException);
+  }
+  const StandardErrorPipe standardError;
+  close(STDERR_FILENO);
+  EXPECT_THROW(fail("closed"_s), rt::InternalInconsistencyException);
+}
+
+// Used to lose the end of what a stream that does not block had no room for, and to wait for ever where
+// one that blocks was full.
+TEST_F(AssertionHandlerTest, WaitsForWhoReadsStandardErrorButNotForEver) {
+  std::string lines;
+  for (int i = 0; i < 20'000; ++i) lines += "line " + std::to_string(i) + "\n";
+  const std::string expected = "Assertion failed in f, a:1: " + lines + "\n";
+  StandardErrorPipe standardError;
+  standardError.makeNonBlocking();
+  std::thread failing([&] { EXPECT_THROW(fail(rt::String::fromUTF8(lines)), rt::Exception); });
+  std::string all;
+  while (all.size() < expected.size()) all += standardError.take(4096);
+  failing.join();
+  EXPECT_TRUE(all == expected);
+
+  StandardErrorPipe full;
+  full.fill();
+  EXPECT_THROW(fail("full"_s), rt::InternalInconsistencyException);
 }
 
 TEST_F(AssertionHandlerTest, CanBeReplacedAndMayReturn) {

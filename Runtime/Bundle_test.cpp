@@ -1,7 +1,10 @@
 #include "Runtime/Bundle.h"
 
 #include <gtest/gtest.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
+#include <atomic>
 #include <thread>
 
 // Bundle_test is built with an identifier, Bundle_none_test without one.
@@ -42,6 +45,26 @@ TEST(Bundle, IsAskedAndSetByAllThreadsAtOnce) {
     const rt::String identifier = rt::Bundle::mainIdentifier();
     ASSERT_TRUE(identifier == first || identifier == second);
   }
+  setter.join();
+  rt::Bundle::setMainIdentifier(nullptr);
+}
+
+// Used to wait for ever where another thread of the parent was about to set it.
+TEST(Bundle, HasItsIdentifierInTheChildOfAFork) {
+  const auto identifier = rt::String::fromUTF8("com.example.Forked");
+  std::atomic<bool> isEnding = false;
+  std::thread setter([&] {
+    while (!isEnding) rt::Bundle::setMainIdentifier(identifier);
+  });
+  rt::Bundle::setMainIdentifier(identifier);
+  for (int i = 0; i < 100; ++i) {
+    const pid_t child = fork();
+    if (child == 0) _exit(rt::Bundle::mainIdentifier() == identifier ? 0 : 1);
+    int status = -1;
+    ASSERT_EQ(waitpid(child, &status, 0), child);
+    EXPECT_EQ(status, 0);
+  }
+  isEnding = true;
   setter.join();
   rt::Bundle::setMainIdentifier(nullptr);
 }

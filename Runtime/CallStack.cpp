@@ -5,11 +5,17 @@
 #include <unwind.h>
 
 #include <array>
+#include <bit>
 #include <cstdio>
 #include <cstdlib>
 #include <memory>
+#include <optional>
 #include <string>
 #include <string_view>
+#include <utility>
+
+#include "Runtime/Process.h"
+#include "Runtime/SymbolTables.h"
 
 namespace rt::CallStack {
 
@@ -18,6 +24,7 @@ namespace {
 struct Capture {
   std::span<std::uint64_t> addresses;
   std::size_t count = 0;
+  std::uint64_t frame = 0;
   bool isOwnFrame = true;
 };
 
@@ -30,8 +37,14 @@ _Unwind_Reason_Code addFrame(_Unwind_Context* context, void* argument) noexcept 
     return _URC_NO_REASON;
   }
   const std::uint64_t address = _Unwind_GetIP(context);
+  const std::uint64_t frame = _Unwind_GetCFA(context);
   if (address == 0 || capture.count == capture.addresses.size()) return _URC_END_OF_STACK;
+  // Unwind tables that are wrong may lead to the same frame again and again.
+  if (capture.count > 0 && address == capture.addresses[capture.count - 1] && frame == capture.frame) {
+    return _URC_END_OF_STACK;
+  }
   capture.addresses[capture.count++] = address;
+  capture.frame = frame;
   return _URC_NO_REASON;
 }
 
@@ -63,24 +76,45 @@ void appendColumn(std::string& line, std::string_view text, std::size_t width) {
   line += ' ';
 }
 
-String symbol(std::size_t number, std::uint64_t address) {
-  Dl_info information{};
+String symbol(std::size_t number, std::uint64_t address, detail::SymbolTables& tables) {
   // A return address lies behind the call, which may have been the last thing in its function.
-  const void* const call = reinterpret_cast<const void*>(address - 1);
-  const bool isKnown = address != 0 && dladdr(call, &information) != 0 && information.dli_fname != nullptr;
-  const char* const image = isKnown ? lastElement(information.dli_fname) : "???";
+  const std::uint64_t call = address - 1;
+  std::string image = "???";
+  std::uint64_t imageStart = 0;
+  std::string function;
+  std::uint64_t functionStart = 0;
+  Dl_info information{};
+  if (address == 0) {
+    // No call leads there.
+  } else if (dladdr(std::bit_cast<const void*>(call), &information) != 0 &&
+             information.dli_fname != nullptr) {
+    image = lastElement(information.dli_fname);
+    imageStart = reinterpret_cast<std::uintptr_t>(information.dli_fbase);
+    if (information.dli_sname != nullptr) {
+      function = information.dli_sname;
+      functionStart = reinterpret_cast<std::uintptr_t>(information.dli_saddr);
+    }
+  }
+  if (address != 0 && function.empty()) {
+    if (std::optional<detail::SymbolTables::Symbol> symbol = tables.find(call)) {
+      if (imageStart == 0) {
+        image =
+            symbol->image.empty() ? std::string(Process::name().view()) : lastElement(symbol->image.c_str());
+        imageStart = symbol->imageStart;
+      }
+      function = std::move(symbol->function);
+      functionStart = symbol->functionStart;
+    }
+  }
 
   std::string line;
   appendColumn(line, std::to_string(number), 3);
   appendColumn(line, image, 35);
   line += hexadecimal(address, 16);
-  if (isKnown) {
-    const bool isNamed = information.dli_sname != nullptr;
-    const void* const start = isNamed ? information.dli_saddr : information.dli_fbase;
-    line += ' ';
-    line += isNamed ? readable(information.dli_sname)
-                    : hexadecimal(reinterpret_cast<std::uintptr_t>(information.dli_fbase), 0);
-    line += " + " + std::to_string(address - reinterpret_cast<std::uintptr_t>(start));
+  if (!function.empty()) {
+    line += ' ' + readable(function.c_str()) + " + " + std::to_string(address - functionStart);
+  } else if (imageStart != 0) {
+    line += ' ' + hexadecimal(imageStart, 0) + " + " + std::to_string(address - imageStart);
   }
   return String::fromUTF8Repaired(line);
 }
@@ -96,7 +130,8 @@ std::size_t capture(std::span<std::uint64_t> addresses) noexcept {
 std::vector<String> symbols(std::span<const std::uint64_t> addresses) {
   std::vector<String> lines;
   lines.reserve(addresses.size());
-  for (const std::uint64_t address : addresses) lines.push_back(symbol(lines.size(), address));
+  detail::SymbolTables tables;
+  for (const std::uint64_t address : addresses) lines.push_back(symbol(lines.size(), address, tables));
   return lines;
 }
 

@@ -24,18 +24,25 @@ namespace rt::CallStack {
 /// Fills `addresses` with the return addresses of the calls that led to this one, the innermost first:
 /// the first lies in the function that called `capture`, the second in that function's caller. Gives how
 /// many there are; what does not fit is left out, so that a result as large as `addresses` may not be
-/// the whole stack. A function that was compiled into its caller, or that called as its last act, has no
-/// frame of its own.
+/// the whole stack. What cannot be unwound ends it. A function that was compiled into its caller, or that
+/// called as its last act, has no frame of its own.
 [[gnu::noinline]] std::size_t capture(std::span<std::uint64_t> addresses) noexcept;
+
+/// Called behind the last call of a function, keeps the compiler from making that call the function's last
+/// act, so that it has a frame of its own.
+[[gnu::always_inline]] inline void keepFrame() noexcept {
+  asm volatile("" ::: "memory");  // NOLINT(hicpp-no-assembler): does nothing, which cannot be left out
+}
 
 /// A line for each of `addresses`: its number, from 0, the image it is in, the address, and the function
 /// with the distance from its start, as in
 ///
 ///     0   mount-point                         0x000055d0c0de1234 main + 52
 ///
-/// C++ names are spelt out. "???" stands for an image that is not known; where no symbol is known (that of
-/// a function which the image does not export), the image's start and the distance from it stand for it.
-/// Throws std::bad_alloc.
+/// C++ names are spelt out. The names of functions that an image does not export are read from the symbol
+/// table in its file, if that is there and still the same. "???" stands for an image that is not known; where
+/// no function is known, as in an image that was stripped, the image's start and the distance from it stand
+/// for it. Throws std::bad_alloc.
 std::vector<String> symbols(std::span<const std::uint64_t> addresses);
 
 }  // namespace rt::CallStack

@@ -4,14 +4,16 @@
 #include <unistd.h>
 
 #include <algorithm>
+#include <chrono>
 #include <csignal>
-#include <cstdio>
+#include <new>
 #include <stdexcept>
 #include <system_error>
 #include <thread>
 #include <utility>
 
 #include "Runtime/Exception.h"
+#include "Runtime/StandardError.h"
 #include "Runtime/Thread.h"
 #include "Runtime/UTF8.h"
 
@@ -19,7 +21,7 @@ namespace rt::detail {
 
 namespace {
 
-constinit UnfairLock reportLock;
+constinit ForkSafeLock reportLock;
 
 // Never destroyed: the thread that waits for changes may report until the process is gone.
 Block<void(const String&)>& reportHandler() RT_REQUIRES(reportLock) {
@@ -70,12 +72,14 @@ void reportDefaults(const std::string& line) noexcept {
   if (handler) {
     handler(String::fromUTF8Repaired(line));
   } else {
-    std::fprintf(stderr, "rt: %s\n", line.c_str());
+    StandardError::write("rt: " + line + "\n", std::chrono::seconds(1));
   }
 }
 
+constinit ForkSafeLock DefaultsStore::lock_;
+
 DefaultsStore::DefaultsStore(std::string path, std::string problem)
-    : file_(std::move(path)), placeProblem_(std::move(problem)) {}
+    : file_(std::move(path)), placeProblem_(std::move(problem)), process_(getpid()) {}
 
 std::optional<std::string> DefaultsStore::value(std::string_view key) {
   std::string problem;
@@ -97,6 +101,10 @@ void DefaultsStore::change(std::string_view key, std::optional<std::string_view>
   if (file_.path().empty()) fail(placeProblem_);
   std::string problem;
   Observers observers;
+  {
+    const LockGuard guard(lock_);
+    forgetParent();
+  }
   {
     const LockGuard guard(changeLock_);
     const DefaultsFile::Lock lock = file_.lock();
@@ -134,6 +142,7 @@ std::shared_ptr<DefaultsObserver> DefaultsStore::observe(std::string_view key, b
   std::string readProblem;
   {
     const LockGuard guard(lock_);
+    forgetParent();
     // First, so that no change after what is read here goes unnoticed.
     watchProblem = startWatching();
     readProblem = refresh();
@@ -159,16 +168,42 @@ void DefaultsStore::remove(DefaultsObserver& observer) noexcept {
   // What it captured is let go of here, without the lock, and not by whoever still looks at it.
   Block<void()> block;
   const LockGuard guard(lock_);
+  forgetParent();
   observer.isRemoved = true;
   std::erase_if(observers_, [&](const auto& each) { return each.get() == &observer; });
-  while (observer.isRunning && observer.caller != currentThreadIdentifier()) callEnded_.wait(lock_);
+  while (observer.isRunning && observer.caller != currentThreadIdentifier()) {
+    const std::uint32_t ended = endedCalls_;
+    lock_.unlock();
+    endedCalls_.wait(ended);
+    lock_.lock();
+  }
   block = std::exchange(observer.block, nullptr);
 }
 
 void DefaultsStore::stop() noexcept {
   const LockGuard guard(lock_);
   // A child of a fork has the parent's means to wake the parent's thread.
-  if (watch_ != nullptr && watcher_ == getpid()) watch_->stop();
+  forgetParent();
+  isStopped_ = true;
+  if (watch_ != nullptr) watch_->stop();
+}
+
+void DefaultsStore::forgetParent() {
+  const pid_t process = getpid();
+  if (process_ == process) return;
+  process_ = process;
+  watch_ = nullptr;
+  new (&changeLock_) UnfairLock;
+  for (const auto& observer : observers_) {
+    if (observer->caller == 0) continue;
+    if (isOrWasCurrentThread(observer->caller)) {
+      // It forks in the observer, which goes on in the child as well.
+      observer->caller = currentThreadIdentifier();
+    } else {
+      observer->caller = 0;
+      observer->isRunning = false;
+    }
+  }
 }
 
 std::string DefaultsStore::refresh() {
@@ -198,36 +233,58 @@ std::optional<std::string> DefaultsStore::find(std::string_view key) const {
 }
 
 std::string DefaultsStore::startWatching() {
-  if (file_.path().empty() || (watch_ != nullptr && watcher_ == getpid())) return {};
+  if (file_.path().empty() || watch_ != nullptr) return {};
   try {
     auto watch = std::make_shared<SystemFileWatch>(file_.path());
     const SignalsBlocked blocked;
-    std::thread([self = shared_from_this(), watch] { self->watch(*watch); }).detach();
+    std::thread([self = shared_from_this(), watch] { self->watch(watch); }).detach();
     watch_ = std::move(watch);
-    watcher_ = getpid();
     return {};
   } catch (const std::system_error& error) {
     return "user defaults are not watched for changes: " + file_.path() + ", " + error.what();
   }
 }
 
-void DefaultsStore::watch(SystemFileWatch& watch) noexcept {
-  try {
-    Thread::setCurrentName("user defaults"_s);
-    while (watch.wait()) {
-      std::string problem;
-      Observers observers;
-      {
-        const LockGuard guard(changeLock_);
-        observers = claim(problem);
-      }
-      reportDefaults(problem);
-      if (const std::exception_ptr exception = call(observers)) {
-        reportDefaults("an observer of user defaults threw: " + textOf(exception));
-      }
+void DefaultsStore::watch(std::shared_ptr<SystemFileWatch> watch) noexcept {
+  Thread::setCurrentName("user defaults"_s);
+  while (watch != nullptr) {
+    try {
+      // First, what has happened before it was watched.
+      do tellOfChange();
+      while (watch->wait());
+      return;
+    } catch (const std::exception& error) {
+      reportDefaults("user defaults are not watched for changes until the system allows it again: " +
+                     file_.path() + ", " + error.what());
     }
-  } catch (const std::exception& error) {
-    reportDefaults("user defaults are no longer watched for changes: " + file_.path() + ", " + error.what());
+    watch = renewedWatch();
+  }
+}
+
+void DefaultsStore::tellOfChange() {
+  std::string problem;
+  Observers observers;
+  {
+    const LockGuard guard(changeLock_);
+    observers = claim(problem);
+  }
+  reportDefaults(problem);
+  if (const std::exception_ptr exception = call(observers)) {
+    reportDefaults("an observer of user defaults threw: " + textOf(exception));
+  }
+}
+
+std::shared_ptr<SystemFileWatch> DefaultsStore::renewedWatch() noexcept {
+  constexpr std::chrono::seconds kPause{1};
+  for (;;) {
+    std::this_thread::sleep_for(kPause);
+    const LockGuard guard(lock_);
+    if (isStopped_) return nullptr;
+    try {
+      watch_ = std::make_shared<SystemFileWatch>(file_.path());
+      return watch_;
+    } catch (const std::exception&) {  // NOLINT(bugprone-empty-catch): it has been reported; try again.
+    }
   }
 }
 
@@ -269,7 +326,8 @@ bool DefaultsStore::isDue(DefaultsObserver& observer) {
   }
   observer.caller = 0;
   observer.isRunning = false;
-  callEnded_.notify_all();
+  ++endedCalls_;
+  endedCalls_.notify_all();
   return false;
 }
 

@@ -4,7 +4,8 @@
 
 #include <sys/types.h>
 
-#include <condition_variable>
+#include <atomic>
+#include <cstdint>
 #include <exception>
 #include <memory>
 #include <optional>
@@ -15,6 +16,7 @@
 #include "Runtime/Block.h"
 #include "Runtime/DefaultsFile.h"
 #include "Runtime/DefaultsText.h"
+#include "Runtime/ForkSafeLock.h"
 #include "Runtime/String.h"
 #include "Runtime/SystemFileWatch.h"
 #include "Runtime/ThreadIdentifier.h"
@@ -58,13 +60,20 @@ class DefaultsStore : public std::enable_shared_from_this<DefaultsStore> {
   void stop() noexcept;
 
  private:
+  // Forgets, in the child of a fork, the threads that it does not have, and what they were doing. Comes first
+  // wherever they count.
+  void forgetParent() RT_REQUIRES(lock_);
+
   // Reads the file if it has changed. Returns what is to be reported, without the lock; "" for nothing.
   [[nodiscard]] std::string refresh() RT_REQUIRES(lock_);
   std::optional<std::string> find(std::string_view key) const RT_REQUIRES(lock_);
 
   // Starts the thread if this process has none. Returns what is to be reported.
   [[nodiscard]] std::string startWatching() RT_REQUIRES(lock_);
-  void watch(SystemFileWatch& watch) noexcept;
+  void watch(std::shared_ptr<SystemFileWatch> watch) noexcept;
+  void tellOfChange();
+  // A new watch, as soon as the system allows one; null when the thread is to end.
+  std::shared_ptr<SystemFileWatch> renewedWatch() noexcept;
 
   using Observers = std::vector<std::shared_ptr<DefaultsObserver>>;
   // The observers whose value has changed and that no thread is about to call, which from now on this
@@ -79,17 +88,21 @@ class DefaultsStore : public std::enable_shared_from_this<DefaultsStore> {
   const DefaultsFile file_;
   // Held while the file is being changed, until the observers are claimed; taken before `lock_`.
   UnfairLock changeLock_;
-  UnfairLock lock_;
+  // One for all stores, of which a process has hardly more than one.
+  static constinit ForkSafeLock lock_;
   DefaultsText text_ RT_GUARDED_BY(lock_);
   DefaultsFile::Version version_ RT_GUARDED_BY(lock_);
   // What was reported last, until it is no longer so.
   std::string problem_ RT_GUARDED_BY(lock_);
   const std::string placeProblem_;
   Observers observers_ RT_GUARDED_BY(lock_);
-  std::condition_variable_any callEnded_;
+  // Counts the calls of observers that have ended.
+  std::atomic<std::uint32_t> endedCalls_ = 0;
+  // What the thread waits at; null while there is no thread.
   std::shared_ptr<SystemFileWatch> watch_ RT_GUARDED_BY(lock_);
-  // The process that has the thread.
-  pid_t watcher_ RT_GUARDED_BY(lock_) = 0;
+  // The process that has all these threads.
+  pid_t process_ RT_GUARDED_BY(lock_);
+  bool isStopped_ RT_GUARDED_BY(lock_) = false;
 };
 
 }  // namespace rt::detail

@@ -5,6 +5,7 @@
 #include <sys/uio.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <string>
@@ -18,19 +19,25 @@ iovec pieceOf(std::string_view text) noexcept {
   return {const_cast<char*>(text.data()), text.size()};
 }
 
-// The pieces of a line that are still to be written.
+// What is still to be written of a line.
 class Pieces {
  public:
   Pieces(std::string_view before, std::string_view line) noexcept
       : pieces_{pieceOf(before), pieceOf(line), pieceOf("\n")} {
+    if (before.size() + line.size() < joined_.size()) join();
     skip(0);
   }
+  Pieces(const Pieces&) = delete;
+  Pieces& operator=(const Pieces&) = delete;
 
   bool isEmpty() const noexcept { return first_ == pieces_.size(); }
 
-  // Hands all of them to the system at once; gives what `writev` gives.
+  // Hands all of it to the system at once; gives what `writev` gives.
   ssize_t write(int descriptor) const noexcept {
-    return writev(descriptor, pieces_.data() + first_, static_cast<int>(pieces_.size() - first_));
+    const iovec* const first = pieces_.data() + first_;
+    const std::size_t count = pieces_.size() - first_;
+    if (count == 1) return ::write(descriptor, first->iov_base, first->iov_len);
+    return writev(descriptor, first, static_cast<int>(count));
   }
 
   void skip(std::size_t count) noexcept {
@@ -46,8 +53,19 @@ class Pieces {
   }
 
  private:
+  // Makes the last piece all of them. Measured: the system takes half as long again for two pieces as for
+  // one.
+  void join() noexcept {
+    char* end = joined_.data();
+    for (const iovec& piece : pieces_) {
+      end = std::copy_n(static_cast<const char*>(piece.iov_base), piece.iov_len, end);
+    }
+    pieces_ = {pieceOf(""), pieceOf(""), pieceOf({joined_.data(), end})};
+  }
+
   std::array<iovec, 3> pieces_;
   std::size_t first_ = 0;
+  std::array<char, 1024> joined_;
 };
 
 void waitUntilWritable(int descriptor) noexcept {
@@ -82,7 +100,8 @@ Ref<FileHandle> FileHandle::openForAppending(const String& path, std::uint16_t m
   do {
     descriptor = open(terminated.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC, mode);
   } while (descriptor < 0 && errno == EINTR);
-  return descriptor < 0 ? nullptr : make<FileHandle>(descriptor, Closing::closes);
+  if (descriptor < 0) return nullptr;
+  return make<FileHandle>(descriptor, Closing::closes);
 }
 
 void FileHandle::writeLine(std::string_view line) {

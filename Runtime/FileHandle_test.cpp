@@ -86,6 +86,18 @@ TEST_F(FileHandleTest, WritesALineOfAnyLength) {
   EXPECT_EQ(contents(path()), line + "\n");
 }
 
+// Short lines are put together before they are written, long ones are not.
+TEST_F(FileHandleTest, WritesLinesOfEveryLengthAroundThatOfShortOnes) {
+  const rt::Ref<rt::FileHandle> handle = open();
+  std::string expected;
+  for (std::size_t length = 1000; length < 1050; ++length) {
+    const std::string line(length, static_cast<char>('a' + (length % 26)));
+    handle->writeLine(line);
+    expected += line + "\n";
+  }
+  EXPECT_EQ(contents(path()), expected);
+}
+
 TEST_F(FileHandleTest, ClosesItsDescriptorWhenItIsReleased) {
   rt::Ref<rt::FileHandle> handle = open();
   ASSERT_TRUE(handle);
@@ -260,7 +272,7 @@ void expectWholeLines(const std::string& text, int writers, int lines) {
     ASSERT_TRUE(words >> writer >> number >> filling) << line;
     ASSERT_EQ(next[writer]++, number) << line;
     ASSERT_EQ(filling,
-              std::string(static_cast<std::size_t>(number % 300 + 1), static_cast<char>('a' + writer)));
+              std::string(static_cast<std::size_t>((number % 300) + 1), static_cast<char>('a' + writer)));
   }
   EXPECT_EQ(count, writers * lines);
 }
@@ -269,13 +281,14 @@ void writeLines(rt::FileHandle& handle, int writer, int lines) {
   for (int number = 0; number < lines; ++number) {
     handle.writeLine(
         std::to_string(writer) + " " + std::to_string(number) + " " +
-        std::string(static_cast<std::size_t>(number % 300 + 1), static_cast<char>('a' + writer)));
+        std::string(static_cast<std::size_t>((number % 300) + 1), static_cast<char>('a' + writer)));
   }
 }
 
 TEST_F(FileHandleTest, KeepsLinesOfThreadsWhole) {
   const rt::Ref<rt::FileHandle> handle = open();
   std::vector<std::thread> threads;
+  threads.reserve(8);
   for (int writer = 0; writer < 8; ++writer) {
     threads.emplace_back([&handle, writer] { writeLines(*handle, writer, 500); });
   }

@@ -125,7 +125,7 @@ class FormatCheck {
       if (argument.kind != ArgumentKind::kObject && !argument.isNull) formatMistake::directiveTakesAnObject();
     } else if (directive.conversion == 'p') {
       if (argument.passedAs != FormatArgument::kPointer) formatMistake::directiveTakesAPointer();
-    } else if (!argument.isNull && !(isText && argument.isWide == directive.isWide())) {
+    } else if (!argument.isNull && (!isText || argument.isWide != directive.isWide())) {
       if (directive.isWide()) formatMistake::directiveTakesAWideTextThatEndsWithNul();
       formatMistake::directiveTakesATextThatEndsWithNul();
     }

@@ -194,7 +194,7 @@ bool KeyedUnarchiver::decodeList(Index owner, std::string_view key, Wanted wante
                                  std::vector<Ref<Object>>& objects) {
   const std::optional<Index> index = list_.find(owner, key);
   const auto* references = index ? list_.get<PropertyList::Array>(*index) : nullptr;
-  if (references == nullptr) return fail("a collection without " + std::string(key)) != nullptr;
+  if (!index || references == nullptr) return fail("a collection without " + std::string(key)) != nullptr;
   // No archiver has two collections share a list, and many that did would multiply what a file holds.
   if (listOwners_.try_emplace(*index, owner).first->second != owner) {
     return fail("two collections with the same " + std::string(key)) != nullptr;

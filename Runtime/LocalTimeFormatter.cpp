@@ -23,11 +23,13 @@ void appendPadded(std::string& text, std::int64_t value, std::size_t width) {
 
 void putMilliseconds(char* place, std::int64_t milliseconds) noexcept {
   for (int digit = 2; digit >= 0; --digit, milliseconds /= 10) {
-    place[digit] = static_cast<char>('0' + milliseconds % 10);
+    place[digit] = static_cast<char>('0' + (milliseconds % 10));
   }
 }
 
 }  // namespace
+
+constinit ForkSafeLock LocalTimeFormatter::lock_;
 
 bool LocalTimeFormatter::parse(std::string_view pattern, std::vector<Piece>& pieces) {
   constexpr std::pair<std::string_view, Field> kFields[] = {

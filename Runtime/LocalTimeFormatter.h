@@ -18,8 +18,8 @@
 /// a change of TZ counts from the next call on, a change of the system's setting from the next second. As
 /// with the system's own functions, no other thread may change the environment at the same time.
 ///
-/// One formatter may be used by all threads; it locks itself. The text of a second is kept, so that
-/// formatting many times in one second costs little.
+/// One formatter may be used by all threads, which wait for each other, and works on in the child of a fork.
+/// The text of a second is kept, so that formatting many times in one second costs little.
 ///
 /// Not for: other zones and calendars; names of months and days; reading dates.
 
@@ -32,10 +32,10 @@
 #include <vector>
 
 #include "Runtime/Class.h"
+#include "Runtime/ForkSafeLock.h"
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
-#include "Runtime/UnfairLock.h"
 
 namespace rt {
 
@@ -72,7 +72,8 @@ class LocalTimeFormatter final : public Implements<LocalTimeFormatter, Object> {
 
   const std::vector<Piece> pieces_;
 
-  UnfairLock lock_;
+  // One for all formatters, as it is for the system's function, whose own lock a fork must not catch either.
+  static constinit ForkSafeLock lock_;
   // The text of `second_`, with three digits to be filled in at each of `milliseconds_`.
   bool isRendered_ RT_GUARDED_BY(lock_) = false;
   std::time_t second_ RT_GUARDED_BY(lock_) = 0;

@@ -1,6 +1,8 @@
 #include "Runtime/LocalTimeFormatter.h"
 
 #include <gtest/gtest.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
 #include <atomic>
 #include <cstdlib>
@@ -192,6 +194,24 @@ TEST_F(LocalTimeFormatterTest, ServesAllThreadsAtOnce) {
   }
   for (std::thread& thread : threads) thread.join();
   EXPECT_EQ(wrong, 0);
+}
+
+// Used to wait for ever where another thread of the parent was using any formatter.
+TEST_F(LocalTimeFormatterTest, WorksOnInTheChildOfAFork) {
+  setenv("TZ", "UTC0", 1);
+  std::atomic<bool> isEnding = false;
+  std::thread user([&] {
+    for (int second = 0; !isEnding; ++second) formatter_->stringFromTime(at(second, 0));
+  });
+  for (int i = 0; i < 100; ++i) {
+    const pid_t child = fork();
+    if (child == 0) _exit(formatter_->stringFromTime(at(5, 7)) == "1970-01-01 00:00:05.007" ? 0 : 1);
+    int status = -1;
+    ASSERT_EQ(waitpid(child, &status, 0), child);
+    EXPECT_EQ(status, 0);
+  }
+  isEnding = true;
+  user.join();
 }
 
 }  // namespace

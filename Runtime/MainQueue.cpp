@@ -3,7 +3,6 @@
 #include <cstdio>
 #include <cstdlib>
 
-#include "Runtime/QueueRegistry.h"
 #include "Runtime/ThreadIdentifier.h"
 
 namespace rt {
@@ -12,7 +11,7 @@ constinit detail::WakeDescriptor MainQueue::wakeDescriptor_;
 constinit std::atomic<bool> MainQueue::isStopping_ = false;
 
 MainQueue& MainQueue::instance() {
-  static MainQueue* const queue = new MainQueue;  // For ever: tasks are queued until the very end.
+  static auto* const queue = new MainQueue;  // For ever: tasks are queued until the very end.
   return *queue;
 }
 
@@ -21,11 +20,10 @@ bool MainQueue::mayRunHere() const noexcept {
 }
 
 void MainQueue::schedule() noexcept {
-  detail::QueueRegistry::runTasksAtExit();
   wakeDescriptor_.set();
 }
 
-void MainQueue::checkThread(const char* operation) const noexcept {
+void MainQueue::checkThread(const char* operation) noexcept {
   if (isMainThread()) return;
   std::fprintf(stderr, "rt: MainQueue::%s on thread %u, which is not the main thread\n", operation,
                currentThreadIdentifier());
@@ -34,7 +32,7 @@ void MainQueue::checkThread(const char* operation) const noexcept {
 
 void MainQueue::run() {
   MainQueue& queue = instance();
-  queue.checkThread("run");
+  checkThread("run");
   if (queue.isCurrent()) {
     std::fprintf(stderr, "rt: MainQueue::run from a task of the main queue\n");
     std::abort();
@@ -54,7 +52,7 @@ void MainQueue::stop() noexcept {
 
 std::size_t MainQueue::drain() {
   MainQueue& queue = instance();
-  queue.checkThread("drain");
+  checkThread("drain");
   wakeDescriptor_.reset();
   return queue.runScheduled(nullptr);
 }

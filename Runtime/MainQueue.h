@@ -64,7 +64,7 @@ class MainQueue final : public Queue {
 
   bool mayRunHere() const noexcept override;
   void schedule() noexcept override;
-  void checkThread(const char* operation) const noexcept;
+  static void checkThread(const char* operation) noexcept;
 
   static constinit detail::WakeDescriptor wakeDescriptor_;
   static constinit std::atomic<bool> isStopping_;

@@ -33,6 +33,8 @@ namespace rt {
 struct ClassInfo;
 struct ProtocolInfo;
 class String;
+template <class T>
+class Ref;
 
 namespace detail {
 class WeakCell;
@@ -56,8 +58,11 @@ class Object {
 
   /// Gives up a reference; the object is destroyed with the last, on the calling thread.
   void release() const noexcept {
-    if (isImmortal()) return;
-    if (count_.fetch_sub(1, std::memory_order_acq_rel) == 1) [[unlikely]]
+    const std::uint32_t count = count_.load(std::memory_order_acquire);
+    if ((count & kImmortal) != 0) return;
+    // Where this is the only reference and there is no weak one, nobody else can add any.
+    const bool isOnlyOne = count == 1 && cellOrClass_.load(std::memory_order_relaxed) == nullptr;
+    if (isOnlyOne || count_.fetch_sub(1, std::memory_order_acq_rel) == 1) [[unlikely]]
       destroy();
   }
 
@@ -70,6 +75,10 @@ class Object {
 
   /// The object as text, for people. By default "<ClassName: 0x...>" with the address.
   virtual String description() const;
+
+  /// The object for somebody who keeps it as it is now: a copy of one that may change, by default the object
+  /// itself, which suits all that never do. Never null. Throws what making the copy throws.
+  virtual Ref<Object> copy() const;
 
   /// The record of the object's class. Overridden by `Implements`, by nothing else.
   virtual const ClassInfo& classInfo() const noexcept;

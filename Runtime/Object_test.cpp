@@ -165,6 +165,12 @@ TEST(Object, IsComparedWithNullInMind) {
   EXPECT_TRUE(rt::isEqual(static_cast<const rt::Object*>(nullptr), nullptr));
 }
 
+TEST(Object, IsItsOwnCopyUnlessItSaysOtherwise) {
+  const rt::Ref<Point> point = rt::make<Point>(3, 4);
+  EXPECT_EQ(point->copy(), point);
+  EXPECT_EQ(kConstant.copy(), &kConstant);
+}
+
 TEST(Object, IsDescribedByClassAndAddress) {
   const rt::Ref<Point> point = rt::make<Point>(3, 4);
   char expected[64];

@@ -71,7 +71,7 @@ constinit thread_local Queue::RunningScope* Queue::RunningScope::innermost_ = nu
 Queue::Queue(String label, QualityOfService qualityOfService, int relativePriority)
     : label_(label ? std::move(label) : ""_s),
       qualityOfService_(qualityOfService),
-      relativePriority_(static_cast<std::int8_t>(std::clamp(relativePriority, kLowestRelativePriority, 0))) {
+      relativePriority_(static_cast<std::int16_t>(std::clamp(relativePriority, kLowestRelativePriority, 0))) {
   detail::QueueRegistry::add(*this);
 }
 
@@ -84,15 +84,25 @@ Ref<Queue> Queue::main() {
 }
 
 void Queue::enqueue(detail::Task& task) noexcept {
+  detail::QueueRegistry::runTasksAtExit();
+  // Known before the lock is let go, since the task may drop the last reference to the queue.
+  const QualityOfService qualityOfService = qualityOfService_;
+  const int relativePriority = relativePriority_;
   lock_.lock();
+  const bool isStranded = isScheduled_ && !isRunning_ && isShortOfThreads();
   const bool wantsSchedule = append(task);
   lock_.unlock();
-  if (wantsSchedule) schedule();
+  if (wantsSchedule) {
+    schedule();
+  } else if (isStranded) {
+    detail::WorkerPool::tryAgain(qualityOfService, relativePriority);
+  }
 }
 
 bool Queue::append(detail::Task& task) noexcept {
   tasks_.append(task);
   ++queuedCount_;
+  detail::QueueRegistry::wakeExit();
   if (isRunning_ || isScheduled_) return false;
   isScheduled_ = true;
   retain();
@@ -106,8 +116,9 @@ detail::TaskList Queue::start() noexcept {
 }
 
 void Queue::schedule() noexcept {
-  detail::QueueRegistry::runTasksAtExit();
+  // From here on its tasks may run and drop the last reference to it.
   detail::WorkerPool::schedule(*this, qualityOfService_, relativePriority_);
+  detail::QueueRegistry::wakeExit();  // There may be no thread for it.
 }
 
 void Queue::perform(detail::FunctionView function) {
@@ -152,16 +163,17 @@ std::size_t Queue::runScheduled(const std::atomic<bool>* stop) noexcept {
   return runBatch(scope, stop);
 }
 
-std::size_t Queue::runHere() noexcept {
+// Runs what is queued, unless some thread is at it. It stays scheduled, and so keeps its reference to itself.
+void Queue::runHere() noexcept {
   const bool mayRun = mayRunHere();
   lock_.lock();
   if (!mayRun || isRunning_ || tasks_.isEmpty()) {
     lock_.unlock();
-    return 0;
+    return;
   }
   RunningScope scope(*this, start());
   lock_.unlock();
-  return runBatch(scope);
+  runBatch(scope);
 }
 
 void Queue::runOnWorker() noexcept {
@@ -178,6 +190,7 @@ void Queue::runOnWorker() noexcept {
   } while (takeMore(scope));
 }
 
+// NOLINTNEXTLINE(readability-make-member-function-const): it runs what the queue was given
 std::size_t Queue::runBatch(RunningScope& scope, const std::atomic<bool>* stop) noexcept {
   std::size_t count = 0;
   while (detail::Task* task = scope.batch().takeFirst()) {
@@ -199,16 +212,17 @@ bool Queue::takeMore(RunningScope& scope) noexcept {
   LockGuard guard(lock_);
   if (tasks_.isEmpty()) return false;
   // Other queues have their turn where threads are short, unless somebody waits for this one.
-  if (lastWaiter_ == nullptr && detail::WorkerPool::isShort(qualityOfService_, relativePriority_))
-    return false;
+  if (lastWaiter_ == nullptr && isShortOfThreads()) return false;
   doneCount_ += std::exchange(scope.count(), 0);
   scope.batch() = start();
+  detail::QueueRegistry::wakeExit();
   return true;
 }
 
 void Queue::finish(RunningScope& scope) noexcept {
   lock_.lock();
   doneCount_ += scope.count();
+  detail::QueueRegistry::wakeExit();
   tasks_.prepend(scope.batch());
   if (tasks_.isEmpty()) {
     isRunning_ = false;
@@ -254,9 +268,11 @@ Queue::UncaughtExceptionHandler Queue::setUncaughtExceptionHandler(
 }
 
 std::optional<std::uint64_t> Queue::exitGoal() noexcept {
-  if (isCurrent() || !mayRunHere()) return std::nullopt;
+  if (isCurrent()) return std::nullopt;
   LockGuard guard(lock_);
-  if (doneCount_ == queuedCount_) return std::nullopt;
+  // In this order: a queue that is being made or destroyed at this moment is in the list, but has no tasks,
+  // and is not asked what only a whole one can answer.
+  if (doneCount_ == queuedCount_ || !mayRunHere()) return std::nullopt;
   retain();  // It has a reference to itself until this lock is let go.
   return queuedCount_;
 }
@@ -264,6 +280,10 @@ std::optional<std::uint64_t> Queue::exitGoal() noexcept {
 bool Queue::hasReached(std::uint64_t goal) const noexcept {
   LockGuard guard(lock_);
   return doneCount_ >= goal;
+}
+
+bool Queue::isShortOfThreads() const noexcept {
+  return detail::WorkerPool::isShort(qualityOfService_, relativePriority_);
 }
 
 // Not analysed: there is no other thread, and whichever held the lock is gone. The tasks are the parent's

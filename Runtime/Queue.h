@@ -16,13 +16,18 @@
 /// task has nobody to go to: see `setUncaughtExceptionHandler`.
 ///
 /// Exit. When the process exits by returning from `main` or by `exit`, the tasks that have been queued by
-/// then run first, and so do those that they queue, up to kExitRounds times over; the program waits for
-/// running tasks, but at most ten seconds altogether, and names the queues that it leaves. Not run are
-/// what is queued behind a task that itself calls `exit` and, where another than the main thread calls
-/// it, the main queue's. `_exit`, `quick_exit` and `abort` run nothing.
+/// then run first, and so do those that they queue, up to kExitRounds times over, and those that
+/// destructors of static objects queue. The program waits for tasks, but at most ten seconds altogether,
+/// and names the queues that it leaves. Not run are what is queued behind a task that itself calls `exit`
+/// and, where another than the main thread calls it, the main queue's. `_exit`, `quick_exit` and `abort`
+/// run nothing.
 ///
 /// Fork. Queued tasks are the parent's: in the child all queues are empty and start with a fresh set of
-/// threads. Where a task forks, the queue it runs on goes on in the child when the task returns.
+/// threads. Where a task forks, the queue it runs on goes on in the child when the task returns; but a
+/// `sync` task that another thread waits for must not return there, since that thread is gone.
+///
+/// Without threads. Where the system refuses the first thread, tasks wait until there is more to do: any
+/// `async` asks again, `sync` runs them on its own thread, and so does the thread that exits.
 ///
 /// Not for: work that waits for something outside for long, of which no more than 64 at once run for each
 /// degree of niceness; timers; priorities among the tasks of one queue.
@@ -77,7 +82,8 @@ class RT_CAPABILITY("queue") Queue : public Implements<Queue, Object>, private d
   /// are queued, and returns without waiting for it. The task is moved or copied into the one block of
   /// memory that this allocates, and destroyed on the thread that has run it. Any thread may call it.
   /// Throws std::bad_alloc and what copying the task throws; then nothing is queued.
-  template <std::invocable Task>
+  template <class Task>
+    requires std::invocable<std::decay_t<Task>>
   void async(Task&& task) {
     enqueue(*new detail::AsyncTask<std::decay_t<Task>>(std::forward<Task>(task)));
   }
@@ -104,7 +110,7 @@ class RT_CAPABILITY("queue") Queue : public Implements<Queue, Object>, private d
     } else {
       std::optional<Result> result;
       perform(detail::FunctionView([&] { result.emplace(std::forward<Task>(task)()); }));
-      return *std::move(result);
+      return *std::move(result);  // NOLINT(bugprone-unchecked-optional-access): the task has run
     }
   }
 
@@ -166,14 +172,15 @@ class RT_CAPABILITY("queue") Queue : public Implements<Queue, Object>, private d
   void finish(RunningScope& scope) noexcept RT_EXCLUDES(lock_);
 
   // For the registry.
-  std::size_t runHere() noexcept RT_EXCLUDES(lock_);
+  void runHere() noexcept RT_EXCLUDES(lock_);
   std::optional<std::uint64_t> exitGoal() noexcept RT_EXCLUDES(lock_);
   bool hasReached(std::uint64_t goal) const noexcept RT_EXCLUDES(lock_);
+  bool isShortOfThreads() const noexcept;
   void resetAfterFork() noexcept;
 
   const String label_;
   const QualityOfService qualityOfService_;
-  const std::int8_t relativePriority_;
+  const std::int16_t relativePriority_;
 
   // A queue that has tasks is running, and whoever runs it looks for more when it is done, or scheduled,
   // or both, where a thread that waits has been quicker than the pool. While it is any of these, it has a

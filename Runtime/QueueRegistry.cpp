@@ -7,19 +7,28 @@
 #include <cstdio>
 #include <cstdlib>
 #include <new>
-#include <thread>
 #include <vector>
 
+#include "Runtime/AddressWait.h"
 #include "Runtime/MainQueue.h"
 #include "Runtime/Queue.h"
+#include "Runtime/Ref.h"
 #include "Runtime/ThreadIdentifier.h"
 
 namespace rt::detail {
+
+namespace {
+
+// Changes with everything that the thread that exits waits for.
+constinit std::atomic<std::uint32_t> exitEvents = 0;
+
+}  // namespace
 
 constinit std::atomic<std::chrono::nanoseconds::rep> QueueRegistry::exitPatience =
     std::chrono::nanoseconds(std::chrono::seconds(10)).count();
 constinit UnfairLock QueueRegistry::lock;
 constinit std::atomic<bool> QueueRegistry::runsTasksAtExit_ = false;
+constinit std::atomic<bool> QueueRegistry::isExiting_ = false;
 constinit Queue* QueueRegistry::first_ = nullptr;
 
 void QueueRegistry::add(Queue& queue) {
@@ -40,13 +49,26 @@ void QueueRegistry::registerExitHandler() noexcept {
   if (!runsTasksAtExit_.exchange(true)) std::atexit(drainAtExit);
 }
 
+void QueueRegistry::changeExitEvents() noexcept {
+  exitEvents.fetch_add(1, std::memory_order_release);
+  wakeAtAddress(&exitEvents);
+}
+
 void QueueRegistry::drainAtExit() {
-  using Clock = std::chrono::steady_clock;
-  // A thread may be making the main queue at this moment, which is in the list before it is whole: this
-  // waits until it is.
-  MainQueue::instance();
-  const Clock::time_point deadline =
-      Clock::now() + std::chrono::nanoseconds(exitPatience.load(std::memory_order_relaxed));
+  static const auto deadline = std::chrono::steady_clock::now() +
+                               std::chrono::nanoseconds(exitPatience.load(std::memory_order_relaxed));
+  static bool hasGivenUp = false;
+  if (hasGivenUp) return;
+  isExiting_ = true;
+  // What is queued from here on has this called again: so do destructors of static objects, which run
+  // afterwards.
+  runsTasksAtExit_ = false;
+  hasGivenUp = !runUntilIdle(deadline);
+}
+
+// Runs, or waits for, what is queued; returns whether nothing is left. Pool queues are left to the pool
+// while it has threads: a task that never ends must not take the thread that watches the clock.
+bool QueueRegistry::runUntilIdle(std::chrono::steady_clock::time_point deadline) {
   struct Unfinished {
     Ref<Queue> queue;
     std::uint64_t goal;
@@ -59,25 +81,28 @@ void QueueRegistry::drainAtExit() {
         if (const auto goal = queue->exitGoal()) all.push_back({Ref<Queue>::adopt(queue), *goal});
       }
     }
-    if (all.empty()) return;
+    if (all.empty()) return true;
     for (;;) {
-      std::size_t count = 0;
-      for (const Unfinished& each : all) count += each.queue->runHere();
+      const std::uint32_t events = exitEvents.load(std::memory_order_acquire);
+      // Also where it was not busy: a task that is waited for may come to wait for it.
+      MainQueue::instance().runHere();
+      for (const Unfinished& each : all) {
+        if (each.queue->isShortOfThreads()) each.queue->runHere();
+      }
       std::erase_if(all, [](const Unfinished& each) { return each.queue->hasReached(each.goal); });
       if (all.empty()) break;
-      if (count != 0) continue;
-      if (Clock::now() >= deadline) {
+      const std::chrono::nanoseconds left = deadline - std::chrono::steady_clock::now();
+      if (left.count() <= 0) {
         for (const Unfinished& each : all) {
           std::fprintf(stderr, "rt: the queue \"%.*s\" still runs a task at exit; what it holds is lost\n",
                        static_cast<int>(each.queue->label().length()), each.queue->label().view().data());
         }
-        return;
+        return false;
       }
-      // A task that is waited for may itself have come to wait for the main queue since.
-      MainQueue::instance().runHere();
-      std::this_thread::sleep_for(std::chrono::milliseconds(1));
+      waitAtAddress(exitEvents, events, &left);
     }
   }
+  return false;
 }
 
 void QueueRegistry::registerForkHandlers() noexcept {

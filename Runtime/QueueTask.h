@@ -79,6 +79,7 @@ template <class Function>
 class AsyncTask final : public Task {
  public:
   template <class Argument>
+    requires(!std::same_as<std::remove_cvref_t<Argument>, AsyncTask>)
   explicit AsyncTask(Argument&& function) : function_(std::forward<Argument>(function)) {}
 
   void run() override {
@@ -124,6 +125,7 @@ class SyncTask final : public Task {
   Outcome wait();
 
  private:
+  // NOLINTNEXTLINE(performance-enum-size): threads sleep at words of 32 bits.
   enum State : std::uint32_t { kWaiting, kAsleep, kTurn, kDone };
   void wake(State state) noexcept;
 

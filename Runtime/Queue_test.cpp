@@ -20,7 +20,9 @@
 #include <latch>
 #include <memory>
 #include <random>
+#include <string>
 #include <thread>
+#include <utility>
 #include <vector>
 
 #include "Runtime/MainQueue.h"
@@ -67,6 +69,22 @@ TEST_F(QueueTest, KeepsWhatItIsMadeOf) {
   EXPECT_EQ(rt::make<Queue>(nullptr)->label(), ""_s);
 }
 
+TEST_F(QueueTest, TakesWhatCanBeCalledAsItCallsIt) {
+  struct CalledInPlace {
+    void operator()() & {}
+  };
+  struct CalledOnce {
+    void operator()() && {}
+  };
+  constexpr auto isTaken = []<class Task>(Task&& task) {
+    return requires { std::declval<Queue&>().async(std::forward<Task>(task)); };
+  };
+  CalledInPlace inPlace;
+  CalledOnce once;
+  EXPECT_FALSE(isTaken(inPlace)) << "it would be called as what is given up";
+  EXPECT_TRUE(isTaken(once));
+}
+
 TEST_F(QueueTest, RelativePriorityEndsAtItsLimits) {
   EXPECT_EQ(rt::make<Queue>("test"_s, QualityOfService::kUtility, -100)->relativePriority(), -15);
   EXPECT_EQ(rt::make<Queue>("test"_s, QualityOfService::kUtility, 3)->relativePriority(), 0);
@@ -91,10 +109,15 @@ TEST_F(QueueTest, AsyncRunsElsewhere) {
 TEST_F(QueueTest, IsDestroyedOnceNobodyRefersToItAndItsTasksHaveRun) {
   Ref<Queue> queue = rt::make<Queue>("test"_s);
   const rt::Weak<Queue> weak = queue;
+  std::latch isRunning(1);
   std::latch mayGoOn(1);
   bool isAlive = false;
   std::latch hasRun(1);
-  queue->async([&] { mayGoOn.wait(); });
+  queue->async([&] {
+    isRunning.count_down();
+    mayGoOn.wait();
+  });
+  isRunning.wait();
   queue->async([&] {
     isAlive = weak.lock() != nullptr;
     hasRun.count_down();
@@ -105,6 +128,32 @@ TEST_F(QueueTest, IsDestroyedOnceNobodyRefersToItAndItsTasksHaveRun) {
   hasRun.wait();
   EXPECT_TRUE(isAlive);
   while (weak.lock() != nullptr) std::this_thread::yield();  // Ends with the queue.
+}
+
+// Whoever gives up a queue with tasks hands it to a thread that waits, but not to one that has been served.
+TEST_F(QueueTest, GoesOnAfterAThreadThatWaitedWasServed) {
+  for (int round = 0; round < 100; ++round) {
+    std::latch isRunning(1);
+    std::atomic<bool> mayGoOn = false;
+    queue_->async([&] {
+      isRunning.count_down();
+      while (!mayGoOn) std::this_thread::yield();
+    });
+    isRunning.wait();
+    std::latch isAboutToWait(1);
+    std::thread waiting([&] {
+      isAboutToWait.count_down();
+      queue_->barrierSync();
+    });
+    isAboutToWait.wait();
+    for (int give = 0; give < 3; ++give) std::this_thread::yield();  // Mostly it waits by now.
+    mayGoOn = true;
+    waiting.join();
+    int count = 0;
+    queue_->sync([&] { queue_->async([&] { ++count; }); });
+    queue_->barrierSync();
+    ASSERT_EQ(count, 1);
+  }
 }
 
 TEST_F(QueueTest, SyncNestsFromQueueToQueue) {
@@ -227,13 +276,12 @@ TEST_F(QueueTest, WaitingTasksDoNotNeedFreeThreads) {
 }
 
 TEST_F(QueueTest, ThreadsEndWhenTheyHaveBeenIdle) {
+#if defined(RT_TEST_THREAD_SANITIZER)
+  GTEST_SKIP() << "the sanitizer has a thread of its own";
+#endif
   queue_->async([] {});
   queue_->barrierSync();
-  const bool isSanitized = threadCountWithoutWorkers() != 1;
-#if defined(RT_TEST_THREAD_SANITIZER)
-  if (isSanitized) GTEST_SKIP() << "the sanitizer has a thread of its own";
-#endif
-  EXPECT_FALSE(isSanitized);
+  EXPECT_EQ(threadCountWithoutWorkers(), 1);
   int runs = 0;
   for (int i = 0; i < 10; ++i) queue_->async([&] { ++runs; });
   queue_->barrierSync();
@@ -266,6 +314,22 @@ TEST_F(QueueTest, WorkersTakeNoSignals) {
   sigset_t ofCaller;
   pthread_sigmask(SIG_SETMASK, nullptr, &ofCaller);
   EXPECT_EQ(sigismember(&ofCaller, SIGUSR1), 0) << "and the caller does as before";
+}
+
+// Blocked, they ended the process and its crash handler saw nothing.
+TEST_F(QueueDeathTest, FaultsOfATaskReachTheHostsHandler) {
+  for (const int signal : {SIGSEGV, SIGBUS, SIGFPE, SIGILL, SIGTRAP, SIGSYS}) {
+    EXPECT_EXIT(
+        {
+          std::signal(signal, [](int) { _exit(7); });
+          queue_->async([signal] {
+            std::raise(signal);
+            _exit(0);
+          });
+          for (;;) pause();
+        },
+        testing::ExitedWithCode(7), "");
+  }
 }
 
 TEST_F(QueueTest, WorkersDoNotBearTheNameOfWhoStartedThem) {
@@ -307,32 +371,116 @@ TEST_F(QueueTest, NicenessFollowsClassAndRelativePriority) {
   }
 }
 
-TEST_F(QueueDeathTest, TasksWaitWhereTheSystemRefusesAThread) {
-#if defined(RT_TEST_THREAD_SANITIZER) || defined(RT_TEST_ADDRESS_SANITIZER)
-  GTEST_SKIP() << "the sanitizers need more memory than a limit allows";
-#endif
+// A thread is as nice as the one that starts it, and may not become less so without a privilege: once a
+// background task had started a worker for urgent work, all urgent work was done as if in the background.
+TEST_F(QueueDeathTest, NicenessDoesNotSpreadFromTheBackground) {
   EXPECT_EXIT(
       {
-        rlimit limit{};
-        getrlimit(RLIMIT_AS, &limit);
-        const rlimit before = limit;
-        limit.rlim_cur = 1;  // What there is stays; a new stack is refused.
+        if (geteuid() == 0 && setresuid(65534, 65534, 65534) != 0) _exit(1);
+        const rlimit none{};
+        setrlimit(RLIMIT_NICE, &none);
+        rt::detail::WorkerPool::idleTimeout = std::chrono::nanoseconds(std::chrono::hours(1)).count();
+        const int ofProcess = getpriority(PRIO_PROCESS, static_cast<id_t>(getpid()));
+        const Ref<Queue> background = rt::make<Queue>("background"_s, QualityOfService::kBackground);
+        std::latch hasRun(1);
+        rt::ThreadIdentifier worker = 0;
+        background->async([&] {
+          queue_->async([&] {
+            worker = rt::currentThreadIdentifier();
+            hasRun.count_down();
+          });
+        });
+        hasRun.wait();
+        const std::string path = "/proc/self/task/" + std::to_string(worker);
+        const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(30);
+        while (std::filesystem::exists(path)) {
+          if (std::chrono::steady_clock::now() > deadline) _exit(2);
+          std::this_thread::yield();
+        }
+        queue_->async(
+            [&] { _exit(getpriority(PRIO_PROCESS, rt::currentThreadIdentifier()) == ofProcess ? 0 : 3); });
+        for (;;) pause();
+      },
+      testing::ExitedWithCode(0), "");
+}
+
+#if defined(RT_TEST_THREAD_SANITIZER) || defined(RT_TEST_ADDRESS_SANITIZER)
+#define SKIP_WITHOUT_MEMORY_LIMITS() GTEST_SKIP() << "the sanitizers need more memory than a limit allows"
+#else
+#define SKIP_WITHOUT_MEMORY_LIMITS() static_cast<void>(0)
+#endif
+
+/// Has the system refuse threads: what memory there is stays, but a new stack is refused.
+class ThreadRefusal {
+ public:
+  ThreadRefusal() {
+    getrlimit(RLIMIT_AS, &before_);
+    rlimit limit = before_;
+    limit.rlim_cur = 1;
+    setrlimit(RLIMIT_AS, &limit);
+  }
+  ~ThreadRefusal() { setrlimit(RLIMIT_AS, &before_); }
+  ThreadRefusal(const ThreadRefusal&) = delete;
+  ThreadRefusal& operator=(const ThreadRefusal&) = delete;
+
+ private:
+  rlimit before_{};
+};
+
+TEST_F(QueueDeathTest, TasksWaitWhereTheSystemRefusesAThread) {
+  SKIP_WITHOUT_MEMORY_LIMITS();
+  EXPECT_EXIT(
+      {
         const Ref<Queue> queue = rt::make<Queue>("test"_s);
         const Ref<Queue> other = rt::make<Queue>("other"_s);
         std::latch haveRun(2);
         std::atomic<bool> isRefused = true;
-        setrlimit(RLIMIT_AS, &limit);
-        queue->async([&] {
-          if (isRefused) _exit(2);
-          haveRun.count_down();
-        });
-        isRefused = false;
-        setrlimit(RLIMIT_AS, &before);
+        {
+          const ThreadRefusal refusal;
+          queue->async([&] {
+            if (isRefused) _exit(2);
+            haveRun.count_down();
+          });
+          isRefused = false;
+        }
         other->async([&] { haveRun.count_down(); });
         haveRun.wait();
         _exit(0);
       },
       testing::ExitedWithCode(0), "");
+}
+
+// A queue that had once been refused a thread never asked again, and held its tasks until the process
+// exited.
+TEST_F(QueueDeathTest, AQueueThatWasRefusedAThreadAsksAgain) {
+  SKIP_WITHOUT_MEMORY_LIMITS();
+  EXPECT_EXIT(
+      {
+        alarm(30);  // Instead of a hang.
+        std::latch haveRun(3);
+        {
+          const ThreadRefusal refusal;
+          for (int i = 0; i < 2; ++i) queue_->async([&] { haveRun.count_down(); });
+        }
+        queue_->async([&] { haveRun.count_down(); });
+        haveRun.wait();
+        _exit(0);
+      },
+      testing::ExitedWithCode(0), "");
+}
+
+TEST_F(QueueDeathTest, TasksRunBeforeTheProcessExitsAlsoWithoutThreads) {
+  SKIP_WITHOUT_MEMORY_LIMITS();
+  EXPECT_EXIT(
+      {
+        static const ThreadRefusal refusal;
+        queue_->async([&] {
+          std::fprintf(stderr, "without a thread;");
+          queue_->async([] { std::fprintf(stderr, "and its task;"); });
+        });
+        std::exit(0);
+      },
+      testing::ExitedWithCode(0), "without a thread;and its task;");
 }
 
 #endif  // !defined(__APPLE__)
@@ -378,15 +526,19 @@ TEST_F(QueueDeathTest, MainQueuesTasksRunBeforeTheMainThreadExits) {
 TEST_F(QueueDeathTest, ATaskThatWaitsForTheMainQueueIsServedAtExit) {
   EXPECT_EXIT(
       {
-        std::latch isRunning(1);
-        rt::make<Queue>("test"_s)->async([&] {
-          isRunning.count_down();
-          Queue::main()->sync([] { std::fprintf(stderr, "served;"); });
+        alarm(30);  // Before patience ends.
+        rt::detail::QueueRegistry::exitPatience = std::chrono::nanoseconds(std::chrono::hours(1)).count();
+        static std::latch isExiting(1);
+        rt::make<Queue>("test"_s)->async([] {
+          isExiting.wait();
+          int served = 0;
+          for (int i = 0; i < 100; ++i) Queue::main()->sync([&] { ++served; });
+          std::fprintf(stderr, "served %d times;", served);
         });
-        isRunning.wait();
+        Queue::main()->async([] { isExiting.count_down(); });
         std::exit(0);
       },
-      testing::ExitedWithCode(0), "served;");
+      testing::ExitedWithCode(0), "served 100 times;");
 }
 
 TEST_F(QueueDeathTest, TasksThatQueueThemselvesForEverDoNotKeepTheProcess) {
@@ -412,6 +564,57 @@ TEST_F(QueueDeathTest, ATaskThatDoesNotEndIsNamedAtExit) {
         std::exit(3);
       },
       testing::ExitedWithCode(3), "rt: the queue \"stuck\" still runs a task at exit");
+}
+
+// A task that did not end and came to run on the thread that exits kept the process for ever.
+TEST_F(QueueDeathTest, TheThreadThatExitsRunsNoTasksOfThePool) {
+  EXPECT_EXIT(
+      {
+        static const auto exiting = std::this_thread::get_id();
+        for (int i = 0; i < 50; ++i) {
+          rt::make<Queue>("test"_s)->async([] {
+            if (std::this_thread::get_id() == exiting) _exit(1);
+          });
+        }
+        std::exit(0);
+      },
+      testing::ExitedWithCode(0), "");
+}
+
+// As long as anything ran, nobody looked at the clock.
+TEST_F(QueueDeathTest, ABusyMainQueueDoesNotKeepTheProcess) {
+  EXPECT_EXIT(
+      {
+        static std::atomic<bool> never = false;
+        rt::detail::QueueRegistry::exitPatience = 1;
+        holdUntilExit(*rt::make<Queue>("stuck"_s), never);
+        struct Again {
+          void operator()() const { Queue::main()->async(*this); }
+        };
+        Queue::main()->async(Again());
+        alarm(30);
+        std::exit(3);
+      },
+      testing::ExitedWithCode(3), "rt: the queue \"stuck\" still runs a task at exit");
+}
+
+// Static objects that are older than the first task are destroyed after the tasks have run, and what they
+// queued was lost.
+TEST_F(QueueDeathTest, WhatStaticObjectsQueueInTheirDestructorsRunsToo) {
+  EXPECT_EXIT(
+      {
+        static Queue& queue = *new Queue("test"_s);
+        struct Static {
+          ~Static() {
+            std::atexit([] { std::fprintf(stderr, "waited for;"); });
+            queue.async([] { queue.async([] { std::fprintf(stderr, "last words;"); }); });
+          }
+        };
+        static const Static older;
+        queue.async([] { std::fprintf(stderr, "first words;"); });
+        std::exit(0);
+      },
+      testing::ExitedWithCode(0), "first words;last words;waited for;");
 }
 
 TEST_F(QueueDeathTest, ATaskMayExit) {

@@ -1,6 +1,8 @@
 #include "Runtime/RecursiveLock.h"
 
 #include <gtest/gtest.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
 #include <string>
 #include <thread>
@@ -91,6 +93,29 @@ TEST(RecursiveLock, ManyThreadsCountTogether) {
 }
 
 #if !defined(__APPLE__)
+
+TEST(RecursiveLock, HeldAcrossForkIsTheForkingThreadsInTheChild) {
+  RecursiveLock lock;
+  const auto forkWithTheLock = NOT_ANALYSED {
+    lock.lock();
+    const pid_t child = fork();
+    if (child == 0) {
+      alarm(30);  // Instead of a hang.
+      lock.assertOwner();
+      lock.lock();
+      lock.unlock();
+      lock.unlock();
+      if (!lock.tryLock()) _exit(1);
+      lock.unlock();
+      _exit(0);
+    }
+    int status = 0;
+    waitpid(child, &status, 0);
+    lock.unlock();
+    return status;
+  };
+  EXPECT_EQ(forkWithTheLock(), 0);
+}
 
 TEST(RecursiveLockDeathTest, LettingGoAFreeLockEndsTheProgram) {
   RecursiveLock lock;

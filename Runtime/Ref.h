@@ -120,6 +120,18 @@ Ref<T> cast(const Ref<From>& ref) noexcept {
   return cast<T>(ref.get());
 }
 
+/// The object as somebody keeps it (`Object::copy`), which is a T too; null for null.
+template <class T>
+Ref<T> copy(const Ref<T>& ref) {
+  if (!ref) return nullptr;
+  Ref<Object> copied = detail::objectOf(ref.get())->copy();
+  if constexpr (std::same_as<T, Object>) {
+    return copied;
+  } else {
+    return cast<T>(copied);
+  }
+}
+
 /// Whether the objects of two references are equal, or both are null.
 template <class T, class Other>
 bool isEqual(const Ref<T>& first, const Ref<Other>& second) {

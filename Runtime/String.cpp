@@ -71,7 +71,7 @@ String String::from(const Object* object) noexcept {
 }
 
 String String::copy(std::string_view text) {
-  return text.empty() ? ""_s : from(StringObject::copy(text));
+  return text.empty() ? ""_s : from(StringObject::copyOf(text));
 }
 
 String String::part(std::string_view part) const {

@@ -24,10 +24,16 @@ Ref<StringObject> StringObject::make(std::size_t length, char*& bytes) {
   return Ref<StringObject>::adopt(object);
 }
 
-Ref<StringObject> StringObject::copy(std::string_view text) {
+Ref<StringObject> StringObject::copyOf(std::string_view text) {
   char* bytes = nullptr;
   Ref<StringObject> object = make(text.size(), bytes);
   if (!text.empty()) std::memcpy(bytes, text.data(), text.size());
+  return object;
+}
+
+StringObject* StringObject::immortalCopyOf(std::string_view text) {
+  auto* object = new (text.size()) StringObject(Immortal(), text.size());
+  if (!text.empty()) std::memcpy(reinterpret_cast<char*>(object + 1), text.data(), text.size());
   return object;
 }
 

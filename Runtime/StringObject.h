@@ -33,7 +33,7 @@ class StringObject final : public Implements<StringObject, Object> {
   constexpr ~StringObject() override {}  // NOLINT(modernize-use-equals-default)
 
   /// A copy of `text`, which is valid UTF-8, in one allocation. Throws std::bad_alloc.
-  static Ref<StringObject> copy(std::string_view text);
+  static Ref<StringObject> copyOf(std::string_view text);
 
   /// One with room for `length` bytes, which the caller fills before anyone else sees the object.
   /// Throws std::bad_alloc.
@@ -42,6 +42,10 @@ class StringObject final : public Implements<StringObject, Object> {
   /// One over `text`, which is valid UTF-8 and outlives the object; nothing is copied. Throws
   /// std::bad_alloc.
   static Ref<StringObject> over(std::string_view text);
+
+  /// A copy of `text`, which is valid UTF-8, that is there as long as the program is; never counted, never
+  /// destroyed. Not null. Throws std::bad_alloc.
+  static StringObject* immortalCopyOf(std::string_view text);
 
   /// The bytes.
   constexpr std::string_view view() const noexcept { return {bytes_, length_}; }
@@ -65,6 +69,8 @@ class StringObject final : public Implements<StringObject, Object> {
 
   explicit StringObject(std::size_t length) noexcept
       : bytes_(reinterpret_cast<char*>(this + 1)), length_(length) {}
+  StringObject(Immortal immortal, std::size_t length) noexcept
+      : Implements(immortal), bytes_(reinterpret_cast<char*>(this + 1)), length_(length) {}
   explicit StringObject(std::string_view text) noexcept : bytes_(text.data()), length_(text.size()) {}
 
   const char* bytes_;

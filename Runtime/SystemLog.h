@@ -53,8 +53,8 @@ class SystemLog {
   bool isEnabled(Type type) const noexcept;
 
   /// Writes the entry `text`, bytes that should be UTF-8. Any thread may call it, at any time, also while
-  /// the program is being loaded or after `main`; threads do not wait for each other. Takes no lock and,
-  /// where a journal listens, allocates nothing. Leaves `errno` alone. See above for what happens to an
+  /// the program is being loaded or after `main`; threads do not wait for each other. Where a journal
+  /// listens it takes no lock and allocates nothing. Leaves `errno` alone. See above for what happens to an
   /// entry that cannot be written.
   void write(Type type, std::string_view text) const noexcept;
 

@@ -6,7 +6,7 @@
 
 namespace rt::detail {
 
-/// The name that the system knows the calling thread by; null when it has none of its own.
+/// The name that the system knows the calling thread by; null when it has none or it may be another's.
 String systemThreadName();
 
 /// Tells the system the calling thread's name; null takes it away. What is too long is cut.

@@ -12,11 +12,11 @@
 
 namespace rt::Thread {
 
-/// The calling thread's name; null when it has none. That is the last one given with `setCurrentName`. A
-/// thread that was never given one is looked at once, the first time it is asked, for a name that the
-/// system knows: on Linux, where every thread bears a text, one that differs from the process's own.
-/// Costs a look at a variable from then on. Null in destructors of the thread's own variables that run
-/// after the name was given up.
+/// The calling thread's name; null when it has none. That is the last one given with `setCurrentName`. On
+/// macOS a thread that was never given one there is looked at once, the first time it is asked, for a name
+/// that the system knows. On Linux what the system knows does not count: a thread bears its creator's name
+/// there until it is given another. Costs a look at a variable. Null in destructors of the thread's own
+/// variables that run after the name was given up.
 String currentName();
 
 /// Names the calling thread; null takes its name away. The system shows the name too, on Linux the first

@@ -108,7 +108,7 @@ TEST(UTF8, FindsAMistakeAnywhere) {
       ASSERT_EQ(rt::validUTF8Length(text), i) << length;
     }
     ASSERT_EQ(rt::validUTF8Length(std::string(length, 'a') + "\u00E9" + std::string(length, 'b')),
-              2 * length + 2);
+              (2 * length) + 2);
   }
 }
 

@@ -26,8 +26,9 @@
 ///
 /// A change replaces the file as a whole and is on the disk when the call returns; processes that change
 /// it at the same time wait for each other. With the first observation a thread starts that waits for
-/// changes by other processes. Nothing is started or read before a first use. The child of a fork has no
-/// such thread until it observes something itself.
+/// changes by other processes; where the system stops telling it of them, that is reported, and it tries each
+/// second to hear of them again. Nothing is started or read before a first use. The child of a fork goes on
+/// with what the parent had, but has no such thread until it observes something itself.
 ///
 /// Any thread may use all of it. No lock is held while an observer or the report handler runs.
 ///

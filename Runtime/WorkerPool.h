@@ -64,8 +64,11 @@ class WorkerPool {
   static constinit std::atomic<std::chrono::nanoseconds::rep> idleTimeout;
 
   /// Has some thread of the pool run `work` once. It is in the pool once at a time. Where the system
-  /// refuses a thread and there is none, the work waits for the next call.
+  /// refuses a thread and there is none, the work waits for the next call of this or of `tryAgain`.
   static void schedule(Work& work, QualityOfService qualityOfService, int relativePriority) noexcept;
+
+  /// Asks the system for a thread once more, where work of the kind waits for one.
+  static void tryAgain(QualityOfService qualityOfService, int relativePriority) noexcept;
 
   /// Whether work of the kind waits and no further thread can be had for it; out of date at once.
   static bool isShort(QualityOfService qualityOfService, int relativePriority) noexcept;

@@ -55,7 +55,7 @@ void textAndIntegerOfFmt(benchmark::State& state) {
 }
 
 void real(benchmark::State& state) {
-  double value = 3.14159;
+  double value = 1234.5678;
   for (auto _ : state) {
     benchmark::DoNotOptimize(value);
     rt::String text = rt::format("%8.3f ms", value);
@@ -64,7 +64,7 @@ void real(benchmark::State& state) {
 }
 
 void realOfC(benchmark::State& state) {
-  double value = 3.14159;
+  double value = 1234.5678;
   char text[512];
   for (auto _ : state) {
     benchmark::DoNotOptimize(value);
@@ -74,7 +74,7 @@ void realOfC(benchmark::State& state) {
 }
 
 void realOfFmt(benchmark::State& state) {
-  double value = 3.14159;
+  double value = 1234.5678;
   for (auto _ : state) {
     benchmark::DoNotOptimize(value);
     std::string text = fmt::format("{:8.3f} ms", value);

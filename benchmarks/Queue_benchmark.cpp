@@ -1,7 +1,10 @@
 #include <benchmark/benchmark.h>
 
 #include <atomic>
+#include <chrono>
 #include <condition_variable>
+#include <cstddef>
+#include <cstdint>
 #include <deque>
 #include <functional>
 #include <mutex>
@@ -105,7 +108,7 @@ void throughput(benchmark::State& state) {
   state.SetItemsProcessed(state.iterations() * kThreads * kTasks);
 }
 
-// A task that brings three strings' worth of data with it, as a log record does.
+// A task that brings a text and two numbers with it, as a log record does.
 template <class Queue>
 void payload(benchmark::State& state) {
   constexpr int kTasks = 20'000;

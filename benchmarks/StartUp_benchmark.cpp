@@ -33,7 +33,10 @@ void create(benchmark::State& state, const char* const* arguments) {
   rmdir(kDirectory);
   for (auto _ : state) {
     const double seconds = run(arguments);
-    if (seconds < 0 || rmdir(kDirectory) != 0) return state.SkipWithError("the directory was not made");
+    if (seconds < 0 || rmdir(kDirectory) != 0) {
+      state.SkipWithError("the directory was not made");
+      return;
+    }
     state.SetIterationTime(seconds);
   }
 }
@@ -42,7 +45,10 @@ void remove(benchmark::State& state, const char* const* arguments) {
   for (auto _ : state) {
     mkdir(kDirectory, 0700);
     const double seconds = run(arguments);
-    if (seconds < 0) return state.SkipWithError("the directory was not removed");
+    if (seconds < 0) {
+      state.SkipWithError("the directory was not removed");
+      return;
+    }
     state.SetIterationTime(seconds);
   }
 }

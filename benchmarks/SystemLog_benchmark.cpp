@@ -46,7 +46,8 @@ class Receiver {
     sockaddr_un address{};
     address.sun_family = AF_UNIX;
     std::strncpy(address.sun_path, kSocket, sizeof address.sun_path - 1);
-    if (bind(descriptor_, reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) {
+    if (descriptor_ < 0 ||
+        bind(descriptor_, reinterpret_cast<const sockaddr*>(&address), sizeof address) != 0) {
       throw std::runtime_error("cannot bind the socket");
     }
   }
@@ -82,7 +83,10 @@ void measure(benchmark::State& state, bool isDaemon, void (*send)()) {
       send();
       const std::chrono::duration<double> elapsed = std::chrono::steady_clock::now() - begin;
       state.SetIterationTime(elapsed.count());
-      if (!receiver.takeOne()) return state.SkipWithError("an entry did not arrive");
+      if (!receiver.takeOne()) {
+        state.SkipWithError("an entry did not arrive");
+        return;
+      }
     }
   } catch (const std::exception& problem) {
     state.SkipWithError(problem.what());

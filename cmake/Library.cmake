@@ -3,12 +3,14 @@
 include_guard(GLOBAL)
 include(CMakePackageConfigHelpers)
 
-# mount_point_library(NAME PUBLIC_NAME)
+# mount_point_library(NAME PUBLIC_NAME DESCRIPTION TEXT [LIBRARIES NAME…])
 #
 # Adds the static library NAME, without sources, and MountPoint::PUBLIC_NAME, which is what to link. It
 # links the library whole: classes are found by name and class methods by selector, so that a file of the
-# library may matter to which no symbol leads. Installed, both are of the package MountPoint.
+# library may matter to which no symbol leads. LIBRARIES are those of these libraries that it stands on.
+# Installed, it is of the package MountPoint, and pkg-config knows it as mount-point-NAME.
 function(mount_point_library name public_name)
+  cmake_parse_arguments(PARSE_ARGV 2 library "" "DESCRIPTION" "LIBRARIES")
   add_library(${name} STATIC)
   target_include_directories(${name} PUBLIC
     "$<BUILD_INTERFACE:${PROJECT_SOURCE_DIR}>" "$<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}/mount-point>")
@@ -24,6 +26,8 @@ function(mount_point_library name public_name)
     "$<BUILD_INTERFACE:$<LINK_LIBRARY:WHOLE_ARCHIVE,${name}>>"
     "$<INSTALL_INTERFACE:$<LINK_LIBRARY:WHOLE_ARCHIVE,MountPoint::${public_name}Archive>>")
   set_target_properties(${name}-whole PROPERTIES EXPORT_NAME ${public_name})
+  list(TRANSFORM library_LIBRARIES APPEND "-whole" OUTPUT_VARIABLE below)
+  target_link_libraries(${name}-whole INTERFACE ${below})
 
   install(TARGETS ${name} ${name}-whole EXPORT MountPoint
     ARCHIVE DESTINATION "${CMAKE_INSTALL_LIBDIR}" COMPONENT development)
@@ -37,11 +41,27 @@ function(mount_point_library name public_name)
     install(DIRECTORY "${CMAKE_CURRENT_SOURCE_DIR}/${CMAKE_SYSTEM_NAME}" COMPONENT development
       DESTINATION "${CMAKE_INSTALL_INCLUDEDIR}/mount-point/${folder}" FILES_MATCHING PATTERN "*.h")
   endif()
+
+  # The prefix is told from where the file is, so that the whole may be moved. One word for what is
+  # linked whole: pkg-config reorders words.
+  set(file "mount-point-${name}")
+  list(TRANSFORM library_LIBRARIES PREPEND "mount-point-" OUTPUT_VARIABLE requires)
+  list(JOIN requires ", " requires)
+  file(RELATIVE_PATH prefix "/prefix/${CMAKE_INSTALL_LIBDIR}/pkgconfig" "/prefix")
+  string(REGEX REPLACE "/$" "" prefix "${prefix}")
+  if(CMAKE_SYSTEM_NAME STREQUAL "Darwin")
+    set(libs "-Wl,-force_load,\${libdir}/lib${file}.a")
+  else()
+    set(libs "-L\${libdir} -Wl,--whole-archive,-l${file},--no-whole-archive")
+  endif()
+  configure_file("${PROJECT_SOURCE_DIR}/cmake/library.pc.in" "${PROJECT_BINARY_DIR}/${file}.pc" @ONLY)
+  install(FILES "${PROJECT_BINARY_DIR}/${file}.pc" DESTINATION "${CMAKE_INSTALL_LIBDIR}/pkgconfig"
+    COMPONENT development)
 endfunction()
 
 # mount_point_install_package()
 #
-# Installs what find_package(MountPoint) and pkg-config need. Called once, after all libraries.
+# Installs what find_package(MountPoint) needs. Called once, after all libraries.
 function(mount_point_install_package)
   set(destination "${CMAKE_INSTALL_LIBDIR}/cmake/MountPoint")
   install(EXPORT MountPoint NAMESPACE MountPoint:: DESTINATION "${destination}" FILE MountPointTargets.cmake
@@ -52,17 +72,4 @@ function(mount_point_install_package)
     COMPATIBILITY SameMinorVersion)
   install(FILES "${PROJECT_BINARY_DIR}/MountPointConfig.cmake" "${PROJECT_BINARY_DIR}/MountPointConfigVersion.cmake"
     DESTINATION "${destination}" COMPONENT development)
-  # The prefix is told from where the file is, so that the whole may be moved. One word for what is
-  # linked whole: pkg-config reorders words.
-  file(RELATIVE_PATH pkgconfig_prefix "/prefix/${CMAKE_INSTALL_LIBDIR}/pkgconfig" "/prefix")
-  string(REGEX REPLACE "/$" "" pkgconfig_prefix "${pkgconfig_prefix}")
-  if(CMAKE_SYSTEM_NAME STREQUAL "Darwin")
-    set(pkgconfig_libs "-Wl,-force_load,\${libdir}/libmount-point-runtime.a")
-  else()
-    set(pkgconfig_libs "-L\${libdir} -Wl,--whole-archive,-lmount-point-runtime,--no-whole-archive")
-  endif()
-  configure_file("${PROJECT_SOURCE_DIR}/cmake/mount-point-runtime.pc.in"
-    "${PROJECT_BINARY_DIR}/mount-point-runtime.pc" @ONLY)
-  install(FILES "${PROJECT_BINARY_DIR}/mount-point-runtime.pc"
-    DESTINATION "${CMAKE_INSTALL_LIBDIR}/pkgconfig" COMPONENT development)
 endfunction()

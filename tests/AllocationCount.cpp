@@ -54,15 +54,15 @@ void* malloc(std::size_t size) {
   return __libc_malloc(size);
 }
 
-void* calloc(std::size_t count, std::size_t size) {
+void* calloc(std::size_t nmemb, std::size_t size) {
   ++allocated;
-  return __libc_calloc(count, size);
+  return __libc_calloc(nmemb, size);
 }
 
-void* realloc(void* block, std::size_t size) {
+void* realloc(void* ptr, std::size_t size) {
   ++allocated;
-  if (block != nullptr) ++freed;
-  return __libc_realloc(block, size);
+  if (ptr != nullptr) ++freed;
+  return __libc_realloc(ptr, size);
 }
 
 void* memalign(std::size_t alignment, std::size_t size) {
@@ -74,10 +74,10 @@ void* aligned_alloc(std::size_t alignment, std::size_t size) {
   return memalign(alignment, size);
 }
 
-int posix_memalign(void** block, std::size_t alignment, std::size_t size) {
+int posix_memalign(void** memptr, std::size_t alignment, std::size_t size) {
   void* made = memalign(alignment, size);
   if (made == nullptr) return ENOMEM;
-  *block = made;
+  *memptr = made;
   return 0;
 }
 

@@ -11,7 +11,9 @@
 #include <array>
 #include <cerrno>
 #include <csignal>
+#include <cstdio>
 #include <cstring>
+#include <exception>
 #include <filesystem>
 #include <fstream>
 #include <stdexcept>
@@ -133,9 +135,14 @@ PrivateJournal::PrivateJournal(Sockets sockets) {
 }
 
 PrivateJournal::~PrivateJournal() {
-  if (daemon_ != 0) stop();
+  try {
+    if (daemon_ != 0) stop();
+  } catch (const std::exception& problem) {
+    std::fprintf(stderr, "journald does not end: %s\n", problem.what());
+  }
   if (listeningSocket_ >= 0) close(listeningSocket_);
-  fs::remove(kSocket);
+  std::error_code ignored;
+  fs::remove(kSocket, ignored);
 }
 
 void PrivateJournal::start() {

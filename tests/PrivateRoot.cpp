@@ -1,14 +1,17 @@
 #include "PrivateRoot.h"
 
 #include <fcntl.h>
+#include <grp.h>
 #include <sched.h>
 #include <sys/mount.h>
+#include <sys/prctl.h>
 #include <sys/syscall.h>
 #include <unistd.h>
 
 #include <cerrno>
 #include <cstdlib>
 #include <filesystem>
+#include <stdexcept>
 #include <system_error>
 
 namespace {
@@ -89,6 +92,14 @@ void enter() {
 
 bool entered() {
   return hasEntered;
+}
+
+void becomeOrdinaryUser() {
+  if (geteuid() != 0) throw std::runtime_error("this is an ordinary user already, as whom the suite runs");
+  require(setgroups(0, nullptr) == 0 && setgid(kOrdinaryGroup) == 0 && setuid(kOrdinaryUser) == 0,
+          "cannot become an ordinary user");
+  // Who changes identity loses the say over its own /proc entries, in which namespaces are set up.
+  require(prctl(PR_SET_DUMPABLE, 1) == 0, "cannot take the say over /proc back");
 }
 
 void mountVolumes(const std::string& options) {

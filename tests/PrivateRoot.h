@@ -1,5 +1,7 @@
 #pragma once
 
+#include <sys/types.h>
+
 #include <string>
 
 /// A root file system of one's own, in which /Volumes is a fresh tmpfs that nobody else sees and
@@ -21,6 +23,14 @@ void enter();
 
 /// Whether `enter` succeeded in this process.
 bool entered();
+
+/// Makes this process, which root runs, an ordinary user's, as whom it may `enter` afterwards: user
+/// `kOrdinaryUser` and group `kOrdinaryGroup`, which differ so that neither can stand for the other. Throws
+/// std::runtime_error where an ordinary user runs it already.
+void becomeOrdinaryUser();
+
+inline constexpr uid_t kOrdinaryUser = 1000;
+inline constexpr gid_t kOrdinaryGroup = 1001;
 
 /// Mounts an empty tmpfs, mode 0755, over /Volumes, which is made when it is missing. `options` are
 /// further options of tmpfs, comma-separated.

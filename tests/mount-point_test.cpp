@@ -3,10 +3,8 @@
 
 #include <fcntl.h>
 #include <gmock/gmock.h>
-#include <grp.h>
 #include <gtest/gtest.h>
 #include <sys/mount.h>
-#include <sys/prctl.h>
 #include <sys/stat.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -34,8 +32,8 @@ using testing::IsEmpty;
 // What the compiler added to the command under test: nothing, or the name of a sanitizer or "coverage".
 constexpr std::string_view kInstrumentation = INSTRUMENTATION;
 
-constexpr uid_t kOrdinaryUser = 1000;
-constexpr gid_t kOrdinaryGroup = 1001;
+using PrivateRoot::kOrdinaryGroup;
+using PrivateRoot::kOrdinaryUser;
 
 // The command under test: a copy in the private root, where an ordinary user may run it whoever built it.
 constexpr const char* kCommand = "/mount-point";
@@ -622,23 +620,14 @@ TEST_F(MountPointTest, DoesWhatTheReadmeShows) {
   EXPECT_THAT(readme.str(), testing::HasSubstr("```\n" + result.standardOutput + "```\n"));
 }
 
-void becomeOrdinaryUser() {
-  require(setgroups(0, nullptr) == 0 && setgid(kOrdinaryGroup) == 0 && setuid(kOrdinaryUser) == 0);
-  // Who changes identity loses the say over its own /proc entries, in which namespaces are set up.
-  require(prctl(PR_SET_DUMPABLE, 1) == 0);
-}
-
 // Enters a private root, as an ordinary user if asked, and puts the command there. Throws where the
 // machine does not allow it.
 void enterPrivateRoot(bool asOrdinaryUser) {
-  if (asOrdinaryUser && geteuid() != 0) {
-    throw std::runtime_error("this is an ordinary user already, as whom mount-point_test runs");
-  }
   if (asOrdinaryUser && kInstrumentation == "coverage") {
     throw std::runtime_error("a coverage build writes its counts where only its builder may");
   }
   std::ifstream built(MOUNT_POINT, std::ios::binary);
-  if (asOrdinaryUser) becomeOrdinaryUser();
+  if (asOrdinaryUser) PrivateRoot::becomeOrdinaryUser();
   isMachineRoot = geteuid() == 0;
   PrivateRoot::enter();
   std::ofstream copy(kCommand, std::ios::binary);

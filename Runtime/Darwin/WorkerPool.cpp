@@ -33,6 +33,8 @@ void WorkerPool::schedule(Work& work, QualityOfService qualityOfService, int) no
   dispatch_async_f(dispatch_get_global_queue(systemClass(qualityOfService), 0), &work, run);
 }
 
+void WorkerPool::tryAgain(QualityOfService, int) noexcept {}
+
 bool WorkerPool::isShort(QualityOfService, int) noexcept {
   return false;
 }

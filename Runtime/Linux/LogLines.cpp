@@ -1,17 +1,16 @@
 #include "Runtime/Linux/LogLines.h"
 
-#include <poll.h>
-#include <sys/stat.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <array>
 #include <cerrno>
-#include <climits>
+#include <chrono>
 #include <ctime>
 #include <string>
 
+#include "Runtime/ForkSafeLock.h"
 #include "Runtime/Linux/LogSocket.h"
+#include "Runtime/StandardError.h"
 
 namespace rt::detail {
 
@@ -74,7 +73,12 @@ Delivery writeToSyslog(const LogEntry& entry, const Patience& patience) {
                                                    "Jul", "Aug", "Sep", "Oct", "Nov", "Dec"};
   const std::time_t now = std::time(nullptr);
   std::tm local{};
-  localtime_r(&now, &local);
+  {
+    // The system's function has a lock that would stay locked in the child of a fork.
+    static constinit ForkSafeLock lock;
+    const LockGuard guard(lock);
+    localtime_r(&now, &local);
+  }
   std::array<char, 32> time{};
   // The names of months are English whatever the program's locale.
   const std::size_t timeLength = std::strftime(time.data(), time.size(), " %e %H:%M:%S ", &local);
@@ -108,28 +112,8 @@ Delivery writeToStandardError(const LogEntry& entry, const Patience& patience) {
   appendBody(line, entry);
   line += '\n';
 
-  // A file takes all of it at once. Anything else may make the writer wait, and may be without a reader;
-  // what it says it has room for is a piece of this length.
-  struct stat status{};
-  const bool isFile = fstat(STDERR_FILENO, &status) == 0 && S_ISREG(status.st_mode);
-  std::string_view rest = line;
-  while (!rest.empty()) {
-    if (!isFile) {
-      pollfd stream{STDERR_FILENO, POLLOUT, 0};
-      const int wait = patience.isOver() ? 0 : static_cast<int>(Patience::kWait.count());
-      const int ready = poll(&stream, 1, wait);
-      if (ready < 0 && errno == EINTR) continue;
-      if (ready <= 0 || (stream.revents & POLLOUT) == 0 || (stream.revents & (POLLERR | POLLNVAL)) != 0) {
-        return Delivery::refused;
-      }
-    }
-    const std::size_t length = isFile ? rest.size() : std::min<std::size_t>(rest.size(), PIPE_BUF);
-    const ssize_t count = write(STDERR_FILENO, rest.data(), length);
-    if (count < 0 && errno == EINTR) continue;
-    if (count <= 0) return Delivery::refused;
-    rest.remove_prefix(static_cast<std::size_t>(count));
-  }
-  return Delivery::done;
+  const auto wait = patience.isOver() ? std::chrono::milliseconds(0) : Patience::kWait;
+  return StandardError::write(line, wait) ? Delivery::done : Delivery::refused;
 }
 
 }  // namespace rt::detail

@@ -45,7 +45,8 @@ LogSocket::Handle LogSocket::open() noexcept {
   const int made = makeSocket();
   if (made < 0) return kNone;
   const Handle handle = handleOf(made);
-  if (handle_.compare_exchange_strong(known, handle, std::memory_order_acq_rel)) return handle;
+  if (handle != kNone && handle_.compare_exchange_strong(known, handle, std::memory_order_acq_rel))
+    return handle;
   close(made);
   return known;
 }
@@ -66,6 +67,12 @@ LogSocket::Outcome LogSocket::send(const msghdr& message, const Patience& patien
   for (int attempt = 0; attempt < kAttempts;) {
     Handle handle = open();
     if (handle == kNone) return Outcome::absent;
+    // What has taken the number of a socket that the program closed may be connected to somebody else.
+    if (handleOf(descriptorOf(handle)) != handle) {
+      handle_.compare_exchange_strong(handle, kNone);
+      ++attempt;
+      continue;
+    }
     const int flags = MSG_NOSIGNAL | (patience.isOver() ? MSG_DONTWAIT : 0);
     if (sendmsg(descriptorOf(handle), &message, flags) >= 0) return Outcome::sent;
     switch (errno) {
@@ -79,11 +86,7 @@ LogSocket::Outcome LogSocket::send(const msghdr& message, const Patience& patien
         return Outcome::tooLarge;
       default:
         ++attempt;
-        if (handleOf(descriptorOf(handle)) != handle) {
-          handle_.compare_exchange_strong(handle, kNone);
-        } else if (!connect(descriptorOf(handle))) {
-          return Outcome::absent;
-        }
+        if (!connect(descriptorOf(handle))) return Outcome::absent;
         break;
     }
   }

@@ -16,7 +16,7 @@ namespace rt::detail {
 /// locked, and threads may send at once.
 ///
 /// A program may close descriptors that it did not open, as daemons do when they start, and use the number
-/// for something else. That is seen when a send fails: then what is there is left alone.
+/// for something else. That is seen before each send, and what is there is left alone.
 class LogSocket {
  public:
   enum class Outcome : std::uint8_t { sent, busy, tooLarge, absent };

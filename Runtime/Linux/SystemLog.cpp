@@ -73,8 +73,11 @@ bool report(const Patience& patience) noexcept {
 
 void reportAtExit() {
   if (report(patienceNow())) return;
+  // Threads that still run may have told of it since.
+  const std::uint64_t count = unreported.exchange(0);
+  if (count == 0) return;
   std::string text;
-  detail::writeToStandardError(makeReport(unreported, text), Patience());
+  detail::writeToStandardError(makeReport(count, text), Patience());
 }
 
 // The parent tells of its own.
@@ -96,6 +99,8 @@ void forgetAfterFork() {
 
 }  // namespace
 
+// Elsewhere it is the handle's to say.
+// NOLINTNEXTLINE(readability-convert-member-functions-to-static)
 bool SystemLog::isEnabled(Type type) const noexcept {
   return type <= Type::fault;
 }

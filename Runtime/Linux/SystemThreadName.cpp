@@ -6,7 +6,6 @@
 
 #include <array>
 #include <cerrno>
-#include <cstring>
 #include <string_view>
 
 namespace rt::detail {
@@ -39,17 +38,12 @@ const Text& firstProcessName() noexcept {
   return name;
 }
 
-bool isSame(const Text& first, const Text& second) noexcept {
-  return std::strcmp(first.data(), second.data()) == 0;
-}
-
 }  // namespace
 
+// A thread bears its creator's name until it is given one, and the main thread the process's. What the system
+// knows it by does not tell whether it was.
 String systemThreadName() {
-  Text name{};
-  prctl(PR_GET_NAME, name.data());
-  if (isSame(name, firstProcessName()) || isSame(name, processName())) return nullptr;
-  return String::fromUTF8Repaired(name.data());
+  return nullptr;
 }
 
 void setSystemThreadName(const String& name) noexcept {

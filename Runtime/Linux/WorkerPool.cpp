@@ -63,6 +63,7 @@ class IdleWorker {
   }
 
  private:
+  // NOLINTNEXTLINE(performance-enum-size): threads sleep at words of 32 bits.
   enum : std::uint32_t { kAwake, kAsleep, kWoken };
 
   IdleWorker* next_;
@@ -83,25 +84,23 @@ class Level {
       return;
     }
     ready_.append(work);
-    const bool wantsThread = threadCount_ < WorkerPool::kMaximumThreads;
-    if (wantsThread) {
-      ++threadCount_;
+    addThread();
+  }
+
+  void tryAgain() noexcept {
+    lock_.lock();
+    if (ready_.isEmpty()) {
+      lock_.unlock();
     } else {
-      isShort_.store(true, std::memory_order_relaxed);
-    }
-    lock_.unlock();
-    if (wantsThread && !startThread()) {
-      LockGuard guard(lock_);
-      --threadCount_;
-      isShort_.store(!ready_.isEmpty(), std::memory_order_relaxed);
+      addThread();
     }
   }
 
   bool isShort() const noexcept { return isShort_.load(std::memory_order_relaxed); }
 
   /// The life of a worker.
-  void run() noexcept {
-    while (Work* work = nextWork()) work->runOnWorker();
+  void run(bool mayBeIdle) noexcept {
+    while (Work* work = nextWork(mayBeIdle)) work->runOnWorker();
   }
 
   /// For the child of a fork, in which the calling thread alone is left.
@@ -111,15 +110,36 @@ class Level {
   }
 
  private:
+  /// For the work that waits, if there may be one more.
+  void addThread() noexcept RT_RELEASE(lock_) {
+    const bool mayStart = threadCount_ < WorkerPool::kMaximumThreads;
+    if (mayStart) {
+      ++threadCount_;
+    } else {
+      isShort_.store(true, std::memory_order_relaxed);
+    }
+    lock_.unlock();
+    if (mayStart && !startThread()) {
+      LockGuard guard(lock_);
+      --threadCount_;
+      isShort_.store(!ready_.isEmpty(), std::memory_order_relaxed);
+    }
+  }
+
   bool startThread() noexcept;
 
   /// What the calling worker does next; null when it is to end, and is no longer counted.
-  Work* nextWork() noexcept {
+  Work* nextWork(bool mayBeIdle) noexcept {
     lock_.lock();
     if (Work* work = ready_.takeFirst()) {
       if (ready_.isEmpty()) isShort_.store(false, std::memory_order_relaxed);
       lock_.unlock();
       return work;
+    }
+    if (!mayBeIdle) {
+      --threadCount_;
+      lock_.unlock();
+      return nullptr;
     }
     // The last to fall idle is the first to be woken: its memory is still in the processor's caches, and
     // those that are not needed grow old enough to end.
@@ -166,7 +186,7 @@ std::size_t niceness(QualityOfService qualityOfService, int relativePriority) no
   std::size_t base = 0;
   if (qualityOfService == QualityOfService::kUtility) base = 5;
   if (qualityOfService == QualityOfService::kBackground) base = 10;
-  return base + static_cast<std::size_t>(-relativePriority) / 3;
+  return base + (static_cast<std::size_t>(-relativePriority) / 3);
 }
 
 Level& level(QualityOfService qualityOfService, int relativePriority) noexcept {
@@ -175,25 +195,28 @@ Level& level(QualityOfService qualityOfService, int relativePriority) noexcept {
 
 void* runWorker(void* argument) {
   levelOfCaller = static_cast<Level*>(argument);
-  // From the main thread on, as the thread that creates this one may be nicer than the process. Where the
-  // system refuses, the worker stays as it is.
+  // From the main thread on, as the thread that creates this one may be nicer than the process. A worker
+  // that the system then refuses to make less nice does the work that waits, but does not stay for more.
   const int ofProcess = getpriority(PRIO_PROCESS, static_cast<id_t>(getpid()));
-  setpriority(PRIO_PROCESS, 0, ofProcess + static_cast<int>(levelOfCaller - levels.data()));
+  const bool isAsNiceAsWanted =
+      setpriority(PRIO_PROCESS, 0, ofProcess + static_cast<int>(levelOfCaller - levels.data())) == 0;
   // Its creator's name, which it inherits, is not its own.
   setSystemThreadName(nullptr);
-  levelOfCaller->run();
+  levelOfCaller->run(isAsNiceAsWanted);
   return nullptr;
 }
 
 bool Level::startThread() noexcept {
-  // Signals are for the host's threads.
-  sigset_t all;
+  // Signals are for the host's threads, but those that an instruction of the worker's raises are its own:
+  // blocked, they would end the process past the host's handler.
+  sigset_t blocked;
   sigset_t before;
-  sigfillset(&all);
+  sigfillset(&blocked);
+  for (const int signal : {SIGSEGV, SIGBUS, SIGFPE, SIGILL, SIGTRAP, SIGSYS}) sigdelset(&blocked, signal);
   pthread_attr_t attributes;
   if (pthread_attr_init(&attributes) != 0) return false;
   pthread_attr_setdetachstate(&attributes, PTHREAD_CREATE_DETACHED);
-  pthread_sigmask(SIG_SETMASK, &all, &before);
+  pthread_sigmask(SIG_SETMASK, &blocked, &before);
   pthread_t thread{};
   const bool isStarted = pthread_create(&thread, &attributes, runWorker, this) == 0;
   pthread_sigmask(SIG_SETMASK, &before, nullptr);
@@ -208,6 +231,10 @@ constinit std::atomic<std::chrono::nanoseconds::rep> WorkerPool::idleTimeout =
 
 void WorkerPool::schedule(Work& work, QualityOfService qualityOfService, int relativePriority) noexcept {
   level(qualityOfService, relativePriority).schedule(work);
+}
+
+void WorkerPool::tryAgain(QualityOfService qualityOfService, int relativePriority) noexcept {
+  level(qualityOfService, relativePriority).tryAgain();
 }
 
 bool WorkerPool::isShort(QualityOfService qualityOfService, int relativePriority) noexcept {

@@ -1,0 +1,50 @@
+#pragma once
+
+#include <unistd.h>
+
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <stdexcept>
+#include <string>
+
+/// Standard user defaults of the test program's own, in a folder that goes with it. To be made before the
+/// first use of any, once a program:
+///
+///     PrivateDefaults defaults;      // at namespace scope
+///
+///     std::ofstream(defaults.file()) << "key = YES\n";
+class PrivateDefaults {
+ public:
+  PrivateDefaults() {
+    // The program started once more, as for a death test, shares them with the one that started it.
+    if (const char* const shared = std::getenv(kFolder)) {
+      folder_ = shared;
+      return;
+    }
+    std::string folder = std::filesystem::temp_directory_path() / "defaults.XXXXXX";
+    if (mkdtemp(folder.data()) == nullptr) throw std::runtime_error("no temporary folder");
+    folder_ = folder;
+    owner_ = getpid();
+    setenv(kFolder, folder.c_str(), 1);
+    setenv("XDG_CONFIG_HOME", folder.c_str(), 1);
+    std::filesystem::create_directory(file().parent_path());
+  }
+  PrivateDefaults(const PrivateDefaults&) = delete;
+  PrivateDefaults& operator=(const PrivateDefaults&) = delete;
+  ~PrivateDefaults() {
+    // Not in a child, which only borrows the folder.
+    if (getpid() == owner_) std::filesystem::remove_all(folder_);
+  }
+
+  /// The file of the settings; its folder is there.
+  std::filesystem::path file() const {
+    return folder_ / std::filesystem::read_symlink("/proc/self/exe").filename() / "defaults.conf";
+  }
+
+ private:
+  static constexpr const char* kFolder = "PRIVATE_DEFAULTS";
+
+  pid_t owner_ = 0;
+  std::filesystem::path folder_;
+};

@@ -1,11 +1,12 @@
 # Run by ctest, with BUILD, COMPILER, FLAGS, WORK, WAY (find_package or pkg-config) and PKG_CONFIG: installs
-# what was built and builds program.cpp beside this file with nothing else, as a stranger would.
+# what was built and builds the programs beside this file with nothing else, as a stranger would. Each is called as
+# pkg-config calls the library that it uses, less "mount-point-", and prints 42.
 
 function(run)
-  execute_process(COMMAND ${ARGN} RESULT_VARIABLE result OUTPUT_VARIABLE output ERROR_VARIABLE output)
+  execute_process(COMMAND ${ARGN} RESULT_VARIABLE result OUTPUT_VARIABLE output ERROR_VARIABLE errors)
   if(NOT result EQUAL 0)
     list(JOIN ARGN " " command)
-    message(FATAL_ERROR "${command}\nfailed with ${result}:\n${output}")
+    message(FATAL_ERROR "${command}\nfailed with ${result}:\n${output}${errors}")
   endif()
   set(output "${output}" PARENT_SCOPE)
 endfunction()
@@ -15,24 +16,29 @@ run("${CMAKE_COMMAND}" --install "${BUILD}" --component development --prefix "${
 # What is installed may be moved.
 file(RENAME "${WORK}/first" "${WORK}/installed")
 
+set(libraries runtime logging error-handler older-logger logging-shim)
 separate_arguments(flags UNIX_COMMAND "${FLAGS}")
 if(WAY STREQUAL "find_package")
   run("${CMAKE_COMMAND}" -S "${CMAKE_CURRENT_LIST_DIR}" -B "${WORK}/build" "-DCMAKE_CXX_COMPILER=${COMPILER}"
     "-DCMAKE_CXX_FLAGS=${FLAGS}" "-DCMAKE_PREFIX_PATH=${WORK}/installed")
   run("${CMAKE_COMMAND}" --build "${WORK}/build")
-  set(program "${WORK}/build/program")
 else()
   file(GLOB_RECURSE description "${WORK}/installed/*/mount-point-runtime.pc")
   cmake_path(GET description PARENT_PATH folder)
   set(ENV{PKG_CONFIG_PATH} "${folder}")
-  run("${PKG_CONFIG}" --cflags --libs mount-point-runtime)
-  string(STRIP "${output}" output)
-  separate_arguments(package UNIX_COMMAND "${output}")
-  set(program "${WORK}/program")
-  run("${COMPILER}" -std=c++20 ${flags} "${CMAKE_CURRENT_LIST_DIR}/program.cpp" ${package} -o "${program}")
+  file(MAKE_DIRECTORY "${WORK}/build")
+  foreach(library ${libraries})
+    run("${PKG_CONFIG}" --cflags --libs mount-point-${library})
+    string(STRIP "${output}" output)
+    separate_arguments(package UNIX_COMMAND "${output}")
+    run("${COMPILER}" -std=c++20 ${flags} "${CMAKE_CURRENT_LIST_DIR}/${library}.cpp" ${package}
+      -o "${WORK}/build/${library}")
+  endforeach()
 endif()
 
-run("${program}")
-if(NOT output STREQUAL "42\n")
-  message(FATAL_ERROR "The program printed \"${output}\".")
-endif()
+foreach(library ${libraries})
+  run("${WORK}/build/${library}")
+  if(NOT output STREQUAL "42\n")
+    message(FATAL_ERROR "The program of ${library} printed \"${output}\".")
+  endif()
+endforeach()

@@ -1,0 +1,35 @@
+#include "Foundation/ZEBArrayCompositeLogWriter.h"
+
+#include <utility>
+
+#include "Foundation/ZEBFileHandleLogWriter.h"
+
+namespace {
+
+// `object` as a writer; null where it is none.
+rt::Ref<ZEBLogWriter> writerFor(const rt::Ref<rt::Object>& object) {
+  if (rt::Ref<ZEBLogWriter> writer = rt::cast<ZEBLogWriter>(object)) return writer;
+  if (const auto array = rt::cast<rt::Array>(object)) return ZEBArrayCompositeLogWriter::initWithArray(array);
+  return ZEBFileHandleLogWriter::initWithFileHandle(rt::cast<rt::FileHandle>(object));
+}
+
+}  // namespace
+
+ZEBArrayCompositeLogWriter::ZEBArrayCompositeLogWriter(std::vector<rt::Ref<ZEBLogWriter>> writers) noexcept
+    : writers_(std::move(writers)) {}
+
+rt::Ref<ZEBArrayCompositeLogWriter> ZEBArrayCompositeLogWriter::initWithArray(
+    const rt::Ref<rt::Array>& array) {
+  if (array == nullptr) return nullptr;
+  // An array never changes: what its elements are is looked at once.
+  std::vector<rt::Ref<ZEBLogWriter>> writers;
+  for (const rt::Ref<rt::Object>& element : *array) {
+    if (rt::Ref<ZEBLogWriter> writer = writerFor(element)) writers.push_back(std::move(writer));
+  }
+  return rt::Ref<ZEBArrayCompositeLogWriter>::adopt(new ZEBArrayCompositeLogWriter(std::move(writers)));
+}
+
+void ZEBArrayCompositeLogWriter::logMessage(const rt::String& message, ZEBLogLevel level) {
+  const rt::LockGuard guard(lock_);
+  for (const rt::Ref<ZEBLogWriter>& writer : writers_) writer->logMessage(message, level);
+}

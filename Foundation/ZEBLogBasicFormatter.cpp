@@ -1,0 +1,31 @@
+#include "Foundation/ZEBLogBasicFormatter.h"
+
+#include <type_traits>
+
+#include "Runtime/Format.h"
+
+using namespace rt::literals;
+
+namespace {
+
+// As a parameter, an argument list is a pointer on the systems where it can be missing.
+template <class List>
+bool isMissing(List list) {
+  if constexpr (std::is_pointer_v<List>) return list == nullptr;
+  return false;
+}
+
+}  // namespace
+
+rt::String ZEBLogBasicFormatter::stringForFunc(const rt::String& /*func*/, const rt::String& withFormat,
+                                               std::va_list valist, ZEBLogLevel /*level*/) {
+  if (withFormat.isNull() || isMissing(valist)) return nullptr;
+  return rt::formatV(withFormat, valist);
+}
+
+rt::String ZEBLogBasicFormatter::prettyNameForFunc(const rt::String& func) {
+  rt::String name = func.trimmed();
+  if (name.isEmpty()) return "(unknown)"_s;
+  if (name.hasPrefix("-[") || name.hasPrefix("+[") || name.hasSuffix(")")) return name;
+  return name + "()"_s;
+}

@@ -1,0 +1,58 @@
+#include "Foundation/ZEBLogLevelFilter.h"
+
+#include "Runtime/AssertionHandler.h"
+#include "Runtime/Process.h"
+
+using namespace rt::literals;
+
+namespace {
+
+// Of the environment variable and of the user default.
+constexpr const char* kSettingName = "ZEBVerboseLogging";
+
+bool isYes(const rt::String& value) {
+  const rt::String text = value.trimmed().uppercased();
+  return text.hasPrefix("Y") || text.hasPrefix("T") || text.integerValue() != 0;
+}
+
+}  // namespace
+
+rt::Ref<ZEBLogLevelFilter> ZEBLogLevelFilter::init() {
+  return rt::Ref<ZEBLogLevelFilter>::adopt(new ZEBLogLevelFilter());
+}
+
+ZEBLogLevelFilter::~ZEBLogLevelFilter() {
+  if (!observation_) return;
+  rt::AssertionHandler::currentHandler()->handleFailureInFunction(
+      "-[ZEBLogLevelFilter dealloc]"_s, "Foundation/ZEBLogger"_s, 544,
+      "The user defaults instance is still retained, which means there was a missing `willDetachFromLogger` "
+      "call. It is important to balance the `didAttachToLogger` call with a `willDetachFromLogger` call "
+      "because "
+      "those methods register/unregister the `ZEBLogLevelFilter` instance as an observer of the user "
+      "defaults "
+      "instance."_s);
+}
+
+bool ZEBLogLevelFilter::filterAllowsMessage(const rt::String& /*message*/, ZEBLogLevel level) {
+  if (level == ZEBLogLevelInfo) return verboseLoggingEnabled();
+  return level != ZEBLogLevelDebug;
+}
+
+void ZEBLogLevelFilter::didAttachToLogger() {
+  const rt::LockGuard guard(lock_);
+  if (observation_) return;
+  rt::UserDefaults& userDefaults = *rt::UserDefaults::standardUserDefaults();
+  observation_ = userDefaults.observe(kSettingName, rt::UserDefaults::Notify::kAlsoNow,
+                                      [this, &userDefaults] { readSetting(&userDefaults); });
+}
+
+void ZEBLogLevelFilter::willDetachFromLogger() {
+  const rt::LockGuard guard(lock_);
+  observation_.remove();
+}
+
+void ZEBLogLevelFilter::readSetting(const rt::UserDefaults* userDefaults) {
+  const rt::String value = rt::Process::environmentValue(kSettingName);
+  const bool isOn = value ? isYes(value) : userDefaults != nullptr && userDefaults->boolForKey(kSettingName);
+  verboseLoggingEnabled_.store(isOn, std::memory_order_relaxed);
+}

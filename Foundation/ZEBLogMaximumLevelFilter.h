@@ -1,0 +1,17 @@
+#pragma once
+
+/// The filter that lets the lines of a level, and of those below it, pass.
+///
+///     logger->setFilter(ZEBLogMaximumLevelFilter::initWithMaximumLevel(ZEBLogLevelInfo));
+
+#include "Foundation/ZEBLogAllowedLevelFilter.h"
+
+class ZEBLogMaximumLevelFilter final
+    : public rt::Implements<ZEBLogMaximumLevelFilter, ZEBLogAllowedLevelFilter> {
+ public:
+  /// One that allows the levels 0 to `maximumLevel`; null where that is not from 0 to 4.
+  static rt::Ref<ZEBLogMaximumLevelFilter> initWithMaximumLevel(ZEBLogLevel maximumLevel);
+
+ private:
+  using Implements::Implements;
+};

@@ -1,0 +1,201 @@
+#include "Foundation/ZEBLogStandardFormatter.h"
+
+#include <gtest/gtest.h>
+#include <pthread.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <cstdio>
+#include <cstdlib>
+#include <ctime>
+#include <regex>
+#include <stdexcept>
+#include <string>
+#include <thread>
+
+#include "Runtime/Format.h"
+#include "Runtime/Process.h"
+#include "Runtime/Thread.h"
+
+namespace {
+
+using namespace rt::literals;
+
+std::string line(ZEBLogStandardFormatter& formatter, const rt::String& func, ZEBLogLevel level,
+                 const rt::String* format, ...) {
+  std::va_list arguments;
+  va_start(arguments, format);
+  const rt::String text = formatter.stringForFunc(func, *format, arguments, level);
+  va_end(arguments);
+  return std::string(text.view());
+}
+
+class ZEBLogStandardFormatterTest : public testing::Test {
+ protected:
+  ZEBLogStandardFormatterTest() {
+    if (const char* const zone = std::getenv("TZ")) zone_ = zone;
+  }
+  ~ZEBLogStandardFormatterTest() override {
+    if (zone_.empty()) {
+      unsetenv("TZ");
+    } else {
+      setenv("TZ", zone_.c_str(), 1);
+    }
+    tzset();
+  }
+
+  // A line of the calling thread, with the message "7 left".
+  std::string line() const { return ::line(*formatter_, "main"_s, 3, &kFormat, 7); }
+
+  // The time in a line, to the second.
+  std::string timeNow() const { return line().substr(0, 19); }
+
+  // What follows the time in each of these lines.
+  static std::string rest() {
+    char text[256];
+    std::snprintf(text, sizeof text, " %s[%d/0x%lx] [lvl=3] main() 7 left",
+                  std::string(rt::Process::name().view()).c_str(), getpid(), pthread_self());
+    return text;
+  }
+
+  // By the clock that lines go by: `std::time` lags behind it.
+  static std::time_t now() { return std::chrono::system_clock::to_time_t(std::chrono::system_clock::now()); }
+
+  static std::string utc(std::time_t time) {
+    std::tm parts{};
+    gmtime_r(&time, &parts);
+    char text[64];
+    std::strftime(text, sizeof text, "%Y-%m-%d %H:%M:%S", &parts);
+    return text;
+  }
+
+  static constexpr rt::String kFormat = "%d left"_s;
+  const rt::Ref<ZEBLogStandardFormatter> formatter_ = ZEBLogStandardFormatter::init();
+
+ private:
+  std::string zone_;
+};
+
+TEST_F(ZEBLogStandardFormatterTest, SaysWhenWhichProcessAndThreadWhatLevelWhereAndWhat) {
+  setenv("TZ", "UTC0", 1);
+  const std::time_t before = now();
+  const std::string text = line();
+  const std::time_t after = now();
+  std::smatch time;
+  ASSERT_TRUE(std::regex_search(text, time, std::regex(R"(^(\d{4}-\d\d-\d\d \d\d:\d\d:\d\d)\.\d{3}(?= ))")))
+      << text;
+  EXPECT_LE(utc(before), time[1].str());
+  EXPECT_GE(utc(after), time[1].str());
+  EXPECT_EQ(text.substr(23), rest());
+}
+
+// The fields are put together by hand; this is the format that they are to come out as.
+TEST_F(ZEBLogStandardFormatterTest, MakesWhatItsFormatWouldMake) {
+  for (const ZEBLogLevel level : {-1, 0, 4, 2'147'483'647}) {
+    const std::string text = ::line(*formatter_, "-[A b]"_s, level, &kFormat, -3);
+    const rt::String expected = rt::format(
+        "%@ %@[%d/%p] [lvl=%d] %@ %@"_s, rt::String::fromUTF8(text.substr(0, 23)), rt::Process::name(),
+        rt::Process::identifier(), rt::Thread::currentHandle(), level, "-[A b]"_s, "-3 left"_s);
+    EXPECT_EQ(text, expected.view());
+  }
+}
+
+TEST_F(ZEBLogStandardFormatterTest, NamesTheThreadThatLogs) {
+  std::string text;
+  std::string expected;
+  std::thread([&] {
+    text = line().substr(23);
+    expected = rest();
+  }).join();
+  EXPECT_EQ(text, expected);
+  EXPECT_NE(text, rest());
+}
+
+TEST_F(ZEBLogStandardFormatterTest, MakesALineOfALongMessage) {
+  const rt::String message = rt::String::fromUTF8(std::string(100'000, 'x'));
+  const rt::String format = "%@"_s;
+  const std::string text = ::line(*formatter_, nullptr, 1, &format, message.object());
+  EXPECT_TRUE(text.ends_with("[lvl=1] (unknown) " + std::string(message.view())));
+}
+
+TEST_F(ZEBLogStandardFormatterTest, HasALineForNoMessage) {
+  const rt::String none;
+  EXPECT_TRUE(::line(*formatter_, nullptr, 4, &none).ends_with(" [lvl=4] (unknown) (null)"));
+  EXPECT_TRUE(formatter_->stringForFunc("f"_s, "text"_s, nullptr, 4).hasSuffix(" [lvl=4] f() (null)"));
+}
+
+TEST_F(ZEBLogStandardFormatterTest, PassesWhatADescriptionThrows) {
+  class Throwing final : public rt::Implements<Throwing, rt::Object> {
+   public:
+    rt::String description() const override { throw std::runtime_error("no description"); }
+  };
+  const rt::Ref<rt::Object> object = rt::make<Throwing>();
+  const rt::String format = "%@"_s;
+  EXPECT_THROW(::line(*formatter_, nullptr, 4, &format, object.get()), std::runtime_error);
+  EXPECT_TRUE(line().ends_with("7 left"));
+}
+
+TEST_F(ZEBLogStandardFormatterTest, TellsTheTimeOfTheZoneOfTheMoment) {
+  // Wherever the second changes meanwhile, it is tried again.
+  for (int attempt = 0; attempt < 100; ++attempt) {
+    setenv("TZ", "UTC0", 1);
+    const std::time_t before = now();
+    const std::string here = timeNow();
+    setenv("TZ", "XYZ-05:30", 1);
+    const std::string east = timeNow();
+    setenv("TZ", "ABC+03", 1);
+    const std::string west = timeNow();
+    if (now() != before) continue;
+    EXPECT_EQ(here, utc(before));
+    EXPECT_EQ(east, utc(before + 19'800));
+    EXPECT_EQ(west, utc(before - 10'800));
+    return;
+  }
+  FAIL() << "no second was long enough";
+}
+
+// In a zone whose summer time begins a moment from now: the lines until then, and the first after it.
+// Where none came before the change, since the process was held up, it is tried again.
+TEST_F(ZEBLogStandardFormatterTest, GoesOnAcrossTheBeginningOfSummerTime) {
+  for (int attempt = 0, lines = 0; lines == 0; ++attempt) {
+    ASSERT_LT(attempt, 20);
+    const std::time_t change = now() + 2;
+    std::tm parts{};
+    gmtime_r(&change, &parts);
+    char zone[64];
+    std::snprintf(zone, sizeof zone, "AAA0BBB,%d/%02d:%02d:%02d,%d/0", parts.tm_yday, parts.tm_hour,
+                  parts.tm_min, parts.tm_sec, (parts.tm_yday + 180) % 365);
+    setenv("TZ", zone, 1);
+    const auto local = [&](std::time_t time) { return utc(time < change ? time : time + 3600); };
+    std::time_t before = 0;
+    std::time_t after = 0;
+    do {
+      before = now();
+      const std::string time = timeNow();
+      after = now();
+      ASSERT_LE(local(before), time) << zone;
+      ASSERT_GE(local(after), time) << zone;
+      if (before < change) ++lines;
+    } while (before < change);
+  }
+}
+
+// One formatter serves all threads: a line's time is no mixture.
+TEST_F(ZEBLogStandardFormatterTest, ServesManyThreads) {
+  setenv("TZ", "UTC0", 1);
+  std::vector<std::thread> threads;
+  threads.reserve(8);
+  for (int thread = 0; thread < 8; ++thread) {
+    threads.emplace_back([&] {
+      const std::string expected = rest();
+      for (int i = 0; i < 500; ++i) {
+        const std::string text = line();
+        ASSERT_EQ(text.substr(23), expected);
+        ASSERT_EQ(text[19], '.');
+      }
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+}
+
+}  // namespace

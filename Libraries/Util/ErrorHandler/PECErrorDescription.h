@@ -1,0 +1,50 @@
+#pragma once
+
+/// What an error callback is told of an error: where it was reported, and in which words.
+///
+///     PECErrorHandler::sharedInstance()->registerErrorHandlerBlock(
+///         [](const rt::Ref<PECErrorDescription>& error) { show(error->errorMessage()); });
+///
+/// A plain record: as safe as a variable, for one thread at a time.
+///
+/// Not for: errors that a correct program can meet.
+
+#include <cstdint>
+#include <utility>
+
+#include "Runtime/Class.h"
+#include "Runtime/Object.h"
+#include "Runtime/String.h"
+
+class PECErrorDescription : public rt::Implements<PECErrorDescription, rt::Object> {
+ public:
+  PECErrorDescription() = default;
+
+  /// The source file, as the report names it.
+  const rt::String& filePath() const noexcept { return filePath_; }
+  void setFilePath(rt::String filePath) noexcept { filePath_ = std::move(filePath); }
+
+  /// The function or operation that reported.
+  const rt::String& functionName() const noexcept { return functionName_; }
+  void setFunctionName(rt::String functionName) noexcept { functionName_ = std::move(functionName); }
+
+  std::uint64_t lineNumber() const noexcept { return lineNumber_; }
+  void setLineNumber(std::uint64_t lineNumber) noexcept { lineNumber_ = lineNumber; }
+
+  /// The text before anything was substituted: the same for all reports from one place.
+  const rt::String& rawFormatString() const noexcept { return rawFormatString_; }
+  void setRawFormatString(rt::String rawFormatString) noexcept {
+    rawFormatString_ = std::move(rawFormatString);
+  }
+
+  /// The whole text.
+  const rt::String& errorMessage() const noexcept { return errorMessage_; }
+  void setErrorMessage(rt::String errorMessage) noexcept { errorMessage_ = std::move(errorMessage); }
+
+ private:
+  rt::String filePath_;
+  rt::String functionName_;
+  std::uint64_t lineNumber_ = 0;
+  rt::String rawFormatString_;
+  rt::String errorMessage_;
+};

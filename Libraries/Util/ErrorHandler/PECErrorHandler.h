@@ -1,0 +1,99 @@
+#pragma once
+
+/// Where every misuse of the libraries ends: messages of LUMLogLevelFault go to one callback of the host's,
+/// on the thread that logged them, and are counted.
+///
+///     PECErrorHandler::sharedInstance()->registerErrorHandlerBlock(
+///         [](const rt::Ref<PECErrorDescription>& error) {
+///           std::fprintf(stderr, "%s\n", std::string(error->errorMessage().view()).c_str());
+///         });
+///
+/// Without a callback an assertion fails: the report is on standard error and, unless somebody catches the
+/// rt::InternalInconsistencyException, the program ends.
+///
+/// The handler is a synchronous logger of the shared LUMLogMultiplexer from the first report on
+/// (Libraries/Util/ErrorHandler/PECReport.h), or from a call of `register_`.
+///
+/// A test asks what is reported by some code:
+///
+///     PECErrorHandler::assertBlockReportsError([&] { registry->internalRegisterBindings(nullptr); });
+///
+/// Not for: errors that a correct program can meet: those are results, or messages of LUMLogLevelError.
+
+#include <atomic>
+#include <cstdint>
+
+#include "Libraries/Util/ErrorHandler/PECErrorDescription.h"
+#include "Runtime/Block.h"
+#include "Runtime/Class.h"
+#include "Runtime/Object.h"
+#include "Runtime/RecursiveLock.h"
+#include "Runtime/Ref.h"
+#include "Runtime/ThreadSafety.h"
+#include "Runtime/UnfairLock.h"
+#include "Shared/Logging/LUMLogFilter.h"
+#include "Shared/Logging/LUMLogMessage.h"
+#include "Shared/Logging/LUMSyncLogger.h"
+
+/// What is told of an error, which is not null. Never run by two threads at once.
+using PECErrorHandlerBlock = rt::Block<void(const rt::Ref<PECErrorDescription>& error)>;
+
+class PECErrorHandler : public rt::Implements<PECErrorHandler, rt::Object, LUMSyncLogger> {
+ public:
+  /// The process's handler; never destroyed. Any thread may ask for it.
+  static const rt::Ref<PECErrorHandler>& sharedInstance();
+
+  /// Has the shared instance hear what the shared multiplexer passes on; once, further calls do nothing. Any
+  /// thread may call it.
+  static void register_();
+
+  /// One that nothing is told yet, without a callback.
+  static rt::Ref<PECErrorHandler> init();
+
+  /// Tells the callback of `message`, not null, and then, unless it threw, counts the error. The handler's
+  /// lock is held meanwhile, so that the callback is told of one error after another; it may itself log, also
+  /// an error. Throws what the callback throws.
+  void logWithMessage(const rt::Ref<LUMLogMessage>& message) override;
+
+  /// Admits LUMLogLevelFault and what is above.
+  rt::Ref<LUMLogFilter> filter() const override { return filter_; }
+
+  /// Makes `block` the callback. It cannot be null and there can be no callback yet: both are errors that are
+  /// reported, and the callback stays as it is.
+  void registerErrorHandlerBlock(PECErrorHandlerBlock block);
+
+  /// The callback that stands in where none is set: it fails an assertion, by the thread's
+  /// rt::AssertionHandler. The same at every call.
+  static PECErrorHandlerBlock defaultErrorHandlerBlock();
+
+  /// The callback, and the number of errors that it was told of. Setting them asks nothing and waits for
+  /// nobody; any thread may do it.
+  PECErrorHandlerBlock errorHandlerBlock() const;
+  void setErrorHandlerBlock(PECErrorHandlerBlock block);
+  std::int32_t errorCount() const noexcept { return errorCount_.load(std::memory_order_relaxed); }
+  void setErrorCount(std::int32_t count) noexcept { errorCount_.store(count, std::memory_order_relaxed); }
+
+  // For tests. All of these are about the shared instance, and for one thread at a time.
+
+  /// Takes the callback away and counts from 0 again.
+  static void resetAfterTest();
+
+  /// How many errors `block`, which is not null, reports; the callback is told of none of them. If `block`
+  /// throws, it is told of none from then on either, until `resetAfterTest`.
+  static std::int32_t errorCountInBlock(const rt::Block<void()>& block);
+
+  /// Throws an rt::Exception of the name "Assertion Failed!" unless `block` reports an error, or if it does.
+  static void assertBlockReportsError(const rt::Block<void()>& block);
+  static void assertBlockDoesNotReportError(const rt::Block<void()>& block);
+
+ protected:
+  PECErrorHandler();
+
+ private:
+  const rt::Ref<LUMLogFilter> filter_;
+  // Held while the callback runs: what it takes long for, the next error waits for.
+  rt::RecursiveLock lock_;
+  mutable rt::UnfairLock blockLock_;
+  PECErrorHandlerBlock errorHandlerBlock_ RT_GUARDED_BY(blockLock_);
+  std::atomic<std::int32_t> errorCount_{0};
+};

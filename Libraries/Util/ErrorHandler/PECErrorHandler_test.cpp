@@ -1,0 +1,784 @@
+// What the handler is told, whom it tells, and what it counts. What needs a process in which nothing was
+// reported yet is a death test, which is started anew.
+
+#include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <atomic>
+#include <csignal>
+#include <cstdint>
+#include <cstdio>
+#include <cstdlib>
+#include <functional>
+#include <latch>
+#include <limits>
+#include <stdexcept>
+#include <string>
+#include <thread>
+#include <utility>
+#include <vector>
+
+#include "Libraries/Util/ErrorHandler/PECReport.h"
+#include "Runtime/AssertionHandler.h"
+#include "Runtime/Exception.h"
+#include "Shared/Logging/LUMLog.h"
+#include "Shared/Logging/LUMLogDropAllFilter.h"
+#include "Shared/Logging/LUMLogMinimumLevelFilter.h"
+#include "Shared/Logging/LUMLogMultiplexer.h"
+#include "Shared/Logging/LUMSystemLogger.h"
+#include "tests/TestLoggers.h"
+
+namespace {
+
+using namespace rt::literals;
+using rt::Ref;
+using testing::ElementsAre;
+using testing::IsEmpty;
+
+// The face of the banner, by its characters.
+constexpr const char* kFace = "\x3c\x28\xe2\x80\xa2\xcc\x80\x5f\xe2\x80\xa2\xcc\x81\x29\x3e";
+
+std::string string(const rt::String& text) {
+  return text ? std::string(text.view()) : "(null)";
+}
+
+Ref<LUMLogMessage> errorMessage(const rt::String& file = "a/b/c.m"_s) {
+  return LUMLogMessage::initWithLevel(LUMLogLevelFault, "%@ is wrong"_s, "this is wrong"_s, file, "-[A b]"_s,
+                                      17, nullptr, nullptr, nullptr, nullptr, nullptr);
+}
+
+void logError(const rt::String& text = "wrong"_s) {
+  LUMLogMultiplexer::sharedInstance()->logWithMessage(messageWith(LUMLogLevelFault, text));
+}
+
+// Keeps the assertions that fail, and returns.
+class Recorder final : public rt::Implements<Recorder, rt::AssertionHandler> {
+ public:
+  struct Failure {
+    rt::String function;
+    rt::String file;
+    std::uint64_t lineNumber;
+    rt::String description;
+  };
+
+  void handleFailureInFunction(const rt::String& function, const rt::String& file, std::uint64_t lineNumber,
+                               const rt::String& description) override {
+    failures.push_back({function, file, lineNumber, description});
+  }
+
+  std::vector<Failure> failures;
+};
+
+// Runs `body` when it is destroyed.
+class AtEnd {
+ public:
+  explicit AtEnd(std::function<void()> body) : body_(std::move(body)) {}
+  AtEnd(const AtEnd&) = delete;
+  AtEnd& operator=(const AtEnd&) = delete;
+  AtEnd(AtEnd&& other) noexcept : body_(std::exchange(other.body_, nullptr)) {}
+  AtEnd& operator=(AtEnd&&) = delete;
+  ~AtEnd() {
+    if (body_) body_();
+  }
+
+ private:
+  std::function<void()> body_;
+};
+
+// The system's log would only repeat what is reported here.
+void silenceSystemLog() {
+  LUMLogMultiplexer::sharedInstance()->addSyncLogger(
+      LUMSystemLogger::initWithFilter(LUMLogDropAllFilter::init()));
+}
+
+class PECErrorHandlerTest : public testing::Test {
+ protected:
+  static void SetUpTestSuite() { silenceSystemLog(); }
+
+  void SetUp() override {
+    PECErrorHandler::register_();
+    PECErrorHandler::resetAfterTest();
+  }
+  void TearDown() override {
+    rt::AssertionHandler::setCurrentHandler(nullptr);
+    PECErrorHandler::resetAfterTest();
+  }
+
+  // Keeps the texts of the errors that it is told of.
+  PECErrorHandlerBlock tracing(std::string name = "") {
+    return [this, name = std::move(name)](const Ref<PECErrorDescription>& error) {
+      trace_.add(name + string(error->errorMessage()));
+    };
+  }
+
+  const Ref<PECErrorHandler> handler_ = PECErrorHandler::sharedInstance();
+  Trace trace_;
+};
+
+TEST(PECErrorDescription, HasWhatIsSet) {
+  const auto error = rt::make<PECErrorDescription>();
+  EXPECT_EQ(error->filePath(), nullptr);
+  EXPECT_EQ(error->functionName(), nullptr);
+  EXPECT_EQ(error->lineNumber(), 0U);
+  EXPECT_EQ(error->rawFormatString(), nullptr);
+  EXPECT_EQ(error->errorMessage(), nullptr);
+  error->setFilePath("a"_s);
+  error->setFunctionName("b"_s);
+  error->setLineNumber(std::numeric_limits<std::uint64_t>::max());
+  error->setRawFormatString("c"_s);
+  error->setErrorMessage("d"_s);
+  EXPECT_EQ(error->filePath(), "a");
+  EXPECT_EQ(error->functionName(), "b");
+  EXPECT_EQ(error->lineNumber(), std::numeric_limits<std::uint64_t>::max());
+  EXPECT_EQ(error->rawFormatString(), "c");
+  EXPECT_EQ(error->errorMessage(), "d");
+}
+
+// A handler.
+
+TEST_F(PECErrorHandlerTest, BeginsWithoutCallbackAndErrors) {
+  const Ref<PECErrorHandler> handler = PECErrorHandler::init();
+  EXPECT_FALSE(handler->errorHandlerBlock());
+  EXPECT_EQ(handler->errorCount(), 0);
+  EXPECT_NE(handler, PECErrorHandler::sharedInstance());
+}
+
+TEST_F(PECErrorHandlerTest, IsASyncLoggerForFaultsAndWhatIsAbove) {
+  const Ref<PECErrorHandler> handler = PECErrorHandler::init();
+  EXPECT_NE(rt::cast<LUMSyncLogger>(handler.get()), nullptr);
+  const Ref<LUMLogFilter> filter = handler->filter();
+  EXPECT_NE(rt::cast<LUMLogMinimumLevelFilter>(filter.get()), nullptr);
+  EXPECT_EQ(handler->filter(), filter);
+  for (LUMLogLevel level = 0; level <= 6; ++level) {
+    EXPECT_EQ(filter->allowLogMessage(*messageWith(level)), level >= 4) << level;
+  }
+  EXPECT_TRUE(filter->allowLogMessage(*messageWith(std::numeric_limits<LUMLogLevel>::max())));
+}
+
+TEST_F(PECErrorHandlerTest, DescribesTheMessage) {
+  const Ref<PECErrorHandler> handler = PECErrorHandler::init();
+  Ref<PECErrorDescription> told;
+  handler->setErrorHandlerBlock([&](const Ref<PECErrorDescription>& error) { told = error; });
+  handler->logWithMessage(errorMessage());
+  ASSERT_NE(told, nullptr);
+  EXPECT_EQ(told->filePath(), "a/b/c.m");
+  EXPECT_EQ(told->functionName(), "-[A b]");
+  EXPECT_EQ(told->lineNumber(), 17U);
+  EXPECT_EQ(told->rawFormatString(), "%@ is wrong");
+  EXPECT_EQ(told->errorMessage(), "this is wrong");
+  const Ref<PECErrorDescription> first = told;
+  handler->logWithMessage(errorMessage());
+  EXPECT_NE(told, first);
+}
+
+TEST_F(PECErrorHandlerTest, CountsWhenTheCallbackHasReturned) {
+  std::vector<std::int32_t> during;
+  handler_->setErrorHandlerBlock(
+      [&](const Ref<PECErrorDescription>&) { during.push_back(handler_->errorCount()); });
+  logError();
+  EXPECT_EQ(handler_->errorCount(), 1);
+  logError();
+  logError();
+  EXPECT_EQ(handler_->errorCount(), 3);
+  EXPECT_THAT(during, ElementsAre(0, 1, 2));
+}
+
+TEST_F(PECErrorHandlerTest, HearsNothingBelowFault) {
+  handler_->setErrorHandlerBlock(tracing());
+  for (LUMLogLevel level = 0; level < LUMLogLevelFault; ++level) {
+    LUMLogMultiplexer::sharedInstance()->logWithMessage(messageWith(level, "harmless"_s));
+  }
+  EXPECT_THAT(trace_.events(), IsEmpty());
+  EXPECT_EQ(handler_->errorCount(), 0);
+  LUMLogMultiplexer::sharedInstance()->logWithMessage(messageWith(5, "level 5"_s));
+  EXPECT_THAT(trace_.events(), ElementsAre("level 5"));
+  EXPECT_EQ(handler_->errorCount(), 1);
+}
+
+TEST_F(PECErrorHandlerTest, IsToldOnTheThreadThatLogs) {
+  std::thread::id teller;
+  handler_->setErrorHandlerBlock(
+      [&](const Ref<PECErrorDescription>&) { teller = std::this_thread::get_id(); });
+  LUMLogAt(LUMLogLevelFault, "wrong"_s);
+  EXPECT_EQ(teller, std::this_thread::get_id());
+}
+
+TEST_F(PECErrorHandlerTest, PassesOnWhatTheCallbackThrowsAndDoesNotCountIt) {
+  struct Thrown {};
+  handler_->setErrorHandlerBlock([](const Ref<PECErrorDescription>&) { throw Thrown(); });
+  EXPECT_THROW(logError(), Thrown);
+  EXPECT_THROW(LUMLogAt(LUMLogLevelFault, "wrong"_s), Thrown);
+  EXPECT_EQ(handler_->errorCount(), 0);
+  // Nobody is locked out by it.
+  handler_->setErrorHandlerBlock(tracing());
+  std::thread([] { logError("in another thread"_s); }).join();
+  EXPECT_THAT(trace_.events(), ElementsAre("in another thread"));
+  EXPECT_EQ(handler_->errorCount(), 1);
+}
+
+TEST_F(PECErrorHandlerTest, ACallbackMayLogErrorsItself) {
+  int depth = 0;
+  handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>& error) {
+    trace_.add("begin " + string(error->errorMessage()));
+    if (++depth < 4) logError(rt::String::fromUTF8("error " + std::to_string(depth)));
+    trace_.add("end, count " + std::to_string(handler_->errorCount()));
+  });
+  logError("error 0"_s);
+  EXPECT_THAT(trace_.events(), ElementsAre("begin error 0", "begin error 1", "begin error 2", "begin error 3",
+                                           "end, count 0", "end, count 1", "end, count 2", "end, count 3"));
+  EXPECT_EQ(handler_->errorCount(), 4);
+}
+
+// Invariant: the callback is never run by two threads at once, and every error is counted.
+TEST_F(PECErrorHandlerTest, TellsOfOneErrorAfterAnother) {
+  constexpr int kThreads = 8;
+  constexpr int kErrors = 500;
+  int running = 0;  // Not atomic: what the handler promises is all that keeps it whole.
+  int highest = 0;
+  int told = 0;
+  handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>& error) {
+    highest = std::max(highest, ++running);
+    ++told;
+    if (told % 10 == 0) std::this_thread::yield();
+    if (error->errorMessage() == "twice") logError("once"_s);
+    --running;
+  });
+  std::vector<std::thread> threads;
+  threads.reserve(kThreads);
+  for (int thread = 0; thread < kThreads; ++thread) {
+    threads.emplace_back([&] {
+      for (int i = 0; i < kErrors; ++i) logError(i % 10 == 0 ? "twice"_s : "wrong"_s);
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+  EXPECT_EQ(highest, 2);  // Only within itself.
+  EXPECT_EQ(told, kThreads * kErrors * 11 / 10);
+  EXPECT_EQ(handler_->errorCount(), told);
+}
+
+// Whoever installs a callback waits for the one that runs, also where that has taken itself away.
+TEST_F(PECErrorHandlerTest, InstallsACallbackWhileNoneRuns) {
+  std::latch isTold(1);
+  handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>&) {
+    handler_->setErrorHandlerBlock(nullptr);
+    isTold.count_down();
+    for (int i = 0; i < 1000; ++i) std::this_thread::yield();
+    trace_.add("ends");
+  });
+  std::thread reporter([] { logError(); });
+  isTold.wait();
+  handler_->registerErrorHandlerBlock(tracing());
+  trace_.add("installed");
+  reporter.join();
+  EXPECT_THAT(trace_.events(), ElementsAre("ends", "installed"));
+}
+
+// Without a callback.
+
+TEST_F(PECErrorHandlerTest, FailsAnAssertionWithoutACallback) {
+  const auto recorder = rt::make<Recorder>();
+  rt::AssertionHandler::setCurrentHandler(recorder);
+  handler_->logWithMessage(errorMessage());
+  ASSERT_EQ(recorder->failures.size(), 1U);
+  const Recorder::Failure& failure = recorder->failures.front();
+  EXPECT_EQ(failure.function, "-[PECErrorHandler defaultErrorHandlerBlock]_block_invoke");
+  EXPECT_EQ(failure.file, "Libraries/Util/ErrorHandler/PECErrorHandler");
+  EXPECT_EQ(failure.lineNumber, 64U);
+  // The format, not what was made of it.
+  EXPECT_EQ(string(failure.description), std::string("\n\n\n   <<< ERROR!    ") + kFace +
+                                             "    ERROR! >>>\n\n   in c.m\n   in -[A b]\n"
+                                             "   Line 17 says:\n\n   %@ is wrong\n\n\n");
+  // A handler of one's own may return: then the error was handled.
+  EXPECT_EQ(handler_->errorCount(), 1);
+}
+
+TEST_F(PECErrorHandlerTest, ShowsTheLastElementOfTheFilePath) {
+  const std::vector<std::pair<rt::String, std::string>> names = {
+      {"a/b/c.m"_s, "c.m"}, {"c.m"_s, "c.m"}, {"/c.m"_s, "c.m"},  {"a/b/"_s, ""},     {"a//c"_s, "c"},
+      {""_s, ""},           {"/"_s, ""},      {"a\\b"_s, "a\\b"}, {nullptr, "(null)"}};
+  for (const auto& [path, name] : names) {
+    const auto recorder = rt::make<Recorder>();
+    rt::AssertionHandler::setCurrentHandler(recorder);
+    handler_->logWithMessage(errorMessage(path));
+    ASSERT_EQ(recorder->failures.size(), 1U);
+    EXPECT_THAT(string(recorder->failures.front().description),
+                testing::HasSubstr("ERROR! >>>\n\n   in " + name + "\n   in -[A b]\n"));
+  }
+}
+
+TEST_F(PECErrorHandlerTest, ShowsWhatIsUnknown) {
+  const auto recorder = rt::make<Recorder>();
+  rt::AssertionHandler::setCurrentHandler(recorder);
+  handler_->logWithMessage(LUMLogMessage::initWithLevel(LUMLogLevelFault, nullptr, nullptr, nullptr, nullptr,
+                                                        std::numeric_limits<std::uint64_t>::max(), nullptr,
+                                                        nullptr, nullptr, nullptr, nullptr));
+  ASSERT_EQ(recorder->failures.size(), 1U);
+  EXPECT_THAT(string(recorder->failures.front().description),
+              testing::EndsWith("\n\n   in (null)\n   in (null)\n   Line 18446744073709551615 says:\n\n"
+                                "   (null)\n\n\n"));
+}
+
+TEST_F(PECErrorHandlerTest, RaisesWithoutACallbackAndCountsNothing) {
+  testing::internal::CaptureStderr();
+  bool isRaised = false;
+  try {
+    LUMLogAt(LUMLogLevelFault, "%@ is wrong"_s, "this"_s);
+  } catch (const rt::InternalInconsistencyException& exception) {
+    isRaised = true;
+    EXPECT_EQ(exception.name(), rt::InternalInconsistencyException::kName);
+    EXPECT_EQ(exception.lineNumber(), 64U);
+    EXPECT_TRUE(exception.description().contains("%@ is wrong"));
+    EXPECT_FALSE(exception.description().contains("this is wrong"));
+    EXPECT_TRUE(exception.description().contains("in PECErrorHandler_test.cpp\n"));
+  }
+  EXPECT_THAT(testing::internal::GetCapturedStderr(), testing::HasSubstr(kFace));
+  EXPECT_TRUE(isRaised);
+  EXPECT_EQ(handler_->errorCount(), 0);
+  // Nobody is locked out by it.
+  handler_->setErrorHandlerBlock(tracing());
+  std::thread([] { logError(); }).join();
+  EXPECT_EQ(handler_->errorCount(), 1);
+}
+
+TEST_F(PECErrorHandlerTest, HasOneCallbackForWhereThereIsNone) {
+  const PECErrorHandlerBlock block = handler_->defaultErrorHandlerBlock();
+  ASSERT_TRUE(block);
+  EXPECT_EQ(block, handler_->defaultErrorHandlerBlock());
+  EXPECT_EQ(block, PECErrorHandler::init()->defaultErrorHandlerBlock());
+  const auto recorder = rt::make<Recorder>();
+  rt::AssertionHandler::setCurrentHandler(recorder);
+  block(rt::make<PECErrorDescription>());
+  EXPECT_EQ(recorder->failures.size(), 1U);
+  EXPECT_EQ(handler_->errorCount(), 0);
+}
+
+// Installing a callback.
+
+TEST_F(PECErrorHandlerTest, InstallsACallback) {
+  const PECErrorHandlerBlock block = tracing();
+  handler_->registerErrorHandlerBlock(block);
+  EXPECT_EQ(handler_->errorHandlerBlock(), block);
+  logError();
+  EXPECT_THAT(trace_.events(), ElementsAre("wrong"));
+  EXPECT_EQ(handler_->errorCount(), 1);
+}
+
+TEST_F(PECErrorHandlerTest, KeepsTheFirstCallbackAndTellsItOfTheSecond) {
+  std::vector<Ref<PECErrorDescription>> errors;
+  const PECErrorHandlerBlock first = [&](const Ref<PECErrorDescription>& error) { errors.push_back(error); };
+  handler_->registerErrorHandlerBlock(first);
+  handler_->registerErrorHandlerBlock(tracing());
+  EXPECT_EQ(handler_->errorHandlerBlock(), first);
+  ASSERT_EQ(errors.size(), 1U);
+  EXPECT_EQ(errors[0]->filePath(), "Libraries/Util/ErrorHandler/PECErrorHandler");
+  EXPECT_EQ(errors[0]->functionName(), "-[PECErrorHandler registerErrorHandlerBlock:]");
+  EXPECT_EQ(errors[0]->lineNumber(), 72U);
+  EXPECT_EQ(errors[0]->rawFormatString(), "An ErrorHandlerBlock was already set!.");
+  EXPECT_EQ(errors[0]->errorMessage(), "An ErrorHandlerBlock was already set!.");
+  EXPECT_EQ(handler_->errorCount(), 1);
+  handler_->registerErrorHandlerBlock(first);  // The same one again is a second one, too.
+  EXPECT_EQ(errors.size(), 2U);
+  EXPECT_THAT(trace_.events(), IsEmpty());
+}
+
+TEST_F(PECErrorHandlerTest, ReportsANullCallback) {
+  std::vector<Ref<PECErrorDescription>> errors;
+  const PECErrorHandlerBlock first = [&](const Ref<PECErrorDescription>& error) { errors.push_back(error); };
+  handler_->registerErrorHandlerBlock(first);
+  handler_->registerErrorHandlerBlock(nullptr);
+  EXPECT_EQ(handler_->errorHandlerBlock(), first);
+  ASSERT_EQ(errors.size(), 1U);
+  EXPECT_EQ(errors[0]->filePath(), "Libraries/Util/ErrorHandler/PECErrorHandler");
+  EXPECT_EQ(errors[0]->functionName(), "-[PECErrorHandler registerErrorHandlerBlock:]");
+  EXPECT_EQ(errors[0]->lineNumber(), 70U);
+  EXPECT_EQ(errors[0]->rawFormatString(), "|errorHandlerBlock| cannot be nil!.");
+  EXPECT_EQ(errors[0]->errorMessage(), "|errorHandlerBlock| cannot be nil!.");
+}
+
+TEST_F(PECErrorHandlerTest, RaisesForANullCallbackWhereThereIsNone) {
+  testing::internal::CaptureStderr();
+  EXPECT_THROW(handler_->registerErrorHandlerBlock(nullptr), rt::InternalInconsistencyException);
+  EXPECT_THAT(
+      testing::internal::GetCapturedStderr(),
+      testing::HasSubstr("   in PECErrorHandler\n   in -[PECErrorHandler registerErrorHandlerBlock:]\n"
+                         "   Line 70 says:\n\n   |errorHandlerBlock| cannot be nil!.\n"));
+  EXPECT_FALSE(handler_->errorHandlerBlock());
+  EXPECT_EQ(handler_->errorCount(), 0);
+  handler_->registerErrorHandlerBlock(tracing());
+  EXPECT_EQ(handler_->errorCount(), 0);
+}
+
+TEST_F(PECErrorHandlerTest, MessagesWithoutMetadataAndArgumentsTellOfABadCallback) {
+  std::vector<Ref<LUMLogMessage>> messages;
+  const auto logger =
+      rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) { messages.push_back(message); });
+  LUMLogMultiplexer::sharedInstance()->addSyncLogger(logger);
+  handler_->registerErrorHandlerBlock(tracing());
+  handler_->registerErrorHandlerBlock(nullptr);
+  handler_->registerErrorHandlerBlock(tracing());
+  LUMLogMultiplexer::sharedInstance()->removeSyncLogger(logger);
+  ASSERT_EQ(messages.size(), 2U);
+  for (const Ref<LUMLogMessage>& message : messages) {
+    EXPECT_EQ(message->level(), LUMLogLevelFault);
+    EXPECT_EQ(message->logMetadata(), nullptr);
+    EXPECT_EQ(message->safeParameters(), nullptr);
+  }
+}
+
+// A hostile callback: it installs another, from within, which is an error to tell it of.
+TEST_F(PECErrorHandlerTest, ACallbackMayInstallACallback) {
+  bool isFirst = true;
+  handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>& error) {
+    trace_.add(string(error->errorMessage()));
+    if (std::exchange(isFirst, false)) handler_->registerErrorHandlerBlock(tracing());
+  });
+  logError();
+  EXPECT_THAT(trace_.events(), ElementsAre("wrong", "An ErrorHandlerBlock was already set!."));
+  EXPECT_EQ(handler_->errorCount(), 2);
+}
+
+// Installing of all threads at once: one callback is installed, and is told of all others.
+TEST_F(PECErrorHandlerTest, InstallsOneOfTheCallbacksThatThreadsInstallAtOnce) {
+  constexpr std::int32_t kThreads = 8;
+  std::latch mayStart(kThreads);
+  std::atomic<std::int32_t> told = 0;
+  std::vector<std::thread> threads;
+  threads.reserve(kThreads);
+  for (std::int32_t thread = 0; thread < kThreads; ++thread) {
+    threads.emplace_back([&] {
+      mayStart.arrive_and_wait();
+      handler_->registerErrorHandlerBlock([&](const Ref<PECErrorDescription>&) { ++told; });
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+  EXPECT_EQ(told, kThreads - 1);
+  EXPECT_EQ(handler_->errorCount(), kThreads - 1);
+}
+
+// Setting a callback and a count.
+
+TEST_F(PECErrorHandlerTest, SetsACallbackWhateverThereIs) {
+  handler_->registerErrorHandlerBlock(tracing("first "));
+  handler_->setErrorHandlerBlock(tracing("second "));
+  logError();
+  handler_->setErrorHandlerBlock(tracing("third "));
+  logError();
+  EXPECT_THAT(trace_.events(), ElementsAre("second wrong", "third wrong"));
+  EXPECT_EQ(handler_->errorCount(), 2);
+  handler_->setErrorHandlerBlock(nullptr);
+  EXPECT_FALSE(handler_->errorHandlerBlock());
+}
+
+TEST_F(PECErrorHandlerTest, CountsOnFromWhatIsSet) {
+  handler_->setErrorHandlerBlock(tracing());
+  handler_->setErrorCount(-3);
+  EXPECT_EQ(handler_->errorCount(), -3);
+  logError();
+  EXPECT_EQ(handler_->errorCount(), -2);
+  // It has 32 bits and a sign.
+  handler_->setErrorCount(std::numeric_limits<std::int32_t>::max());
+  logError();
+  EXPECT_EQ(handler_->errorCount(), std::numeric_limits<std::int32_t>::min());
+}
+
+// A callback that takes itself away lives until it returns. What it captured used to be destroyed with the
+// handler's lock held.
+TEST_F(PECErrorHandlerTest, GivesUpACallbackWithoutALock) {
+  bool hasReturned = false;
+  int ended = 0;
+  handler_->setErrorHandlerBlock([&, end = AtEnd([&] {
+                                       EXPECT_TRUE(hasReturned);
+                                       ++ended;
+                                       std::thread([&] {
+                                         handler_->setErrorHandlerBlock(tracing());
+                                         logError("in another thread"_s);
+                                       }).join();
+                                     })](const Ref<PECErrorDescription>&) {
+    handler_->setErrorHandlerBlock(nullptr);
+    EXPECT_EQ(ended, 0);
+    hasReturned = true;
+  });
+  logError();
+  EXPECT_EQ(ended, 1);
+  EXPECT_THAT(trace_.events(), ElementsAre("in another thread"));
+}
+
+TEST_F(PECErrorHandlerTest, ReplacesACallbackWithoutALock) {
+  int ended = 0;
+  const PECErrorHandlerBlock next = tracing();
+  handler_->setErrorHandlerBlock([end = AtEnd([&] {
+                                    ++ended;
+                                    EXPECT_EQ(handler_->errorHandlerBlock(), next);
+                                  })](const Ref<PECErrorDescription>&) {});
+  handler_->setErrorHandlerBlock(next);
+  EXPECT_EQ(ended, 1);
+}
+
+// Expectations.
+
+TEST_F(PECErrorHandlerTest, ForgetsCallbackAndCountAfterATest) {
+  handler_->setErrorHandlerBlock(tracing());
+  logError();
+  PECErrorHandler::resetAfterTest();
+  EXPECT_FALSE(handler_->errorHandlerBlock());
+  EXPECT_EQ(handler_->errorCount(), 0);
+  handler_->registerErrorHandlerBlock(tracing());  // As the first.
+  EXPECT_EQ(handler_->errorCount(), 0);
+}
+
+TEST_F(PECErrorHandlerTest, CountsTheErrorsOfABlock) {
+  const PECErrorHandlerBlock kept = tracing();
+  handler_->setErrorHandlerBlock(kept);
+  handler_->setErrorCount(40);
+  EXPECT_EQ(PECErrorHandler::errorCountInBlock([] {
+              logError();
+              LUMLogAt(LUMLogLevelError, "no error"_s);
+              logError();
+            }),
+            2);
+  EXPECT_EQ(handler_->errorHandlerBlock(), kept);
+  EXPECT_EQ(handler_->errorCount(), 42);
+  EXPECT_EQ(PECErrorHandler::errorCountInBlock([] {}), 0);
+  EXPECT_THAT(trace_.events(), IsEmpty());
+}
+
+TEST_F(PECErrorHandlerTest, RaisesNothingWhileItCountsAndRaisesAgainAfterwards) {
+  EXPECT_EQ(PECErrorHandler::errorCountInBlock([&] {
+              EXPECT_TRUE(handler_->errorHandlerBlock());
+              logError();
+            }),
+            1);
+  EXPECT_FALSE(handler_->errorHandlerBlock());
+  testing::internal::CaptureStderr();
+  EXPECT_THROW(logError(), rt::InternalInconsistencyException);
+  testing::internal::GetCapturedStderr();
+}
+
+TEST_F(PECErrorHandlerTest, CountsWithinWhatIsCounted) {
+  EXPECT_EQ(PECErrorHandler::errorCountInBlock([] {
+              logError();
+              EXPECT_EQ(PECErrorHandler::errorCountInBlock([] { logError(); }), 1);
+              logError();
+            }),
+            3);
+}
+
+TEST_F(PECErrorHandlerTest, CountsOverTheEndOfTheNumbers) {
+  handler_->setErrorCount(std::numeric_limits<std::int32_t>::max());
+  EXPECT_EQ(PECErrorHandler::errorCountInBlock([] {
+              logError();
+              logError();
+            }),
+            2);
+  EXPECT_EQ(PECErrorHandler::errorCountInBlock([&] { handler_->setErrorCount(0); }),
+            std::numeric_limits<std::int32_t>::max());
+}
+
+// On purpose: what a block throws leaves the callback that does nothing behind.
+TEST_F(PECErrorHandlerTest, PutsNothingBackWhereABlockThrows) {
+  struct Thrown {};
+  handler_->setErrorHandlerBlock(tracing());
+  EXPECT_THROW(PECErrorHandler::errorCountInBlock([] {
+                 logError();
+                 throw Thrown();
+               }),
+               Thrown);
+  logError();
+  EXPECT_THAT(trace_.events(), IsEmpty());
+  EXPECT_EQ(handler_->errorCount(), 2);
+  EXPECT_TRUE(handler_->errorHandlerBlock());
+}
+
+// Counting waits for nobody: a callback that is running holds up only those that report.
+TEST_F(PECErrorHandlerTest, CountsWhileACallbackRuns) {
+  std::latch isRunning(1);
+  std::latch mayReturn(1);
+  handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>&) {
+    isRunning.count_down();
+    mayReturn.wait();
+  });
+  std::thread reporter([] { logError(); });
+  isRunning.wait();
+  EXPECT_EQ(PECErrorHandler::errorCountInBlock([] {}), 0);
+  mayReturn.count_down();
+  reporter.join();
+}
+
+// The name and the reason of what `body` throws.
+template <class Body>
+std::pair<std::string, std::string> thrownBy(Body body) {
+  try {
+    body();
+  } catch (const rt::Exception& exception) {
+    return {string(exception.name()), string(exception.reason())};
+  }
+  return {"nothing", ""};
+}
+
+TEST_F(PECErrorHandlerTest, AssertsThatABlockReportsAnError) {
+  EXPECT_EQ(thrownBy([] { PECErrorHandler::assertBlockReportsError([] {}); }),
+            std::make_pair(std::string("Assertion Failed!"),
+                           std::string("\n\n     ") + kFace + "     Expected block to report an error!\n\n"));
+  EXPECT_NO_THROW(PECErrorHandler::assertBlockReportsError([] { logError(); }));
+  EXPECT_NO_THROW(PECErrorHandler::assertBlockReportsError([] {
+    logError();
+    logError();
+  }));
+  EXPECT_FALSE(handler_->errorHandlerBlock());
+}
+
+TEST_F(PECErrorHandlerTest, AssertsThatABlockReportsNoError) {
+  EXPECT_EQ(
+      thrownBy([] { PECErrorHandler::assertBlockDoesNotReportError([] { logError(); }); }),
+      std::make_pair(std::string("Assertion Failed!"),
+                     std::string("\n\n     ") + kFace + "     Expected block to report no errors!\n\n"));
+  EXPECT_NO_THROW(
+      PECErrorHandler::assertBlockDoesNotReportError([] { LUMLogAt(LUMLogLevelError, "no error"_s); }));
+  EXPECT_FALSE(handler_->errorHandlerBlock());
+}
+
+// A count that has gone down is neither no error nor some.
+TEST_F(PECErrorHandlerTest, AssertsNothingWhereABlockCountsDown) {
+  EXPECT_NO_THROW(PECErrorHandler::assertBlockReportsError([&] { handler_->setErrorCount(-1); }));
+  EXPECT_NO_THROW(PECErrorHandler::assertBlockDoesNotReportError([&] { handler_->setErrorCount(-2); }));
+}
+
+// Hostile loggers beside the handler.
+
+TEST_F(PECErrorHandlerTest, SurvivesLoggersThatThrowLogAndLeave) {
+  struct Thrown {};
+  const auto& multiplexer = LUMLogMultiplexer::sharedInstance();
+  handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>& error) {
+    trace_.add(string(error->errorMessage()));
+    if (error->errorMessage() == "wrong") logError("from within the callback"_s);
+  });
+  Ref<LUMSyncLogger> leaving;
+  leaving = rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) {
+    if (text(*message) != "wrong") return;
+    multiplexer->removeSyncLogger(leaving);
+    logError("from within a logger"_s);
+  });
+  multiplexer->addSyncLogger(leaving);
+  logError();
+  EXPECT_THAT(trace_.events(),
+              testing::UnorderedElementsAre("wrong", "from within the callback", "from within a logger"));
+  EXPECT_EQ(handler_->errorCount(), 3);
+
+  const auto throwing = rt::make<TestSyncLogger>([](const Ref<LUMLogMessage>&) { throw Thrown(); });
+  multiplexer->addSyncLogger(throwing);
+  EXPECT_THROW(logError(), Thrown);
+  multiplexer->removeSyncLogger(throwing);
+  trace_.events();
+  logError("afterwards"_s);
+  EXPECT_THAT(trace_.events(), ElementsAre("afterwards"));
+}
+
+// A process in which nothing was reported yet.
+
+class PECErrorHandlerAtTheStartDeathTest : public testing::Test {
+ protected:
+  PECErrorHandlerAtTheStartDeathTest() { GTEST_FLAG_SET(death_test_style, "threadsafe"); }
+
+  // Ends the process, with what `isTrue` says as its status.
+  [[noreturn]] static void conclude(bool isTrue) { std::exit(isTrue ? 0 : 1); }
+};
+
+TEST_F(PECErrorHandlerAtTheStartDeathTest, HearsNothingUntilSomethingIsReported) {
+  const auto body = [] {
+    silenceSystemLog();
+    int told = 0;
+    PECErrorHandler::sharedInstance()->registerErrorHandlerBlock(
+        [&](const Ref<PECErrorDescription>&) { ++told; });
+    logError();
+    const bool isDeafAtFirst = told == 0;
+    PECReport({"a", "b"}, "reported"_s);
+    const bool isToldOfTheFirst = told == 1;
+    logError();
+    conclude(isDeafAtFirst && isToldOfTheFirst && told == 2);
+  };
+  EXPECT_EXIT(body(), testing::ExitedWithCode(0), "");
+}
+
+// Who takes the handler away has taken it away for good.
+TEST_F(PECErrorHandlerAtTheStartDeathTest, IsRegisteredOnce) {
+  const auto body = [] {
+    silenceSystemLog();
+    int told = 0;
+    PECErrorHandler::register_();
+    PECErrorHandler::register_();
+    PECErrorHandler::sharedInstance()->setErrorHandlerBlock([&](const Ref<PECErrorDescription>&) { ++told; });
+    logError();
+    const bool isToldOnce = told == 1;
+    LUMLogMultiplexer::sharedInstance()->removeSyncLogger(PECErrorHandler::sharedInstance());
+    PECErrorHandler::register_();
+    PECReport({"a", "b"}, "reported"_s);
+    conclude(isToldOnce && told == 1);
+  };
+  EXPECT_EXIT(body(), testing::ExitedWithCode(0), "");
+}
+
+TEST_F(PECErrorHandlerAtTheStartDeathTest, IsMadeAndRegisteredByAllThreadsAtOnce) {
+  const auto body = [] {
+    silenceSystemLog();
+    constexpr std::int32_t kThreads = 8;
+    std::latch mayStart(kThreads);
+    std::vector<std::thread> threads;
+    threads.reserve(kThreads);
+    std::atomic<bool> isTheSame = true;
+    for (std::int32_t thread = 0; thread < kThreads; ++thread) {
+      threads.emplace_back([&] {
+        mayStart.arrive_and_wait();
+        static std::atomic<PECErrorHandler*> first = nullptr;
+        PECErrorHandler* const own = PECErrorHandler::sharedInstance().get();
+        PECErrorHandler* none = nullptr;
+        if (!first.compare_exchange_strong(none, own) && none != own) isTheSame = false;
+        own->setErrorHandlerBlock([](const Ref<PECErrorDescription>&) {});
+        PECErrorHandler::register_();
+        logError();  // Heard, since the handler is registered when `register_` returns.
+      });
+    }
+    for (std::thread& thread : threads) thread.join();
+    conclude(isTheSame && PECErrorHandler::sharedInstance()->errorCount() == kThreads);
+  };
+  EXPECT_EXIT(body(), testing::ExitedWithCode(0), "");
+}
+
+// Both mistakes with callbacks are heard although nothing was registered before.
+TEST_F(PECErrorHandlerAtTheStartDeathTest, RegistersItselfToTellOfASecondCallback) {
+  const auto body = [] {
+    silenceSystemLog();
+    int told = 0;
+    PECErrorHandler::sharedInstance()->registerErrorHandlerBlock(
+        [&](const Ref<PECErrorDescription>&) { ++told; });
+    PECErrorHandler::sharedInstance()->registerErrorHandlerBlock([](const Ref<PECErrorDescription>&) {});
+    conclude(told == 1);
+  };
+  EXPECT_EXIT(body(), testing::ExitedWithCode(0), "");
+}
+
+TEST_F(PECErrorHandlerAtTheStartDeathTest, EndsTheProgramWhereNobodyCatchesIt) {
+  const auto body = []() noexcept {
+    silenceSystemLog();
+    PECErrorHandler::sharedInstance()->registerErrorHandlerBlock(nullptr);
+  };
+  EXPECT_EXIT(body(), testing::KilledBySignal(SIGABRT),
+              "Assertion failed in -\\[PECErrorHandler defaultErrorHandlerBlock\\]_block_invoke, "
+              "Libraries/Util/ErrorHandler/PECErrorHandler:64: ");
+}
+
+TEST_F(PECErrorHandlerAtTheStartDeathTest, IsToldUntilTheProcessIsGone) {
+  const auto body = [] {
+    silenceSystemLog();
+    std::atexit([] { PECReport({"a", "b"}, "at exit"_s); });
+    PECErrorHandler::sharedInstance()->registerErrorHandlerBlock([](const Ref<PECErrorDescription>& error) {
+      std::fprintf(stderr, "told of %s.", string(error->errorMessage()).c_str());
+    });
+    std::exit(0);
+  };
+  EXPECT_EXIT(body(), testing::ExitedWithCode(0), "told of at exit\\.");
+}
+
+}  // namespace

@@ -1,0 +1,74 @@
+#pragma once
+
+/// How the libraries report misuse: the one line at the place where it is found.
+///
+///     constexpr const char* kFile = "Shared/ServiceRegistry/Source/SRLRegistry";
+///
+///     PECReport({kFile, "-[SRLRegistry internalRegisterBindings:]"},
+///               "API %@ is bound %@ times."_s, identifier, count);
+///     return nullptr;
+///
+/// It makes sure that the error handler is told, and logs a message of LUMLogLevelFault of which the caller's
+/// own function is first in the call stack. Every parameter is printed by "%@" and kept by itself in the
+/// message too, as a LUMSafeStringParameter or LUMSafeNumberParameter of type 1: give none that tells of a
+/// person.
+///
+/// It returns where the error callback returns, and throws what that throws; see PECErrorHandler.
+///
+/// Not for: hosts, whose errors are messages like any others (LUMLog).
+
+#include <concepts>
+#include <cstdint>
+#include <source_location>
+#include <type_traits>
+
+#include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
+#include "Runtime/CallStack.h"
+#include "Runtime/FormatArguments.h"
+#include "Runtime/FormatString.h"
+#include "Runtime/Number.h"
+#include "Runtime/Ref.h"
+#include "Runtime/String.h"
+#include "Shared/Logging/LUMLog.h"
+#include "Shared/Logging/LUMSafeNumberParameter.h"
+#include "Shared/Logging/LUMSafeStringParameter.h"
+
+/// Where a report is from: the source file, relative and without extension, the operation, and the line.
+struct PECReportSite {
+  constexpr PECReportSite(const char* filePath, const char* functionName,
+                          std::uint64_t lineNumber = std::source_location::current().line())
+      : file(filePath), function(functionName), line(lineNumber) {}
+
+  const char* file;
+  const char* function;
+  std::uint64_t line;
+};
+
+/// `value` as a parameter of a report.
+inline rt::Ref<rt::Object> PECReportParameter(const rt::String& value) {
+  return LUMSafeStringParameter::parameterWithString(value, 1);
+}
+inline rt::Ref<rt::Object> PECReportParameter(std::integral auto value) {
+  return LUMSafeNumberParameter::parameterWithNumber(rt::Number::of(value), 1);
+}
+
+namespace PECReportDetail {
+template <class>
+using Object = rt::Ref<rt::Object>;
+}
+
+/// Reports an error at `site`: the literal `format` with `parameters`, strings and integers, in the place of
+/// each "%@".
+// Compiled into its caller, so that the caller is first in the call stack.
+template <class... Parameters>
+[[gnu::always_inline]] inline void PECReport(
+    const PECReportSite& site,
+    const std::type_identity_t<rt::FormatString<PECReportDetail::Object<Parameters>...>>& format,
+    const Parameters&... parameters) {
+  PECErrorHandler::register_();
+  LUMLog(LUMLogLevelFault, site.file, site.function, site.line, nullptr,
+         static_cast<std::int32_t>(sizeof...(Parameters)),
+         rt::kArgumentKinds<PECReportDetail::Object<Parameters>...>.data(), format.string(),
+         rt::toVariadic(PECReportParameter(parameters))...);
+  rt::CallStack::keepFrame();
+}

@@ -1,0 +1,191 @@
+// What a report makes of its line: the message that is logged, and what the error handler is told.
+
+#include "Libraries/Util/ErrorHandler/PECReport.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <array>
+#include <cstdint>
+#include <limits>
+#include <string>
+#include <vector>
+
+#include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
+#include "Runtime/CallStack.h"
+#include "Runtime/Dictionary.h"
+#include "Runtime/Exception.h"
+#include "Runtime/Number.h"
+#include "Shared/Logging/LUMLogAddressCallstack.h"
+#include "Shared/Logging/LUMLogDropAllFilter.h"
+#include "Shared/Logging/LUMLogMultiplexer.h"
+#include "Shared/Logging/LUMLogSymbolCallstack.h"
+#include "Shared/Logging/LUMSafeNumberParameter.h"
+#include "Shared/Logging/LUMSafeStringParameter.h"
+#include "Shared/Logging/LUMSystemLogger.h"
+#include "tests/TestLoggers.h"
+
+namespace {
+
+using namespace rt::literals;
+using rt::Ref;
+using testing::HasSubstr;
+
+constexpr const char* kFile = "Libraries/Util/ErrorHandler/PECReport_test";
+
+class PECReportTest : public testing::Test {
+ protected:
+  static void SetUpTestSuite() {
+    // The system's log would only repeat what is reported here.
+    LUMLogMultiplexer::sharedInstance()->addSyncLogger(
+        LUMSystemLogger::initWithFilter(LUMLogDropAllFilter::init()));
+  }
+
+  void SetUp() override {
+    LUMLogMultiplexer::sharedInstance()->addSyncLogger(logger_);
+    PECErrorHandler::sharedInstance()->setErrorHandlerBlock(
+        [this](const Ref<PECErrorDescription>& error) { errors_.push_back(error); });
+  }
+  void TearDown() override {
+    LUMLogMultiplexer::sharedInstance()->removeSyncLogger(logger_);
+    LUMLogMultiplexer::sharedInstance()->setCaptureCallStackAddresses(true);
+    PECErrorHandler::resetAfterTest();
+  }
+
+  const LUMLogMessage& message() const { return *messages_.at(0); }
+
+  // The safe parameter at a place, as what it is.
+  template <class Parameter>
+  const Parameter* parameterAt(std::int32_t place) const {
+    return rt::cast<Parameter>(message().safeParameters()->objectForKey(rt::Number::of(place).get()));
+  }
+
+  std::vector<Ref<LUMLogMessage>> messages_;
+  std::vector<Ref<PECErrorDescription>> errors_;
+  const Ref<LUMSyncLogger> logger_ =
+      rt::make<TestSyncLogger>([this](const Ref<LUMLogMessage>& message) { messages_.push_back(message); });
+};
+
+TEST_F(PECReportTest, LogsAFaultFromItsSite) {
+  PECReport({kFile, "-[Registry add:]", 70}, "nothing to add"_s);
+  ASSERT_EQ(messages_.size(), 1U);
+  EXPECT_EQ(message().level(), LUMLogLevelFault);
+  EXPECT_EQ(message().file(), kFile);
+  EXPECT_EQ(message().function(), "-[Registry add:]");
+  EXPECT_EQ(message().line(), 70U);
+  EXPECT_EQ(message().format(), "nothing to add");
+  EXPECT_EQ(message().formattedString(), "nothing to add");
+  EXPECT_EQ(message().logMetadata(), nullptr);
+  EXPECT_EQ(message().safeParameters(), nullptr);
+}
+
+TEST_F(PECReportTest, TellsTheErrorHandler) {
+  PECReport({kFile, "-[Registry add:]", 70}, "%@ is bound %@ times."_s, "API"_s, 2);
+  ASSERT_EQ(errors_.size(), 1U);
+  EXPECT_EQ(errors_[0]->filePath(), kFile);
+  EXPECT_EQ(errors_[0]->functionName(), "-[Registry add:]");
+  EXPECT_EQ(errors_[0]->lineNumber(), 70U);
+  EXPECT_EQ(errors_[0]->rawFormatString(), "%@ is bound %@ times.");
+  EXPECT_EQ(errors_[0]->errorMessage(), "API is bound 2 times.");
+  EXPECT_EQ(PECErrorHandler::sharedInstance()->errorCount(), 1);
+}
+
+TEST_F(PECReportTest, KnowsItsLine) {
+  PECReport({kFile, "f"}, "first"_s);
+  const std::uint64_t line = __LINE__ - 1;
+  PECReport({kFile, "f"}, "second"_s);
+  ASSERT_EQ(messages_.size(), 2U);
+  EXPECT_EQ(messages_[0]->line(), line);
+  EXPECT_EQ(messages_[1]->line(), line + 2);
+}
+
+TEST_F(PECReportTest, KeepsEveryParameterAsASafeOneOfTypeOne) {
+  const rt::String name = rt::String::fromUTF8("Clock");
+  PECReport({kFile, "f"}, "%@ of %@ and %@"_s, name, 4, "literal"_s);
+  EXPECT_EQ(message().formattedString(), "Clock of 4 and literal");
+  ASSERT_EQ(message().safeParameters()->count(), 3U);
+  ASSERT_NE(parameterAt<LUMSafeStringParameter>(0), nullptr);
+  EXPECT_EQ(parameterAt<LUMSafeStringParameter>(0)->stringValue(), "Clock");
+  EXPECT_EQ(parameterAt<LUMSafeStringParameter>(0)->type(), 1U);
+  ASSERT_NE(parameterAt<LUMSafeNumberParameter>(1), nullptr);
+  EXPECT_TRUE(rt::isEqual(parameterAt<LUMSafeNumberParameter>(1)->numberValue(), rt::Number::of(4)));
+  EXPECT_EQ(parameterAt<LUMSafeNumberParameter>(1)->type(), 1U);
+  ASSERT_NE(parameterAt<LUMSafeStringParameter>(2), nullptr);
+  EXPECT_EQ(parameterAt<LUMSafeStringParameter>(2)->stringValue(), "literal");
+}
+
+TEST_F(PECReportTest, PrintsIntegersWhole) {
+  PECReport({kFile, "f"}, "%@ %@ %@ %@ %@"_s, std::numeric_limits<std::uint64_t>::max(),
+            std::numeric_limits<std::int64_t>::min(), -1, std::uint8_t{200}, std::size_t{7});
+  EXPECT_EQ(message().formattedString(), "18446744073709551615 -9223372036854775808 -1 200 7");
+}
+
+TEST_F(PECReportTest, PrintsNoTextAsNone) {
+  PECReport({kFile, "f"}, "no %@, and %@"_s, rt::String(), ""_s);
+  EXPECT_EQ(message().formattedString(), "no (null), and ");
+  EXPECT_EQ(message().safeParameters()->count(), 2U);
+}
+
+// A text with directives in it is printed as it is.
+TEST_F(PECReportTest, PrintsForeignTextAsItIs) {
+  PECReport({kFile, "f"}, "100 %% of %@"_s, "%@%s%n"_s);
+  EXPECT_EQ(message().formattedString(), "100 % of %@%s%n");
+  EXPECT_EQ(message().format(), "100 %% of %@");
+}
+
+// What these report is the last thing that they do.
+[[gnu::noinline]] void functionThatReports() {
+  PECReport({kFile, "f"}, "wrong"_s);
+}
+[[gnu::noinline]] void functionThatReportsParameters(const rt::String& text) {
+  PECReport({kFile, "f"}, "%@ %@"_s, text, 1);
+}
+
+std::string firstSymbolOf(const LUMLogMessage& message) {
+  if (auto* symbols = rt::cast<LUMLogSymbolCallstack>(message.callstack().get())) {
+    return std::string(symbols->symbols()->stringAt(0).view());
+  }
+  std::string line;
+  rt::cast<LUMLogAddressCallstack>(message.callstack().get())
+      ->enumerateAddressesWithBlock([&](std::uint64_t address, std::uint64_t, bool* stop) {
+        line = rt::CallStack::symbols(std::array{address}).front().view();
+        *stop = true;
+      });
+  return line;
+}
+
+TEST_F(PECReportTest, HasTheReportingFunctionFirstInItsCallStack) {
+  for (const bool captureAddresses : {true, false}) {
+    LUMLogMultiplexer::sharedInstance()->setCaptureCallStackAddresses(captureAddresses);
+    messages_.clear();
+    functionThatReports();
+    functionThatReportsParameters("text"_s);
+    ASSERT_EQ(messages_.size(), 2U);
+    EXPECT_THAT(firstSymbolOf(*messages_[0]), HasSubstr("functionThatReports("));
+    EXPECT_THAT(firstSymbolOf(*messages_[1]), HasSubstr("functionThatReportsParameters("));
+  }
+}
+
+TEST_F(PECReportTest, ReturnsWhereTheCallbackReturnsAndThrowsWhatItThrows) {
+  struct Thrown {};
+  EXPECT_NO_THROW(functionThatReports());
+  PECErrorHandler::sharedInstance()->setErrorHandlerBlock(
+      [](const Ref<PECErrorDescription>&) { throw Thrown(); });
+  EXPECT_THROW(functionThatReports(), Thrown);
+  EXPECT_THROW(functionThatReportsParameters("text"_s), Thrown);
+  PECErrorHandler::sharedInstance()->setErrorHandlerBlock(nullptr);
+  testing::internal::CaptureStderr();
+  EXPECT_THROW(functionThatReports(), rt::InternalInconsistencyException);
+  EXPECT_THAT(testing::internal::GetCapturedStderr(), HasSubstr("in PECReport_test\n   in f\n"));
+}
+
+TEST_F(PECReportTest, IsWhatABlockReports) {
+  EXPECT_EQ(PECErrorHandler::errorCountInBlock([] {
+              functionThatReports();
+              functionThatReportsParameters("text"_s);
+            }),
+            2);
+  EXPECT_NO_THROW(PECErrorHandler::assertBlockReportsError([] { functionThatReports(); }));
+}
+
+}  // namespace

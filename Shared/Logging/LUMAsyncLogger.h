@@ -1,0 +1,42 @@
+#pragma once
+
+/// A logger that is called on a queue of its own, later.
+///
+///     class FileLogger : public rt::Implements<FileLogger, rt::Object, LUMAsyncLogger> {
+///      public:
+///       void logWithMessage(const rt::Ref<LUMLogMessage>& message) override;      // on queue_
+///       rt::Ref<LUMLogFilter> filter() const override { return filter_; }
+///       rt::Ref<rt::Queue> operationQueue() const override { return queue_; }
+///       LUMLogDispatchMode dispatchModeForMessage(const LUMLogMessage& message) const override {
+///         return message.level() == LUMLogLevelFault ? LUMLogDispatchModeSynchronous : 0;
+///       }
+///     };
+///
+/// Messages of one thread come in the order in which they were logged.
+///
+/// Not for: what must see a message before the caller goes on, as a rule; see LUMSyncLogger.
+
+#include <cstdint>
+
+#include "Runtime/Queue.h"
+#include "Runtime/Ref.h"
+#include "Shared/Logging/LUMLogger.h"
+
+/// How a LUMAsyncLogger wants to be called.
+using LUMLogDispatchMode = std::uint32_t;
+
+/// Before `LUMLog` returns. Any other value: later.
+inline constexpr LUMLogDispatchMode LUMLogDispatchModeSynchronous = 2;
+
+struct LUMAsyncLogger : rt::Protocol<LUMAsyncLogger, LUMLogger> {
+  /// The queue to be called on; without one the logger receives nothing.
+  virtual rt::Ref<rt::Queue> operationQueue() const = 0;
+
+  /// How to be called with `message`; asked on the thread that logs. Must not be
+  /// LUMLogDispatchModeSynchronous for what is logged on the logger's own queue, which would wait for
+  /// itself.
+  virtual LUMLogDispatchMode dispatchModeForMessage(const LUMLogMessage& message) const = 0;
+
+ protected:
+  ~LUMAsyncLogger() = default;
+};

@@ -1,0 +1,21 @@
+#include "Shared/Logging/LUMDefaultMinimumLogLevelFilter.h"
+
+#include "Runtime/Process.h"
+#include "Runtime/String.h"
+#include "Shared/Logging/LUMLogLevel.h"
+
+namespace {
+
+LUMLogLevel levelFromEnvironment() {
+  const rt::String mode = rt::Process::environmentValue("OS_ACTIVITY_MODE");
+  if (mode == "debug") return LUMLogLevelDebug;
+  if (mode == "info") return LUMLogLevelInfo;
+  return LUMLogLevelError;
+}
+
+}  // namespace
+
+bool LUMDefaultMinimumLogLevelFilter::allowLogMessage(const LUMLogMessage& message) const {
+  static const LUMLogLevel threshold = levelFromEnvironment();
+  return message.level() >= threshold;
+}

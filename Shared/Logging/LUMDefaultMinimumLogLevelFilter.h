@@ -1,0 +1,25 @@
+#pragma once
+
+/// Lets pass what the environment asks for: from LUMLogLevelDebug on where OS_ACTIVITY_MODE is "debug", from
+/// LUMLogLevelInfo on where it is "info", else from LUMLogLevelError on.
+///
+///     logger = LUMSystemLogger::initWithFilter(LUMDefaultMinimumLogLevelFilter::init());
+///
+/// The environment is read once in a process, the first time that any such filter is asked.
+///
+/// Not for: a level that the program decides; see LUMLogMinimumLevelFilter.
+
+#include "Runtime/Class.h"
+#include "Runtime/Object.h"
+#include "Runtime/Ref.h"
+#include "Shared/Logging/LUMLogFilter.h"
+
+class LUMDefaultMinimumLogLevelFilter
+    : public rt::Implements<LUMDefaultMinimumLogLevelFilter, rt::Object, LUMLogFilter> {
+ public:
+  static rt::Ref<LUMDefaultMinimumLogLevelFilter> init() {
+    return rt::make<LUMDefaultMinimumLogLevelFilter>();
+  }
+
+  bool allowLogMessage(const LUMLogMessage& message) const override;
+};

@@ -1,0 +1,115 @@
+// What the environment is asked for once in a process takes a process for each answer: every death test here
+// is one, started anew, that has asked nothing.
+
+#include "Shared/Logging/LUMDefaultMinimumLogLevelFilter.h"
+
+#include <gtest/gtest.h>
+
+#include <cstdint>
+#include <cstdio>
+#include <cstdlib>
+#include <latch>
+#include <limits>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "tests/TestLoggers.h"
+
+namespace {
+
+using rt::Ref;
+
+class LUMDefaultMinimumLogLevelFilterDeathTest : public testing::Test {
+ protected:
+  LUMDefaultMinimumLogLevelFilterDeathTest() { GTEST_FLAG_SET(death_test_style, "threadsafe"); }
+
+  static void setMode(const char* mode) {
+    if (mode != nullptr) {
+      setenv("OS_ACTIVITY_MODE", mode, 1);
+    } else {
+      unsetenv("OS_ACTIVITY_MODE");
+    }
+  }
+
+  // The lowest level that passes, if all above it do and none below it.
+  static std::string threshold() {
+    const Ref<LUMDefaultMinimumLogLevelFilter> filter = LUMDefaultMinimumLogLevelFilter::init();
+    std::string passed;
+    for (LUMLogLevel level = 0; level < 7; ++level) {
+      passed += filter->allowLogMessage(*messageWith(level)) ? 'y' : 'n';
+    }
+    passed += filter->allowLogMessage(*messageWith(std::numeric_limits<std::uint64_t>::max())) ? 'y' : 'n';
+    const std::size_t lowest = passed.find('y');
+    return passed.find('n', lowest) == std::string::npos ? std::to_string(lowest) : passed;
+  }
+
+  // Writes the threshold of this process, in which `mode` is the first, and ends it.
+  [[noreturn]] static void tellThreshold(const char* mode) {
+    setMode(mode);
+    std::fprintf(stderr, "threshold %s.\n", threshold().c_str());
+    std::exit(0);
+  }
+};
+
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsDebugPassWhereTheModeIsDebug) {
+  EXPECT_EXIT(tellThreshold("debug"), testing::ExitedWithCode(0), "threshold 1\\.");
+}
+
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsInfoPassWhereTheModeIsInfo) {
+  EXPECT_EXIT(tellThreshold("info"), testing::ExitedWithCode(0), "threshold 2\\.");
+}
+
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsErrorPassWhereTheModeIsNotSet) {
+  EXPECT_EXIT(tellThreshold(nullptr), testing::ExitedWithCode(0), "threshold 3\\.");
+}
+
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsErrorPassInEveryOtherMode) {
+  EXPECT_EXIT(tellThreshold(""), testing::ExitedWithCode(0), "threshold 3\\.");
+  EXPECT_EXIT(tellThreshold("disable"), testing::ExitedWithCode(0), "threshold 3\\.");
+  EXPECT_EXIT(tellThreshold("DEBUG"), testing::ExitedWithCode(0), "threshold 3\\.");
+  EXPECT_EXIT(tellThreshold("debug "), testing::ExitedWithCode(0), "threshold 3\\.");
+  EXPECT_EXIT(tellThreshold("1"), testing::ExitedWithCode(0), "threshold 3\\.");
+}
+
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, AsksOnceForAllFiltersOfTheProcess) {
+  const auto body = [] {
+    setMode("info");
+    const std::string first = threshold();
+    setMode("debug");
+    std::fprintf(stderr, "threshold %s, then %s.\n", first.c_str(), threshold().c_str());
+    std::exit(0);
+  };
+  EXPECT_EXIT(body(), testing::ExitedWithCode(0), "threshold 2, then 2\\.");
+}
+
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, AsksWhenAMessageComesAndNotWhenAFilterIsMade) {
+  const auto body = [] {
+    setMode("info");
+    const Ref<LUMDefaultMinimumLogLevelFilter> filter = LUMDefaultMinimumLogLevelFilter::init();
+    tellThreshold("debug");
+  };
+  EXPECT_EXIT(body(), testing::ExitedWithCode(0), "threshold 1\\.");
+}
+
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, TellsAllThreadsTheSameWhenTheyAskAtOnce) {
+  const auto body = [] {
+    setMode("debug");
+    constexpr int kThreads = 8;
+    std::latch mayStart(kThreads);
+    std::vector<std::string> thresholds(kThreads);
+    std::vector<std::thread> threads;
+    for (std::string& found : thresholds) {
+      threads.emplace_back([&] {
+        mayStart.arrive_and_wait();
+        found = threshold();
+      });
+    }
+    for (std::thread& thread : threads) thread.join();
+    for (const std::string& found : thresholds) std::fprintf(stderr, "%s.", found.c_str());
+    std::exit(0);
+  };
+  EXPECT_EXIT(body(), testing::ExitedWithCode(0), "1\\.1\\.1\\.1\\.1\\.1\\.1\\.1\\.");
+}
+
+}  // namespace

@@ -1,0 +1,128 @@
+#include "Shared/Logging/LUMLog.h"
+
+#include <algorithm>
+#include <cstddef>
+#include <span>
+#include <string_view>
+#include <utility>
+
+#include "Runtime/Dictionary.h"
+#include "Runtime/Format.h"
+#include "Runtime/Number.h"
+#include "Shared/Logging/LUMLogAddressCallstack.h"
+#include "Shared/Logging/LUMLogMultiplexer.h"
+#include "Shared/Logging/LUMLogSourceText.h"
+#include "Shared/Logging/LUMLogSymbolCallstack.h"
+
+namespace {
+
+using namespace rt::literals;
+
+/// Ends the use of an argument list, also where something throws.
+class ListEnd {
+ public:
+  explicit ListEnd(std::va_list& list) noexcept : list_(list) {}
+  ListEnd(const ListEnd&) = delete;
+  ListEnd& operator=(const ListEnd&) = delete;
+  ~ListEnd() { va_end(list_); }
+
+ private:
+  std::va_list& list_;
+};
+
+bool isSafeParameter(const rt::Object& object) {
+  constexpr std::string_view kNumber = "LUMSafeNumberParameter";
+  constexpr std::string_view kString = "LUMSafeStringParameter";
+  const std::string_view name = object.classInfo().name;
+  return name.starts_with(kNumber) || name.starts_with(kString);
+}
+
+constexpr LUMLogArgumentKind kObject = 1;
+
+/// The safe parameters in the list by their places among all arguments; null where there are none.
+rt::Ref<rt::Dictionary> safeParametersIn(std::va_list list, std::int32_t count,
+                                         const LUMLogArgumentKind* kinds) {
+  const std::span<const LUMLogArgumentKind> all(kinds, static_cast<std::size_t>(std::max(count, 0)));
+  if (std::ranges::find(all, kObject) == all.end()) return nullptr;
+  rt::Dictionary::Builder parameters;
+  for (std::int32_t i = 0; i < count; ++i) {
+    switch (all[static_cast<std::size_t>(i)]) {
+      case 0:
+      case 2:
+      case 3:
+      case 4:
+        static_cast<void>(va_arg(list, std::int64_t));
+        break;
+      case kObject:
+        if (auto* object = va_arg(list, rt::Object*); object != nullptr && isSafeParameter(*object)) {
+          parameters.set(rt::Number::of(i), object);
+        }
+        break;
+      case 5:  // NOLINT(bugprone-branch-clone): it is another type that is read
+        static_cast<void>(va_arg(list, double));
+        break;
+      case 6:
+        static_cast<void>(va_arg(list, long double));
+        break;
+      default:
+        break;
+    }
+  }
+  return parameters.count() > 0 ? std::move(parameters).dictionary() : nullptr;
+}
+
+// The calls that a call stack leaves out: that of `logArguments` and that of `LUMLog`.
+constexpr std::uint64_t kOwnFrameCount = 2;
+
+[[gnu::noinline]] rt::Ref<LUMLogMessage> logArguments(LUMLogLevel level, const char* file,
+                                                      const char* function, std::uint64_t line,
+                                                      const rt::Ref<LUMLogMetadata>& metadata,
+                                                      std::int32_t argumentCount,
+                                                      const LUMLogArgumentKind* argumentKinds,
+                                                      const rt::String& format, std::va_list arguments) {
+  LUMLogMultiplexer& multiplexer = *LUMLogMultiplexer::sharedInstance();
+  rt::Ref<LUMLogCallstack> callstack;
+  if ((level == LUMLogLevelError || level == LUMLogLevelFault) && multiplexer.captureCallStack()) {
+    if (multiplexer.captureCallStackAddresses()) {
+      callstack = LUMLogAddressCallstack::addressCallstackIgnoringFrameCount(kOwnFrameCount);
+    } else {
+      callstack = LUMLogSymbolCallstack::symbolCallstackIgnoringFrameCount(kOwnFrameCount);
+    }
+  }
+  rt::String fileText = LUMLogSourceText(file);
+  rt::String functionText = LUMLogSourceText(function);
+  rt::Ref<LUMLogMessage> message =
+      LUMLogV(level, fileText ? std::move(fileText) : "(invalid file)"_s,
+              functionText ? std::move(functionText) : "(invalid function)"_s, line, callstack, metadata,
+              argumentCount, argumentKinds, format, arguments);
+  multiplexer.logWithMessage(message);
+  return message;
+}
+
+}  // namespace
+
+rt::Ref<LUMLogMessage> LUMLog(LUMLogLevel level, const char* file, const char* function, std::uint64_t line,
+                              const rt::Ref<LUMLogMetadata>& metadata, std::int32_t argumentCount,
+                              const LUMLogArgumentKind* argumentKinds,
+                              rt::String format,  // NOLINT(performance-unnecessary-value-param): see va_start
+                              ...) {
+  std::va_list arguments;
+  va_start(arguments, format);
+  const ListEnd end(arguments);
+  // NOLINTNEXTLINE(clang-analyzer-valist.Unterminated): `end` does
+  return logArguments(level, file, function, line, metadata, argumentCount, argumentKinds, format, arguments);
+}
+
+rt::Ref<LUMLogMessage> LUMLogV(LUMLogLevel level, rt::String file, rt::String function, std::uint64_t line,
+                               const rt::Ref<LUMLogCallstack>& callstack,
+                               const rt::Ref<LUMLogMetadata>& metadata, std::int32_t argumentCount,
+                               const LUMLogArgumentKind* argumentKinds, const rt::String& format,
+                               std::va_list arguments) {
+  std::va_list walked;
+  va_copy(walked, arguments);
+  const ListEnd end(walked);  // NOLINT(clang-analyzer-valist.Unterminated): that is what ends it
+  rt::String text = rt::formatV(format, arguments);
+  return LUMLogMessage::initWithLevel(level, format, std::move(text), std::move(file), std::move(function),
+                                      line, nullptr, nullptr, callstack,
+                                      safeParametersIn(walked, argumentCount, argumentKinds), metadata);
+}

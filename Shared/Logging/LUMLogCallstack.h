@@ -1,0 +1,15 @@
+#pragma once
+
+/// A call stack that goes with a log message. It has no operations of its own: who shows messages prints its
+/// `description`, or asks for the class that it knows.
+///
+///     if (auto* addresses = rt::cast<LUMLogAddressCallstack>(message->callstack())) ...
+///
+/// Not for: a call stack without a message (Runtime/CallStack.h).
+
+#include "Runtime/Class.h"
+
+struct LUMLogCallstack : rt::Protocol<LUMLogCallstack> {
+ protected:
+  ~LUMLogCallstack() = default;
+};

@@ -1,0 +1,34 @@
+#pragma once
+
+/// Lets the messages of one component pass: those whose metadata names it.
+///
+///     filter = LUMLogComponentFilter::initWithComponent("Importer"_s);
+///     LUMLogAt(LUMLogLevelInfo, LUMLogMetadata::metadataWithComponent("Importer"_s), "started"_s);   //
+///     passes
+///
+/// Not for: categories or other metadata, which take a filter of one's own.
+
+#include <utility>
+
+#include "Runtime/Class.h"
+#include "Runtime/Object.h"
+#include "Runtime/Ref.h"
+#include "Runtime/String.h"
+#include "Shared/Logging/LUMLogFilter.h"
+
+class LUMLogComponentFilter : public rt::Implements<LUMLogComponentFilter, rt::Object, LUMLogFilter> {
+ public:
+  /// Lets nothing pass if `component` is null: a message without metadata or without a component has none
+  /// that could be equal.
+  static rt::Ref<LUMLogComponentFilter> initWithComponent(rt::String component) {
+    return rt::Ref<LUMLogComponentFilter>::adopt(new LUMLogComponentFilter(std::move(component)));
+  }
+
+  bool allowLogMessage(const LUMLogMessage& message) const override;
+
+ protected:
+  explicit LUMLogComponentFilter(rt::String component) noexcept : component_(std::move(component)) {}
+
+ private:
+  const rt::String component_;
+};

@@ -1,0 +1,5 @@
+#include "Shared/Logging/LUMLogMinimumLevelFilter.h"
+
+bool LUMLogMinimumLevelFilter::allowLogMessage(const LUMLogMessage& message) const {
+  return message.level() >= minimumLevel_;
+}

@@ -1,0 +1,195 @@
+#include "Shared/Logging/LUMLogMultiplexer.h"
+
+#include <algorithm>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "Runtime/QualityOfService.h"
+#include "Shared/Logging/LUMDefaultMinimumLogLevelFilter.h"
+
+namespace {
+
+using namespace rt::literals;
+
+template <class T>
+void add(std::vector<rt::Ref<T>>& list, const rt::Ref<T>& object) {
+  const bool isThere =
+      std::ranges::any_of(list, [&](const rt::Ref<T>& other) { return rt::isEqual(other, object); });
+  if (!isThere) list.push_back(object);
+}
+
+template <class T>
+void remove(std::vector<rt::Ref<T>>& list, const rt::Object* object) {
+  std::erase_if(list, [&](const rt::Ref<T>& other) { return rt::isEqual(other->asObject(), object); });
+}
+
+bool admits(const LUMLogger& logger, const LUMLogMessage& message) {
+  const rt::Ref<LUMLogFilter> filter = logger.filter();
+  return !filter || filter->allowLogMessage(message);
+}
+
+void deliver(LUMLogger& logger, const rt::Ref<LUMLogMessage>& message) {
+  if (admits(logger, *message)) logger.logWithMessage(message);
+}
+
+}  // namespace
+
+struct LUMLogMultiplexer::Lists {
+  std::vector<rt::Ref<LUMLogFilter>> filters;
+  std::vector<rt::Ref<LUMSyncLogger>> syncLoggers;
+  std::vector<rt::Ref<LUMAsyncLogger>> asyncLoggers;
+  // The one that the multiplexer was made with, until another takes its place.
+  rt::Ref<LUMSystemLogger> systemLogger;
+};
+
+/// The filters and loggers of a moment. One object for all, since each message counts a reference to it.
+class LUMLogMultiplexer::Members final : public rt::Implements<Members, rt::Object> {
+ public:
+  static constexpr std::string_view kClassName = "LUMLogMultiplexerMembers";
+
+  explicit Members(Lists given) : lists(std::move(given)) {}
+
+  const Lists lists;
+};
+
+const rt::Ref<LUMLogMultiplexer>& LUMLogMultiplexer::sharedInstance() {
+  static const rt::Ref<LUMLogMultiplexer>& instance = *new rt::Ref<LUMLogMultiplexer>(init());
+  return instance;
+}
+
+rt::Ref<LUMLogMultiplexer> LUMLogMultiplexer::init() {
+  return initWithSystemLogger(LUMSystemLogger::initWithFilter(LUMDefaultMinimumLogLevelFilter::init()));
+}
+
+rt::Ref<LUMLogMultiplexer> LUMLogMultiplexer::initWithSystemLogger(rt::Ref<LUMSystemLogger> systemLogger) {
+  return rt::Ref<LUMLogMultiplexer>::adopt(new LUMLogMultiplexer(std::move(systemLogger)));
+}
+
+LUMLogMultiplexer::LUMLogMultiplexer(rt::Ref<LUMSystemLogger> systemLogger)
+    : loggingQueue_(rt::make<rt::Queue>("LUMLogMultiplexer"_s, rt::QualityOfService::kUtility, 0)) {
+  Lists lists;
+  if (systemLogger) lists.syncLoggers.emplace_back(systemLogger);
+  lists.systemLogger = std::move(systemLogger);
+  members_ = rt::make<Members>(std::move(lists));
+}
+
+LUMLogMultiplexer::~LUMLogMultiplexer() = default;
+
+rt::Ref<LUMLogMultiplexer::Members> LUMLogMultiplexer::members() const {
+  const rt::LockGuard guard(lock_);
+  return members_;
+}
+
+void LUMLogMultiplexer::logWithMessage(const rt::Ref<LUMLogMessage>& message) {
+  if (!message) return;
+  const rt::Ref<Members> current = members();
+  const Lists& lists = current->lists;
+
+  for (const rt::Ref<LUMLogFilter>& filter : lists.filters) {
+    if (!filter->allowLogMessage(*message)) return;
+  }
+
+  std::vector<rt::Ref<LUMAsyncLogger>> laterLoggers;
+  std::vector<rt::Ref<LUMAsyncLogger>> blockingLoggers;
+  for (const rt::Ref<LUMAsyncLogger>& logger : lists.asyncLoggers) {
+    const bool isBlocking = admits(*logger, *message) &&
+                            logger->dispatchModeForMessage(*message) == LUMLogDispatchModeSynchronous;
+    (isBlocking ? blockingLoggers : laterLoggers).push_back(logger);
+  }
+  if (!laterLoggers.empty()) deliverLater(std::move(laterLoggers), message);
+
+  for (const rt::Ref<LUMSyncLogger>& logger : lists.syncLoggers) deliver(*logger, message);
+
+  for (const rt::Ref<LUMAsyncLogger>& logger : blockingLoggers) {
+    if (const rt::Ref<rt::Queue> queue = logger->operationQueue()) {
+      queue->sync([&] { deliver(*logger, message); });
+    }
+  }
+}
+
+void LUMLogMultiplexer::deliverLater(std::vector<rt::Ref<LUMAsyncLogger>> loggers,
+                                     const rt::Ref<LUMLogMessage>& message) {
+  loggingQueue_->async([loggers = std::move(loggers), message] {
+    for (const rt::Ref<LUMAsyncLogger>& logger : loggers) {
+      if (const rt::Ref<rt::Queue> queue = logger->operationQueue()) {
+        queue->async([logger, message] { deliver(*logger, message); });
+      }
+    }
+  });
+}
+
+/// Has `change` make the next members of those that there are. It runs without the lock, since objects are
+/// compared by their own `isEqual`, and again where somebody else was quicker.
+template <class Change>
+void LUMLogMultiplexer::replaceMembers(Change change) {
+  for (;;) {
+    // Given up without the lock as well: a logger may go with it.
+    rt::Ref<Members> known = members();
+    Lists lists = known->lists;
+    change(lists);
+    const rt::Ref<Members> next = rt::make<Members>(std::move(lists));
+    const rt::LockGuard guard(lock_);
+    if (members_ == known) {
+      members_ = next;
+      return;
+    }
+  }
+}
+
+void LUMLogMultiplexer::addLogFilter(const rt::Ref<LUMLogFilter>& filter) {
+  if (!filter) return;
+  replaceMembers([&](Lists& lists) { add(lists.filters, filter); });
+}
+
+void LUMLogMultiplexer::removeLogFilter(const rt::Ref<LUMLogFilter>& filter) {
+  if (!filter) return;
+  replaceMembers([&](Lists& lists) { remove(lists.filters, filter->asObject()); });
+}
+
+void LUMLogMultiplexer::addSyncLogger(const rt::Ref<LUMSyncLogger>& logger) {
+  if (!logger) return;
+  const bool isSystemLogger = rt::cast<LUMSystemLogger>(logger.get()) != nullptr;
+  replaceMembers([&](Lists& lists) {
+    if (isSystemLogger && lists.systemLogger) {
+      remove(lists.syncLoggers, lists.systemLogger.get());
+      lists.systemLogger = nullptr;
+    }
+    add(lists.syncLoggers, logger);
+  });
+}
+
+void LUMLogMultiplexer::removeSyncLogger(const rt::Ref<LUMSyncLogger>& logger) {
+  if (!logger) return;
+  replaceMembers([&](Lists& lists) { remove(lists.syncLoggers, logger->asObject()); });
+}
+
+void LUMLogMultiplexer::addAsyncLogger(const rt::Ref<LUMAsyncLogger>& logger) {
+  if (!logger) return;
+  replaceMembers([&](Lists& lists) { add(lists.asyncLoggers, logger); });
+}
+
+void LUMLogMultiplexer::removeAsyncLogger(const rt::Ref<LUMAsyncLogger>& logger) {
+  if (!logger) return;
+  replaceMembers([&](Lists& lists) { remove(lists.asyncLoggers, logger->asObject()); });
+}
+
+void LUMLogMultiplexer::waitForLogging() {
+  loggingQueue_->barrierSync();
+}
+
+void LUMLogMultiplexer::setCaptureCallStack(bool capture) {
+  captureCallStack_.store(capture, std::memory_order_relaxed);
+}
+
+void LUMLogMultiplexer::setCaptureCallStackAddresses(bool capture) {
+  captureCallStackAddresses_.store(capture, std::memory_order_relaxed);
+}
+
+bool LUMLogMultiplexer::captureSwiftCallStackOnErrorAndAbove() const {
+  return captureSwiftCallStackOnErrorAndAbove_.load(std::memory_order_relaxed);
+}
+
+void LUMLogMultiplexer::setCaptureSwiftCallStackOnErrorAndAbove(bool capture) {
+  captureSwiftCallStackOnErrorAndAbove_.store(capture, std::memory_order_relaxed);
+}

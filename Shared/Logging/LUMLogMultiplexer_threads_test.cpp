@@ -1,0 +1,311 @@
+// The multiplexer used by many threads at once, while filters and loggers come and go.
+//
+// Invariants: a logger that is there all the time gets every message, once, and those of one thread in the
+// order in which it logged them; one that comes and goes gets some of them, once each and in the same order.
+
+#include <gtest/gtest.h>
+
+#include <array>
+#include <atomic>
+#include <cstddef>
+#include <cstdint>
+#include <mutex>
+#include <string>
+#include <thread>
+#include <utility>
+#include <vector>
+
+#include "Shared/Logging/LUMLogMinimumLevelFilter.h"
+#include "Shared/Logging/LUMLogMultiplexer.h"
+#include "Shared/Logging/LUMLogNoFilter.h"
+#include "tests/TestLoggers.h"
+
+namespace {
+
+using namespace rt::literals;
+using rt::Queue;
+using rt::Ref;
+
+constexpr std::size_t kThreads = 8;
+
+// A message that says whose it is and which one: the line is a number of the thread's own.
+Ref<LUMLogMessage> numbered(LUMLogLevel level, std::size_t thread, std::uint64_t index) {
+  return LUMLogMessage::initWithLevel(level, "numbered"_s, "numbered"_s,
+                                      rt::String::fromUTF8(std::to_string(thread)), nullptr, index, nullptr,
+                                      nullptr, nullptr, nullptr, nullptr);
+}
+
+std::size_t threadOf(const LUMLogMessage& message) {
+  return static_cast<std::size_t>(message.file().integerValue());
+}
+
+// The indices of the messages that came, by the threads that logged them. Not locked.
+class Received {
+ public:
+  void add(const LUMLogMessage& message) { indices_.at(threadOf(message)).push_back(message.line()); }
+
+  std::size_t count() const {
+    std::size_t sum = 0;
+    for (const std::vector<std::uint64_t>& indices : indices_) sum += indices.size();
+    return sum;
+  }
+  void expectAll(std::uint64_t count) const {
+    for (const std::vector<std::uint64_t>& indices : indices_) {
+      ASSERT_EQ(indices.size(), count);
+      for (std::uint64_t i = 0; i < count; ++i) ASSERT_EQ(indices.at(i), i);
+    }
+  }
+  void expectSomeInOrder() const {
+    for (const std::vector<std::uint64_t>& indices : indices_) {
+      for (std::size_t i = 1; i < indices.size(); ++i) ASSERT_LT(indices.at(i - 1), indices.at(i));
+    }
+  }
+
+ private:
+  std::array<std::vector<std::uint64_t>, kThreads> indices_;
+};
+
+// Runs `body(thread)` in kThreads threads and `other()` in one more, once and again until these are done.
+template <class Body, class Other>
+void inThreads(Body body, Other other) {
+  std::atomic<bool> isDone = false;
+  std::thread otherThread([&] {
+    do {
+      other();
+    } while (!isDone);
+  });
+  std::vector<std::thread> threads;
+  threads.reserve(kThreads);
+  for (std::size_t thread = 0; thread < kThreads; ++thread) {
+    threads.emplace_back([&body, thread] { body(thread); });
+  }
+  for (std::thread& thread : threads) thread.join();
+  isDone = true;
+  otherThread.join();
+}
+
+class LUMLogMultiplexerThreadsTest : public testing::Test {
+ protected:
+  static constexpr std::uint64_t kMessages = 2000;
+
+  void drain() {
+    multiplexer_->waitForLogging();
+    queue_->barrierSync();
+  }
+
+  const Ref<LUMLogMultiplexer> multiplexer_ = LUMLogMultiplexer::initWithSystemLogger(nullptr);
+  const Ref<Queue> queue_ = rt::make<Queue>("logger"_s);
+};
+
+TEST_F(LUMLogMultiplexerThreadsTest, LosesNothingWhileFiltersAndLoggersComeAndGo) {
+  std::mutex mutex;
+  Received bySync;
+  Received byAsync;  // Touched by tasks of the queue only.
+  multiplexer_->addSyncLogger(rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) {
+    const std::scoped_lock guard(mutex);
+    bySync.add(*message);
+  }));
+  multiplexer_->addAsyncLogger(
+      rt::make<TestAsyncLogger>(queue_, [&](const Ref<LUMLogMessage>& message) { byAsync.add(*message); }));
+
+  std::mutex passingMutex;
+  Received byPassingSync;
+  Received byPassingAsync;
+  const auto passingQueue = rt::make<Queue>("passing"_s);
+  const auto passing = LUMLogMinimumLevelFilter::initWithMinimumLevel(LUMLogLevelInfo);
+  std::uint64_t round = 0;
+  inThreads(
+      [&](std::size_t thread) {
+        for (std::uint64_t i = 0; i < kMessages; ++i) {
+          multiplexer_->logWithMessage(numbered(LUMLogLevelInfo, thread, i));
+          // Everybody adds and removes something now and then.
+          if (i % 16 != 0) continue;
+          const Ref<LUMLogFilter> own = LUMLogNoFilter::init();
+          multiplexer_->addLogFilter(own);
+          multiplexer_->removeLogFilter(own);
+        }
+      },
+      [&] {
+        const auto syncLogger = rt::make<TestSyncLogger>(
+            [&](const Ref<LUMLogMessage>& message) {
+              const std::scoped_lock guard(passingMutex);
+              byPassingSync.add(*message);
+            },
+            passing);
+        const auto asyncLogger = rt::make<TestAsyncLogger>(
+            passingQueue, [&](const Ref<LUMLogMessage>& message) { byPassingAsync.add(*message); });
+        asyncLogger->filter_ = passing;
+        const Ref<LUMLogFilter> filter = LUMLogMinimumLevelFilter::initWithMinimumLevel(round % 2);
+        multiplexer_->addSyncLogger(syncLogger);
+        multiplexer_->addAsyncLogger(asyncLogger);
+        multiplexer_->addLogFilter(filter);
+        multiplexer_->waitForLogging();
+        multiplexer_->removeAsyncLogger(asyncLogger);
+        multiplexer_->removeLogFilter(filter);
+        multiplexer_->removeSyncLogger(syncLogger);
+        ++round;
+      });
+  drain();
+  passingQueue->barrierSync();
+  bySync.expectAll(kMessages);
+  byAsync.expectAll(kMessages);
+  byPassingSync.expectSomeInOrder();
+  byPassingAsync.expectSomeInOrder();
+}
+
+// A logger that logs from within, about every tenth message, once more.
+TEST_F(LUMLogMultiplexerThreadsTest, LosesNothingOfWhatLoggersLogFromWithin) {
+  std::atomic<std::uint64_t> bySync = 0;
+  std::uint64_t byAsync = 0;  // Touched by tasks of the queue only.
+  std::uint64_t byAsyncFromWithin = 0;
+  multiplexer_->addSyncLogger(rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) {
+    ++bySync;
+    if (message->level() == LUMLogLevelInfo && message->line() % 10 == 0) {
+      multiplexer_->logWithMessage(messageWith(LUMLogLevelDebug, "from within"_s));
+    }
+  }));
+  multiplexer_->addAsyncLogger(rt::make<TestAsyncLogger>(queue_, [&](const Ref<LUMLogMessage>& message) {
+    if (message->level() == LUMLogLevelDebug) {
+      ++byAsyncFromWithin;
+      return;
+    }
+    ++byAsync;
+    if (message->level() == LUMLogLevelInfo && message->line() % 10 == 5) {
+      multiplexer_->logWithMessage(messageWith(LUMLogLevelError, "from within a queue"_s));
+    }
+  }));
+  inThreads(
+      [&](std::size_t thread) {
+        for (std::uint64_t i = 0; i < kMessages; ++i) {
+          multiplexer_->logWithMessage(numbered(LUMLogLevelInfo, thread, i));
+        }
+      },
+      [&] {
+        const auto logger = rt::make<TestSyncLogger>([](const Ref<LUMLogMessage>&) {});
+        multiplexer_->addSyncLogger(logger);
+        multiplexer_->removeSyncLogger(logger);
+      });
+  drain();
+  drain();  // What the queue's tasks logged.
+  constexpr std::uint64_t kTenths = kThreads * kMessages / 10;
+  EXPECT_EQ(bySync, kThreads * kMessages + 2 * kTenths);
+  EXPECT_EQ(byAsync, kThreads * kMessages + kTenths);
+  EXPECT_EQ(byAsyncFromWithin, kTenths);
+}
+
+// A logger that wants every seventh message at once gets each message once; those that it gets later are in
+// order, and so are those that it gets at once, which it has when the call returns.
+TEST_F(LUMLogMultiplexerThreadsTest, GivesABlockingLoggerEachMessageOnce) {
+  constexpr auto isUrgent = [](const LUMLogMessage& message) { return message.line() % 7 == 0; };
+  Received later;
+  Received atOnce;
+  std::array<std::atomic<std::uint64_t>, kThreads> lastAtOnce{};
+  const auto logger = rt::make<TestAsyncLogger>(queue_, [&](const Ref<LUMLogMessage>& message) {
+    if (!isUrgent(*message)) {
+      later.add(*message);
+      return;
+    }
+    atOnce.add(*message);
+    lastAtOnce.at(threadOf(*message)) = message->line();
+  });
+  logger->dispatchMode_ = [=](const LUMLogMessage& message) {
+    return isUrgent(message) ? LUMLogDispatchModeSynchronous : LUMLogDispatchMode{0};
+  };
+  multiplexer_->addAsyncLogger(logger);
+  std::atomic<std::uint64_t> missing = 0;
+  inThreads(
+      [&](std::size_t thread) {
+        for (std::uint64_t i = 0; i < kMessages; ++i) {
+          const Ref<LUMLogMessage> message = numbered(LUMLogLevelInfo, thread, i);
+          multiplexer_->logWithMessage(message);
+          if (isUrgent(*message) && lastAtOnce.at(thread) != i) ++missing;
+        }
+      },
+      [&] { multiplexer_->waitForLogging(); });
+  drain();
+  EXPECT_EQ(missing, 0U);
+  later.expectSomeInOrder();
+  atOnce.expectSomeInOrder();
+  std::uint64_t urgent = 0;
+  for (std::uint64_t i = 0; i < kMessages; ++i) urgent += i % 7 == 0 ? 1 : 0;
+  EXPECT_EQ(atOnce.count(), kThreads * urgent);
+  EXPECT_EQ(later.count(), kThreads * (kMessages - urgent));
+}
+
+// Of the changes that threads make at once, none is lost.
+TEST_F(LUMLogMultiplexerThreadsTest, KeepsEveryChange) {
+  constexpr std::uint64_t kEach = 50;
+  std::atomic<std::uint64_t> asked = 0;
+  std::atomic<std::uint64_t> heard = 0;
+  std::atomic<std::uint64_t> heardLater = 0;
+  const auto logger = [&] { return rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>&) { ++heard; }); };
+  inThreads(
+      [&](std::size_t) {
+        for (std::uint64_t i = 0; i < kEach; ++i) {
+          multiplexer_->addLogFilter(rt::make<TestFilter>([&](const LUMLogMessage&) {
+            ++asked;
+            return true;
+          }));
+          multiplexer_->addSyncLogger(logger());
+          const auto passing = logger();
+          multiplexer_->addSyncLogger(passing);
+          multiplexer_->addAsyncLogger(
+              rt::make<TestAsyncLogger>(queue_, [&](const Ref<LUMLogMessage>&) { ++heardLater; }));
+          multiplexer_->removeSyncLogger(passing);
+        }
+      },
+      [] { std::this_thread::yield(); });
+  multiplexer_->logWithMessage(messageWith(LUMLogLevelInfo));
+  drain();
+  EXPECT_EQ(asked, kThreads * kEach);
+  EXPECT_EQ(heard, kThreads * kEach);
+  EXPECT_EQ(heardLater, kThreads * kEach);
+}
+
+// One logger throws, one leaves and comes back, one logs a fault from within, one takes its time: whoever is
+// there all the time misses nothing that was logged before something was thrown.
+TEST_F(LUMLogMultiplexerThreadsTest, KeepsItsPromisesAmongHostileLoggers) {
+  struct Thrown {};
+  std::uint64_t byAsync = 0;  // Touched by tasks of the queue only.
+  std::atomic<std::uint64_t> thrown = 0;
+  multiplexer_->addAsyncLogger(rt::make<TestAsyncLogger>(queue_, [&](const Ref<LUMLogMessage>& message) {
+    if (message->level() == LUMLogLevelInfo) ++byAsync;
+  }));
+  Ref<LUMSyncLogger> leaving;
+  leaving = rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>&) {
+    multiplexer_->removeSyncLogger(leaving);
+    multiplexer_->addSyncLogger(leaving);
+  });
+  multiplexer_->addSyncLogger(leaving);
+  multiplexer_->addSyncLogger(rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) {
+    if (message->level() == LUMLogLevelInfo && message->line() % 8 == 1) {
+      multiplexer_->logWithMessage(messageWith(LUMLogLevelFault, "from within"_s));
+    }
+  }));
+  multiplexer_->addSyncLogger(rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) {
+    if (message->line() % 8 == 2) throw Thrown();
+  }));
+  multiplexer_->addSyncLogger(rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) {
+    if (message->line() % 8 == 3) queue_->barrierSync();
+  }));
+  inThreads(
+      [&](std::size_t thread) {
+        for (std::uint64_t i = 0; i < kMessages; ++i) {
+          try {
+            multiplexer_->logWithMessage(numbered(LUMLogLevelInfo, thread, i));
+          } catch (const Thrown&) {
+            ++thrown;
+          }
+        }
+      },
+      [&] {
+        const auto logger = rt::make<TestAsyncLogger>(queue_, [](const Ref<LUMLogMessage>&) {});
+        multiplexer_->addAsyncLogger(logger);
+        multiplexer_->removeAsyncLogger(logger);
+      });
+  drain();
+  EXPECT_EQ(byAsync, kThreads * kMessages);
+  EXPECT_EQ(thrown, kThreads * kMessages / 8);
+}
+
+}  // namespace

@@ -1,0 +1,31 @@
+#pragma once
+
+/// What takes messages and passes them on to filters and loggers that come and go: see LUMLogMultiplexer.
+///
+///     void Host::attach(LUMLogMultiplexing& multiplexer) { multiplexer.addSyncLogger(terminal_); }
+
+#include "Runtime/Class.h"
+#include "Runtime/Ref.h"
+#include "Shared/Logging/LUMAsyncLogger.h"
+#include "Shared/Logging/LUMLogFilter.h"
+#include "Shared/Logging/LUMLogMessage.h"
+#include "Shared/Logging/LUMSyncLogger.h"
+
+struct LUMLogMultiplexing : rt::Protocol<LUMLogMultiplexing> {
+  /// Passes `message` on; null is ignored. Throws what a filter or a synchronous logger throws.
+  virtual void logWithMessage(const rt::Ref<LUMLogMessage>& message) = 0;
+
+  /// Adds or removes one that all messages must pass. Null is ignored, and so is adding what is there and
+  /// removing what is not; the same goes for loggers.
+  virtual void addLogFilter(const rt::Ref<LUMLogFilter>& filter) = 0;
+  virtual void removeLogFilter(const rt::Ref<LUMLogFilter>& filter) = 0;
+
+  /// Adds or removes a logger. What is being logged meanwhile goes to those that were there when it began.
+  virtual void addSyncLogger(const rt::Ref<LUMSyncLogger>& logger) = 0;
+  virtual void removeSyncLogger(const rt::Ref<LUMSyncLogger>& logger) = 0;
+  virtual void addAsyncLogger(const rt::Ref<LUMAsyncLogger>& logger) = 0;
+  virtual void removeAsyncLogger(const rt::Ref<LUMAsyncLogger>& logger) = 0;
+
+ protected:
+  ~LUMLogMultiplexing() = default;
+};

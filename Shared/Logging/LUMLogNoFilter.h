@@ -1,0 +1,19 @@
+#pragma once
+
+/// Lets every message pass: for where a filter must be and nothing is to be held back.
+///
+///     rt::Ref<LUMLogFilter> filter = LUMLogNoFilter::init();
+///
+/// Not for: a logger's `filter`, which may be null.
+
+#include "Runtime/Class.h"
+#include "Runtime/Object.h"
+#include "Runtime/Ref.h"
+#include "Shared/Logging/LUMLogFilter.h"
+
+class LUMLogNoFilter : public rt::Implements<LUMLogNoFilter, rt::Object, LUMLogFilter> {
+ public:
+  static rt::Ref<LUMLogNoFilter> init() { return rt::make<LUMLogNoFilter>(); }
+
+  bool allowLogMessage(const LUMLogMessage& message) const override;
+};

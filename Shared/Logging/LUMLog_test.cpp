@@ -1,0 +1,362 @@
+#include "Shared/Logging/LUMLog.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <cstdarg>
+#include <cstdint>
+#include <span>
+#include <stdexcept>
+#include <string>
+#include <string_view>
+#include <thread>
+#include <vector>
+
+#include "Runtime/Format.h"
+#include "Runtime/Number.h"
+#include "Runtime/Queue.h"
+#include "Runtime/Thread.h"
+#include "Shared/Logging/LUMLogAddressCallstack.h"
+#include "Shared/Logging/LUMLogMultiplexer.h"
+#include "Shared/Logging/LUMLogSymbolCallstack.h"
+#include "Shared/Logging/LUMSafeNumberParameter.h"
+#include "Shared/Logging/LUMSafeStringParameter.h"
+#include "tests/AllocationCount.h"
+
+namespace {
+
+using namespace rt::literals;
+using testing::HasSubstr;
+
+constexpr const char* kInvalid = "a\xFF";
+
+/// Keeps what it is told.
+class Recorder final : public rt::Implements<Recorder, rt::Object, LUMSyncLogger> {
+ public:
+  void logWithMessage(const rt::Ref<LUMLogMessage>& message) override { messages.push_back(message); }
+  rt::Ref<LUMLogFilter> filter() const override { return nullptr; }
+
+  std::vector<rt::Ref<LUMLogMessage>> messages;
+};
+
+/// The shared multiplexer with a recorder only.
+class LUMLogTest : public testing::Test {
+ protected:
+  LUMLogTest() {
+    const rt::Ref<LUMSystemLogger> replacement = LUMSystemLogger::initWithFilter(nullptr);
+    multiplexer_->addSyncLogger(replacement);
+    multiplexer_->removeSyncLogger(replacement);
+    multiplexer_->addSyncLogger(recorder_);
+  }
+  ~LUMLogTest() override {
+    multiplexer_->removeSyncLogger(recorder_);
+    multiplexer_->setCaptureCallStack(true);
+    multiplexer_->setCaptureCallStackAddresses(true);
+  }
+
+  /// A message by the entry for programs, with `arguments` passed as they are.
+  template <class... Arguments>
+  rt::Ref<LUMLogMessage> log(const std::vector<LUMLogArgumentKind>& kinds, const rt::String& format,
+                             Arguments... arguments) {
+    return LUMLog(LUMLogLevelInfo, "file", "function", 1, nullptr, static_cast<std::int32_t>(kinds.size()),
+                  kinds.data(), format, arguments...);
+  }
+
+  const rt::Ref<LUMLogMultiplexer>& multiplexer_ = LUMLogMultiplexer::sharedInstance();
+  const rt::Ref<Recorder> recorder_ = rt::make<Recorder>();
+};
+
+rt::Object* object(const rt::Ref<rt::Object>& ref) {
+  return ref.get();
+}
+
+TEST_F(LUMLogTest, LogsTheMessageThatItReturns) {
+  const rt::Ref<LUMLogMetadata> metadata = LUMLogMetadata::metadataWithComponent("c"_s);
+  const rt::Ref<LUMLogMessage> message =
+      LUMLog(LUMLogLevelInfo, "a/b", "-[C d:]", 17, metadata, 0, nullptr, "text"_s);
+  ASSERT_EQ(recorder_->messages.size(), 1U);
+  EXPECT_EQ(recorder_->messages[0], message);
+  EXPECT_EQ(message->level(), LUMLogLevelInfo);
+  EXPECT_EQ(message->format(), "text");
+  EXPECT_EQ(message->formattedString(), "text");
+  EXPECT_EQ(message->file(), "a/b");
+  EXPECT_EQ(message->function(), "-[C d:]");
+  EXPECT_EQ(message->line(), 17U);
+  EXPECT_EQ(message->dispatchQueueLabel(), "");
+  EXPECT_FALSE(message->safeParameters());
+  EXPECT_EQ(message->logMetadata(), metadata);
+}
+
+TEST_F(LUMLogTest, TellsWhereItIsCalled) {
+  const unsigned line = __LINE__ + 1;
+  const rt::Ref<LUMLogMessage> message = LUMLogAt(LUMLogLevelInfo, "%@ has %d entries", "a"_s, 3);
+  EXPECT_EQ(message->format(), "%@ has %d entries");
+  EXPECT_EQ(message->formattedString(), "a has 3 entries");
+  EXPECT_EQ(message->file(), __FILE__);
+  EXPECT_EQ(message->function(), __PRETTY_FUNCTION__);
+  EXPECT_EQ(message->line(), line);
+  EXPECT_FALSE(message->logMetadata());
+}
+
+TEST_F(LUMLogTest, TakesMetadataBeforeTheFormat) {
+  const rt::Ref<LUMLogMetadata> metadata = LUMLogMetadata::metadataWithComponent("c"_s);
+  const rt::Ref<LUMLogMessage> message = LUMLogAt(LUMLogLevelInfo, metadata, "%d"_s, 4);
+  EXPECT_EQ(message->logMetadata(), metadata);
+  EXPECT_EQ(message->formattedString(), "4");
+  EXPECT_EQ(message->file(), __FILE__);
+}
+
+TEST_F(LUMLogTest, SaysWhoIsLogging) {
+  std::thread([] {
+    rt::Thread::setCurrentName("Importer"_s);
+    EXPECT_EQ(LUMLogAt(LUMLogLevelInfo, "text")->threadName(), "Importer");
+  }).join();
+  std::thread([] { EXPECT_EQ(LUMLogAt(LUMLogLevelInfo, "text")->threadName(), ""); }).join();
+  rt::make<rt::Queue>("Letters"_s)->sync([] {
+    EXPECT_EQ(LUMLogAt(LUMLogLevelInfo, "text")->dispatchQueueLabel(), "Letters");
+  });
+}
+
+TEST_F(LUMLogTest, KeepsSafeParametersByTheirPlaceAmongAllArguments) {
+  const rt::Ref<rt::Object> safe = LUMSafeStringParameter::parameterWithString("a"_s, 1);
+  const rt::Ref<LUMLogMessage> first = log({1, 0}, "%@ %d"_s, object(safe), 7);
+  EXPECT_EQ(first->formattedString(), "a 7");
+  ASSERT_TRUE(first->safeParameters());
+  EXPECT_TRUE(rt::isEqual(first->safeParameters(), rt::Dictionary::of({{rt::Number::of(0), safe}})));
+  EXPECT_EQ(first->safeParameters()->objectForKey(rt::Number::of(0).get()), safe.get());
+
+  const rt::Ref<LUMLogMessage> second = log({0, 1}, "%d %@"_s, 7, object(safe));
+  EXPECT_TRUE(rt::isEqual(second->safeParameters(), rt::Dictionary::of({{rt::Number::of(1), safe}})));
+
+  // By the call for people as well.
+  const rt::Ref<LUMSafeNumberParameter> number =
+      LUMSafeNumberParameter::parameterWithNumber(rt::Number::of(5), 2);
+  const rt::Ref<LUMLogMessage> both =
+      LUMLogAt(LUMLogLevelInfo, "%s %@ %g %Lg %@ %@", "text", safe, 1.5, 2.5L, "plain"_s, number);
+  EXPECT_EQ(both->formattedString(), "text a 1.5 2.5 plain 5");
+  EXPECT_TRUE(rt::isEqual(both->safeParameters(),
+                          rt::Dictionary::of({{rt::Number::of(1), safe}, {rt::Number::of(5), number}})));
+}
+
+TEST_F(LUMLogTest, ReadsEachKindOfArgument) {
+  const rt::Ref<rt::Object> safe = LUMSafeStringParameter::parameterWithString("a"_s, 1);
+  const auto place = [&](const rt::Ref<LUMLogMessage>& message) {
+    if (!message->safeParameters() || message->safeParameters()->count() != 1) return -1;
+    return static_cast<int>(
+        rt::cast<rt::Number>(message->safeParameters()->begin()->first.get())->integerValue());
+  };
+  // More than go in registers, so that a kind that is read wrongly shows.
+  EXPECT_EQ(place(log({0, 2, 3, 4, 0, 2, 3, 4, 1}, "%d %u %s %p %ld %lu %s %p %@"_s, 1, 2U, "three",
+                      static_cast<const void*>(nullptr), 5L, 6UL, "seven", static_cast<const void*>(nullptr),
+                      object(safe))),
+            8);
+  EXPECT_EQ(place(log({5, 5, 5, 5, 5, 5, 5, 5, 5, 1}, "%g"_s, 1.0, 2.0, 3.0, 4.0, 5.0, 6.0, 7.0, 8.0, 9.0,
+                      object(safe))),
+            9);
+  EXPECT_EQ(place(log({6, 1}, "%Lg %@"_s, 1.0L, object(safe))), 1);
+  EXPECT_EQ(place(log({0, 0, 0, 0, 0, 0, 6, 0, 1}, "%d"_s, 1, 2, 3, 4, 5, 6, 7.0L, 8, object(safe))), 8);
+  // For any other kind nothing is read, and the place counts.
+  EXPECT_EQ(place(log({7, 0, 0xFFFFFFFF, 1}, "%d %@"_s, 1, object(safe))), 3);
+}
+
+TEST_F(LUMLogTest, LooksAtNoMoreArgumentsThanItIsTold) {
+  const rt::Ref<rt::Object> safe = LUMSafeStringParameter::parameterWithString("a"_s, 1);
+  const LUMLogArgumentKind kinds[] = {1};
+  for (const std::int32_t count : {0, -1, -2147483647 - 1}) {
+    const rt::Ref<LUMLogMessage> message =
+        LUMLog(LUMLogLevelInfo, "file", "function", 1, nullptr, count, kinds, "%@"_s, object(safe));
+    EXPECT_EQ(message->formattedString(), "a");
+    EXPECT_FALSE(message->safeParameters());
+  }
+}
+
+/// An object with the name of a class that is like that of a safe parameter.
+template <rt::detail::StringLiteral name>
+class Named final : public rt::Implements<Named<name>, rt::Object> {
+ public:
+  static constexpr std::string_view kClassName = name.view();
+  rt::String description() const override { return "named"_s; }
+};
+
+TEST_F(LUMLogTest, KnowsSafeParametersByTheBeginningOfTheirClassNames) {
+  const auto keeps = [&](const rt::Ref<rt::Object>& argument) {
+    const rt::Ref<LUMLogMessage> message = log({1}, "%@"_s, argument.get());
+    if (!message->safeParameters()) return false;
+    EXPECT_EQ(message->safeParameters()->objectForKey(rt::Number::of(0).get()), argument.get());
+    return true;
+  };
+  EXPECT_TRUE(keeps(rt::make<Named<"LUMSafeStringParameterOfAHost">>()));
+  EXPECT_TRUE(keeps(rt::make<Named<"LUMSafeNumberParameter2">>()));
+  EXPECT_FALSE(keeps(rt::make<Named<"LUMSafeStringParamete">>()));
+  EXPECT_FALSE(keeps(rt::make<Named<"LUMSafeNumberParameteR">>()));
+  EXPECT_FALSE(keeps(rt::make<Named<"XLUMSafeNumberParameter">>()));
+  EXPECT_FALSE(keeps(rt::make<Named<"LUMSafeParameter">>()));
+  EXPECT_FALSE(keeps(rt::Number::of(1)));
+  EXPECT_FALSE(keeps(nullptr));
+}
+
+TEST_F(LUMLogTest, LogsWithoutAFormat) {
+  const rt::Ref<rt::Object> safe = LUMSafeStringParameter::parameterWithString("a"_s, 1);
+  const rt::Ref<LUMLogMessage> message = log({1}, nullptr, object(safe));
+  EXPECT_TRUE(message->format().isNull());
+  EXPECT_TRUE(message->formattedString().isNull());
+  EXPECT_EQ(message->safeParameters()->count(), 1U);
+  EXPECT_EQ(recorder_->messages.size(), 1U);
+}
+
+TEST_F(LUMLogTest, ReplacesPlacesThatAreNotText) {
+  const auto logAt = [](const char* file, const char* function) {
+    return LUMLog(LUMLogLevelInfo, file, function, 1, nullptr, 0, nullptr, "text"_s);
+  };
+  EXPECT_EQ(logAt(kInvalid, "f")->file(), "(invalid file)");
+  EXPECT_EQ(logAt(kInvalid, "f")->function(), "f");
+  EXPECT_EQ(logAt("a", kInvalid)->function(), "(invalid function)");
+  EXPECT_EQ(logAt("a", kInvalid)->file(), "a");
+  EXPECT_EQ(logAt(nullptr, nullptr)->file(), "(invalid file)");
+  EXPECT_EQ(logAt(nullptr, nullptr)->function(), "(invalid function)");
+  EXPECT_EQ(logAt("", "")->file(), "");
+  EXPECT_EQ(logAt("", "")->function(), "");
+}
+
+TEST_F(LUMLogTest, HasACallStackAtTwoLevels) {
+  const auto stackAt = [](LUMLogLevel level) { return LUMLogAt(level, "text")->callstack(); };
+  for (const LUMLogLevel level :
+       {LUMLogLevel{0}, LUMLogLevelDebug, LUMLogLevelInfo, LUMLogLevel{5}, ~LUMLogLevel{0}}) {
+    EXPECT_FALSE(stackAt(level)) << level;
+  }
+  for (const LUMLogLevel level : {LUMLogLevelError, LUMLogLevelFault}) {
+    EXPECT_TRUE(rt::cast<LUMLogAddressCallstack>(stackAt(level))) << level;
+    multiplexer_->setCaptureCallStackAddresses(false);
+    EXPECT_TRUE(rt::cast<LUMLogSymbolCallstack>(stackAt(level))) << level;
+    multiplexer_->setCaptureCallStackAddresses(true);
+    // The third switch changes nothing.
+    multiplexer_->setCaptureSwiftCallStackOnErrorAndAbove(true);
+    EXPECT_TRUE(rt::cast<LUMLogAddressCallstack>(stackAt(level))) << level;
+    multiplexer_->setCaptureSwiftCallStackOnErrorAndAbove(false);
+    multiplexer_->setCaptureCallStack(false);
+    EXPECT_FALSE(stackAt(level)) << level;
+    multiplexer_->setCaptureCallStack(true);
+  }
+}
+
+// What these log is the last thing that they do.
+[[gnu::noinline]] rt::Ref<LUMLogMessage> functionThatLogs(const rt::Ref<LUMLogMetadata>& metadata) {
+  return LUMLogAt(LUMLogLevelError, metadata, "%d", 1);
+}
+[[gnu::noinline]] void functionThatLogsAndForgets() {
+  LUMLogAt(LUMLogLevelFault, "text"_s);
+}
+[[gnu::noinline]] rt::Ref<LUMLogMessage> functionThatLogsLikeAProgram() {
+  rt::Ref<LUMLogMessage> message =
+      LUMLog(LUMLogLevelFault, "file", "function", 1, nullptr, 0, nullptr, "text"_s);
+  rt::CallStack::keepFrame();
+  return message;
+}
+
+std::string firstSymbolOf(const LUMLogMessage& message) {
+  if (auto* symbols = rt::cast<LUMLogSymbolCallstack>(message.callstack().get())) {
+    return std::string(symbols->symbols()->stringAt(0).view());
+  }
+  std::string line;
+  rt::cast<LUMLogAddressCallstack>(message.callstack().get())
+      ->enumerateAddressesWithBlock([&](std::uint64_t address, std::uint64_t /*index*/, bool* stop) {
+        line = rt::CallStack::symbols(std::span(&address, 1)).front().view();
+        *stop = true;
+      });
+  return line;
+}
+
+TEST_F(LUMLogTest, HasTheCallingFunctionFirstInItsCallStack) {
+  for (const bool captureAddresses : {true, false}) {
+    multiplexer_->setCaptureCallStackAddresses(captureAddresses);
+    EXPECT_THAT(firstSymbolOf(*functionThatLogs(nullptr)), HasSubstr("functionThatLogs("));
+    functionThatLogsAndForgets();
+    EXPECT_THAT(firstSymbolOf(*recorder_->messages.back()), HasSubstr("functionThatLogsAndForgets("));
+    EXPECT_THAT(firstSymbolOf(*functionThatLogsLikeAProgram()), HasSubstr("functionThatLogsLikeAProgram("));
+  }
+}
+
+rt::Ref<LUMLogMessage> messageOfList(const rt::Ref<LUMLogCallstack>& callstack,
+                                     const rt::Ref<LUMLogMetadata>& metadata, std::int32_t count,
+                                     const LUMLogArgumentKind* kinds, const char* format, ...) {
+  std::va_list arguments;
+  va_start(arguments, format);
+  rt::Ref<LUMLogMessage> message = LUMLogV(9, "file"_s, nullptr, 5, callstack, metadata, count, kinds,
+                                           rt::String::fromUTF8(format), arguments);
+  // The list is still where it was.
+  EXPECT_EQ(rt::formatV(format, arguments), message->formattedString());
+  va_end(arguments);
+  return message;
+}
+
+TEST_F(LUMLogTest, MakesAMessageOfAListWithoutLoggingIt) {
+  const rt::Ref<LUMLogCallstack> callstack = LUMLogSymbolCallstack::initWithSymbols(nullptr);
+  const rt::Ref<LUMLogMetadata> metadata = LUMLogMetadata::init();
+  const rt::Ref<rt::Object> safe = LUMSafeStringParameter::parameterWithString("a"_s, 1);
+  const LUMLogArgumentKind kinds[] = {0, 1};
+  const rt::Ref<LUMLogMessage> message =
+      messageOfList(callstack, metadata, 2, kinds, "%d %@", 3, object(safe));
+  EXPECT_TRUE(recorder_->messages.empty());
+  EXPECT_EQ(message->level(), 9U);
+  EXPECT_EQ(message->file(), "file");
+  EXPECT_TRUE(message->function().isNull());
+  EXPECT_EQ(message->line(), 5U);
+  EXPECT_EQ(message->callstack(), callstack);
+  EXPECT_EQ(message->logMetadata(), metadata);
+  EXPECT_EQ(message->format(), "%d %@");
+  EXPECT_EQ(message->formattedString(), "3 a");
+  EXPECT_EQ(message->safeParameters()->objectForKey(rt::Number::of(1).get()), safe.get());
+}
+
+class Thrower final : public rt::Implements<Thrower, rt::Object> {
+ public:
+  rt::String description() const override { throw std::runtime_error("no description"); }
+};
+
+TEST_F(LUMLogTest, LetsADescriptionThrow) {
+  const rt::Ref<Thrower> thrower = rt::make<Thrower>();
+  EXPECT_THROW(LUMLogAt(LUMLogLevelInfo, "%@", thrower), std::runtime_error);
+  EXPECT_TRUE(recorder_->messages.empty());
+  LUMLogAt(LUMLogLevelInfo, "the next");
+  EXPECT_EQ(recorder_->messages.size(), 1U);
+}
+
+/// Looks at what it is told, and keeps nothing.
+class Reader final : public rt::Implements<Reader, rt::Object, LUMSyncLogger> {
+ public:
+  void logWithMessage(const rt::Ref<LUMLogMessage>& message) override {
+    length += message->formattedString().length();
+  }
+  rt::Ref<LUMLogFilter> filter() const override { return nullptr; }
+
+  std::size_t length = 0;
+};
+
+TEST_F(LUMLogTest, AllocatesTwicePerMessage) {
+  if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations on this system";
+  multiplexer_->removeSyncLogger(recorder_);
+  const rt::Ref<Reader> reader = rt::make<Reader>();
+  multiplexer_->addSyncLogger(reader);
+  const auto logOnce = [] { LUMLogAt(LUMLogLevelInfo, "%s has %d entries"_s, "holiday.tar", 3); };
+  logOnce();  // The place becomes known.
+  {
+    const AllocationCount count;
+    logOnce();
+    // The message and its text.
+    EXPECT_EQ(count.allocations(), 2);
+  }
+  multiplexer_->removeSyncLogger(reader);
+}
+
+// What is logged before `main` is logged, whatever the order in which a program is initialized.
+struct LoggedWhileLoading {
+  LoggedWhileLoading() : message(LUMLogAt(LUMLogLevelInfo, "loading %d", 1)) {}
+  rt::Ref<LUMLogMessage> message;
+};
+const LoggedWhileLoading loggedWhileLoading;
+
+TEST_F(LUMLogTest, LogsWhileTheProgramIsLoaded) {
+  EXPECT_EQ(loggedWhileLoading.message->formattedString(), "loading 1");
+}
+
+}  // namespace

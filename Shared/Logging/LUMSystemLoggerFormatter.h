@@ -1,0 +1,22 @@
+#pragma once
+
+/// The text of an entry in the system's log: "function: text", or only the text where the function is not
+/// known.
+///
+///     LUMSystemLoggerFormatter::init()->formattedLogMessage(*message);        // "int main(): started"
+///
+/// Not for: lines in files, which want the time too.
+
+#include "Runtime/Class.h"
+#include "Runtime/Object.h"
+#include "Runtime/Ref.h"
+#include "Runtime/String.h"
+#include "Shared/Logging/LUMLogFormatter.h"
+
+class LUMSystemLoggerFormatter
+    : public rt::Implements<LUMSystemLoggerFormatter, rt::Object, LUMLogFormatter> {
+ public:
+  static rt::Ref<LUMSystemLoggerFormatter> init() { return rt::make<LUMSystemLoggerFormatter>(); }
+
+  rt::String formattedLogMessage(const LUMLogMessage& message) const override;
+};

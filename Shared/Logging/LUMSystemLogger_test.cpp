@@ -1,0 +1,397 @@
+// What is in the journal when messages have gone through the system logger: the machine's own journald, run
+// in a private root, is asked. The suite runs as root and as an ordinary user.
+
+#include "Shared/Logging/LUMSystemLogger.h"
+
+#include <gmock/gmock.h>
+#include <grp.h>
+#include <gtest/gtest.h>
+#include <sys/prctl.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <cerrno>
+#include <cstdint>
+#include <cstdlib>
+#include <functional>
+#include <limits>
+#include <new>
+#include <optional>
+#include <set>
+#include <stdexcept>
+#include <string>
+#include <string_view>
+#include <system_error>
+#include <thread>
+#include <utility>
+#include <vector>
+
+#include "Runtime/Bundle.h"
+#include "Runtime/Number.h"
+#include "Runtime/SystemLog.h"
+#include "Shared/Logging/LUMLog.h"
+#include "Shared/Logging/LUMLogDropAllFilter.h"
+#include "Shared/Logging/LUMLogMultiplexer.h"
+#include "Shared/Logging/LUMSystemLoggerFormatter.h"
+#include "tests/PrivateJournal.h"
+#include "tests/TestLoggers.h"
+
+namespace {
+
+using namespace rt::literals;
+using rt::Ref;
+using testing::ElementsAre;
+using testing::IsEmpty;
+
+// Why there is no private journal; empty when there is one.
+std::string refusal;
+
+Ref<LUMLogMessage> messageIn(const rt::String& function, const rt::String& text) {
+  return LUMLogMessage::initWithLevel(LUMLogLevelInfo, "%@"_s, text, "a/b.cpp"_s, function, 7, nullptr,
+                                      nullptr, nullptr, nullptr, nullptr);
+}
+
+TEST(LUMSystemLoggerFormatter, PutsTheFunctionBeforeTheText) {
+  const Ref<LUMSystemLoggerFormatter> formatter = LUMSystemLoggerFormatter::init();
+  EXPECT_EQ(formatter->formattedLogMessage(*messageIn("int main()"_s, "started"_s)), "int main(): started");
+  EXPECT_EQ(formatter->formattedLogMessage(*messageIn("f"_s, ""_s)), "f: ");
+  EXPECT_EQ(formatter->formattedLogMessage(*messageIn("%@"_s, "100 %"_s)), "%@: 100 %");
+  EXPECT_EQ(formatter->formattedLogMessage(*messageIn("f"_s, nullptr)), "f: (null)");
+}
+
+TEST(LUMSystemLoggerFormatter, GivesTheTextAloneWithoutAFunction) {
+  const Ref<LUMSystemLoggerFormatter> formatter = LUMSystemLoggerFormatter::init();
+  EXPECT_EQ(formatter->formattedLogMessage(*messageIn(""_s, "started"_s)), "started");
+  EXPECT_EQ(formatter->formattedLogMessage(*messageIn(nullptr, "started"_s)), "started");
+  EXPECT_EQ(formatter->formattedLogMessage(*messageIn(nullptr, ""_s)), "");
+  EXPECT_EQ(formatter->formattedLogMessage(*messageIn(nullptr, nullptr)), nullptr);
+}
+
+class LUMSystemLoggerTest : public testing::Test {
+ protected:
+  void SetUp() override {
+    if (!PrivateJournal::entered()) GTEST_SKIP() << refusal;
+    journal_.emplace();
+    journal_->start();
+    rt::Bundle::setMainIdentifier("com.example.host"_s);
+  }
+  void TearDown() override { rt::Bundle::setMainIdentifier(nullptr); }
+
+  static Ref<LUMSystemLogger> loggerWith(TestFormatter::Making making) {
+    return LUMSystemLogger::initWithFilter(nullptr, rt::make<TestFormatter>(std::move(making)));
+  }
+
+  // Everything that this program has written and its children have.
+  std::vector<PrivateJournal::Entry> entries() const {
+    return journal_->entries("SYSLOG_IDENTIFIER=LUMSystemLogger_test");
+  }
+  // One field of each of these.
+  std::vector<std::string> fields(const char* name) const {
+    std::vector<std::string> values;
+    for (PrivateJournal::Entry& entry : entries()) values.push_back(entry[name]);
+    return values;
+  }
+  std::vector<std::string> messages() const { return fields("MESSAGE"); }
+
+  // Runs `body` in a child, in which nobody has asked for the environment or the shared multiplexer.
+  static void inChild(const std::function<void()>& body) {
+    const pid_t child = fork();
+    if (child == 0) {
+      body();
+      std::exit(testing::Test::HasFailure() ? 1 : 0);
+    }
+    int status = -1;
+    ASSERT_EQ(waitpid(child, &status, 0), child);
+    EXPECT_EQ(status, 0);
+  }
+
+  std::optional<PrivateJournal> journal_;
+};
+
+TEST_F(LUMSystemLoggerTest, WritesEachLevelWithItsPriority) {
+  const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
+  for (LUMLogLevel level = 0; level <= 6; ++level) {
+    logger->logWithMessage(messageWith(level, rt::String::fromUTF8("level " + std::to_string(level))));
+  }
+  logger->logWithMessage(messageWith(std::numeric_limits<LUMLogLevel>::max(), "level of all bits"_s));
+  logger->logWithMessage(messageWith((std::uint64_t{1} << 32U) + 1, "level 1 in 32 bits"_s));
+  EXPECT_THAT(messages(), ElementsAre("level 1", "level 2", "level 3", "level 4"));
+  EXPECT_THAT(fields("PRIORITY"), ElementsAre("7", "6", "3", "2"));
+}
+
+TEST_F(LUMSystemLoggerTest, WritesUnderTheBundleAndTheComponent) {
+  const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
+  const auto write = [&](Ref<LUMLogMetadata> metadata) {
+    logger->logWithMessage(messageWith(LUMLogLevelError, "x"_s, std::move(metadata)));
+  };
+  write(nullptr);
+  write(LUMLogMetadata::init());
+  write(LUMLogMetadata::metadataWithComponent("Importer"_s));
+  // Not the bundle: what is empty stands alone.
+  write(LUMLogMetadata::metadataWithComponent(""_s));
+  write(LUMLogMetadata::metadataWithCause("a cause"_s));
+  write(LUMLogMetadata::init()->messageWithKey(LUMLogMetadata::kComponentKey, rt::Number::of(1)));
+  EXPECT_THAT(fields("SUBSYSTEM"),
+              ElementsAre("com.example.host", "com.example.host", "com.example.host.Importer", "",
+                          "com.example.host", "com.example.host"));
+  EXPECT_EQ(journal_->entries("SUBSYSTEM=com.example.host.Importer").size(), 1U);
+}
+
+TEST_F(LUMSystemLoggerTest, WritesUnderADotAndTheComponentWithoutABundle) {
+  rt::Bundle::setMainIdentifier(nullptr);
+  ASSERT_EQ(rt::Bundle::mainIdentifier(), "");
+  const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
+  logger->logWithMessage(messageWith(LUMLogLevelError, "x"_s));
+  logger->logWithMessage(
+      messageWith(LUMLogLevelError, "x"_s, LUMLogMetadata::metadataWithComponent("Importer"_s)));
+  logger->logWithMessage(messageWith(LUMLogLevelError, "x"_s, LUMLogMetadata::metadataWithComponent(""_s)));
+  EXPECT_THAT(fields("SUBSYSTEM"), ElementsAre("", ".Importer", ""));
+}
+
+TEST_F(LUMSystemLoggerTest, KeepsTheBundleThatItWasMadeIn) {
+  const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
+  rt::Bundle::setMainIdentifier("com.example.later"_s);
+  logger->logWithMessage(messageWith(LUMLogLevelError, "x"_s));
+  EXPECT_THAT(fields("SUBSYSTEM"), ElementsAre("com.example.host"));
+}
+
+TEST_F(LUMSystemLoggerTest, WritesTheCategory) {
+  const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
+  const auto importer = LUMLogMetadata::metadataWithComponent("Importer"_s);
+  for (const Ref<LUMLogMetadata>& metadata :
+       {Ref<LUMLogMetadata>(), importer, importer->metadataByAddingCategory("network"_s),
+        importer->metadataByAddingCategory(""_s),
+        LUMLogMetadata::init()->metadataByAddingCategory("file"_s)}) {
+    logger->logWithMessage(messageWith(LUMLogLevelInfo, "x"_s, metadata));
+  }
+  EXPECT_THAT(fields("CATEGORY"), ElementsAre("", "", "network", "", "file"));
+}
+
+TEST_F(LUMSystemLoggerTest, WritesFunctionAndText) {
+  const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
+  logger->logWithMessage(messageIn("int main()"_s, "started"_s));
+  logger->logWithMessage(messageIn(nullptr, "started"_s));
+  logger->logWithMessage(messageIn("f"_s, nullptr));
+  logger->logWithMessage(messageIn("f"_s, "100 % of %@ and %s and %n"_s));
+  EXPECT_THAT(messages(),
+              ElementsAre("int main(): started", "started", "f: (null)", "f: 100 % of %@ and %s and %n"));
+}
+
+TEST_F(LUMSystemLoggerTest, WritesNothingWithoutText) {
+  const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
+  logger->logWithMessage(messageIn(nullptr, nullptr));
+  logger->logWithMessage(messageIn(""_s, ""_s));
+  loggerWith([](const LUMLogMessage&) { return rt::String(); })->logWithMessage(messageIn("f"_s, "x"_s));
+  loggerWith([](const LUMLogMessage&) { return ""_s; })->logWithMessage(messageIn("f"_s, "x"_s));
+  EXPECT_THAT(entries(), IsEmpty());
+}
+
+TEST_F(LUMSystemLoggerTest, WritesWhatItsFormatterMakes) {
+  const Ref<LUMLogMessage> message = messageIn("f"_s, "x"_s);
+  int count = 0;
+  const Ref<LUMSystemLogger> logger = loggerWith([&](const LUMLogMessage& asked) {
+    EXPECT_EQ(&asked, message.get());
+    ++count;
+    return "by its formatter"_s;
+  });
+  logger->logWithMessage(message);
+  EXPECT_EQ(count, 1);
+  EXPECT_THAT(messages(), ElementsAre("by its formatter"));
+}
+
+// The formatter is asked before the level is looked at.
+TEST_F(LUMSystemLoggerTest, AsksItsFormatterAboutLevelsThatAreNotWrittenToo) {
+  std::vector<LUMLogLevel> asked;
+  const Ref<LUMSystemLogger> logger = loggerWith([&](const LUMLogMessage& message) {
+    asked.push_back(message.level());
+    return "x"_s;
+  });
+  logger->logWithMessage(messageWith(0));
+  logger->logWithMessage(messageWith(5));
+  EXPECT_THAT(asked, ElementsAre(0, 5));
+  EXPECT_THAT(entries(), IsEmpty());
+}
+
+TEST_F(LUMSystemLoggerTest, WritesNothingWhereItsFormatterThrows) {
+  const Ref<LUMLogMessage> message = messageWith(LUMLogLevelFault, "x"_s);
+  EXPECT_NO_THROW(loggerWith([](const LUMLogMessage&) -> rt::String {
+                    throw std::runtime_error("no text");
+                  })->logWithMessage(message));
+  EXPECT_NO_THROW(loggerWith([](const LUMLogMessage&) -> rt::String { throw 1; })->logWithMessage(message));
+  bool throws = true;
+  const Ref<LUMSystemLogger> logger = loggerWith([&](const LUMLogMessage&) {
+    if (std::exchange(throws, false)) throw std::bad_alloc();
+    return "the next one"_s;
+  });
+  logger->logWithMessage(message);
+  logger->logWithMessage(message);
+  EXPECT_THAT(messages(), ElementsAre("the next one"));
+}
+
+// The multiplexer asks the filter; the logger has been asked already when it is called.
+TEST_F(LUMSystemLoggerTest, HasAFilterAndDoesNotAskIt) {
+  const Ref<LUMLogFilter> filter = LUMLogDropAllFilter::init();
+  const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(filter);
+  EXPECT_EQ(logger->filter(), filter);
+  EXPECT_EQ(LUMSystemLogger::initWithFilter(nullptr)->filter(), nullptr);
+  logger->logWithMessage(messageWith(LUMLogLevelInfo, "by itself"_s));
+  LUMLogMultiplexer::initWithSystemLogger(logger)->logWithMessage(messageWith(LUMLogLevelFault, "refused"_s));
+  LUMLogMultiplexer::initWithSystemLogger(LUMSystemLogger::initWithFilter(nullptr))
+      ->logWithMessage(messageWith(LUMLogLevelDebug, "let pass"_s));
+  EXPECT_THAT(messages(), ElementsAre("by itself", "let pass"));
+}
+
+TEST_F(LUMSystemLoggerTest, WritesEveryByte) {
+  const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
+  const std::vector<std::string> texts = {
+      std::string(200'000, 'l'),
+      "first line\nsecond line\n\nlast line\n",
+      "\n",
+      "h\xc3\xa9llo \xf0\x9f\x8c\x8d",
+      std::string("a\0b\x1b[0m\t\r", 9),
+      "MESSAGE=forged\nPRIORITY=0\nSUBSYSTEM=forged\n" + std::string(200'000, 'x') + "\n",
+  };
+  for (const std::string& text : texts) {
+    logger->logWithMessage(messageWith(LUMLogLevelError, rt::String::fromUTF8(text)));
+  }
+  EXPECT_TRUE(messages() == texts);
+  for (const std::string& priority : fields("PRIORITY")) EXPECT_EQ(priority, "3");
+}
+
+TEST_F(LUMSystemLoggerTest, TakesForeignTextInItsFieldsAsItIs) {
+  const auto metadata = LUMLogMetadata::metadataWithComponent("a\nPRIORITY=0"_s)
+                            ->metadataByAddingCategory("b\nMESSAGE=forged"_s);
+  LUMSystemLogger::initWithFilter(nullptr)->logWithMessage(messageWith(LUMLogLevelInfo, "x"_s, metadata));
+  EXPECT_THAT(fields("SUBSYSTEM"), ElementsAre("com.example.host.a\nPRIORITY=0"));
+  EXPECT_THAT(fields("CATEGORY"), ElementsAre("b\nMESSAGE=forged"));
+  EXPECT_THAT(fields("PRIORITY"), ElementsAre("6"));
+  EXPECT_THAT(messages(), ElementsAre("x"));
+}
+
+// Invariant: every message is written, once, but for those that a machine too busy to run the journal drops
+// and counts.
+TEST_F(LUMSystemLoggerTest, IsUsedByAllThreadsAtOnce) {
+  const std::uint64_t droppedBefore = rt::SystemLog::droppedCount();
+  const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
+  std::set<std::string> sent;
+  std::vector<std::thread> threads;
+  for (int thread = 0; thread < 8; ++thread) {
+    const std::string name = "thread " + std::to_string(thread) + ' ';
+    for (int i = 0; i < 100; ++i) sent.insert(name + std::to_string(i));
+    threads.emplace_back([&logger, name] {
+      for (int i = 0; i < 100; ++i) {
+        const auto metadata = LUMLogMetadata::metadataWithComponent(rt::String::fromUTF8(name));
+        logger->logWithMessage(
+            messageWith(LUMLogLevelInfo, rt::String::fromUTF8(name + std::to_string(i)), metadata));
+      }
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+  for (PrivateJournal::Entry& entry : entries()) {
+    if (entry["SUBSYSTEM"] == "rt") continue;  // The count.
+    EXPECT_EQ(sent.erase(entry["MESSAGE"]), 1U) << entry["MESSAGE"];
+    EXPECT_EQ("com.example.host." + entry["MESSAGE"].substr(0, 9), entry["SUBSYSTEM"]);
+  }
+  EXPECT_EQ(sent.size(), rt::SystemLog::droppedCount() - droppedBefore);
+}
+
+// By way of the shared multiplexer, as a program begins.
+
+class LUMSystemLoggerAtTheStartTest : public LUMSystemLoggerTest {
+ protected:
+  // What is written of a message of each level from 0 to 5, in a program that begins in the mode, and has a
+  // logger without a filter besides, which hears all of them.
+  std::vector<std::string> writtenInMode(const char* mode) {
+    inChild([mode] {
+      if (mode != nullptr) {
+        setenv("OS_ACTIVITY_MODE", mode, 1);
+      } else {
+        unsetenv("OS_ACTIVITY_MODE");
+      }
+      std::vector<LUMLogLevel> heard;
+      LUMLogMultiplexer::sharedInstance()->addSyncLogger(rt::make<TestSyncLogger>(
+          [&](const Ref<LUMLogMessage>& message) { heard.push_back(message->level()); }));
+      for (LUMLogLevel level = 0; level <= 5; ++level) {
+        LUMLogMultiplexer::sharedInstance()->logWithMessage(
+            messageWith(level, rt::String::fromUTF8("level " + std::to_string(level))));
+      }
+      EXPECT_THAT(heard, ElementsAre(0, 1, 2, 3, 4, 5));
+    });
+    return messages();
+  }
+};
+
+TEST_F(LUMSystemLoggerAtTheStartTest, WritesErrorsAndFaults) {
+  EXPECT_THAT(writtenInMode(nullptr), ElementsAre("level 3", "level 4"));
+  EXPECT_THAT(fields("SUBSYSTEM"), ElementsAre("com.example.host", "com.example.host"));
+}
+
+TEST_F(LUMSystemLoggerAtTheStartTest, WritesInfoInTheModeInfo) {
+  EXPECT_THAT(writtenInMode("info"), ElementsAre("level 2", "level 3", "level 4"));
+}
+
+TEST_F(LUMSystemLoggerAtTheStartTest, WritesDebugInTheModeDebug) {
+  EXPECT_THAT(writtenInMode("debug"), ElementsAre("level 1", "level 2", "level 3", "level 4"));
+}
+
+TEST_F(LUMSystemLoggerAtTheStartTest, WritesWhatIsLogged) {
+  inChild([] {
+    const auto metadata =
+        LUMLogMetadata::metadataWithComponent("Importer"_s)->metadataByAddingCategory("archive"_s);
+    LUMLogAt(LUMLogLevelError, metadata, "entry %d is damaged"_s, 2);
+    LUMLogAt(LUMLogLevelInfo, metadata, "not written"_s);
+  });
+  ASSERT_EQ(entries().size(), 1U);
+  PrivateJournal::Entry entry = entries().front();
+  EXPECT_THAT(entry["MESSAGE"], testing::EndsWith(": entry 2 is damaged"));
+  EXPECT_EQ(entry["PRIORITY"], "3");
+  EXPECT_EQ(entry["SUBSYSTEM"], "com.example.host.Importer");
+  EXPECT_EQ(entry["CATEGORY"], "archive");
+}
+
+TEST_F(LUMSystemLoggerAtTheStartTest, GivesWayToTheFirstThatIsAddedOnly) {
+  inChild([] {
+    const auto& multiplexer = LUMLogMultiplexer::sharedInstance();
+    const auto adding = [&](const rt::String& text) {
+      multiplexer->addSyncLogger(loggerWith([=](const LUMLogMessage&) { return text; }));
+      multiplexer->logWithMessage(messageWith(LUMLogLevelFault, "by the first"_s));
+    };
+    multiplexer->logWithMessage(messageWith(LUMLogLevelFault, "by the first"_s));
+    adding("by the second"_s);
+    adding("by the third"_s);
+  });
+  const std::vector<std::string> written = messages();
+  ASSERT_EQ(written.size(), 4U);
+  EXPECT_EQ(written[0], "by the first");
+  EXPECT_EQ(written[1], "by the second");
+  EXPECT_THAT((std::vector<std::string>{written[2], written[3]}),
+              testing::UnorderedElementsAre("by the second", "by the third"));
+}
+
+void require(bool succeeded, const char* what) {
+  if (!succeeded) throw std::system_error(errno, std::generic_category(), what);
+}
+
+void becomeOrdinaryUser() {
+  constexpr uid_t kUser = 1000;
+  constexpr gid_t kGroup = 1001;
+  if (geteuid() != 0)
+    throw std::runtime_error("an ordinary user already; the other run of this suite was its");
+  require(setgroups(0, nullptr) == 0 && setgid(kGroup) == 0 && setuid(kUser) == 0, "another user");
+  // Who changes identity loses the say over its own /proc entries, in which namespaces are set up.
+  require(prctl(PR_SET_DUMPABLE, 1) == 0, "PR_SET_DUMPABLE");
+}
+
+}  // namespace
+
+int main(int argumentCount, char** arguments) {
+  testing::InitGoogleTest(&argumentCount, arguments);
+  if (testing::GTEST_FLAG(list_tests)) return RUN_ALL_TESTS();
+  try {
+    if (argumentCount > 1 && std::string_view(arguments[1]) == "--as-ordinary-user") becomeOrdinaryUser();
+    PrivateJournal::enter();
+  } catch (const std::exception& problem) {
+    refusal = std::string("no private journal: ") + problem.what();
+  }
+  return RUN_ALL_TESTS();
+}

@@ -1,0 +1,75 @@
+// A host program that logs: to a file of its own, on the file's own queue, the messages of one component, and
+// that hears of every misuse of the libraries. Its log file is standard output here.
+//
+// Its entries are in the system's log too: journalctl SUBSYSTEM=com.example.Importer
+
+#include <utility>
+
+#include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
+#include "Runtime/FileHandle.h"
+#include "Runtime/Format.h"
+#include "Runtime/Number.h"
+#include "Runtime/Queue.h"
+#include "Shared/Logging/LUMAsyncLogger.h"
+#include "Shared/Logging/LUMLog.h"
+#include "Shared/Logging/LUMLogComponentFilter.h"
+#include "Shared/Logging/LUMLogMultiplexer.h"
+#include "Shared/Logging/LUMSafeNumberParameter.h"
+
+using namespace rt::literals;
+
+extern "C" const char kMainBundleIdentifier[] = "com.example";
+
+class FileLogger final : public rt::Implements<FileLogger, rt::Object, LUMAsyncLogger> {
+ public:
+  FileLogger(rt::Ref<rt::FileHandle> file, rt::Ref<LUMLogFilter> filter)
+      : file_(std::move(file)), filter_(std::move(filter)) {}
+
+  void logWithMessage(const rt::Ref<LUMLogMessage>& message) override {
+    file_->writeLine(rt::format("%lu: %@"_s, message->level(), message->formattedString()));
+  }
+  rt::Ref<LUMLogFilter> filter() const override { return filter_; }
+  rt::Ref<rt::Queue> operationQueue() const override { return queue_; }
+
+  // A fault is in the file before the program goes on.
+  LUMLogDispatchMode dispatchModeForMessage(const LUMLogMessage& message) const override {
+    return message.level() == LUMLogLevelFault ? LUMLogDispatchModeSynchronous : 0;
+  }
+
+ private:
+  const rt::Ref<rt::FileHandle> file_;
+  const rt::Ref<LUMLogFilter> filter_;
+  const rt::Ref<rt::Queue> queue_ = rt::make<rt::Queue>("FileLogger"_s, rt::QualityOfService::kUtility);
+};
+
+int main() {
+  const rt::Ref<LUMLogMultiplexer>& multiplexer = LUMLogMultiplexer::sharedInstance();
+  const rt::Ref<FileLogger> logger = rt::make<FileLogger>(
+      rt::FileHandle::standardOutput(), LUMLogComponentFilter::initWithComponent("Importer"_s));
+  multiplexer->addAsyncLogger(logger);
+
+  PECErrorHandler::sharedInstance()->registerErrorHandlerBlock([](const rt::Ref<PECErrorDescription>& error) {
+    rt::FileHandle::standardOutput()->writeLine(
+        rt::format("line %lu: %@"_s, error->lineNumber(), error->errorMessage()));
+  });
+
+  const rt::Ref<LUMLogMetadata> importer = LUMLogMetadata::metadataWithComponent("Importer"_s);
+  const rt::String name = "holiday.tar"_s;
+  LUMLogAt(LUMLogLevelInfo, importer, "%@ has %d entries"_s, name, 3);
+  LUMLogAt(LUMLogLevelInfo, "of no component"_s);
+
+  // A parameter that is safe to upload is kept in the message by itself, too.
+  const rt::Ref<LUMLogMessage> message =
+      LUMLogAt(LUMLogLevelError, importer->metadataByAddingCategory("archive"_s), "entry %@ is damaged"_s,
+               LUMSafeNumberParameter::parameterWithNumber(rt::Number::of(2), 1));
+
+  // What was logged is in the file when the queues have run.
+  multiplexer->waitForLogging();
+  logger->operationQueue()->barrierSync();
+  rt::FileHandle::standardOutput()->writeLine(
+      rt::format("%zu safe parameter"_s, message->safeParameters()->count()));
+
+  // A second callback is a mistake, of which the first is told.
+  PECErrorHandler::sharedInstance()->registerErrorHandlerBlock([](const rt::Ref<PECErrorDescription>&) {});
+  return 0;
+}

@@ -1,0 +1,74 @@
+#pragma once
+
+/// What the libraries report as misuse while it is there, on one thread. The error callback meanwhile
+/// returns, and nothing reaches the system's log.
+///
+///     TestReports reports;
+///     SRLClassType::initWithClass(nullptr);
+///     EXPECT_THAT(reports.texts(), ElementsAre("SRLClassType's concreteClass must not be nil."));
+///
+/// Not for: anything but tests.
+
+#include <cstdint>
+#include <string>
+#include <utility>
+#include <vector>
+
+#include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
+#include "Runtime/Dictionary.h"
+#include "Runtime/Number.h"
+#include "Shared/Logging/LUMLogDropAllFilter.h"
+#include "Shared/Logging/LUMLogLevel.h"
+#include "Shared/Logging/LUMLogMessage.h"
+#include "Shared/Logging/LUMLogMultiplexer.h"
+#include "Shared/Logging/LUMSafeParameter.h"
+#include "Shared/Logging/LUMSystemLogger.h"
+#include "tests/TestLoggers.h"
+
+class TestReports {
+ public:
+  TestReports() {
+    static const bool isSystemLogQuiet = [] {
+      LUMLogMultiplexer::sharedInstance()->addSyncLogger(
+          LUMSystemLogger::initWithFilter(LUMLogDropAllFilter::init()));
+      return true;
+    }();
+    static_cast<void>(isSystemLogQuiet);
+    LUMLogMultiplexer::sharedInstance()->addSyncLogger(logger_);
+    PECErrorHandler::sharedInstance()->setErrorHandlerBlock([](const rt::Ref<PECErrorDescription>&) {});
+  }
+  TestReports(const TestReports&) = delete;
+  TestReports& operator=(const TestReports&) = delete;
+  ~TestReports() {
+    LUMLogMultiplexer::sharedInstance()->removeSyncLogger(logger_);
+    PECErrorHandler::resetAfterTest();
+  }
+
+  /// The messages since the last call of this function or the next.
+  std::vector<rt::Ref<LUMLogMessage>> messages() { return std::exchange(messages_, {}); }
+
+  /// Their texts, of those that are faults.
+  std::vector<std::string> texts() {
+    std::vector<std::string> texts;
+    for (const rt::Ref<LUMLogMessage>& message : messages()) {
+      if (message->level() == LUMLogLevelFault) texts.push_back(text(*message));
+    }
+    return texts;
+  }
+
+ private:
+  std::vector<rt::Ref<LUMLogMessage>> messages_;
+  const rt::Ref<LUMSyncLogger> logger_ = rt::make<TestSyncLogger>(
+      [this](const rt::Ref<LUMLogMessage>& message) { messages_.push_back(message); });
+};
+
+/// How many parameters of a message are kept by themselves, as safe ones of type 1.
+inline std::int32_t countOfSafeParameters(const LUMLogMessage& message) {
+  if (!message.safeParameters()) return 0;
+  std::int32_t count = 0;
+  for (const auto& entry : *message.safeParameters()) {
+    const auto* parameter = rt::cast<LUMSafeParameter>(entry.second.get());
+    if (parameter != nullptr && parameter->type() == 1) ++count;
+  }
+  return count;
+}

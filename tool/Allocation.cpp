@@ -47,20 +47,20 @@ void* malloc(std::size_t size) noexcept {
 void free(void* /*block*/) noexcept {}
 
 // Memory that was never used is zero.
-void* calloc(std::size_t count, std::size_t size) noexcept {
-  if (size != 0 && count > sizeof memory / size) {
+void* calloc(std::size_t nmemb, std::size_t size) noexcept {
+  if (size != 0 && nmemb > sizeof memory / size) {
     errno = ENOMEM;
     return nullptr;
   }
-  return allocate(count * size, kAlignment);
+  return allocate(nmemb * size, kAlignment);
 }
 
-void* realloc(void* block, std::size_t size) noexcept {
+void* realloc(void* ptr, std::size_t size) noexcept {
   void* const larger = allocate(size, kAlignment);
-  if (block != nullptr && larger != nullptr) {
+  if (ptr != nullptr && larger != nullptr) {
     Header header{};
-    std::memcpy(&header, static_cast<unsigned char*>(block) - sizeof header, sizeof header);
-    std::memcpy(larger, block, std::min(header.size, size));
+    std::memcpy(&header, static_cast<unsigned char*>(ptr) - sizeof header, sizeof header);
+    std::memcpy(larger, ptr, std::min(header.size, size));
   }
   return larger;
 }
@@ -73,10 +73,10 @@ void* aligned_alloc(std::size_t alignment, std::size_t size) noexcept {
   return memalign(alignment, size);
 }
 
-int posix_memalign(void** block, std::size_t alignment, std::size_t size) noexcept {
+int posix_memalign(void** memptr, std::size_t alignment, std::size_t size) noexcept {
   void* const aligned = memalign(alignment, size);
   if (aligned == nullptr) return ENOMEM;
-  *block = aligned;
+  *memptr = aligned;
   return 0;
 }
 

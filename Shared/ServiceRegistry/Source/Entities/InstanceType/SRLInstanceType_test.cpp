@@ -1,0 +1,196 @@
+// The three instance types, and the function that makes whichever fits.
+
+#include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLInstanceType.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <cstdint>
+#include <functional>
+#include <string>
+#include <string_view>
+#include <vector>
+
+#include "Runtime/Class.h"
+#include "Runtime/Ref.h"
+#include "Runtime/String.h"
+#include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassProtocolType.h"
+#include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
+#include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLMakeInstanceTypeContainer.h"
+#include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLProtocolType.h"
+#include "tests/TestReports.h"
+
+namespace {
+
+using rt::classInfo;
+using rt::isEqual;
+using rt::protocolInfo;
+using rt::Ref;
+using testing::ElementsAre;
+using testing::IsEmpty;
+
+struct Clock : rt::Protocol<Clock> {
+ protected:
+  ~Clock() = default;
+};
+struct AlarmClock : rt::Protocol<AlarmClock, Clock> {
+ protected:
+  ~AlarmClock() = default;
+};
+class View : public rt::Implements<View, rt::Object> {};
+class ClockView : public rt::Implements<ClockView, View, Clock> {};
+class BigClockView final : public rt::Implements<BigClockView, ClockView> {};
+class AlarmView final : public rt::Implements<AlarmView, View, AlarmClock> {};
+class PlainView final : public rt::Implements<PlainView, View> {};
+class OtherClock final : public rt::Implements<OtherClock, rt::Object, Clock> {};
+
+std::uint64_t hashOf(std::string_view text) {
+  return std::hash<std::string_view>()(text);
+}
+std::uint64_t hashOf(const rt::ClassInfo& info) {
+  return std::hash<const rt::ClassInfo*>()(&info);
+}
+
+// What one message says of where it is from.
+void expectFrom(TestReports& reports, const std::string& file, const std::string& function,
+                const std::string& report) {
+  const std::vector<Ref<LUMLogMessage>> messages = reports.messages();
+  ASSERT_EQ(messages.size(), 1U);
+  EXPECT_EQ(messages[0]->level(), LUMLogLevelFault);
+  EXPECT_EQ(messages[0]->file(), "Shared/ServiceRegistry/Source/Entities/InstanceType/" + file);
+  EXPECT_EQ(messages[0]->function(), function);
+  EXPECT_GT(messages[0]->line(), 0U);
+  EXPECT_EQ(text(*messages[0]), report);
+  EXPECT_FALSE(messages[0]->safeParameters());
+}
+
+TEST(SRLClassType, IsForAClassAndWhatDerivesFromIt) {
+  const Ref<SRLClassType> type = SRLClassType::initWithClass(&classInfo<ClockView>());
+  EXPECT_EQ(&type->concreteClass(), &classInfo<ClockView>());
+  EXPECT_TRUE(type->doesRepresentSupertypeOfClass(classInfo<ClockView>()));
+  EXPECT_TRUE(type->doesRepresentSupertypeOfClass(classInfo<BigClockView>()));
+  EXPECT_FALSE(type->doesRepresentSupertypeOfClass(classInfo<View>()));
+  EXPECT_FALSE(type->doesRepresentSupertypeOfClass(classInfo<OtherClock>()));
+}
+
+TEST(SRLClassType, IsAValue) {
+  const Ref<SRLClassType> type = SRLClassType::initWithClass(&classInfo<View>());
+  EXPECT_EQ(type->description(), "View");
+  EXPECT_EQ(type->hash(), hashOf(classInfo<View>()));
+  EXPECT_TRUE(isEqual(type, type));
+  EXPECT_TRUE(isEqual(type, SRLClassType::initWithClass(&classInfo<View>())));
+  EXPECT_FALSE(isEqual(type, SRLClassType::initWithClass(&classInfo<ClockView>())));
+  EXPECT_FALSE(
+      isEqual(type, SRLClassProtocolType::initWithClass(&classInfo<View>(), &protocolInfo<Clock>())));
+  EXPECT_FALSE(type->isEqual(nullptr));
+  EXPECT_EQ(rt::copy(type), type);
+  EXPECT_EQ(classInfo<SRLClassType>().superclass, &classInfo<rt::Object>());
+  EXPECT_TRUE(type->conformsTo(protocolInfo<SRLInstanceType>()));
+}
+
+TEST(SRLClassType, NeedsAClass) {
+  TestReports reports;
+  EXPECT_EQ(SRLClassType::initWithClass(nullptr), nullptr);
+  expectFrom(reports, "SRLClassType", "-[SRLClassType initWithClass:]",
+             "SRLClassType's concreteClass must not be nil.");
+  EXPECT_EQ(SRLClassType::initWithClass(rt::classNamed("NoSuchClass")), nullptr);
+  EXPECT_THAT(reports.texts(), ElementsAre("SRLClassType's concreteClass must not be nil."));
+}
+
+TEST(SRLProtocolType, IsForWhateverConforms) {
+  const Ref<SRLProtocolType> type = SRLProtocolType::initWithProtocol(&protocolInfo<Clock>());
+  EXPECT_EQ(&type->concreteProtocol(), &protocolInfo<Clock>());
+  EXPECT_TRUE(type->doesRepresentSupertypeOfClass(classInfo<ClockView>()));
+  EXPECT_TRUE(type->doesRepresentSupertypeOfClass(classInfo<BigClockView>()));  // by its superclass
+  EXPECT_TRUE(type->doesRepresentSupertypeOfClass(classInfo<AlarmView>()));     // by an inherited protocol
+  EXPECT_TRUE(type->doesRepresentSupertypeOfClass(classInfo<OtherClock>()));
+  EXPECT_FALSE(type->doesRepresentSupertypeOfClass(classInfo<View>()));
+  const Ref<SRLProtocolType> alarm = SRLProtocolType::initWithProtocol(&protocolInfo<AlarmClock>());
+  EXPECT_TRUE(alarm->doesRepresentSupertypeOfClass(classInfo<AlarmView>()));
+  EXPECT_FALSE(alarm->doesRepresentSupertypeOfClass(classInfo<ClockView>()));
+}
+
+TEST(SRLProtocolType, IsAValue) {
+  const Ref<SRLProtocolType> type = SRLProtocolType::initWithProtocol(&protocolInfo<Clock>());
+  EXPECT_EQ(type->description(), "id<Clock>");
+  EXPECT_EQ(type->hash(), hashOf("Clock"));
+  EXPECT_TRUE(isEqual(type, type));
+  EXPECT_TRUE(isEqual(type, SRLProtocolType::initWithProtocol(&protocolInfo<Clock>())));
+  // Inherits it, and is another all the same.
+  EXPECT_FALSE(isEqual(type, SRLProtocolType::initWithProtocol(&protocolInfo<AlarmClock>())));
+  EXPECT_FALSE(
+      isEqual(type, SRLClassProtocolType::initWithClass(&classInfo<View>(), &protocolInfo<Clock>())));
+  EXPECT_FALSE(type->isEqual(nullptr));
+  EXPECT_EQ(rt::copy(type), type);
+  EXPECT_EQ(classInfo<SRLProtocolType>().superclass, &classInfo<rt::Object>());
+}
+
+TEST(SRLProtocolType, NeedsAProtocol) {
+  TestReports reports;
+  EXPECT_EQ(SRLProtocolType::initWithProtocol(nullptr), nullptr);
+  expectFrom(reports, "SRLProtocolType", "-[SRLProtocolType initWithProtocol:]",
+             "SRLProtocolType's concreteProtocol must not be nil.");
+}
+
+TEST(SRLClassProtocolType, IsForSubclassesThatConform) {
+  const Ref<SRLClassProtocolType> type =
+      SRLClassProtocolType::initWithClass(&classInfo<View>(), &protocolInfo<Clock>());
+  EXPECT_EQ(&type->concreteClass(), &classInfo<View>());
+  EXPECT_EQ(&type->concreteProtocol(), &protocolInfo<Clock>());
+  EXPECT_TRUE(type->doesRepresentSupertypeOfClass(classInfo<ClockView>()));
+  EXPECT_TRUE(type->doesRepresentSupertypeOfClass(classInfo<BigClockView>()));
+  EXPECT_TRUE(type->doesRepresentSupertypeOfClass(classInfo<AlarmView>()));
+  EXPECT_FALSE(type->doesRepresentSupertypeOfClass(classInfo<PlainView>()));   // does not conform
+  EXPECT_FALSE(type->doesRepresentSupertypeOfClass(classInfo<OtherClock>()));  // no subclass
+  EXPECT_FALSE(type->doesRepresentSupertypeOfClass(classInfo<View>()));
+  EXPECT_FALSE(type->doesRepresentSupertypeOfClass(classInfo<rt::Object>()));
+}
+
+TEST(SRLClassProtocolType, IsAValue) {
+  const auto typeOf = [](const rt::ClassInfo& aClass, const rt::ProtocolInfo& protocol) {
+    return SRLClassProtocolType::initWithClass(&aClass, &protocol);
+  };
+  const Ref<SRLClassProtocolType> type = typeOf(classInfo<View>(), protocolInfo<Clock>());
+  EXPECT_EQ(type->description(), "View<Clock>");
+  EXPECT_EQ(type->hash(), 41 * hashOf("Clock") + hashOf(classInfo<View>()));
+  EXPECT_TRUE(isEqual(type, type));
+  EXPECT_TRUE(isEqual(type, typeOf(classInfo<View>(), protocolInfo<Clock>())));
+  EXPECT_FALSE(isEqual(type, typeOf(classInfo<PlainView>(), protocolInfo<Clock>())));
+  EXPECT_FALSE(isEqual(type, typeOf(classInfo<View>(), protocolInfo<AlarmClock>())));
+  EXPECT_FALSE(isEqual(type, SRLClassType::initWithClass(&classInfo<View>())));
+  EXPECT_FALSE(isEqual(type, SRLProtocolType::initWithProtocol(&protocolInfo<Clock>())));
+  EXPECT_FALSE(type->isEqual(nullptr));
+  EXPECT_EQ(rt::copy(type), type);
+  EXPECT_EQ(classInfo<SRLClassProtocolType>().superclass, &classInfo<rt::Object>());
+}
+
+TEST(SRLClassProtocolType, NeedsBoth) {
+  TestReports reports;
+  EXPECT_EQ(SRLClassProtocolType::initWithClass(nullptr, &protocolInfo<Clock>()), nullptr);
+  expectFrom(reports, "SRLClassProtocolType", "-[SRLClassProtocolType initWithClass:constrainedToProtocol:]",
+             "concreteClass and concreteProtocol must be provided.");
+  EXPECT_EQ(SRLClassProtocolType::initWithClass(&classInfo<View>(), nullptr), nullptr);
+  EXPECT_EQ(SRLClassProtocolType::initWithClass(nullptr, nullptr), nullptr);
+  EXPECT_THAT(reports.texts(), ElementsAre("concreteClass and concreteProtocol must be provided.",
+                                           "concreteClass and concreteProtocol must be provided."));
+}
+
+TEST(SRLMakeInstanceTypeContainer, MakesWhatFits) {
+  TestReports reports;
+  EXPECT_TRUE(isEqual(SRLMakeInstanceTypeContainer(&classInfo<View>(), &protocolInfo<Clock>()),
+                      SRLClassProtocolType::initWithClass(&classInfo<View>(), &protocolInfo<Clock>())));
+  EXPECT_TRUE(isEqual(SRLMakeInstanceTypeContainer(nullptr, &protocolInfo<Clock>()),
+                      SRLProtocolType::initWithProtocol(&protocolInfo<Clock>())));
+  EXPECT_TRUE(isEqual(SRLMakeInstanceTypeContainer(&classInfo<View>(), nullptr),
+                      SRLClassType::initWithClass(&classInfo<View>())));
+  EXPECT_THAT(reports.texts(), IsEmpty());
+}
+
+TEST(SRLMakeInstanceTypeContainer, NeedsEither) {
+  TestReports reports;
+  EXPECT_EQ(SRLMakeInstanceTypeContainer(nullptr, nullptr), nullptr);
+  expectFrom(reports, "SRLMakeInstanceTypeContainer", "SRLMakeInstanceTypeContainer",
+             "Either instanceClass or instanceProtocol must be provided.");
+}
+
+}  // namespace

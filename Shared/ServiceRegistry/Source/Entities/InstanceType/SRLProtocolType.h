@@ -1,0 +1,43 @@
+#pragma once
+
+/// Instances of any class that conforms to a protocol.
+///
+///     rt::Ref<SRLProtocolType> type = SRLProtocolType::initWithProtocol(&rt::protocolInfo<Clock>());
+///     type->description();                                 // "id<Clock>"
+///
+/// Immutable: any thread may use it.
+///
+/// Not for: types that a class says something about (SRLClassType, SRLClassProtocolType).
+
+#include <cstdint>
+
+#include "Runtime/Class.h"
+#include "Runtime/Object.h"
+#include "Runtime/Ref.h"
+#include "Runtime/String.h"
+#include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLInstanceType.h"
+
+class SRLProtocolType final : public rt::Implements<SRLProtocolType, rt::Object, SRLInstanceType> {
+ public:
+  /// For `concreteProtocol`. Null is reported, and yields null. Throws what the error callback throws, and
+  /// std::bad_alloc.
+  static rt::Ref<SRLProtocolType> initWithProtocol(const rt::ProtocolInfo* concreteProtocol);
+
+  const rt::ProtocolInfo& concreteProtocol() const noexcept { return concreteProtocol_; }
+
+  /// Whether `aClass` conforms to the protocol, by itself or by a superclass.
+  bool doesRepresentSupertypeOfClass(const rt::ClassInfo& aClass) const override;
+
+  /// Whether `other` is for the same protocol.
+  bool isEqual(const rt::Object* other) const override;
+  /// That of the protocol's name.
+  std::uint64_t hash() const override;
+  /// "id<NAME>" with the protocol's name.
+  rt::String description() const override;
+
+ private:
+  explicit SRLProtocolType(const rt::ProtocolInfo& concreteProtocol) noexcept
+      : concreteProtocol_(concreteProtocol) {}
+
+  const rt::ProtocolInfo& concreteProtocol_;
+};

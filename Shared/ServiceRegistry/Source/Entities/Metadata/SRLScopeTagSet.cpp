@@ -1,0 +1,107 @@
+#include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSet.h"
+
+#include <algorithm>
+#include <span>
+
+#include "Libraries/Util/ErrorHandler/PECReport.h"
+
+using namespace rt::literals;
+
+namespace {
+
+constexpr const char* kFile = "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSet";
+
+std::span<rt::Object* const> usedTags(const SRLScopeTagSet& set) noexcept {
+  return {set.tags.begin(), std::ranges::find(set.tags, nullptr)};
+}
+
+// By pairs, since counting the bits of a word is a call of a library function on the plainest processors.
+bool hasOneTagForEachBit(const SRLScopeTagSet& set, SRLScopeType scope) noexcept {
+  for (const rt::Object* tag : set.tags) {
+    if (tag == nullptr) break;
+    if (scope == 0) return false;
+    scope &= scope - 1;
+  }
+  return scope == 0;
+}
+
+}  // namespace
+
+SRLScopeTagSet SRLScopeTagSetCreateWithTags(const rt::Array* tags) {
+  SRLScopeTagSet set;
+  if (tags == nullptr) return set;
+  if (tags->count() > SRLScopeTagSet::kCapacity) {
+    PECReport({kFile, "SRLScopeTagSetCreateWithTags"},
+              "SRLScopeTagSet only supports up to %@ tags, but received %@."_s, SRLScopeTagSet::kCapacity,
+              tags->count());
+    return set;
+  }
+  std::ranges::transform(*tags, set.tags.begin(), &rt::Ref<rt::Object>::get);
+  return set;
+}
+
+rt::Object* SRLScopeTagSetCFRefTypeForIndex(const SRLScopeTagSet& set, std::size_t index) {
+  if (index >= SRLScopeTagSet::kCapacity || set.tags[index] == nullptr) {
+    PECReport({kFile, "SRLScopeTagSetCFRefTypeForIndex"}, "Tags' index out of bounds or nil (%@ >= %@)."_s,
+              index, SRLScopeTagSet::kCapacity);
+    return nullptr;
+  }
+  return set.tags[index];
+}
+
+SRLScopeTagSet SRLScopeTagSetMaskingWithScopes(const SRLScopeTagSet& set, SRLScopeType apiScope,
+                                               SRLScopeType implScope) {
+  if (!hasOneTagForEachBit(set, apiScope)) {
+    PECReport({kFile, "SRLScopeTagSetMaskingWithScopes"}, "The tag set must contain all API scope tags."_s);
+    return {};
+  }
+  if (implScope == apiScope) return set;
+  if ((implScope & ~apiScope) != 0) {
+    PECReport({kFile, "SRLScopeTagSetMaskingWithScopes"},
+              "The API scope must be a superset of the implementation's scope"_s);
+    return {};
+  }
+  // The tags and the API's bits are in the same order, and as many.
+  SRLScopeTagSet masked;
+  std::size_t count = 0;
+  SRLScopeType rest = apiScope;
+  for (rt::Object* tag : set.tags) {
+    const SRLScopeType lowest = rest & (~rest + 1);
+    if ((implScope & lowest) != 0) masked.tags[count++] = tag;
+    rest ^= lowest;
+  }
+  return masked;
+}
+
+bool SRLScopeTagSetEqual(const SRLScopeTagSet& first, const SRLScopeTagSet& second) {
+  for (std::size_t i = 0; i < SRLScopeTagSet::kCapacity; ++i) {
+    if (!rt::isEqual(first.tags[i], second.tags[i])) return false;
+    if (first.tags[i] == nullptr) return true;
+  }
+  return true;
+}
+
+std::uint64_t SRLScopeTagSetHash(const SRLScopeTagSet& set) {
+  std::uint64_t hash = kSRLScopeTagSetHashOfNone;
+  for (const rt::Object* tag : usedTags(set)) hash = hash * 41 + tag->hash();
+  return hash;
+}
+
+bool SRLScopeTagSetContainsTag(const SRLScopeTagSet& set, const rt::Object* tag) {
+  return std::ranges::any_of(usedTags(set), [tag](const rt::Object* each) { return rt::isEqual(each, tag); });
+}
+
+void SRLScopeTagSetRetain(const SRLScopeTagSet& set) noexcept {
+  for (const rt::Object* tag : usedTags(set)) tag->retain();
+}
+
+void SRLScopeTagSetRelease(const SRLScopeTagSet& set) {
+  for (const rt::Object* tag : usedTags(set)) tag->release();
+}
+
+std::vector<rt::Ref<rt::Object>> SRLScopeTagSetToArray(const SRLScopeTagSet& set) {
+  std::vector<rt::Ref<rt::Object>> tags;
+  tags.reserve(SRLScopeTagSet::kCapacity);
+  for (rt::Object* tag : usedTags(set)) tags.emplace_back(tag);
+  return tags;
+}

@@ -1,0 +1,73 @@
+#pragma once
+
+/// The tags of a scope: up to four, by value, without an allocation.
+///
+///     rt::Ref<rt::Array> tags = rt::Array::of(account, window);
+///     SRLScopeTagSet set = SRLScopeTagSetCreateWithTags(tags.get());
+///     SRLScopeTagSet masked = SRLScopeTagSetMaskingWithScopes(set, /*apiScope=*/0b0110,
+///     /*implScope=*/0b0100); SRLScopeTagSetCFRefTypeForIndex(masked, 0);                              //
+///     window
+///
+/// A set for a scope type has one tag for each of the type's bits, the lowest bit's first.
+///
+/// A set does not own its tags. Who keeps one longer than whoever made it keeps the tags retains it
+/// (`SRLScopeTagSetRetain`), and releases it when done. The functions are safe on any thread where the tags'
+/// own `isEqual`, `hash` and counting are, take no lock, and throw what these and the error callback throw.
+///
+/// Not for: passing tags to another process (SRLScopeTagSetCodableWrapper).
+
+#include <array>
+#include <cstddef>
+#include <cstdint>
+#include <type_traits>
+#include <vector>
+
+#include "Runtime/Array.h"
+#include "Runtime/Object.h"
+#include "Runtime/Ref.h"
+#include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeType.h"
+
+/// The set. The first null ends it, and all that follow are null too.
+struct SRLScopeTagSet {
+  static constexpr std::size_t kCapacity = 4;
+
+  std::array<rt::Object*, kCapacity> tags{};
+};
+
+static_assert(sizeof(SRLScopeTagSet) == 32 && std::is_trivially_copyable_v<SRLScopeTagSet>);
+
+/// The hash of no tags, from which the hash of those there are goes on.
+inline constexpr std::uint64_t kSRLScopeTagSetHashOfNone = 0x7FFFFFFF;
+
+/// A set of the elements of `tags`, in their order. Null counts as empty; more than four are reported and
+/// yield the empty set. Retains nothing.
+SRLScopeTagSet SRLScopeTagSetCreateWithTags(const rt::Array* tags);
+
+/// The tag at `index`, not retained. That there is none is reported, and yields null.
+rt::Object* SRLScopeTagSetCFRefTypeForIndex(const SRLScopeTagSet& set, std::size_t index);
+
+/// Of `set`, the tags of a scope of the type `apiScope`, those whose bits `implScope` has. Retains nothing.
+/// That `set` has not exactly one tag for each bit of `apiScope`, or that `implScope` has a bit that
+/// `apiScope` lacks, is reported, and yields the empty set.
+SRLScopeTagSet SRLScopeTagSetMaskingWithScopes(const SRLScopeTagSet& set, SRLScopeType apiScope,
+                                               SRLScopeType implScope);
+
+/// Whether both have equal tags in the same order.
+bool SRLScopeTagSetEqual(const SRLScopeTagSet& first, const SRLScopeTagSet& second);
+
+/// A hash that suits SRLScopeTagSetEqual: from `kSRLScopeTagSetHashOfNone` on, for each tag in order, 41
+/// times what there is, plus the tag's own.
+std::uint64_t SRLScopeTagSetHash(const SRLScopeTagSet& set);
+
+/// Whether one of the set's tags equals `tag`; none equals null.
+bool SRLScopeTagSetContainsTag(const SRLScopeTagSet& set, const rt::Object* tag);
+
+/// Adds a reference to each tag of the set.
+void SRLScopeTagSetRetain(const SRLScopeTagSet& set) noexcept;
+
+/// Gives up a reference to each tag of the set; on the calling thread, tags may be destroyed.
+void SRLScopeTagSetRelease(const SRLScopeTagSet& set);
+
+/// The tags, retained, in their order, in a list that the caller may change, with room for four. Throws
+/// std::bad_alloc.
+std::vector<rt::Ref<rt::Object>> SRLScopeTagSetToArray(const SRLScopeTagSet& set);

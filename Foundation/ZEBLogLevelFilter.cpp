@@ -41,9 +41,9 @@ bool ZEBLogLevelFilter::filterAllowsMessage(const rt::String& /*message*/, ZEBLo
 void ZEBLogLevelFilter::didAttachToLogger() {
   const rt::LockGuard guard(lock_);
   if (observation_) return;
-  rt::UserDefaults& userDefaults = *rt::UserDefaults::standardUserDefaults();
-  observation_ = userDefaults.observe(kSettingName, rt::UserDefaults::Notify::kAlsoNow,
-                                      [this, &userDefaults] { readSetting(&userDefaults); });
+  const rt::Ref<rt::UserDefaults> userDefaults = rt::UserDefaults::standardUserDefaults();
+  observation_ = userDefaults->observe(kSettingName, rt::UserDefaults::Notify::kAlsoNow,
+                                       [this, defaults = userDefaults.get()] { readSetting(defaults); });
 }
 
 void ZEBLogLevelFilter::willDetachFromLogger() {

@@ -131,6 +131,14 @@ class Block<Result(Arguments...)> {
     return body->call(std::forward<Arguments>(arguments)...);
   }
 
+  /// The same for a caller who knows that something keeps the block until it returns, such as a constant
+  /// member of an object that the caller has a reference to. Spares the count.
+  Result callKept(Arguments... arguments) const {
+    if (!body_) [[unlikely]]
+      detail::trapOnNullBlock();
+    return body_->call(std::forward<Arguments>(arguments)...);
+  }
+
   explicit operator bool() const noexcept { return body_ != nullptr; }
 
   /// Whether both are the same block, or both are null.

@@ -157,6 +157,12 @@ TEST(Block, AllocatesOnceAndForCapturesOnly) {
   EXPECT_EQ(count.allocations(), 1);
 }
 
+TEST(Block, IsCalledWithoutACountByWhoKeepsIt) {
+  const rt::Block<std::uint32_t()> block = [token = rt::make<Token>()] { return 42U; };
+  EXPECT_EQ(block.callKept(), 42U);
+  EXPECT_DEATH(rt::Block<void()>().callKept(), "");
+}
+
 TEST(BlockDeathTest, EndsTheProgramWhenNullIsCalled) {
   testing::GTEST_FLAG(death_test_style) = "threadsafe";
   const rt::Block<int(int)> block;

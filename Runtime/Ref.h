@@ -21,6 +21,7 @@
 #include <utility>
 
 #include "Runtime/Class.h"
+#include "Runtime/LifetimeBound.h"
 #include "Runtime/Object.h"
 
 namespace rt {
@@ -77,7 +78,7 @@ class Ref {
   /// The object, or null; not retained.
   T* get() const noexcept { return pointer_; }
   T* operator->() const noexcept { return pointer_; }
-  T& operator*() const noexcept { return *pointer_; }
+  T& operator*() const noexcept RT_LIFETIME_BOUND { return *pointer_; }
   explicit operator bool() const noexcept { return pointer_ != nullptr; }
 
   friend bool operator==(const Ref& ref, std::nullptr_t) noexcept { return ref.pointer_ == nullptr; }

@@ -16,7 +16,7 @@ run("${CMAKE_COMMAND}" --install "${BUILD}" --component development --prefix "${
 # What is installed may be moved.
 file(RENAME "${WORK}/first" "${WORK}/installed")
 
-set(libraries runtime logging error-handler older-logger logging-shim)
+set(libraries runtime logging error-handler older-logger logging-shim provider service-registry)
 separate_arguments(flags UNIX_COMMAND "${FLAGS}")
 if(WAY STREQUAL "find_package")
   run("${CMAKE_COMMAND}" -S "${CMAKE_CURRENT_LIST_DIR}" -B "${WORK}/build" "-DCMAKE_CXX_COMPILER=${COMPILER}"

@@ -16,16 +16,14 @@ rt::Ref<SRLMemoizingScope> SRLMemoizingScope::init() {
   return rt::Ref<SRLMemoizingScope>::adopt(new SRLMemoizingScope());
 }
 
-SRLMemoizingScope::SRLMemoizingScope() : ivars_(std::make_unique<SRLMemoizingScopeIvars>()) {}
-SRLMemoizingScope::~SRLMemoizingScope() = default;
-
-rt::Ref<rt::Object> SRLMemoizingScope::instanceForIdentifier(
-    const void* identifier, bool* instanceCreated, const rt::Block<rt::Ref<rt::Object>()>& factoryBlock) {
+rt::Ref<rt::Object> SRLMemoizingScope::makeOrAwaitInstance(const void* identifier, bool* instanceCreated,
+                                                           const FactoryReference& factory) {
   SRLMemoizingScopeIvars& ivars = *ivars_;
   rt::Ref<SRLPendingCreation> creation;
   bool isCreator = false;
   {
     const rt::LockGuard guard(ivars.lock);
+    // It may have been made since.
     if (const auto found = ivars.instances.find(identifier); found != ivars.instances.end())
       return found->second;
     if (const auto found = ivars.pendingCreations.find(identifier); found != ivars.pendingCreations.end()) {
@@ -51,7 +49,7 @@ rt::Ref<rt::Object> SRLMemoizingScope::instanceForIdentifier(
     return nullptr;
   }
 
-  rt::Ref<rt::Object> instance = factoryBlock();
+  rt::Ref<rt::Object> instance = factory.call(factory.factory);
   // Destroyed when no lock is held any more.
   rt::Ref<rt::Object> replaced;
   {

@@ -10,36 +10,61 @@
 /// what it needs. Who asks for an instance in the making waits until it is made; a factory must not ask for
 /// the one that it makes, which ends the program.
 ///
-/// A factory that throws leaves its instance in the making for ever: whoever asks for it later waits for
-/// ever, too, or ends the program where the thread is the same. What the factory threw comes out of the
-/// request that called it.
+/// A factory that throws leaves its instance in the making for ever, as does memory that runs out while one
+/// is kept: whoever asks for it later waits for ever, too, or ends the program where the thread is the same.
+/// What the factory threw comes out of the request that called it.
 ///
 /// Not for: hosts. They ask SRLRegistry, which has a scope for each set of tags.
 
+#include <concepts>
 #include <memory>
+#include <type_traits>
 
 #include "Runtime/Array.h"
-#include "Runtime/Block.h"
 #include "Runtime/Class.h"
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
-
-struct SRLMemoizingScopeIvars;
+#include "Runtime/UnfairLock.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScopeIvars.h"
 
 class SRLMemoizingScope final : public rt::Implements<SRLMemoizingScope, rt::Object> {
  public:
   /// Without instances. Throws std::bad_alloc.
   static rt::Ref<SRLMemoizingScope> init();
 
-  ~SRLMemoizingScope() override;
-
   /// The instance for `identifier`, an address that is only compared; null where the factory gave none. If
   /// there is none yet, `factoryBlock` is called, or, if another thread calls its own for the same
   /// identifier, that one is waited for. Where there was none, `instanceCreated`, unless it is null, then
   /// points to whether this call has called the factory; else it is left as it is. Throws what the factory
   /// throws, and std::bad_alloc.
+  ///
+  /// The factory is a block or any other callable object, not null, that returns a reference.
+  template <class Factory>
+    requires std::invocable<const Factory&>
   rt::Ref<rt::Object> instanceForIdentifier(const void* identifier, bool* instanceCreated,
-                                            const rt::Block<rt::Ref<rt::Object>()>& factoryBlock);
+                                            const Factory& factoryBlock) {
+    if constexpr (std::is_function_v<Factory>) {
+      return instanceForIdentifier(identifier, instanceCreated, &factoryBlock);
+    } else {
+      rt::Ref<rt::Object> instance;
+      if (findInstance(identifier, instance)) [[likely]]
+        return instance;
+      return makeOrAwaitInstance(identifier, instanceCreated,
+                                 {&factoryBlock, [](const void* factory) -> rt::Ref<rt::Object> {
+                                    return (*static_cast<const Factory*>(factory))();
+                                  }});
+    }
+  }
+
+  /// Has `instance` be the one for `identifier`, which may be null, and returns true; false where there is
+  /// none yet.
+  bool findInstance(const void* identifier, rt::Ref<rt::Object>& instance) const {
+    const rt::LockGuard guard(ivars_->lock);
+    const auto found = ivars_->instances.find(identifier);
+    if (found == ivars_->instances.end()) return false;
+    instance = found->second;
+    return true;
+  }
 
   /// The instances that there are, without nulls, in no particular order. Throws std::bad_alloc.
   rt::Ref<rt::Array> instances() const;
@@ -47,7 +72,17 @@ class SRLMemoizingScope final : public rt::Implements<SRLMemoizingScope, rt::Obj
  private:
   friend struct SRLMemoizingScopeTestAccess;
 
-  SRLMemoizingScope();
+  // A factory for the time of a call: an instance that is there already must not cost a block.
+  struct FactoryReference {
+    const void* factory;
+    rt::Ref<rt::Object> (*call)(const void* factory);
+  };
+
+  SRLMemoizingScope() : ivars_(std::make_unique<SRLMemoizingScopeIvars>()) {}
+
+  // What `instanceForIdentifier` does where there was no instance yet. It looks once more.
+  [[gnu::noinline]] rt::Ref<rt::Object> makeOrAwaitInstance(const void* identifier, bool* instanceCreated,
+                                                            const FactoryReference& factory);
 
   const std::unique_ptr<SRLMemoizingScopeIvars> ivars_;
 };

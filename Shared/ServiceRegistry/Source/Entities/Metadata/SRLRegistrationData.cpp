@@ -1,12 +1,11 @@
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"
 
-#include <cstdlib>
 #include <type_traits>
 
-#include "Libraries/Util/ErrorHandler/PECReport.h"
 #include "Runtime/ClassInfo.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLMakeInstanceTypeContainer.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLReportFatal.h"
 
 using namespace rt::literals;
 
@@ -29,13 +28,6 @@ const rt::ProtocolInfo* protocolNamed(const char* name) noexcept {
   return name != nullptr ? rt::protocolNamed(name) : nullptr;
 }
 
-// Reports what a record can only have from a generator that is wrong. The program ends, whether the error
-// callback returns or throws.
-[[noreturn]] void fail(const PECReportSite& site, const rt::FormatString<>& message) noexcept {
-  PECReport(site, message);
-  std::abort();
-}
-
 }  // namespace
 
 rt::Ref<SRLInstanceType> SRLAPIRegistrationDataInstanceType(const SRLAPIRegistrationData* record) {
@@ -47,7 +39,7 @@ rt::Ref<SRLInstanceType> SRLAPIRegistrationDataInstanceType(const SRLAPIRegistra
     case SRLInstanceTypeKindFunction:
       return record->instanceType.function(record);
     default:
-      fail({kFile, "SRLAPIRegistrationDataInstanceType"}, "APIs cannot be of an unknown type"_s);
+      SRLReportFatal({kFile, "SRLAPIRegistrationDataInstanceType"}, "APIs cannot be of an unknown type"_s);
   }
 }
 
@@ -72,7 +64,7 @@ rt::Ref<SRLInstanceType> SRLImplementationRegistrationDataConfigInstanceType(
     case SRLInstanceTypeKindFunction:
       return record->configInstanceType.function(record);
     default:
-      fail({kFile, "SRLImplementationRegistrationDataConfigInstanceType"},
-           "Configurations cannot be of an unknown type"_s);
+      SRLReportFatal({kFile, "SRLImplementationRegistrationDataConfigInstanceType"},
+                     "Configurations cannot be of an unknown type"_s);
   }
 }

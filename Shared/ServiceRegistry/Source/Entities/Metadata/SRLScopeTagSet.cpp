@@ -15,16 +15,6 @@ std::span<rt::Object* const> usedTags(const SRLScopeTagSet& set) noexcept {
   return {set.tags.begin(), std::ranges::find(set.tags, nullptr)};
 }
 
-// By pairs, since counting the bits of a word is a call of a library function on the plainest processors.
-bool hasOneTagForEachBit(const SRLScopeTagSet& set, SRLScopeType scope) noexcept {
-  for (const rt::Object* tag : set.tags) {
-    if (tag == nullptr) break;
-    if (scope == 0) return false;
-    scope &= scope - 1;
-  }
-  return scope == 0;
-}
-
 }  // namespace
 
 SRLScopeTagSet SRLScopeTagSetCreateWithTags(const rt::Array* tags) {
@@ -49,13 +39,12 @@ rt::Object* SRLScopeTagSetCFRefTypeForIndex(const SRLScopeTagSet& set, std::size
   return set.tags[index];
 }
 
-SRLScopeTagSet SRLScopeTagSetMaskingWithScopes(const SRLScopeTagSet& set, SRLScopeType apiScope,
-                                               SRLScopeType implScope) {
+SRLScopeTagSet SRLScopeTagSetDetail::maskedToPart(const SRLScopeTagSet& set, SRLScopeType apiScope,
+                                                  SRLScopeType implScope) {
   if (!hasOneTagForEachBit(set, apiScope)) {
     PECReport({kFile, "SRLScopeTagSetMaskingWithScopes"}, "The tag set must contain all API scope tags."_s);
     return {};
   }
-  if (implScope == apiScope) return set;
   if ((implScope & ~apiScope) != 0) {
     PECReport({kFile, "SRLScopeTagSetMaskingWithScopes"},
               "The API scope must be a superset of the implementation's scope"_s);

@@ -49,8 +49,8 @@ rt::Object* SRLScopeTagSetCFRefTypeForIndex(const SRLScopeTagSet& set, std::size
 /// Of `set`, the tags of a scope of the type `apiScope`, those whose bits `implScope` has. Retains nothing.
 /// That `set` has not exactly one tag for each bit of `apiScope`, or that `implScope` has a bit that
 /// `apiScope` lacks, is reported, and yields the empty set.
-SRLScopeTagSet SRLScopeTagSetMaskingWithScopes(const SRLScopeTagSet& set, SRLScopeType apiScope,
-                                               SRLScopeType implScope);
+inline SRLScopeTagSet SRLScopeTagSetMaskingWithScopes(const SRLScopeTagSet& set, SRLScopeType apiScope,
+                                                      SRLScopeType implScope);
 
 /// Whether both have equal tags in the same order.
 bool SRLScopeTagSetEqual(const SRLScopeTagSet& first, const SRLScopeTagSet& second);
@@ -71,3 +71,30 @@ void SRLScopeTagSetRelease(const SRLScopeTagSet& set);
 /// The tags, retained, in their order, in a list that the caller may change, with room for four. Throws
 /// std::bad_alloc.
 std::vector<rt::Ref<rt::Object>> SRLScopeTagSetToArray(const SRLScopeTagSet& set);
+
+namespace SRLScopeTagSetDetail {
+
+// Bit by bit, since counting the bits of a word is a call of a library function on the plainest processors.
+inline bool hasOneTagForEachBit(const SRLScopeTagSet& set, SRLScopeType scope) noexcept {
+  constexpr auto withoutLowestBit = [](SRLScopeType bits) { return bits & (bits - 1); };
+  if (set.tags[0] == nullptr) return scope == 0;
+  const SRLScopeType second = withoutLowestBit(scope);
+  if (set.tags[1] == nullptr) return scope != 0 && second == 0;
+  const SRLScopeType third = withoutLowestBit(second);
+  if (set.tags[2] == nullptr) return second != 0 && third == 0;
+  const SRLScopeType fourth = withoutLowestBit(third);
+  if (set.tags[3] == nullptr) return third != 0 && fourth == 0;
+  return fourth != 0 && withoutLowestBit(fourth) == 0;
+}
+
+// The same for an implementation whose scope is another than the API's, and for what is reported.
+SRLScopeTagSet maskedToPart(const SRLScopeTagSet& set, SRLScopeType apiScope, SRLScopeType implScope);
+
+}  // namespace SRLScopeTagSetDetail
+
+inline SRLScopeTagSet SRLScopeTagSetMaskingWithScopes(const SRLScopeTagSet& set, SRLScopeType apiScope,
+                                                      SRLScopeType implScope) {
+  if (implScope == apiScope && SRLScopeTagSetDetail::hasOneTagForEachBit(set, apiScope)) [[likely]]
+    return set;
+  return SRLScopeTagSetDetail::maskedToPart(set, apiScope, implScope);
+}

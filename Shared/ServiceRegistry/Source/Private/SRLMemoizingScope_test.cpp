@@ -1,0 +1,276 @@
+#include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope.h"
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <array>
+#include <cstddef>
+#include <functional>
+#include <stdexcept>
+#include <thread>
+#include <utility>
+#include <vector>
+
+#include "Runtime/Block.h"
+#include "Runtime/Class.h"
+#include "Runtime/String.h"
+#include "Runtime/Weak.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScopeIvars.h"
+#include "tests/TestReports.h"
+
+struct SRLMemoizingScopeTestAccess {
+  static SRLMemoizingScopeIvars& ivars(const rt::Ref<SRLMemoizingScope>& scope) { return *scope->ivars_; }
+};
+
+namespace {
+
+using namespace rt::literals;
+using rt::Ref;
+using testing::IsEmpty;
+using Access = SRLMemoizingScopeTestAccess;
+using Factory = rt::Block<Ref<rt::Object>()>;
+
+class Instance final : public rt::Implements<Instance, rt::Object> {};
+
+Ref<rt::Object> makeInstance() {
+  return rt::make<Instance>();
+}
+
+// For requests that find what they ask for.
+Ref<rt::Object> mustNotRun() {
+  ADD_FAILURE() << "a factory ran";
+  return nullptr;
+}
+
+// What identifies instances: addresses, whatever is there.
+struct Identifiers {
+  int first = 1;
+  int second = 1;
+};
+
+class SRLMemoizingScopeTest : public testing::Test {
+ protected:
+  Ref<rt::Object> ask(const void* identifier, const Factory& factory, bool* instanceCreated = nullptr) const {
+    return scope_->instanceForIdentifier(identifier, instanceCreated, factory);
+  }
+
+  const Ref<SRLMemoizingScope> scope_ = SRLMemoizingScope::init();
+  const Identifiers identifiers_;
+};
+
+using SRLMemoizingScopeDeathTest = SRLMemoizingScopeTest;
+
+TEST_F(SRLMemoizingScopeTest, IsEmptyAtFirst) {
+  EXPECT_TRUE(scope_->instances()->isEmpty());
+  SRLMemoizingScopeIvars& ivars = Access::ivars(scope_);
+  const rt::LockGuard guard(ivars.lock);
+  EXPECT_THAT(ivars.instances, IsEmpty());
+  EXPECT_THAT(ivars.pendingCreations, IsEmpty());
+  EXPECT_EQ(ivars.instances.max_load_factor(), 1.0F);
+  EXPECT_EQ(ivars.pendingCreations.max_load_factor(), 1.0F);
+}
+
+TEST_F(SRLMemoizingScopeTest, MakesAnInstanceAtTheFirstRequest) {
+  for (const bool before : {false, true}) {
+    const Ref<SRLMemoizingScope> scope = SRLMemoizingScope::init();
+    bool isCreated = before;
+    int runs = 0;
+    Ref<rt::Object> made;
+    const Ref<rt::Object> got = scope->instanceForIdentifier(&identifiers_.first, &isCreated, [&] {
+      EXPECT_TRUE(isCreated);  // It is written before the factory runs.
+      ++runs;
+      made = rt::make<Instance>();
+      return made;
+    });
+    EXPECT_TRUE(got);
+    EXPECT_EQ(got, made);
+    EXPECT_EQ(runs, 1);
+    EXPECT_TRUE(isCreated);
+  }
+}
+
+TEST_F(SRLMemoizingScopeTest, ReturnsItEverAfterAndLeavesTheFlagAlone) {
+  const Ref<rt::Object> made = ask(&identifiers_.first, makeInstance);
+  for (const bool before : {false, true}) {
+    bool isCreated = before;
+    EXPECT_EQ(ask(&identifiers_.first, mustNotRun, &isCreated), made);
+    EXPECT_EQ(isCreated, before);
+  }
+  EXPECT_EQ(ask(&identifiers_.first, mustNotRun), made);
+}
+
+TEST_F(SRLMemoizingScopeTest, GoesByTheAddressOfTheIdentifier) {
+  ASSERT_EQ(identifiers_.first, identifiers_.second);
+  const Ref<rt::Object> first = ask(&identifiers_.first, makeInstance);
+  const Ref<rt::Object> second = ask(&identifiers_.second, makeInstance);
+  const Ref<rt::Object> third = ask(nullptr, makeInstance);
+  EXPECT_NE(first, second);
+  EXPECT_NE(first, third);
+  EXPECT_EQ(ask(&identifiers_.first, mustNotRun), first);
+  EXPECT_EQ(ask(&identifiers_.second, mustNotRun), second);
+  EXPECT_EQ(ask(nullptr, mustNotRun), third);
+}
+
+TEST_F(SRLMemoizingScopeTest, SharesNothingWithAnother) {
+  const Ref<rt::Object> made = ask(&identifiers_.first, makeInstance);
+  EXPECT_NE(SRLMemoizingScope::init()->instanceForIdentifier(&identifiers_.first, nullptr, makeInstance),
+            made);
+}
+
+TEST_F(SRLMemoizingScopeTest, KeepsNullToo) {
+  bool isCreated = false;
+  EXPECT_EQ(ask(&identifiers_.first, [] { return nullptr; }, &isCreated), nullptr);
+  EXPECT_TRUE(isCreated);
+  for (const bool before : {false, true}) {
+    isCreated = before;
+    EXPECT_EQ(ask(&identifiers_.first, mustNotRun, &isCreated), nullptr);
+    EXPECT_EQ(isCreated, before);
+  }
+}
+
+TEST_F(SRLMemoizingScopeTest, ListsTheInstancesInTheOrderOfItsTable) {
+  std::array<char, 50> places{};
+  for (std::size_t i = 0; i < places.size(); ++i) {
+    ask(&places[i], [i]() -> Ref<rt::Object> { return i % 3 == 0 ? nullptr : rt::make<Instance>(); });
+  }
+  const Ref<rt::Array> listed = scope_->instances();
+  EXPECT_EQ(listed->count(), 33U);
+  EXPECT_NE(scope_->instances(), listed);
+
+  std::vector<Ref<rt::Object>> expected;
+  SRLMemoizingScopeIvars& ivars = Access::ivars(scope_);
+  const rt::LockGuard guard(ivars.lock);
+  EXPECT_EQ(ivars.instances.size(), 50U);
+  EXPECT_THAT(ivars.pendingCreations, IsEmpty());
+  for (const auto& [identifier, instance] : ivars.instances) {
+    if (instance) expected.push_back(instance);
+  }
+  EXPECT_TRUE(std::ranges::equal(*listed, expected));
+}
+
+TEST_F(SRLMemoizingScopeTest, KeepsItsInstancesUntilItGoes) {
+  Ref<SRLMemoizingScope> scope = SRLMemoizingScope::init();
+  const rt::Weak<rt::Object> weak = scope->instanceForIdentifier(&identifiers_.first, nullptr, makeInstance);
+  EXPECT_NE(weak.lock(), nullptr);
+  scope = nullptr;
+  EXPECT_EQ(weak.lock(), nullptr);
+}
+
+// A lock held meanwhile would end the program.
+TEST_F(SRLMemoizingScopeTest, LetsAFactoryUseTheScope) {
+  Ref<rt::Object> inner;
+  const Ref<rt::Object> outer = ask(&identifiers_.first, [&]() -> Ref<rt::Object> {
+    EXPECT_TRUE(scope_->instances()->isEmpty());
+    inner = ask(&identifiers_.second, makeInstance);
+    EXPECT_EQ(scope_->instances()->count(), 1U);
+    return rt::make<Instance>();
+  });
+  EXPECT_TRUE(inner);
+  EXPECT_EQ(ask(&identifiers_.first, mustNotRun), outer);
+  EXPECT_EQ(ask(&identifiers_.second, mustNotRun), inner);
+}
+
+// An instance whose end uses the scope that it was in.
+class Watcher final : public rt::Implements<Watcher, rt::Object> {
+ public:
+  explicit Watcher(std::function<void()> atEnd) : atEnd_(std::move(atEnd)) {}
+  ~Watcher() override { atEnd_(); }
+
+ private:
+  const std::function<void()> atEnd_;
+};
+
+TEST_F(SRLMemoizingScopeTest, ReplacesWhatCameToBeThereMeanwhileAndDestroysItWithoutALock) {
+  std::size_t countAtEnd = 0;
+  const Ref<rt::Object> made = ask(&identifiers_.first, [&]() -> Ref<rt::Object> {
+    SRLMemoizingScopeIvars& ivars = Access::ivars(scope_);
+    Ref<rt::Object> other = rt::make<Watcher>([&] { countAtEnd = scope_->instances()->count(); });
+    const rt::LockGuard guard(ivars.lock);
+    ivars.instances[&identifiers_.first] = std::move(other);
+    return rt::make<Instance>();
+  });
+  EXPECT_EQ(countAtEnd, 1U);
+  EXPECT_EQ(ask(&identifiers_.first, mustNotRun), made);
+}
+
+TEST_F(SRLMemoizingScopeTest, ReportsThatItWaitedForNothing) {
+  {
+    SRLMemoizingScopeIvars& ivars = Access::ivars(scope_);
+    const rt::LockGuard guard(ivars.lock);
+    ivars.pendingCreations.emplace(&identifiers_.first, rt::make<SRLPendingCreation>());
+  }
+  TestReports reports;
+  for (const bool before : {false, true}) {
+    bool isCreated = before;
+    EXPECT_EQ(ask(&identifiers_.first, mustNotRun, &isCreated), nullptr);
+    EXPECT_FALSE(isCreated);
+    const std::vector<Ref<LUMLogMessage>> messages = reports.messages();
+    ASSERT_EQ(messages.size(), 1U);
+    EXPECT_EQ(messages[0]->level(), LUMLogLevelFault);
+    EXPECT_EQ(text(*messages[0]), "We blocked waiting on instance creation but no instance was created.");
+    EXPECT_EQ(messages[0]->file(), "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope");
+    EXPECT_EQ(messages[0]->function(),
+              "-[SRLMemoizingScope instanceForIdentifier:instanceCreated:factoryBlock:]");
+    EXPECT_GT(messages[0]->line(), 0U);
+    EXPECT_FALSE(messages[0]->safeParameters());
+  }
+  // No lock is left held.
+  EXPECT_TRUE(scope_->instances()->isEmpty());
+  EXPECT_TRUE(ask(&identifiers_.second, makeInstance));
+}
+
+Ref<rt::Object> fail() {
+  throw std::out_of_range("no instance");
+}
+
+TEST_F(SRLMemoizingScopeTest, LetsAnExceptionOutAndTheInstanceBeInTheMaking) {
+  bool isCreated = false;
+  try {
+    ask(&identifiers_.first, fail, &isCreated);
+    ADD_FAILURE() << "nothing was thrown";
+  } catch (const std::out_of_range& exception) {
+    EXPECT_STREQ(exception.what(), "no instance");
+  }
+  EXPECT_TRUE(isCreated);
+  EXPECT_TRUE(scope_->instances()->isEmpty());
+  EXPECT_TRUE(ask(&identifiers_.second, makeInstance));
+  std::thread([&] { EXPECT_EQ(scope_->instances()->count(), 1U); }).join();
+
+  SRLMemoizingScopeIvars& ivars = Access::ivars(scope_);
+  const rt::LockGuard guard(ivars.lock);
+  EXPECT_FALSE(ivars.instances.contains(&identifiers_.first));
+  ASSERT_TRUE(ivars.pendingCreations.contains(&identifiers_.first));
+  EXPECT_EQ(ivars.pendingCreations.size(), 1U);
+  // Ends the program if the lock is not held.
+  ivars.pendingCreations.at(&identifiers_.first)->end();
+}
+
+#if !defined(__APPLE__)
+
+constexpr const char* kTakenAgain =
+    "rt: the lock at 0x[0-9a-f]+ is taken again by thread [0-9]+, which holds it";
+
+TEST_F(SRLMemoizingScopeDeathTest, AskingAgainForWhatTheThreadFailedToMakeEndsTheProgram) {
+  EXPECT_DEATH(
+      {
+        EXPECT_THROW(ask(&identifiers_.first, fail), std::out_of_range);
+        ask(&identifiers_.first, makeInstance);
+      },
+      kTakenAgain);
+}
+
+TEST_F(SRLMemoizingScopeDeathTest, AFactoryThatAsksForWhatItMakesEndsTheProgram) {
+  EXPECT_DEATH(ask(&identifiers_.first, [&] { return ask(&identifiers_.first, makeInstance); }), kTakenAgain);
+}
+
+TEST_F(SRLMemoizingScopeDeathTest, SoDoFactoriesThatAskForEachOthersInstances) {
+  const Factory outer = [&] {
+    return ask(&identifiers_.second, [&] { return ask(&identifiers_.first, makeInstance); });
+  };
+  EXPECT_DEATH(ask(&identifiers_.first, outer), kTakenAgain);
+}
+
+#endif
+
+}  // namespace

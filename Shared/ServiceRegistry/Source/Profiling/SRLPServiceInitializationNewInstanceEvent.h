@@ -1,0 +1,60 @@
+#pragma once
+
+/// The sum of the instances that an implementation made, where every request makes one.
+///
+///     auto event = SRLPServiceInitializationNewInstanceEvent::initWithAPIDescription("Clock"_s, text, 10);
+///     event->addInitializationWithDurationNs(15);
+///     event->averageDurationNs();                        // 12
+///
+/// Threads that share one hold a lock, as SRLProfilingStorage does. Equal to itself only.
+///
+/// Not for: hosts, which ask for the protocol that it conforms to.
+
+#include <cstdint>
+#include <utility>
+
+#include "Runtime/Class.h"
+#include "Runtime/Object.h"
+#include "Runtime/Ref.h"
+#include "Runtime/String.h"
+#include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationNewInstanceEventProtocol.h"
+
+class SRLPServiceInitializationNewInstanceEvent final
+    : public rt::Implements<SRLPServiceInitializationNewInstanceEvent, rt::Object,
+                            SRLPServiceInitializationNewInstanceEventProtocol> {
+ public:
+  /// Of one instance, which took `durationNs`. Either string may be null. Throws std::bad_alloc.
+  static rt::Ref<SRLPServiceInitializationNewInstanceEvent> initWithAPIDescription(rt::String apiDescription,
+                                                                                   rt::String implDescription,
+                                                                                   std::uint64_t durationNs);
+
+  /// Counts another instance, which took `durationNs`. The average is reckoned in double precision, and is
+  /// at most the largest number of 64 bits.
+  void addInitializationWithDurationNs(std::uint64_t durationNs) noexcept;
+
+  const rt::String& apiDescription() const noexcept override { return apiDescription_; }
+  const rt::String& implDescription() const noexcept override { return implDescription_; }
+  std::uint64_t initializationCount() const noexcept override { return initializationCount_; }
+  std::uint64_t averageDurationNs() const noexcept override { return averageDurationNs_; }
+  std::uint64_t maximumDurationNs() const noexcept override { return maximumDurationNs_; }
+  std::uint64_t firstDurationNs() const noexcept override { return firstDurationNs_; }
+
+  /// A new event that says the same, but for `firstDurationNs`, which is 0. Throws std::bad_alloc.
+  rt::Ref<rt::Object> copy() const override;
+
+ private:
+  SRLPServiceInitializationNewInstanceEvent(rt::String apiDescription, rt::String implDescription,
+                                            std::uint64_t durationNs) noexcept
+      : apiDescription_(std::move(apiDescription)),
+        implDescription_(std::move(implDescription)),
+        averageDurationNs_(durationNs),
+        maximumDurationNs_(durationNs),
+        firstDurationNs_(durationNs) {}
+
+  const rt::String apiDescription_;
+  const rt::String implDescription_;
+  std::uint64_t initializationCount_ = 1;
+  std::uint64_t averageDurationNs_;
+  std::uint64_t maximumDurationNs_;
+  const std::uint64_t firstDurationNs_;
+};

@@ -1,0 +1,52 @@
+#pragma once
+
+/// The store of what was measured, in memory, for the life of the process.
+///
+///     const rt::Ref<SRLProfilingStorage>& storage = SRLProfilingStorage::sharedInstance();
+///     std::cout << storage->serviceInitializationEvents()->count() << " services were made.\n";
+///
+/// Any thread may use it. It grows by every shared instance that is made, and by every implementation that
+/// makes a new one for each request.
+///
+/// Not for: many of them in a program; what is measured goes into the shared one.
+
+#include <cstdint>
+#include <unordered_map>
+#include <vector>
+
+#include "Runtime/Array.h"
+#include "Runtime/Class.h"
+#include "Runtime/Object.h"
+#include "Runtime/Ref.h"
+#include "Runtime/String.h"
+#include "Runtime/ThreadSafety.h"
+#include "Runtime/UnfairLock.h"
+#include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationEvent.h"
+#include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationNewInstanceEvent.h"
+#include "Shared/ServiceRegistry/Source/Profiling/SRLProfilingStorageProtocol.h"
+
+class SRLProfilingStorage final
+    : public rt::Implements<SRLProfilingStorage, rt::Object, SRLProfilingStorageProtocol> {
+ public:
+  /// The one that measurements go into; made when it is first asked for, and never destroyed.
+  static const rt::Ref<SRLProfilingStorage>& sharedInstance();
+
+  /// Empty. Throws std::bad_alloc.
+  static rt::Ref<SRLProfilingStorage> init();
+
+  void storeServiceInitializationEvent(const rt::Ref<SRLPServiceInitializationEvent>& event) override;
+  void storeServiceInitializationNewInstanceEventWithAPIDescription(const rt::String& apiDescription,
+                                                                    const rt::String& implDescription,
+                                                                    std::uint64_t durationNs) override;
+  rt::Ref<rt::Array> serviceInitializationEvents() const override;
+  rt::Ref<rt::Array> serviceInitializationNewInstanceEvents() const override;
+
+ private:
+  SRLProfilingStorage() = default;
+
+  std::vector<rt::Ref<SRLPServiceInitializationEvent>> events_ RT_GUARDED_BY(eventsLock_);
+  mutable rt::UnfairLock eventsLock_;
+  std::unordered_map<rt::String, rt::Ref<SRLPServiceInitializationNewInstanceEvent>>
+      implDescriptionToNewInstanceEvent_ RT_GUARDED_BY(implDescriptionToNewInstanceEventLock_);
+  mutable rt::UnfairLock implDescriptionToNewInstanceEventLock_;
+};

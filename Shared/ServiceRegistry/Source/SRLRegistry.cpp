@@ -1,0 +1,310 @@
+#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+
+#include <algorithm>
+#include <atomic>
+#include <new>
+#include <string_view>
+#include <utility>
+
+#include "Libraries/Util/ErrorHandler/PECReport.h"
+#include "Runtime/ClassMethod.h"
+#include "Runtime/Dictionary.h"
+#include "Runtime/Format.h"
+#include "Runtime/LoadHook.h"
+#include "Runtime/MainQueue.h"
+#include "Runtime/ThreadIdentifier.h"
+#include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLAPIIdentifier.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLReportFatal.h"
+#include "Shared/ServiceRegistry/Source/SRLStartUpHook.h"
+
+using namespace rt::literals;
+
+template struct rt::LoadHook<SRLRegistry>;
+
+namespace {
+
+constexpr const char* kFile = "Shared/ServiceRegistry/Source/SRLRegistry";
+
+constexpr std::string_view kBindingsPrefix = "srl_bindings";
+
+constinit rt::UnfairLock sharedInstanceLock;
+constinit bool isSharedInstanceMade RT_GUARDED_BY(sharedInstanceLock) = false;
+// Retained, and never released at exit, when other threads may still ask for services. Written under the
+// lock; read without it only to be compared.
+constinit std::atomic<SRLRegistry*> sharedRegistry{nullptr};
+
+rt::String descriptionOf(const rt::Ref<SRLInstanceType>& type) {
+  return type ? type->asObject()->description() : rt::String();
+}
+
+}  // namespace
+
+void SRLRegistry::load() {
+  initialize(rt::classInfo<SRLRegistry>());
+}
+
+void SRLRegistry::initialize(const rt::ClassInfo& receiver) {
+  if (&receiver != &rt::classInfo<SRLRegistry>()) return;
+  SRLStartUpHook();
+  std::vector<const SRLBindingsModuleData*> modules;
+  for (const rt::ClassMethod& method : rt::classMethods(receiver)) {
+    if (!method.selector().starts_with(kBindingsPrefix) || method.selector() == kBindingsPrefix) continue;
+    const auto bindings = method.as<const SRLBindingsModuleData*()>();
+    if (bindings == nullptr) continue;
+    if (const SRLBindingsModuleData* module = bindings()) modules.push_back(module);
+  }
+  sharedInstance()->internalRegisterBindings(modules);
+}
+
+rt::Ref<SRLRegistry> SRLRegistry::sharedInstance() {
+  const rt::LockGuard guard(sharedInstanceLock);
+  if (!isSharedInstanceMade) [[unlikely]] {
+    const rt::Ref<SRLRegistry> made = initPrivate();
+    made->retain();
+    sharedRegistry.store(made.get(), std::memory_order_relaxed);
+    isSharedInstanceMade = true;
+  }
+  return sharedRegistry.load(std::memory_order_relaxed);
+}
+
+rt::Ref<SRLRegistry> SRLRegistry::setSharedInstance(const rt::Ref<SRLRegistry>& registry) {
+  if (registry) registry->retain();
+  const rt::LockGuard guard(sharedInstanceLock);
+  isSharedInstanceMade = true;
+  return rt::Ref<SRLRegistry>::adopt(sharedRegistry.exchange(registry.get(), std::memory_order_relaxed));
+}
+
+bool SRLRegistry::isShared() const noexcept {
+  return sharedRegistry.load(std::memory_order_relaxed) == this;
+}
+
+rt::Ref<SRLRegistry> SRLRegistry::initPrivate() {
+  return rt::Ref<SRLRegistry>::adopt(new SRLRegistry(std::make_unique<SRLRegistryIvars>()));
+}
+
+SRLRegistry::SRLRegistry(std::unique_ptr<SRLRegistryIvars> ivars)
+    : ivars_(std::move(ivars)), configScope_(SRLMemoizingScope::init()) {}
+
+SRLRegistry::~SRLRegistry() {
+  if (rt::isMainThread()) return;
+  try {
+    rt::Queue::main()->async([ivars = std::move(ivars_)] {});
+  } catch (const std::bad_alloc&) {
+    // There is no memory for a task: then they are released here and now, with the task that there was to be.
+  }
+}
+
+rt::Ref<SRLRegistry> SRLRegistry::mutableCopy() const {
+  const rt::LockGuard guard(ivars_->lock);
+  return rt::Ref<SRLRegistry>::adopt(new SRLRegistry(std::make_unique<SRLRegistryIvars>(*ivars_)));
+}
+
+rt::String SRLRegistry::description() const {
+  rt::Dictionary::Builder singles;
+  rt::Dictionary::Builder multis;
+  {
+    const rt::LockGuard guard(ivars_->lock);
+    for (const auto& [api, implementation] : ivars_->singleBindings) {
+      singles.set(SRLAPIIdentifier(api), implementation);
+    }
+    for (const auto& [api, implementations] : ivars_->multiBindings) {
+      multis.set(SRLAPIIdentifier(api), implementations);
+    }
+  }
+  return rt::format("<%@: %p>\nSingle bindings:\n%@\nMulti bindings:\n%@"_s,
+                    rt::String::overStatic(classInfo().name), static_cast<const void*>(this),
+                    std::move(singles).dictionary(), std::move(multis).dictionary());
+}
+
+void SRLRegistry::internalRegisterBindings(std::span<const SRLBindingsModuleData* const> modules) {
+  if (ivars_->bindingsState != SRLBindingsState::kNone) {
+    SRLReportFatal({kFile, "-[SRLRegistry internalRegisterBindings:]"},
+                   "Trying to register bindings module data twice. This is likely caused by loading multiple "
+                   "bindings modules in the same app or test. "
+                   "See docs/registry.md#registering-bindings-module-twice."_s);
+  }
+  ivars_->bindingsState = SRLBindingsState::kInProgress;
+  for (const SRLBindingsModuleData* module : modules) {
+    if (module->addConfigurationFactories == nullptr) continue;
+    SRLConfigurationFactories factories;
+    module->addConfigurationFactories(factories);
+    ivars_->configFactories.merge(factories);
+  }
+  ivars_->bindingsModules.insert(ivars_->bindingsModules.end(), modules.begin(), modules.end());
+  ivars_->bindingsState = SRLBindingsState::kRegistered;
+}
+
+bool SRLRegistry::multipleBindingsModulesAllowed() const {
+  static const bool isAllowed = std::ranges::all_of(
+      ivars_->bindingsModules, [](const auto* module) { return module->allowsMultipleModules != 0; });
+  return isAllowed;
+}
+
+bool SRLRegistry::lazilyRegisterBindingsForAPI(const SRLAPIRegistrationData* api) {
+  const std::vector<const _SRLBindingRegistrationData*> bindings = registrationDatasForAPI(api);
+  for (const _SRLBindingRegistrationData* binding : bindings) registerBindings(*binding);
+  return !bindings.empty();
+}
+
+std::vector<const _SRLBindingRegistrationData*> SRLRegistry::registrationDatasForAPI(
+    const SRLAPIRegistrationData* api) const {
+  const std::string_view identifier = api->identifier;
+  std::vector<const _SRLBindingRegistrationData*> found;
+  for (const SRLBindingsModuleData* module : ivars_->bindingsModules) {
+    const auto bindings = module->bindings();
+    const auto position =
+        std::ranges::lower_bound(bindings, identifier, SRLIsIdentifierBefore,
+                                 [](const auto& binding) { return SRLIdentifierBytes(*binding.api); });
+    if (position != bindings.end() && SRLIdentifierBytes(*position->api) == identifier)
+      found.push_back(&*position);
+  }
+  return found;
+}
+
+void SRLRegistry::registerBindings(const _SRLBindingRegistrationData& binding) {
+  ivars_->lock.assertOwner();
+  const SRLAPIRegistrationData* api = binding.api;
+  if (*binding.implementations == nullptr) {
+    if (api->isMultibound == 0) {
+      ivars_->singleBindings[api] = nullptr;
+    } else {
+      rt::Ref<rt::Set> none = rt::make<rt::Set>();
+      rt::Ref<rt::Set>& implementations = ivars_->multiBindings[api];
+      if (!implementations) implementations = std::move(none);
+    }
+    return;
+  }
+  for (const auto* next = binding.implementations; *next != nullptr; ++next) {
+    const SRLImplementationRegistrationData* record = *next;
+    rt::Ref<SRLImplementationConfiguration> configuration;
+    if (record->hasConfiguration != 0) {
+      configuration = SRLImplementationConfiguration::initWithConfigurationInstanceType(
+          SRLImplementationRegistrationDataConfigInstanceType(record), record->isConfigurationRequired != 0);
+    }
+    rt::Ref<SRLInstanceType> instanceType = SRLImplementationRegistrationDataInstanceType(record);
+    SRLFactoryBlock factoryBlock =
+        scopedBlockForFactory(record->factory, record, api->scopeType, record->scopeType, record->lifetime);
+    internalRegisterServiceAPI(api, SRLImplementation::initWithIdentifier(
+                                        record->identifier, std::move(instanceType), record->lifetime,
+                                        record->scopeType, std::move(factoryBlock), configuration));
+  }
+}
+
+void SRLRegistry::internalRegisterServiceAPI(const SRLAPIRegistrationData* api,
+                                             const rt::Ref<SRLImplementation>& implementation) {
+  constexpr const char* kFunction = "-[SRLRegistry internalRegisterServiceAPI:toImplementation:]";
+  if (api == nullptr) {
+    PECReport({kFile, kFunction}, "apiData cannot be nil!"_s);
+    return;
+  }
+  if (!implementation) {
+    PECReport({kFile, kFunction}, "implMetadata cannot be nil!"_s);
+    return;
+  }
+
+  if (const auto* classType = rt::cast<SRLClassType>(implementation->instanceType().get())) {
+    const rt::Ref<SRLInstanceType> apiType = SRLAPIRegistrationDataInstanceType(api);
+    if (!apiType || !apiType->doesRepresentSupertypeOfClass(classType->concreteClass())) {
+      PECReport({kFile, kFunction}, "Implementation %@ should conform to %@"_s,
+                descriptionOf(implementation->instanceType()), descriptionOf(apiType));
+      return;
+    }
+  }
+  if ((implementation->scopeType() & api->scopeType) != implementation->scopeType()) {
+    // The grammar is that of a message that people search for.
+    PECReport({kFile, kFunction},
+              "Cannot bind a implementation to APIs that require a superset of scopes:\n"
+              "Implementation: %@,\nService API: %@"_s,
+              implementation->description(), SRLAPIIdentifier(api));
+    return;
+  }
+  if (api->isMultibound != 0) {
+    internalRegisterImplementation(implementation, api);
+  } else {
+    internalRegisterImplementation(implementation, api, /*allowOverridingExistingBinding=*/false);
+  }
+}
+
+void SRLRegistry::internalRegisterImplementation(const rt::Ref<SRLImplementation>& implementation,
+                                                 const SRLAPIRegistrationData* forSingleboundAPI,
+                                                 bool allowOverridingExistingBinding) {
+  constexpr const char* kFunction =
+      "-[SRLRegistry internalRegisterImplementation:forSingleboundAPI:allowOverridingExistingBinding:]";
+  if (forSingleboundAPI->isMultibound != 0) {
+    PECReport({kFile, kFunction}, "Incorrect binding type for %@"_s, SRLAPIIdentifier(forSingleboundAPI));
+    return;
+  }
+  rt::Ref<SRLImplementation>& bound = ivars_->singleBindings[forSingleboundAPI];
+  if (bound && !allowOverridingExistingBinding) {
+    PECReport({kFile, kFunction},
+              "Service API is already registered\nService API: %@\nExisting binding implementation: "
+              "%@\nNew binding implementation: %@"_s,
+              SRLAPIIdentifier(forSingleboundAPI), bound->description(), implementation->description());
+    return;
+  }
+  bound = implementation;
+}
+
+void SRLRegistry::internalRegisterImplementation(const rt::Ref<SRLImplementation>& implementation,
+                                                 const SRLAPIRegistrationData* forMultiboundAPI) {
+  constexpr const char* kFunction = "-[SRLRegistry internalRegisterImplementation:forMultiboundAPI:]";
+  if (forMultiboundAPI->isMultibound == 0) {
+    PECReport({kFile, kFunction}, "Incorrect binding type for %@"_s, SRLAPIIdentifier(forMultiboundAPI));
+    return;
+  }
+  // The set is complete before the API is known: a type of the host's own may throw when it is hashed.
+  const auto found = ivars_->multiBindings.find(forMultiboundAPI);
+  const bool isBound = found != ivars_->multiBindings.end() && found->second;
+  rt::Set::Builder builder = isBound ? rt::Set::Builder(*found->second) : rt::Set::Builder();
+  builder.add(implementation);
+  ivars_->multiBindings.insert_or_assign(forMultiboundAPI, std::move(builder).set());
+}
+
+rt::Ref<rt::Object> SRLRegistry::internalImplementationConfigForIdentifier(const void* identifier) {
+  const auto found = ivars_->configFactories.find(identifier);
+  if (found == ivars_->configFactories.end()) return nullptr;
+  return configScope_->instanceForIdentifier(identifier, nullptr, found->second);
+}
+
+const SRLAPIRegistrationData* SRLRegistry::apiIdentifierForProtocol(const rt::ProtocolInfo* protocol) const {
+  ivars_->lock.assertOwner();
+  if (protocol == nullptr) return nullptr;
+  for (const SRLBindingsModuleData* module : ivars_->bindingsModules) {
+    for (const _SRLBindingRegistrationData& binding : module->bindings()) {
+      if (binding.api->instanceTypeKind != SRLInstanceTypeKindNames) continue;
+      const SRLAPIInstanceType::Names& names = binding.api->instanceType.names;
+      if (names.className == nullptr && names.protocolName != nullptr &&
+          names.protocolName == protocol->name) {
+        return binding.api;
+      }
+    }
+  }
+  return nullptr;
+}
+
+const SRLAPIRegistrationData* SRLRegistry::apiIdentifierFromString(
+    const rt::String& apiIdentifierString) const {
+  if (!apiIdentifierString) {
+    PECReport({kFile, "-[SRLRegistry apiIdentifierFromString:]"}, "apiIdentifierString must not be nil"_s);
+    return nullptr;
+  }
+  const rt::LockGuard guard(ivars_->lock);
+  for (const SRLBindingsModuleData* module : ivars_->bindingsModules) {
+    for (const _SRLBindingRegistrationData& binding : module->bindings()) {
+      if (SRLIdentifierBytes(*binding.api) == apiIdentifierString.view()) return binding.api;
+    }
+  }
+  return nullptr;
+}
+
+rt::Ref<rt::Set> SRLRegistry::registeredAPIIdentifiers() const {
+  rt::Set::Builder identifiers;
+  const rt::LockGuard guard(ivars_->lock);
+  for (const SRLBindingsModuleData* module : ivars_->bindingsModules) {
+    for (const _SRLBindingRegistrationData& binding : module->bindings()) {
+      identifiers.add(SRLAPIIdentifier(binding.api).object());
+    }
+  }
+  return std::move(identifiers).set();
+}

@@ -1,0 +1,331 @@
+// How a registry hands out instances, and the scopes that they live in.
+
+#include <cstddef>
+#include <unordered_map>
+#include <utility>
+#include <vector>
+
+#include "Libraries/Util/ErrorHandler/PECReport.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLAPIIdentifier.h"
+#include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingEnabled.h"
+#include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingMeasurement.h"
+#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+
+using namespace rt::literals;
+
+namespace {
+
+constexpr const char* kFile = "Shared/ServiceRegistry/Source/SRLRegistry";
+
+// Asks an implementation for an instance while it is measured. A factory that throws leaves no mark.
+[[gnu::noinline]] rt::Ref<rt::Object> measuredInstance(const rt::Ref<SRLImplementation>& implementation,
+                                                       const SRLAPIRegistrationData* api,
+                                                       const SRLScopeTagSet& tags) {
+  const SRLPProfilingMeasurementPartial partial = SRLPCaptureInjectionStart(implementation);
+  bool instanceCreated = false;
+  rt::Ref<rt::Object> instance;
+  try {
+    instance = implementation->factoryBlock().callKept(tags, &instanceCreated);
+  } catch (...) {
+    SRLPCaptureInjectionCancel();
+    throw;
+  }
+  if (instanceCreated) {
+    SRLPCaptureInjectionEnd(partial, api, implementation);
+  } else {
+    SRLPCaptureInjectionCancel();
+  }
+  return instance;
+}
+
+// The registry that the calling thread is asking for an instance, which keeps it meanwhile; null for none.
+constinit thread_local SRLRegistry* asked = nullptr;
+
+struct Asking {
+  explicit Asking(SRLRegistry* registry) noexcept : before(std::exchange(asked, registry)) {}
+  Asking(const Asking&) = delete;
+  Asking& operator=(const Asking&) = delete;
+  ~Asking() { asked = before; }
+
+  SRLRegistry* const before;
+};
+
+rt::String instanceTypeOf(const SRLImplementation& implementation) {
+  const rt::Ref<SRLInstanceType>& type = implementation.instanceType();
+  return type ? type->asObject()->description() : rt::String();
+}
+
+}  // namespace
+
+rt::Ref<rt::Object> SRLRegistry::instanceOf(SRLImplementation& implementation,
+                                            const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) {
+  const Asking asking(this);
+  if (SRLPProfilingEnabled()) [[unlikely]]
+    return measuredInstance(&implementation, api, tags);
+  bool instanceCreated = false;
+  return implementation.factoryBlock().callKept(tags, &instanceCreated);
+}
+
+// Flat, as is what it calls for an instance that is there: most requests are of that kind.
+[[gnu::flatten]] rt::Ref<rt::Object> SRLRegistry::internalService(const SRLAPIRegistrationData* api,
+                                                                  const SRLScopeTagSet& scopeTags) {
+  constexpr const char* kFunction = "-[SRLRegistry internalService:scopeTags:]";
+  rt::Ref<SRLImplementation> implementation;
+  {
+    const rt::LockGuard guard(ivars_->lock);
+    implementation = implementationForSingleBoundService(api);
+    if (!implementation || !implementation->factoryBlock()) [[unlikely]] {
+      if (ivars_->bindingsState == SRLBindingsState::kRegistered) {
+        PECReport({kFile, kFunction}, "No binding was found for required, single-bound service: %@"_s,
+                  SRLAPIIdentifier(api));
+      } else {
+        PECReport(
+            {kFile, kFunction},
+            "A service injector was called prior to service bindings being registered.\n\nService: %@"_s,
+            SRLAPIIdentifier(api));
+      }
+      return nullptr;
+    }
+  }
+  rt::Ref<rt::Object> instance = instanceOf(*implementation, api, scopeTags);
+  if (!instance) [[unlikely]] {
+    PECReport({kFile, kFunction},
+              "Implementation of %@, bound to required service %@, returned nil.\nImplementation metadata: %@"
+              "\nSee docs/registry.md#initializer-return-nil."_s,
+              instanceTypeOf(*implementation), SRLAPIIdentifier(api), implementation->description());
+  }
+  return instance;
+}
+
+rt::Ref<rt::Object> SRLRegistry::internalOptionalService(const SRLAPIRegistrationData* api,
+                                                         const SRLScopeTagSet& scopeTags) {
+  rt::Ref<SRLImplementation> implementation;
+  {
+    const rt::LockGuard guard(ivars_->lock);
+    implementation = implementationForSingleBoundService(api);
+    if (!implementation || !implementation->factoryBlock()) {
+      if (ivars_->bindingsState == SRLBindingsState::kInProgress) {
+        PECReport(
+            {kFile, "-[SRLRegistry internalOptionalService:scopeTags:]"},
+            "A service injector was called prior to service bindings being registered.\n\nService: %@"_s,
+            SRLAPIIdentifier(api));
+      }
+      return nullptr;
+    }
+  }
+  return instanceOf(*implementation, api, scopeTags);
+}
+
+rt::Ref<SRLImplementation> SRLRegistry::implementationForSingleBoundService(
+    const SRLAPIRegistrationData* api) {
+  if (api == nullptr) [[unlikely]] {
+    PECReport({kFile, "-[SRLRegistry implementationForSingleBoundService:]"},
+              "|apiIdentifier| cannot be nil!"_s);
+    return nullptr;
+  }
+  if (const auto found = ivars_->singleBindings.find(api); found != ivars_->singleBindings.end()) {
+    return found->second;
+  }
+  if (!lazilyRegisterBindingsForAPI(api)) return nullptr;
+  // Made known even where registration has refused what there was.
+  return ivars_->singleBindings[api];
+}
+
+rt::Ref<rt::Array> SRLRegistry::internalMultiBoundService(const SRLAPIRegistrationData* api,
+                                                          const SRLScopeTagSet& scopeTags) {
+  constexpr const char* kFunction = "-[SRLRegistry internalMultiBoundService:scopeTags:]";
+  if (api == nullptr) [[unlikely]] {
+    PECReport({kFile, kFunction}, "|apiIdentifier| cannot be nil!"_s);
+    return nullptr;
+  }
+  rt::Ref<rt::Set> implementations;
+  {
+    const rt::LockGuard guard(ivars_->lock);
+    auto found = ivars_->multiBindings.find(api);
+    if (found == ivars_->multiBindings.end() && lazilyRegisterBindingsForAPI(api)) {
+      found = ivars_->multiBindings.try_emplace(api).first;
+    }
+    if (found != ivars_->multiBindings.end()) implementations = found->second;
+    if (!implementations) {
+      if (ivars_->bindingsState == SRLBindingsState::kInProgress) {
+        PECReport(
+            {kFile, kFunction},
+            "A service injector was called prior to service bindings being registered.\n\nService: %@"_s,
+            SRLAPIIdentifier(api));
+      }
+      return nullptr;
+    }
+  }
+  std::vector<rt::Ref<rt::Object>> instances;
+  instances.reserve(implementations->count());
+  for (const rt::Ref<rt::Object>& element : *implementations) {
+    auto& implementation = static_cast<SRLImplementation&>(*element);
+    rt::Ref<rt::Object> instance = instanceOf(implementation, api, scopeTags);
+    if (instance) {
+      instances.push_back(std::move(instance));
+    } else {
+      PECReport(
+          {kFile, kFunction},
+          "Implementation of %@, bound to multi-bound service %@, returned nil.\nImplementation metadata: %@"
+          "\nSee docs/registry.md#initializer-return-nil."_s,
+          instanceTypeOf(implementation), SRLAPIIdentifier(api), implementation.description());
+    }
+  }
+  return rt::make<rt::Array>(std::move(instances));
+}
+
+bool SRLRegistry::internalHasImplementationForService(const SRLAPIRegistrationData* api) {
+  if (api == nullptr) [[unlikely]] {
+    PECReport({kFile, "-[SRLRegistry internalHasImplementationForService:]"},
+              "|apiIdentifier| cannot be nil!"_s);
+    return false;
+  }
+  const rt::LockGuard guard(ivars_->lock);
+  return implementationForSingleBoundService(api) != nullptr;
+}
+
+rt::Ref<rt::Object> SRLRegistry::eg_internalService(const rt::String& identifier,
+                                                    const rt::Ref<SRLScopeTagSetCodableWrapper>& scopeTags) {
+  constexpr const char* kFunction = "-[SRLRegistry eg_internalService:scopeTags:]";
+  if (!scopeTags) {
+    PECReport({kFile, kFunction}, "Missing tag set for service:\n%@."_s, identifier);
+    return nullptr;
+  }
+  const SRLAPIRegistrationData* api = apiIdentifierFromString(identifier);
+  if (api == nullptr) {
+    PECReport({kFile, kFunction}, "Unknown API %@"_s, identifier);
+    return nullptr;
+  }
+  const rt::Ref<rt::Array> tags = scopeTags->tags();
+  return internalService(api, SRLScopeTagSetCreateWithTags(tags.get()));
+}
+
+rt::Ref<rt::Object> SRLRegistry::eg_internalOptionalService(
+    const rt::String& identifier, const rt::Ref<SRLScopeTagSetCodableWrapper>& scopeTags) {
+  if (!scopeTags) {
+    PECReport({kFile, "-[SRLRegistry eg_internalOptionalService:scopeTags:]"},
+              "Missing tag set for service:\n%@."_s, identifier);
+    return nullptr;
+  }
+  const SRLAPIRegistrationData* api = apiIdentifierFromString(identifier);
+  if (api == nullptr) return nullptr;
+  const rt::Ref<rt::Array> tags = scopeTags->tags();
+  return internalOptionalService(api, SRLScopeTagSetCreateWithTags(tags.get()));
+}
+
+rt::Ref<rt::Array> SRLRegistry::eg_internalMultiBoundService(
+    const rt::String& identifier, const rt::Ref<SRLScopeTagSetCodableWrapper>& scopeTags) {
+  if (!scopeTags) {
+    PECReport({kFile, "-[SRLRegistry eg_internalMultiBoundService:scopeTags:]"},
+              "Missing tag set for service:\n%@."_s, identifier);
+    return nullptr;
+  }
+  const SRLAPIRegistrationData* api = apiIdentifierFromString(identifier);
+  if (api == nullptr) return rt::make<rt::Array>();
+  const rt::Ref<rt::Array> tags = scopeTags->tags();
+  return internalMultiBoundService(api, SRLScopeTagSetCreateWithTags(tags.get()));
+}
+
+bool SRLRegistry::eg_internalHasImplementationForService(const rt::String& identifier) {
+  const SRLAPIRegistrationData* api = apiIdentifierFromString(identifier);
+  if (api == nullptr) {
+    PECReport({kFile, "-[SRLRegistry eg_internalHasImplementationForService:]"}, "Unknown API %@"_s,
+              identifier);
+    return false;
+  }
+  return internalHasImplementationForService(api);
+}
+
+rt::Ref<SRLMemoizingScope> SRLRegistry::scopeWithTags(const SRLScopeTagSet& tags) {
+  const rt::LockGuard guard(ivars_->lock);
+  if (const auto found = ivars_->scopes.find(tags); found != ivars_->scopes.end()) return found->second;
+  rt::Ref<SRLMemoizingScope> scope = SRLMemoizingScope::init();
+  ivars_->scopes.emplace(tags, scope);
+  SRLScopeTagSetRetain(tags);
+  return scope;
+}
+
+[[gnu::flatten]] rt::Ref<rt::Object> SRLRegistry::scopedInstance(
+    const SRLScopeTagSet& tags, const SRLImplementationRegistrationData* implementationIdentifier,
+    bool* instanceCreated, rt::Ref<rt::Object> (*factory)(SRLScopeTagSet tags)) {
+  {
+    // An instance that is there is got at one go, and its scope needs no reference.
+    const rt::LockGuard guard(ivars_->lock);
+    rt::Ref<rt::Object> instance;
+    const auto scope = ivars_->scopes.find(tags);
+    if (scope != ivars_->scopes.end() && scope->second->findInstance(implementationIdentifier, instance))
+        [[likely]]
+      return instance;
+  }
+  return scopeWithTags(tags)->instanceForIdentifier(implementationIdentifier, instanceCreated,
+                                                    [&] { return factory(tags); });
+}
+
+void SRLRegistry::removeScopesWithTag(const rt::Ref<rt::Object>& tag) {
+  if (!tag) {
+    PECReport({kFile, "-[SRLRegistry removeScopesWithTag:]"}, "tag cannot be nil!"_s);
+    return;
+  }
+  // What the caller's reference is a part of may end with a scope.
+  const rt::Ref<rt::Object> keptTag = tag;
+  const bool isDelegateSet = scopeLifecycleDelegate() != nullptr;
+  std::vector<rt::Weak<rt::Object>> instances;
+  {
+    // Entries that are taken out keep their scopes, and the tags that their keys have retained, until the
+    // lock is let go.
+    struct Removed : std::vector<SRLRegistryIvars::Scopes::node_type> {
+      ~Removed() {
+        for (const auto& entry : *this) SRLScopeTagSetRelease(entry.key());
+      }
+    } removed;
+    std::vector<SRLRegistryIvars::Scopes::const_iterator> entries;
+    const rt::LockGuard guard(ivars_->lock);
+    for (auto entry = ivars_->scopes.cbegin(); entry != ivars_->scopes.cend(); ++entry) {
+      if (!SRLScopeTagSetContainsTag(entry->first, keptTag.get())) continue;
+      entries.push_back(entry);
+      if (!isDelegateSet) continue;
+      const rt::Ref<rt::Array> kept = entry->second->instances();
+      instances.insert(instances.end(), kept->begin(), kept->end());
+    }
+    removed.reserve(entries.size());
+    for (const auto& entry : entries) removed.push_back(ivars_->scopes.extract(entry));
+  }
+  if (const rt::Ref<SRLScopeLifecycleDelegate> delegate = scopeLifecycleDelegate()) {
+    delegate->didRemoveScopesWithTag(keptTag, instances);
+  }
+}
+
+rt::Ref<SRLScopeLifecycleDelegate> SRLRegistry::scopeLifecycleDelegate() const {
+  const rt::LockGuard guard(delegateLock_);
+  return scopeLifecycleDelegate_.lock();
+}
+
+void SRLRegistry::setScopeLifecycleDelegate(const rt::Ref<SRLScopeLifecycleDelegate>& delegate) {
+  rt::Weak<SRLScopeLifecycleDelegate> weak = delegate;
+  const rt::LockGuard guard(delegateLock_);
+  scopeLifecycleDelegate_ = std::move(weak);
+}
+
+SRLFactoryBlock SRLRegistry::scopedBlockForFactory(
+    rt::Ref<rt::Object> (*factory)(SRLScopeTagSet tags),
+    const SRLImplementationRegistrationData* implementationIdentifier, SRLScopeType apiScope,
+    SRLScopeType implScope, std::uint64_t lifetime) {
+  if (lifetime == 1) {
+    return [=](const SRLScopeTagSet& tags, bool* instanceCreated) {
+      if (instanceCreated != nullptr) *instanceCreated = true;
+      return factory(SRLScopeTagSetMaskingWithScopes(tags, apiScope, implScope));
+    };
+  }
+  return [=](const SRLScopeTagSet& tags, bool* instanceCreated) -> rt::Ref<rt::Object> {
+    const SRLScopeTagSet masked = SRLScopeTagSetMaskingWithScopes(tags, apiScope, implScope);
+    // Mostly it is the shared registry that is asked, and needs no reference.
+    rt::Ref<SRLRegistry> reference;
+    SRLRegistry* registry = asked;
+    if (registry == nullptr || !registry->isShared()) {
+      reference = sharedInstance();
+      registry = reference.get();
+      if (registry == nullptr) return nullptr;
+    }
+    return registry->scopedInstance(masked, implementationIdentifier, instanceCreated, factory);
+  };
+}

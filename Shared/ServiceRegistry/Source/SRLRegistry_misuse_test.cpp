@@ -1,0 +1,156 @@
+// What ends the program: modules that are registered twice, and misuse of the lock.
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <csignal>
+#include <cstdio>
+#include <functional>
+#include <string>
+
+#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "tests/TestBindings.h"
+#include "tests/TestReports.h"
+
+namespace {
+
+using namespace rt::literals;
+using rt::Ref;
+using testing::ContainsRegex;
+using testing::HasSubstr;
+using testing::KilledBySignal;
+using testing::Not;
+
+constexpr const char* kTwice =
+    "Trying to register bindings module data twice. This is likely caused by loading multiple bindings "
+    "modules "
+    "in the same app or test. See docs/registry.md#registering-bindings-module-twice.";
+constexpr const char* kTakenAgain =
+    "rt: the lock at 0x[0-9a-f]+ is taken again by thread [0-9]+, which holds it\n";
+constexpr const char* kNotHeld =
+    "rt: the lock at 0x[0-9a-f]+ is needed by thread [0-9]+, but no thread holds it\n";
+
+// The error callback writes the report, and returns.
+void print(const Ref<PECErrorDescription>& error) {
+  std::fprintf(stderr, "%s: %s: \"%s\" of \"%s\"\n", std::string(error->filePath().view()).c_str(),
+               std::string(error->functionName().view()).c_str(),
+               std::string(error->errorMessage().view()).c_str(),
+               std::string(error->rawFormatString().view()).c_str());
+}
+
+class SRLRegistryDeathTest : public testing::Test {
+ protected:
+  SRLRegistryDeathTest() { setCallback(print); }
+
+  static void setCallback(const PECErrorHandlerBlock& callback) {
+    PECErrorHandler::sharedInstance()->setErrorHandlerBlock(callback);
+  }
+
+  TestReports reports_;
+  const TestModule module_{{{&testClockAPI, testWallClocks}}};
+  const Ref<SRLRegistry> registry_ = registryWith({&module_});
+};
+
+TEST_F(SRLRegistryDeathTest, ModulesRegisteredTwiceEndTheProgramAfterAReport) {
+  const std::string report =
+      "Shared/ServiceRegistry/Source/SRLRegistry: -[SRLRegistry internalRegisterBindings:]: \"" +
+      std::string(kTwice) + "\" of \"" + kTwice + "\"\n";
+  EXPECT_EXIT(registry_->internalRegisterBindings({}), KilledBySignal(SIGABRT), HasSubstr(report));
+  // The program's own have been registered when it was loaded.
+  EXPECT_EXIT(SRLRegistry::sharedInstance()->internalRegisterBindings({}), KilledBySignal(SIGABRT),
+              HasSubstr(report));
+  EXPECT_EXIT(SRLRegistry::initialize(rt::classInfo<SRLRegistry>()), KilledBySignal(SIGABRT),
+              HasSubstr(report));
+  EXPECT_EXIT(SRLRegistry::load(), KilledBySignal(SIGABRT), HasSubstr(report));
+  // A copy is as far as the original.
+  EXPECT_EXIT(registry_->mutableCopy()->internalRegisterBindings({}), KilledBySignal(SIGABRT),
+              HasSubstr(report));
+}
+
+TEST_F(SRLRegistryDeathTest, ModulesRegisteredWhileModulesAreRegisteredEndTheProgram) {
+  static SRLRegistry* registry;
+  const Ref<SRLRegistry> fresh = SRLRegistry::initPrivate();
+  registry = fresh.get();
+  const TestModule module({}, [](SRLConfigurationFactories&) { registry->internalRegisterBindings({}); });
+  const SRLBindingsModuleData* const modules[] = {module.data()};
+  EXPECT_EXIT(fresh->internalRegisterBindings(modules), KilledBySignal(SIGABRT), HasSubstr(kTwice));
+}
+
+// Nobody can catch what the error callback throws.
+TEST_F(SRLRegistryDeathTest, ModulesRegisteredTwiceEndTheProgramWhereTheCallbackThrows) {
+  struct Thrown {};
+  const auto registerTwice = [this] {
+    try {
+      registry_->internalRegisterBindings({});
+    } catch (...) {
+      std::fputs("caught\n", stderr);
+    }
+  };
+  setCallback([](const Ref<PECErrorDescription>& error) {
+    print(error);
+    throw Thrown();
+  });
+  EXPECT_EXIT(registerTwice(), KilledBySignal(SIGABRT), AllOf(HasSubstr(kTwice), Not(HasSubstr("caught"))));
+  // The one that stands in where none is set.
+  setCallback(nullptr);
+  EXPECT_EXIT(registerTwice(), KilledBySignal(SIGABRT), AllOf(HasSubstr(kTwice), Not(HasSubstr("caught"))));
+}
+
+TEST_F(SRLRegistryDeathTest, WhatNeedsTheLockEndsTheProgramWithoutIt) {
+  const auto registerBindings = [this]() RT_NO_THREAD_SAFETY_ANALYSIS {
+    registry_->registerBindings(module_.bindings().front());
+  };
+  EXPECT_EXIT(registerBindings(), KilledBySignal(SIGABRT), ContainsRegex(kNotHeld));
+  const auto ask = [this]() RT_NO_THREAD_SAFETY_ANALYSIS {
+    registry_->apiIdentifierForProtocol(&rt::protocolInfo<TestClock>());
+  };
+  EXPECT_EXIT(ask(), KilledBySignal(SIGABRT), ContainsRegex(kNotHeld));
+}
+
+// The lock of another registry is another lock.
+TEST_F(SRLRegistryDeathTest, WhatNeedsTheLockEndsTheProgramWithAnotherLock) {
+  const Ref<SRLRegistry> copy = registry_->mutableCopy();
+  const auto registerBindings = [&]() RT_NO_THREAD_SAFETY_ANALYSIS {
+    const rt::LockGuard guard(*registry_->lock());
+    copy->registerBindings(module_.bindings().front());
+  };
+  EXPECT_EXIT(registerBindings(), KilledBySignal(SIGABRT), ContainsRegex(kNotHeld));
+}
+
+TEST_F(SRLRegistryDeathTest, WhatTakesTheLockEndsTheProgramWithIt) {
+  const std::function<void()> takers[] = {
+      [this] { registry_->apiIdentifierFromString("Clock"_s); },
+      [this] { registry_->registeredAPIIdentifiers(); },
+      [this] { registry_->description(); },
+      [this] { registry_->mutableCopy(); },
+      [this] { registry_->internalService(&testClockAPI, {}); },
+  };
+  for (const auto& take : takers) {
+    const auto takeTwice = [&] {
+      const rt::LockGuard guard(*registry_->lock());
+      take();
+    };
+    EXPECT_EXIT(takeTwice(), KilledBySignal(SIGABRT), ContainsRegex(kTakenAgain));
+  }
+}
+
+// A report that is made with the lock held: the callback must not ask the registry for anything.
+TEST_F(SRLRegistryDeathTest, AnErrorCallbackThatUsesTheRegistryUnderItsLockEndsTheProgram) {
+  setCallback([this](const Ref<PECErrorDescription>& error) {
+    print(error);
+    registry_->registeredAPIIdentifiers();
+  });
+  const SRLAPIRegistrationData unknown{.identifier = "Unknown", .identifierLength = 7};
+  EXPECT_EXIT(registry_->internalService(&unknown, {}), KilledBySignal(SIGABRT),
+              AllOf(HasSubstr("No binding was found for required, single-bound service: Unknown"),
+                    ContainsRegex(kTakenAgain)));
+  const auto bindStone = [this] {
+    const rt::LockGuard guard(*registry_->lock());
+    registry_->internalRegisterServiceAPI(&testClockAPI, implementationOf<TestStone>("stone"));
+  };
+  EXPECT_EXIT(bindStone(), KilledBySignal(SIGABRT),
+              AllOf(HasSubstr("Implementation TestStone should conform to id<TestClock>"),
+                    ContainsRegex(kTakenAgain)));
+}
+
+}  // namespace

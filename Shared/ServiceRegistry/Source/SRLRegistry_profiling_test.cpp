@@ -1,0 +1,106 @@
+// What is measured of services that a registry hands out, in a program that has profiling on or off:
+// SWITCH_ANSWER.
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <cstddef>
+
+#include "Runtime/Number.h"
+#include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingMeasurement.h"
+#include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingSwitch.h"
+#include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationEvent.h"
+#include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationNewInstanceEvent.h"
+#include "Shared/ServiceRegistry/Source/Profiling/SRLProfilingStorage.h"
+#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "tests/TestServices.h"
+
+bool SRLPProfilingSwitch() {
+  return SWITCH_ANSWER;
+}
+
+namespace {
+
+using namespace TestServices;
+using rt::Ref;
+
+class SRLRegistryProfiling : public ServicesTest {
+ protected:
+  // New events since the last call: the store is the process's.
+  std::vector<Ref<SRLPServiceInitializationEvent>> newEvents() {
+    std::vector<Ref<SRLPServiceInitializationEvent>> events;
+    const Ref<rt::Array> all = SRLProfilingStorage::sharedInstance()->serviceInitializationEvents();
+    // The latest come first.
+    for (std::size_t i = 0; i + seen < all->count(); ++i) {
+      events.emplace_back(all->at<SRLPServiceInitializationEvent>(i));
+    }
+    seen = all->count();
+    return events;
+  }
+  static std::uint64_t freshOnes() {
+    std::uint64_t count = 0;
+    const Ref<rt::Array> all =
+        SRLProfilingStorage::sharedInstance()->serviceInitializationNewInstanceEvents();
+    for (const Ref<rt::Object>& event : *all) {
+      count += rt::cast<SRLPServiceInitializationNewInstanceEvent>(event.get())->initializationCount();
+    }
+    return count;
+  }
+
+  std::size_t seen = SRLProfilingStorage::sharedInstance()->serviceInitializationEvents()->count();
+};
+
+constexpr std::size_t kOne = SWITCH_ANSWER ? 1 : 0;
+
+TEST_F(SRLRegistryProfiling, MeasuresWhatIsMadeForAScopeOnce) {
+  registry->internalService(&scopedAPI, tags);
+  const auto events = newEvents();
+  ASSERT_EQ(events.size(), kOne);
+  if (SWITCH_ANSWER) {
+    EXPECT_EQ(events[0]->apiDescription(), "Scoped");
+    EXPECT_TRUE(events[0]->implDescription().contains("identifier: ScopedThing"));
+    EXPECT_FALSE(events[0]->parentImplDescription());
+  }
+  // What is there already is forgotten.
+  registry->internalService(&scopedAPI, tags);
+  registry->internalOptionalService(&scopedAPI, tags);
+  EXPECT_EQ(newEvents().size(), 0U);
+  EXPECT_EQ(SRLPProfilingDetail::countOfStacks(), 0U);
+}
+
+TEST_F(SRLRegistryProfiling, KnowsWhatNeededAService) {
+  registry->internalService(&nestedAPI, tags);
+  const auto events = newEvents();
+  ASSERT_EQ(events.size(), 2 * kOne);
+  if (SWITCH_ANSWER) {
+    EXPECT_EQ(events[0]->apiDescription(), "Nested");
+    EXPECT_FALSE(events[0]->parentImplDescription());
+    EXPECT_EQ(events[1]->apiDescription(), "Scoped");
+    EXPECT_EQ(events[1]->parentImplDescription(), "Nest");
+  }
+}
+
+TEST_F(SRLRegistryProfiling, CountsWhatIsMadeAnewEachTime) {
+  const std::uint64_t before = freshOnes();
+  for (int i = 0; i < 3; ++i) registry->internalService(&freshAPI, tags);
+  registry->internalOptionalService(&freshAPI, tags);
+  EXPECT_EQ(freshOnes() - before, 4 * kOne);
+  EXPECT_EQ(newEvents().size(), 0U);
+}
+
+TEST_F(SRLRegistryProfiling, MeasuresEachOfMany) {
+  const std::uint64_t before = freshOnes();
+  registry->internalMultiBoundService(&manyAPI, tags);
+  registry->internalMultiBoundService(&manyAPI, tags);
+  // A scoped one and one that is null, made once, and one that is made twice.
+  EXPECT_EQ(newEvents().size(), 2 * kOne);
+  EXPECT_EQ(freshOnes() - before, 2 * kOne);
+}
+
+TEST_F(SRLRegistryProfiling, ForgetsWhatThrows) {
+  EXPECT_THROW(registry->internalService(&throwingAPI, {}), Failure);
+  EXPECT_EQ(SRLPProfilingDetail::countOfStacks(), 0U);
+  EXPECT_EQ(newEvents().size(), 0U);
+}
+
+}  // namespace

@@ -1,0 +1,315 @@
+// Instances of services: required, optional, many.
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <array>
+#include <iterator>
+#include <string>
+#include <vector>
+
+#include "Runtime/Number.h"
+#include "Runtime/UnfairLock.h"
+#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "tests/AllocationCount.h"
+#include "tests/TestServices.h"
+
+namespace {
+
+using namespace TestServices;
+using rt::Ref;
+using testing::ElementsAre;
+using testing::IsEmpty;
+
+constexpr const char* kService = "-[SRLRegistry internalService:scopeTags:]";
+constexpr const char* kOptional = "-[SRLRegistry internalOptionalService:scopeTags:]";
+constexpr const char* kMultiBound = "-[SRLRegistry internalMultiBoundService:scopeTags:]";
+
+std::string priorTo(const std::string& api) {
+  return "A service injector was called prior to service bindings being registered.\n\nService: " + api;
+}
+std::string noBinding(const std::string& api) {
+  return "No binding was found for required, single-bound service: " + api;
+}
+
+class SRLRegistryServices : public ServicesTest {
+ protected:
+  // The description of what is bound to an API for one.
+  std::string metadataOf(const SRLAPIRegistrationData& api) {
+    const rt::LockGuard guard(*registry->lock());
+    return std::string(registry->implementationForSingleBoundService(&api)->description());
+  }
+};
+
+SRLScopeTagSet tagsOf(const Ref<rt::Object>& object) {
+  return rt::cast<Thing>(object.get())->tags;
+}
+
+TEST_F(SRLRegistryServices, NewEachTimeForLifetimeOne) {
+  const Ref<rt::Object> first = registry->internalService(&freshAPI, tags);
+  const Ref<rt::Object> second = registry->internalService(&freshAPI, tags);
+  ASSERT_TRUE(first && second);
+  EXPECT_NE(first, second);
+  EXPECT_EQ(tagsOf(first).tags, tagSet(window).tags);
+  EXPECT_THAT(reports.texts(), IsEmpty());
+}
+
+TEST_F(SRLRegistryServices, OncePerScopeForLifetimeZero) {
+  const Ref<rt::Object> first = registry->internalService(&scopedAPI, tags);
+  ASSERT_TRUE(first);
+  EXPECT_EQ(tagsOf(first).tags, tagSet(account).tags);
+  EXPECT_EQ(registry->internalService(&scopedAPI, tags), first);
+  // The implementation's scope has no window, and equal tags are as good as the same.
+  const Ref<rt::Object> otherWindow = rt::Number::of(2);
+  const Ref<rt::Object> equalAccount = rt::String::fromUTF8("account").object();
+  EXPECT_EQ(registry->internalService(&scopedAPI, tagSet(equalAccount, otherWindow)), first);
+  EXPECT_NE(registry->internalService(&scopedAPI, tagSet(otherWindow, window)), first);
+  EXPECT_THAT(reports.texts(), IsEmpty());
+}
+
+TEST_F(SRLRegistryServices, OfNoScopeAreInTheScopeWithoutTags) {
+  const Ref<rt::Object> thing = registry->internalService(&globalAPI, {});
+  ASSERT_TRUE(thing);
+  EXPECT_EQ(registry->internalService(&globalAPI, {}), thing);
+  const Ref<rt::Array> instances = registry->scopeWithTags({})->instances();
+  ASSERT_EQ(instances->count(), 1U);
+  EXPECT_EQ(instances->at(0), thing.get());
+}
+
+TEST_F(SRLRegistryServices, AreAskedForByFactories) {
+  const Ref<rt::Object> nest = registry->internalService(&nestedAPI, tags);
+  ASSERT_TRUE(rt::cast<Nest>(nest.get()) != nullptr);
+  EXPECT_EQ(rt::cast<Nest>(nest.get())->inner, registry->internalService(&scopedAPI, tags));
+}
+
+TEST_F(SRLRegistryServices, GetNoTagsWhereTheirsDoNotFitTheScope) {
+  const Ref<rt::Object> thing = registry->internalService(&freshAPI, tagSet(account));
+  EXPECT_THAT(reports.texts(), ElementsAre("The tag set must contain all API scope tags."));
+  ASSERT_TRUE(thing);
+  EXPECT_EQ(tagsOf(thing).tags, SRLScopeTagSet().tags);
+}
+
+TEST_F(SRLRegistryServices, RequiredOnesAreReportedWhereNothingIsBound) {
+  for (int i = 0; i < 2; ++i) {
+    EXPECT_FALSE(registry->internalService(&unboundAPI, {}));
+    EXPECT_FALSE(registry->internalService(&unknownAPI, {}));
+    EXPECT_THAT(reportsOf(kService), ElementsAre(noBinding("Unbound"), noBinding("Unknown")));
+  }
+}
+
+TEST_F(SRLRegistryServices, RequiredOnesAreReportedBeforeThereAreBindings) {
+  EXPECT_FALSE(SRLRegistry::initPrivate()->internalService(&scopedAPI, tags));
+  EXPECT_THAT(reportsOf(kService), ElementsAre(priorTo("Scoped")));
+}
+
+TEST_F(SRLRegistryServices, OptionalOnesNeedNotBeThere) {
+  EXPECT_FALSE(registry->internalOptionalService(&unboundAPI, {}));
+  EXPECT_FALSE(registry->internalOptionalService(&unknownAPI, {}));
+  EXPECT_FALSE(registry->internalOptionalService(&nullAPI, {}));
+  EXPECT_FALSE(SRLRegistry::initPrivate()->internalOptionalService(&scopedAPI, tags));
+  EXPECT_FALSE(SRLRegistry::initPrivate()->internalMultiBoundService(&manyAPI, tags));
+  EXPECT_EQ(registry->internalOptionalService(&scopedAPI, tags), registry->internalService(&scopedAPI, tags));
+  EXPECT_THAT(reports.texts(), IsEmpty());
+}
+
+// Of the registry in the making, from a module's own callback.
+SRLRegistry* inTheMaking = nullptr;
+
+TEST_F(SRLRegistryServices, AreReportedWhileModulesAreBeingRegistered) {
+  const SRLBindingsModuleData module{
+      .bindingsBegin = kModule.bindingsBegin,
+      .bindingsEnd = kModule.bindingsEnd,
+      .addConfigurationFactories = [](SRLConfigurationFactories&) {
+        const Ref<rt::Object> tag = rt::Number::of(1);
+        EXPECT_FALSE(inTheMaking->internalService(&scopedAPI, tagSet(tag, tag)));
+        EXPECT_FALSE(inTheMaking->internalOptionalService(&scopedAPI, tagSet(tag, tag)));
+        EXPECT_FALSE(inTheMaking->internalMultiBoundService(&manyAPI, tagSet(tag, tag)));
+        EXPECT_FALSE(inTheMaking->internalHasImplementationForService(&scopedAPI));
+      }};
+  const Ref<SRLRegistry> other = SRLRegistry::initPrivate();
+  inTheMaking = other.get();
+  other->internalRegisterBindings(std::array{&module});
+  const std::vector<Ref<LUMLogMessage>> messages = reports.messages();
+  ASSERT_EQ(messages.size(), 3U);
+  EXPECT_EQ(text(*messages[0]), priorTo("Scoped"));
+  EXPECT_EQ(messages[0]->function(), kService);
+  EXPECT_EQ(text(*messages[1]), priorTo("Scoped"));
+  EXPECT_EQ(messages[1]->function(), kOptional);
+  EXPECT_EQ(text(*messages[2]), priorTo("Many"));
+  EXPECT_EQ(messages[2]->function(), kMultiBound);
+  // That there was nothing then is not remembered.
+  EXPECT_TRUE(other->internalService(&scopedAPI, tags));
+  EXPECT_TRUE(other->internalMultiBoundService(&manyAPI, tags));
+}
+
+TEST_F(SRLRegistryServices, NullIsReportedForARequiredOne) {
+  const std::string report =
+      "Implementation of Thing, bound to required service Null, returned nil.\nImplementation metadata: " +
+      metadataOf(nullAPI) + "\nSee docs/registry.md#initializer-return-nil.";
+  EXPECT_FALSE(registry->internalService(&nullAPI, {}));
+  EXPECT_THAT(reportsOf(kService), ElementsAre(report));
+  // Null is kept as any instance is, and reported each time.
+  EXPECT_FALSE(registry->internalService(&nullAPI, {}));
+  EXPECT_THAT(reportsOf(kService), ElementsAre(report));
+  EXPECT_EQ(nullsMade, 1);
+}
+
+TEST_F(SRLRegistryServices, ManyComeWithoutNulls) {
+  const Ref<rt::Array> things = registry->internalMultiBoundService(&manyAPI, tags);
+  const std::vector<std::string> texts = reportsOf(kMultiBound);
+  ASSERT_EQ(texts.size(), 1U);
+  EXPECT_THAT(texts[0], testing::MatchesRegex(
+                            "Implementation of Thing, bound to multi-bound service Many, returned nil.\n"
+                            "Implementation metadata: SRLImplementation<0x[0-9a-f]+, identifier: NullThing, "
+                            "instanceType: Thing, lifetime: 0, scopeType: 0, configuration: None>\n"
+                            "See docs/registry.md#initializer-return-nil\\."));
+  ASSERT_TRUE(things);
+  ASSERT_EQ(things->count(), 2U);
+  EXPECT_TRUE(things->contains(registry->scopeWithTags(tagSet(account))->instances()->at(0)));
+
+  const Ref<rt::Array> again = registry->internalMultiBoundService(&manyAPI, tags);
+  ASSERT_EQ(again->count(), 2U);
+  int same = 0;
+  for (const Ref<rt::Object>& thing : *again) same += things->contains(thing.get()) ? 1 : 0;
+  EXPECT_EQ(same, 1);
+}
+
+TEST_F(SRLRegistryServices, ManyMayBeNone) {
+  const Ref<rt::Array> none = registry->internalMultiBoundService(&noneOfManyAPI, {});
+  ASSERT_TRUE(none);
+  EXPECT_TRUE(none->isEmpty());
+  EXPECT_FALSE(registry->internalMultiBoundService(&unknownManyAPI, {}));
+  EXPECT_THAT(reports.texts(), IsEmpty());
+}
+
+// An API for one is known to both tables once it has been asked for as if it were for many.
+TEST_F(SRLRegistryServices, ManyAreNotWhatIsBoundToAnAPIForOne) {
+  EXPECT_FALSE(registry->internalMultiBoundService(&scopedAPI, tags));
+  EXPECT_FALSE(registry->internalMultiBoundService(&scopedAPI, tags));
+  EXPECT_TRUE(registry->internalService(&scopedAPI, tags));
+  EXPECT_THAT(reports.texts(), IsEmpty());
+}
+
+TEST_F(SRLRegistryServices, OneIsNotWhatIsBoundToAnAPIForMany) {
+  EXPECT_FALSE(registry->internalService(&manyAPI, tags));
+  EXPECT_THAT(reportsOf(kService), ElementsAre(noBinding("Many")));
+}
+
+TEST_F(SRLRegistryServices, AreKnownToBeBound) {
+  EXPECT_TRUE(registry->internalHasImplementationForService(&scopedAPI));
+  EXPECT_TRUE(registry->internalHasImplementationForService(&scopedAPI));
+  EXPECT_TRUE(registry->internalHasImplementationForService(&nullAPI));
+  EXPECT_FALSE(registry->internalHasImplementationForService(&unboundAPI));
+  EXPECT_FALSE(registry->internalHasImplementationForService(&unknownAPI));
+  EXPECT_FALSE(registry->internalHasImplementationForService(&manyAPI));
+  EXPECT_FALSE(registry->internalHasImplementationForService(&manyAPI));
+  EXPECT_THAT(reports.texts(), IsEmpty());
+}
+
+TEST_F(SRLRegistryServices, NeedAnAPI) {
+  {
+    const rt::LockGuard guard(*registry->lock());
+    EXPECT_FALSE(registry->implementationForSingleBoundService(nullptr));
+  }
+  EXPECT_THAT(reportsOf("-[SRLRegistry implementationForSingleBoundService:]"),
+              ElementsAre("|apiIdentifier| cannot be nil!"));
+  EXPECT_FALSE(registry->internalMultiBoundService(nullptr, tags));
+  EXPECT_THAT(reportsOf(kMultiBound), ElementsAre("|apiIdentifier| cannot be nil!"));
+  EXPECT_FALSE(registry->internalHasImplementationForService(nullptr));
+  EXPECT_THAT(reportsOf("-[SRLRegistry internalHasImplementationForService:]"),
+              ElementsAre("|apiIdentifier| cannot be nil!"));
+  // A mistake of the caller's, which is at least no crash.
+  EXPECT_FALSE(registry->internalService(nullptr, tags));
+  EXPECT_THAT(reports.texts(), ElementsAre("|apiIdentifier| cannot be nil!", noBinding("(null)")));
+}
+
+TEST_F(SRLRegistryServices, AreImplementedByWhatIsBound) {
+  const rt::LockGuard guard(*registry->lock());
+  EXPECT_FALSE(registry->implementationForSingleBoundService(&unknownAPI));
+  EXPECT_FALSE(registry->implementationForSingleBoundService(&unboundAPI));
+  const Ref<SRLImplementation> implementation = registry->implementationForSingleBoundService(&freshAPI);
+  ASSERT_TRUE(implementation);
+  EXPECT_EQ(implementation->lifetime(), 1U);
+  EXPECT_EQ(implementation->scopeType(), 0b10U);
+  EXPECT_EQ(registry->implementationForSingleBoundService(&freshAPI), implementation);
+}
+
+// What was refused once is not looked at again.
+TEST_F(SRLRegistryServices, AreKnownToBeMissingWhereTheirImplementationWasRefused) {
+  static constexpr SRLImplementationRegistrationData notAThing{
+      .identifier = "NotAThing", .instanceType = {.className = "String"}, .factory = makeThing};
+  static constexpr Implementations list[] = {&notAThing, nullptr};
+  static constexpr SRLAPIRegistrationData api{
+      .identifier = "Refused", .instanceType = kThingType, .identifierLength = 7};
+  static constexpr _SRLBindingRegistrationData bindings[] = {{&api, list}};
+  const SRLBindingsModuleData module{.bindingsBegin = std::begin(bindings),
+                                     .bindingsEnd = std::end(bindings)};
+  const Ref<SRLRegistry> other = SRLRegistry::initPrivate();
+  other->internalRegisterBindings(std::array{&module});
+  EXPECT_FALSE(other->internalService(&api, {}));
+  EXPECT_THAT(reports.texts(),
+              ElementsAre("Implementation String should conform to Thing", noBinding("Refused")));
+  EXPECT_FALSE(other->internalService(&api, {}));
+  EXPECT_THAT(reports.texts(), ElementsAre(noBinding("Refused")));
+}
+
+// Another record with the same identifier is another API, for which the module has nothing.
+TEST_F(SRLRegistryServices, AreBoundToARecordAndNotToItsText) {
+  static constexpr SRLAPIRegistrationData twin{
+      .identifier = "Global", .instanceType = kThingType, .identifierLength = 6};
+  EXPECT_FALSE(registry->internalService(&twin, {}));
+  EXPECT_THAT(reportsOf(kService), ElementsAre(noBinding("Global")));
+  EXPECT_TRUE(registry->internalService(&globalAPI, {}));
+  EXPECT_FALSE(registry->internalHasImplementationForService(&twin));
+  EXPECT_THAT(reports.texts(), IsEmpty());
+}
+
+TEST_F(SRLRegistryServices, ThatAreThereCostNoAllocation) {
+  if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
+  const Ref<rt::Object> thing = registry->internalService(&scopedAPI, tags);
+  const AllocationCount count;
+  EXPECT_EQ(registry->internalService(&scopedAPI, tags), thing);
+  EXPECT_EQ(registry->internalOptionalService(&scopedAPI, tags), thing);
+  EXPECT_EQ(count.allocations(), 0);
+}
+
+TEST_F(SRLRegistryServices, MayThrowAndLeaveTheRegistryWhole) {
+  EXPECT_THROW(registry->internalService(&throwingAPI, {}), Failure);
+  EXPECT_THROW(registry->internalOptionalService(&throwingAPI, {}), Failure);
+  EXPECT_TRUE(registry->internalService(&globalAPI, {}));
+}
+
+TEST_F(SRLRegistryServices, ThatAreScopedLiveInTheSharedRegistry) {
+  const Ref<SRLRegistry> copy = registry->mutableCopy();
+  const Ref<rt::Object> thing = copy->internalService(&scopedAPI, tags);
+  EXPECT_EQ(registry->internalService(&scopedAPI, tags), thing);
+  EXPECT_TRUE(copy->scopeWithTags(tagSet(account))->instances()->isEmpty());
+  EXPECT_EQ(registry->scopeWithTags(tagSet(account))->instances()->count(), 1U);
+
+  // The one that is shared when an instance is asked for.
+  SRLRegistry::setSharedInstance(copy);
+  EXPECT_NE(registry->internalService(&scopedAPI, tags), thing);
+  SRLRegistry::setSharedInstance(nullptr);
+  EXPECT_FALSE(registry->internalOptionalService(&scopedAPI, tags));
+}
+
+TEST_F(SRLRegistryServices, TellWhetherTheyAreNew) {
+  const SRLFactoryBlock fresh = registry->scopedBlockForFactory(makeThing, &freshThing, 0b11, 0b10, 1);
+  const SRLFactoryBlock scoped = registry->scopedBlockForFactory(makeThing, &scopedThing, 0b11, 0b01, 0);
+  // Any lifetime but 1 is that of a scope.
+  const SRLFactoryBlock odd = registry->scopedBlockForFactory(makeThing, &scopedThing, 0b11, 0b01, 2);
+  bool isNew = false;
+  EXPECT_TRUE(fresh(tags, &isNew));
+  EXPECT_TRUE(isNew);
+  EXPECT_TRUE(fresh(tags, nullptr));
+  isNew = false;
+  const Ref<rt::Object> thing = scoped(tags, &isNew);
+  EXPECT_TRUE(isNew);
+  isNew = false;
+  EXPECT_EQ(scoped(tags, &isNew), thing);
+  EXPECT_EQ(odd(tags, &isNew), thing);
+  EXPECT_EQ(scoped(tags, nullptr), thing);
+  EXPECT_FALSE(isNew);
+}
+
+}  // namespace

@@ -1,0 +1,242 @@
+// One registry and many threads.
+
+#include <gtest/gtest.h>
+
+#include <algorithm>
+#include <array>
+#include <atomic>
+#include <cstddef>
+#include <cstdint>
+#include <random>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "Runtime/Class.h"
+#include "Runtime/Ref.h"
+#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "tests/TestReports.h"
+
+namespace {
+
+using rt::Ref;
+
+constexpr std::size_t kThreads = 8;
+constexpr std::size_t kRequests = 2000;
+constexpr std::size_t kAccounts = 4;
+constexpr std::size_t kLevels = 4;
+constexpr std::size_t kAPIsInLevel = 250;
+constexpr std::size_t kAPIs = kLevels * kAPIsInLevel;
+
+// Taken by all that is the user's own: a registry that held its lock meanwhile would end the program here.
+void takeTheLock() {
+  const rt::LockGuard guard(*SRLRegistry::sharedInstance()->lock());
+}
+
+std::atomic<int> tagsAlive{0};
+
+// An account or a window, equal by number.
+class Tag final : public rt::Implements<Tag, rt::Object> {
+ public:
+  explicit Tag(std::size_t number) : number_(number) { ++tagsAlive; }
+  ~Tag() override {
+    takeTheLock();
+    --tagsAlive;
+  }
+  bool isEqual(const rt::Object* other) const override {
+    const auto* tag = rt::cast<Tag>(other);
+    return tag != nullptr && tag->number_ == number_;
+  }
+  std::uint64_t hash() const override { return number_; }
+  std::size_t number() const { return number_; }
+
+ private:
+  const std::size_t number_;
+};
+
+// Counts all that happens.
+std::atomic<std::uint64_t> now{1};
+
+struct Account {
+  std::atomic<std::uint64_t> removalsBegun{0};
+  // When the last removal that is over had begun.
+  std::atomic<std::uint64_t> lastRemoval{0};
+};
+std::array<Account, kAccounts> accounts;
+
+class Instance final : public rt::Implements<Instance, rt::Object> {
+ public:
+  explicit Instance(Ref<rt::Object> dependency) : dependency_(std::move(dependency)) {}
+  ~Instance() override { takeTheLock(); }
+  std::uint64_t madeAt() const { return madeAt_; }
+
+ private:
+  const std::uint64_t madeAt_ = now++;
+  const Ref<rt::Object> dependency_;
+};
+
+std::array<SRLAPIRegistrationData, kAPIs> apis;
+std::array<SRLImplementationRegistrationData, kAPIs> implementations;
+std::array<std::array<const SRLImplementationRegistrationData*, 2>, kAPIs> lists;
+std::array<_SRLBindingRegistrationData, kAPIs> bindings;
+std::array<std::string, kAPIs> identifiers;
+thread_local std::minstd_rand chance;
+
+// Each asks for a service of the level below, so that no instance needs itself.
+template <std::size_t level>
+Ref<rt::Object> makeInstance(SRLScopeTagSet tags) {
+  takeTheLock();
+  Ref<rt::Object> dependency;
+  if constexpr (level > 0) {
+    // The API's scope is that of the account; services without one have none to give.
+    if (tags.tags[0] != nullptr) {
+      const std::size_t below = (level - 1) * kAPIsInLevel + chance() % kAPIsInLevel;
+      dependency = SRLRegistry::sharedInstance()->internalService(&apis.at(below), tags);
+    }
+  }
+  return rt::make<Instance>(std::move(dependency));
+}
+
+constexpr std::array<Ref<rt::Object> (*)(SRLScopeTagSet), kLevels> kFactories = {
+    makeInstance<0>, makeInstance<1>, makeInstance<2>, makeInstance<3>};
+
+bool isNew(std::size_t api) {
+  return api % 7 == 0;
+}
+bool isOfAccount(std::size_t api) {
+  return api % 5 != 0;
+}
+
+const SRLBindingsModuleData& moduleOfAll() {
+  for (std::size_t i = 0; i < kAPIs; ++i) {
+    identifiers.at(i) = "API" + std::to_string(1000 + i);
+    apis.at(i).identifier = identifiers.at(i).c_str();
+    apis.at(i).identifierLength = static_cast<std::uint16_t>(identifiers.at(i).size());
+    apis.at(i).scopeType = 0b1;
+    apis.at(i).instanceType.names.className = "Instance";
+    implementations.at(i).identifier = identifiers.at(i).c_str();
+    implementations.at(i).instanceType.className = "Instance";
+    implementations.at(i).factory = kFactories.at(i / kAPIsInLevel);
+    implementations.at(i).scopeType = isOfAccount(i) ? 0b1 : 0;
+    implementations.at(i).lifetime = isNew(i) ? 1 : 0;
+    lists.at(i) = {&implementations.at(i), nullptr};
+    bindings.at(i) = {&apis.at(i), lists.at(i).data()};
+  }
+  static const SRLBindingsModuleData module{.bindingsBegin = bindings.data(),
+                                            .bindingsEnd = bindings.data() + bindings.size()};
+  return module;
+}
+
+// Ends the account's scopes, at times the same as other threads do.
+void removeScopesOf(SRLRegistry& registry, std::size_t number) {
+  Account& account = accounts.at(number);
+  ++account.removalsBegun;
+  const std::uint64_t begun = now++;
+  registry.removeScopesWithTag(rt::make<Tag>(number));
+  std::uint64_t last = account.lastRemoval;
+  while (last < begun && !account.lastRemoval.compare_exchange_weak(last, begun)) {
+  }
+}
+
+// What holds for every request, whatever the other threads do:
+// - a service comes out, and nothing is reported;
+// - one that is made anew each time is another each time;
+// - one that lives in an account's scope was made after every removal that was over before the request, and a
+// second
+//   request gets the same one unless a removal has begun since the first;
+// - one that lives in no account's scope is the same for ever;
+// - user code, that is factories, destructors and the delegate, finds the registry's lock free;
+// and at the end, when all scopes have ended, no tag is left that the registry had retained.
+void request(SRLRegistry& registry, std::size_t api, std::size_t number) {
+  const Account& account = accounts.at(number);
+  const std::uint64_t removals = account.removalsBegun;
+  const std::uint64_t lastRemoval = account.lastRemoval;
+  // The tag lives as long as this request only, unless the registry keeps it.
+  const auto ask = [&] {
+    const Ref<Tag> tag = rt::make<Tag>(number);
+    return registry.internalService(&apis.at(api), SRLScopeTagSet{{tag.get()}});
+  };
+  const Ref<rt::Object> first = ask();
+  const Ref<rt::Object> second = ask();
+  ASSERT_TRUE(first && second);
+  if (isNew(api)) {
+    EXPECT_NE(first, second);
+  } else if (isOfAccount(api)) {
+    EXPECT_GT(rt::cast<Instance>(first.get())->madeAt(), lastRemoval);
+    EXPECT_TRUE(first == second || account.removalsBegun != removals);
+  } else {
+    EXPECT_EQ(first, second);
+  }
+}
+
+class Delegate final : public rt::Implements<Delegate, rt::Object, SRLScopeLifecycleDelegate> {
+ public:
+  void didRemoveScopesWithTag(const Ref<rt::Object>& /*tag*/,
+                              const std::vector<rt::Weak<rt::Object>>& serviceInstances) override {
+    takeTheLock();
+    for (const rt::Weak<rt::Object>& instance : serviceInstances) static_cast<void>(instance.lock());
+  }
+};
+
+TEST(SRLRegistryThreads, KeepEveryPromise) {
+  std::atomic<int> reports{0};
+  PECErrorHandler::sharedInstance()->setErrorHandlerBlock(
+      [&](const Ref<PECErrorDescription>&) { ++reports; });
+  const Ref<SRLRegistry> registry = SRLRegistry::initPrivate();
+  registry->internalRegisterBindings(std::array{&moduleOfAll()});
+  const Ref<SRLRegistry> before = SRLRegistry::setSharedInstance(registry);
+  const Ref<Delegate> delegate = rt::make<Delegate>();
+  registry->setScopeLifecycleDelegate(delegate);
+
+  std::vector<std::thread> threads;
+  for (std::size_t thread = 0; thread < kThreads; ++thread) {
+    threads.emplace_back([&registry, thread] {
+      chance.seed(static_cast<unsigned>(thread + 1));
+      Ref<SRLRegistry> asked = registry;
+      for (std::size_t i = 0; i < kRequests; ++i) {
+        request(*asked, chance() % kAPIs, chance() % kAccounts);
+        if (chance() % 50 == 0) removeScopesOf(*registry, chance() % kAccounts);
+        // Copies keep what is scoped in the shared registry, too.
+        if (chance() % 200 == 0) asked = chance() % 2 == 0 ? registry : registry->mutableCopy();
+      }
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+
+  for (std::size_t number = 0; number < kAccounts; ++number) removeScopesOf(*registry, number);
+  EXPECT_EQ(tagsAlive, 0);
+  EXPECT_EQ(reports, 0);
+  SRLRegistry::setSharedInstance(before);
+  PECErrorHandler::resetAfterTest();
+}
+
+// A request goes to the registry that is shared at some moment of it, which is whole however soon it is
+// replaced.
+TEST(SRLRegistryThreads, AskWhileTheSharedRegistryIsReplaced) {
+  const Ref<SRLRegistry> asked = SRLRegistry::initPrivate();
+  asked->internalRegisterBindings(std::array{&moduleOfAll()});
+  const Ref<SRLRegistry> before = SRLRegistry::setSharedInstance(asked);
+  std::atomic<bool> isOver{false};
+  std::vector<std::thread> threads;
+  for (std::size_t thread = 0; thread < 3; ++thread) {
+    threads.emplace_back([&] {
+      const Ref<Tag> tag = rt::make<Tag>(std::size_t{0});
+      // One that lives in the account's scope, and needs no other.
+      for (std::size_t i = 0; i < kRequests; ++i) {
+        EXPECT_TRUE(asked->internalService(&apis.at(1), SRLScopeTagSet{{tag.get()}}));
+      }
+    });
+  }
+  std::thread replacing([&] {
+    while (!isOver) {
+      SRLRegistry::setSharedInstance(asked->mutableCopy());
+      SRLRegistry::setSharedInstance(asked);
+    }
+  });
+  for (std::thread& thread : threads) thread.join();
+  isOver = true;
+  replacing.join();
+  SRLRegistry::setSharedInstance(before);
+}
+
+}  // namespace

@@ -1,0 +1,5 @@
+#include "Shared/ServiceRegistry/Source/SRLStartUpHook.h"
+
+[[gnu::weak]] bool SRLStartUpHook() {
+  return true;
+}

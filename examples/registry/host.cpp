@@ -1,0 +1,59 @@
+// A mail program: services that live as long as an account, and others as long as an account and a window. It
+// finds them by the injectors, and ends them all when an account is logged out.
+
+#include <cstdio>
+#include <string>
+#include <vector>
+
+#include "Runtime/Class.h"
+#include "Runtime/Format.h"
+#include "Runtime/Weak.h"
+#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "examples/registry/bindings.h"
+
+using namespace rt::literals;
+
+namespace {
+
+void print(const rt::String& line) {
+  std::printf("%s\n", std::string(line).c_str());
+}
+
+// Tells of services that somebody keeps although their scope has ended.
+class LeakWatch final : public rt::Implements<LeakWatch, rt::Object, SRLScopeLifecycleDelegate> {
+ public:
+  void didRemoveScopesWithTag(const rt::Ref<rt::Object>& tag,
+                              const std::vector<rt::Weak<rt::Object>>& serviceInstances) override {
+    for (const rt::Weak<rt::Object>& instance : serviceInstances) {
+      if (const rt::Ref<rt::Object> leaked = instance.lock()) {
+        print(rt::format("%@ is logged out; still there: %@"_s, tag,
+                         rt::String::overStatic(leaked->classInfo().name)));
+      }
+    }
+  }
+};
+
+}  // namespace
+
+int main() {
+  const rt::Ref<SRLRegistry> registry = SRLRegistry::sharedInstance();
+  const rt::Ref<LeakWatch> leakWatch = rt::make<LeakWatch>();
+  registry->setScopeLifecycleDelegate(leakWatch);
+
+  // Any objects that are equal when they stand for the same may be tags.
+  const rt::Ref<rt::Object> ann = "Ann"_s.object();
+  const rt::Ref<rt::Object> left = "the left window"_s.object();
+  const rt::Ref<rt::Object> right = "the right window"_s.object();
+
+  print(injectMessageList(ann, left)->title());
+  print(injectMessageList(ann, right)->title());
+  print(injectMessageStore(ann) == injectMessageStore(ann) ? "one store"_s : "two stores"_s);
+  const rt::Ref<rt::Array> tasks = injectWindowTasks(ann);
+  for (const rt::Ref<rt::Object>& task : *tasks) print(rt::cast<WindowTask>(task.get())->label());
+
+  // The lists end with the account, and so would the store.
+  const rt::Ref<MessageStore> kept = injectMessageStore(ann);
+  registry->removeScopesWithTag(ann);
+  print(injectMessageStore(ann) == kept ? "the same store"_s : "another store"_s);
+  return 0;
+}

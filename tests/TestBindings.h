@@ -1,0 +1,133 @@
+#pragma once
+
+/// A few services, their records as a generator writes them, and registries that know them.
+///
+///     const TestModule module({{&testClockAPI, testWallClocks}});
+///     rt::Ref<SRLRegistry> registry = registryWith({&module});
+///
+/// Not for: anything but tests.
+
+#include <algorithm>
+#include <cstdint>
+#include <initializer_list>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "Runtime/Class.h"
+#include "Runtime/ClassInfo.h"
+#include "Runtime/Object.h"
+#include "Runtime/Ref.h"
+#include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
+#include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLBindingsModuleData.h"
+#include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementation.h"
+#include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"
+#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+
+struct TestClock : rt::Protocol<TestClock> {
+ protected:
+  ~TestClock() = default;
+};
+class TestWallClock final : public rt::Implements<TestWallClock, rt::Object, TestClock> {};
+class TestSundial final : public rt::Implements<TestSundial, rt::Object, TestClock> {};
+/// Is no clock.
+class TestStone final : public rt::Implements<TestStone, rt::Object> {};
+
+template <class Service>
+rt::Ref<rt::Object> makeTestService(SRLScopeTagSet) {
+  return rt::make<Service>();
+}
+
+/// For one implementation, in scopes 1 and 2.
+inline constinit const SRLAPIRegistrationData testClockAPI{
+    .identifier = "Clock",
+    .instanceType = {.names = {.protocolName = "TestClock"}},
+    .scopeType = 0b11,
+    .identifierLength = 5,
+};
+/// For many implementations, in no scope.
+inline constinit const SRLAPIRegistrationData testClocksAPI{
+    .identifier = "Clocks",
+    .instanceType = {.names = {.protocolName = "TestClock"}},
+    .identifierLength = 6,
+    .isMultibound = 1,
+};
+
+/// Implementations that are made anew for each request, and live in no scope.
+template <class Service>
+constexpr SRLImplementationRegistrationData testImplementation(const char* name) {
+  return {.identifier = name,
+          .instanceType = {.className = name},
+          .factory = makeTestService<Service>,
+          .lifetime = 1};
+}
+inline constinit const auto testWallClock = testImplementation<TestWallClock>("TestWallClock");
+inline constinit const auto testSundial = testImplementation<TestSundial>("TestSundial");
+inline constinit const auto testStone = testImplementation<TestStone>("TestStone");
+
+using TestImplementations = const SRLImplementationRegistrationData* const;
+inline constinit TestImplementations testWallClocks[] = {&testWallClock, nullptr};
+inline constinit TestImplementations testSundials[] = {&testSundial, nullptr};
+inline constinit TestImplementations testBothClocks[] = {&testWallClock, &testSundial, nullptr};
+inline constinit TestImplementations testNoClocks[] = {nullptr};
+
+/// A module with some bindings, which it sorts.
+class TestModule {
+ public:
+  explicit TestModule(std::vector<_SRLBindingRegistrationData> bindings,
+                      void (*addConfigurationFactories)(SRLConfigurationFactories&) = nullptr,
+                      std::uint8_t allowsMultipleModules = 0)
+      : bindings_(std::move(bindings)) {
+    std::ranges::sort(bindings_, SRLIsIdentifierBefore,
+                      [](const auto& binding) { return std::string_view(binding.api->identifier); });
+    data_ = {.bindingsBegin = bindings_.data(),
+             .bindingsEnd = bindings_.data() + bindings_.size(),
+             .addConfigurationFactories = addConfigurationFactories,
+             .allowsMultipleModules = allowsMultipleModules};
+  }
+  TestModule(const TestModule&) = delete;
+  TestModule& operator=(const TestModule&) = delete;
+
+  const SRLBindingsModuleData* data() const { return &data_; }
+  const std::vector<_SRLBindingRegistrationData>& bindings() const { return bindings_; }
+
+ private:
+  std::vector<_SRLBindingRegistrationData> bindings_;
+  SRLBindingsModuleData data_;
+};
+
+/// A registry with these modules, in their order, which outlive it.
+inline rt::Ref<SRLRegistry> registryWith(std::initializer_list<const TestModule*> modules) {
+  std::vector<const SRLBindingsModuleData*> datas;
+  for (const TestModule* module : modules) datas.push_back(module->data());
+  rt::Ref<SRLRegistry> registry = SRLRegistry::initPrivate();
+  registry->internalRegisterBindings(datas);
+  return registry;
+}
+
+/// An implementation whose instances are of `type`, which may be null, with a factory of its own.
+inline rt::Ref<SRLImplementation> implementationOf(std::string_view identifier, rt::Ref<SRLInstanceType> type,
+                                                   SRLScopeType scope = 0) {
+  return SRLImplementation::initWithIdentifier(
+      identifier, std::move(type), /*lifetime=*/1, scope,
+      [](const SRLScopeTagSet&, bool*) -> rt::Ref<rt::Object> { return rt::make<TestWallClock>(); }, nullptr);
+}
+
+/// The same for instances of a class.
+template <class Service>
+rt::Ref<SRLImplementation> implementationOf(std::string_view identifier, SRLScopeType scope = 0) {
+  return implementationOf(identifier, SRLClassType::initWithClass(&rt::classInfo<Service>()), scope);
+}
+
+/// What is bound to `api`; null where that is nothing.
+inline rt::Ref<SRLImplementation> boundTo(const SRLAPIRegistrationData& api,
+                                          const rt::Ref<SRLRegistry>& registry) {
+  const rt::LockGuard guard(*registry->lock());
+  return registry->implementationForSingleBoundService(&api);
+}
+
+/// How many implementations are bound to `api`, for many; -1 where the registry does not know it.
+inline std::int64_t countBoundTo(const SRLAPIRegistrationData& api, const rt::Ref<SRLRegistry>& registry) {
+  const rt::Ref<rt::Array> instances = registry->internalMultiBoundService(&api, {});
+  return instances ? static_cast<std::int64_t>(instances->count()) : -1;
+}

@@ -1,0 +1,74 @@
+#pragma once
+
+/// Reports of misuse, whole: everything but the line and the call stack, to be compared at once.
+///
+///     TestReports reports;
+///     registry->apiIdentifierFromString(nullptr);
+///     EXPECT_THAT(wholeReports(reports),
+///                 ElementsAre(WholeReport{kFile, "-[SRLRegistry apiIdentifierFromString:]",
+///                                         "apiIdentifierString must not be nil"}));
+///
+/// Not for: anything but tests.
+
+#include <cstdint>
+#include <ostream>
+#include <string>
+#include <vector>
+
+#include "Runtime/Dictionary.h"
+#include "Runtime/Number.h"
+#include "Shared/Logging/LUMLogLevel.h"
+#include "Shared/Logging/LUMLogMessage.h"
+#include "Shared/Logging/LUMSafeStringParameter.h"
+#include "tests/TestReports.h"
+
+struct WholeReport {
+  std::string file;
+  std::string function;
+  std::string text;
+  /// The safe strings of type 1, in the order of the arguments, null as "(null)"; anything else is "?".
+  // NOLINTNEXTLINE(readability-redundant-member-init): compilers warn where it is left out
+  std::vector<std::string> parameters{};
+  LUMLogLevel level = LUMLogLevelFault;
+  /// That it has a line, which is not compared.
+  bool hasLine = true;
+
+  bool operator==(const WholeReport&) const = default;
+
+  friend void PrintTo(const WholeReport& report, std::ostream* stream) {
+    *stream << "level " << report.level << " " << report.file << ": " << report.function << ": \""
+            << report.text << "\"" << (report.hasLine ? "" : " without a line") << " (";
+    for (const std::string& parameter : report.parameters) *stream << " \"" << parameter << "\"";
+    *stream << " )";
+  }
+};
+
+/// What `message` is as a report.
+inline WholeReport wholeReport(const LUMLogMessage& message) {
+  WholeReport report{
+      .file = std::string(message.file().view()),
+      .function = std::string(message.function().view()),
+      .text = text(message),
+      .level = message.level(),
+      .hasLine = message.line() != 0,
+  };
+  if (!message.safeParameters()) return report;
+  for (std::size_t place = 0; place < message.safeParameters()->count(); ++place) {
+    const auto* parameter =
+        message.safeParameters()->objectForKey<LUMSafeStringParameter>(rt::Number::of(place).get());
+    if (parameter == nullptr || parameter->type() != 1) {
+      report.parameters.emplace_back("?");
+    } else {
+      const rt::String& value = parameter->stringValue();
+      report.parameters.emplace_back(value ? value.view() : "(null)");
+    }
+  }
+  return report;
+}
+
+/// The reports since `reports` was last asked.
+inline std::vector<WholeReport> wholeReports(TestReports& reports) {
+  std::vector<WholeReport> whole;
+  for (const rt::Ref<LUMLogMessage>& message : reports.messages()) whole.push_back(wholeReport(*message));
+  return whole;
+}

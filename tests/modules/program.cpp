@@ -1,0 +1,126 @@
+// Has bindings modules in itself and in the libraries that it links, and opens another library, its first
+// argument, that has one too. Checks which modules were asked, when and in which order, and which services
+// there are.
+#include <dlfcn.h>
+
+#include <cstddef>
+#include <cstdio>
+#include <cstring>
+#include <string>
+#include <string_view>
+
+#include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
+#include "Runtime/ClassMethod.h"
+#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/Source/SRLStartUpHook.h"
+#include "Trace.h"
+
+using namespace rt::literals;
+
+namespace {
+
+// Filled before any static object is made, so no object itself.
+constinit char traced[4096] = "";
+constinit std::size_t tracedSize = 0;
+
+void add(std::string_view text) {
+  if (text.size() >= sizeof traced - tracedSize) return;
+  std::memcpy(traced + tracedSize, text.data(), text.size());
+  tracedSize += text.size();
+  traced[tracedSize] = '\0';
+}
+
+// What has happened up to the making of the program's static objects.
+const std::string tracedBeforeStaticObjects = traced;
+
+constexpr SRLAPIRegistrationData early{.identifier = "early", .identifierLength = 5};
+
+// What the selectors of these stand for is no module.
+template <char mark>
+const SRLBindingsModuleData* noModule() {
+  static constexpr char kMark[] = {mark, '\0'};
+  trace("is asked, and no module: ", kMark);
+  return nullptr;
+}
+
+}  // namespace
+
+template struct rt::AddedClassMethod<SRLRegistry, "srl_bindings", &noModule<'1'>>;
+template struct rt::AddedClassMethod<SRLRegistry, "srl_binding", &noModule<'2'>>;
+template struct rt::AddedClassMethod<SRLRegistry, "srl_BindingsA", &noModule<'3'>>;
+template struct rt::AddedClassMethod<SRLRegistry, "_srl_bindingsA", &noModule<'4'>>;
+
+void trace(const char* text, const char* name) {
+  add(text);
+  add(name);
+  add("\n");
+}
+
+bool SRLStartUpHook() {
+  trace("start-up hook");
+  PECErrorHandler::sharedInstance()->setErrorHandlerBlock(
+      [](const rt::Ref<PECErrorDescription>& error) { add(error->errorMessage().view()), add("\n"); });
+  if (SRLRegistry::sharedInstance()->internalService(&early, {})) trace("too early, and found");
+  // Nobody looks at it.
+  return false;
+}
+
+namespace {
+
+int fail(const char* what, const std::string& seen) {
+  std::fprintf(stderr, "%s: %s\n", what, seen.c_str());
+  return 1;
+}
+
+// What is traced from now on.
+void forget() {
+  tracedSize = 0;
+  traced[0] = '\0';
+}
+
+}  // namespace
+
+int main(int argumentCount, char** arguments) {
+  if (argumentCount != 2) return 1;
+
+  const std::string prior =
+      "A service injector was called prior to service bindings being registered.\n\nService: ";
+  const char* const names[] = {"InArchive1", "InArchive2", "InArchive3", "InProgram", "InShared"};
+  std::string expected = "start-up hook\n" + prior + "early\n";
+  for (const std::string name : names) expected += "is asked: " + name + "\n";
+  for (const std::string name : names) {
+    expected.append("configures ").append(name).append("\n").append(prior).append(name).append("\n");
+  }
+  if (tracedBeforeStaticObjects != expected) return fail("before main", tracedBeforeStaticObjects);
+  if (traced != expected) return fail("by main", traced);
+  forget();
+
+  const rt::Ref<SRLRegistry> registry = SRLRegistry::sharedInstance();
+  const auto serviceNamed = [&](const char* name) {
+    const SRLAPIRegistrationData* api = registry->apiIdentifierFromString(rt::String::fromUTF8(name));
+    return api != nullptr ? registry->internalService(api, {}) : nullptr;
+  };
+  for (const char* name : names) {
+    const rt::Ref<rt::Object> service = serviceNamed(name);
+    if (!service || service->classInfo().name != name) return fail("no service", name);
+  }
+  if (registry->registeredAPIIdentifiers()->count() != std::size(names)) return fail("too many APIs", "");
+  if (tracedSize != 0) return fail("while services were asked for", traced);
+
+  void* const opened = dlopen(arguments[1], RTLD_NOW | RTLD_LOCAL);
+  if (opened == nullptr) return fail("not opened", dlerror());
+  auto* const apiOfOpened =
+      reinterpret_cast<const SRLAPIRegistrationData* (*)()>(dlsym(opened, "apiOfOpened"));
+  if (apiOfOpened == nullptr) return fail("no such function", dlerror());
+  bool isAdded = false;
+  for (const rt::ClassMethod& method : rt::classMethods(rt::classInfo<SRLRegistry>())) {
+    isAdded |= method.selector() == "srl_bindingsInOpened";
+  }
+  if (!isAdded) return fail("the opened library has no module", "");
+  if (registry->internalService(apiOfOpened(), {})) return fail("found", "InOpened");
+  if (serviceNamed("InOpened")) return fail("found by name", "InOpened");
+  if (std::string_view(traced) != "No binding was found for required, single-bound service: InOpened\n") {
+    return fail("when a library was opened", traced);
+  }
+  return 0;
+}

@@ -67,6 +67,16 @@ TEST_F(MountPointBinaryTest, LoadsNothing) {
   EXPECT_THAT(outputOf({"readelf", "--wide", "--program-headers", MOUNT_POINT}), Not(HasSubstr("INTERP")));
 }
 
+// The libraries are there, with what sets the registry up when the program is loaded.
+TEST_F(MountPointBinaryTest, CarriesTheLibraries) {
+  const std::string symbols = outputOf({"nm", "--demangle", "--defined-only", MOUNT_POINT});
+  for (const char* const name :
+       {"SRLRegistry::load()", "LUMLogMultiplexer::logWithMessage(", "PECErrorHandler::register_()",
+        "ZEBLogger::sharedLogger()", "LUMLoggingReroutingZEBLogger::", "AVOProvider::get() const"}) {
+    EXPECT_THAT(symbols, HasSubstr(name));
+  }
+}
+
 TEST_F(MountPointBinaryTest, IsPositionIndependent) {
   EXPECT_THAT(outputOf({"readelf", "--file-header", MOUNT_POINT}), HasSubstr("DYN"));
   const std::string dynamic = outputOf({"readelf", "--wide", "--dynamic", MOUNT_POINT});
@@ -117,12 +127,14 @@ class MountPointTracedTest : public MountPointBinaryTest {
 };
 
 // All that happens beside the one write: the C library's start (the thread's own data, random bytes,
-// where the program lies, read-only relocations). No file is opened, no thread or process is started.
+// where the program lies, read-only relocations), and that of the libraries, for which the main thread
+// learns that it is that. No file is opened, no thread or process is started.
 TEST_F(MountPointTracedTest, AsksTheSystemForNothingThatIsNotAccountedFor) {
   const std::vector<std::string> calls = runTraced("NOTHING").systemCalls;
-  const std::set<std::string> accounted = {
-      "execve",   "brk",        "arch_prctl", "set_tid_address", "set_robust_list", "rseq",      "prlimit64",
-      "readlink", "readlinkat", "getrandom",  "mprotect",        "write",           "exit_group"};
+  const std::set<std::string> accounted = {"execve",          "brk",       "arch_prctl", "set_tid_address",
+                                           "set_robust_list", "rseq",      "prlimit64",  "readlink",
+                                           "readlinkat",      "getrandom", "mprotect",   "write",
+                                           "exit_group",      "gettid",    "getpid"};
   EXPECT_THAT(calls, testing::Contains("write"));
   EXPECT_THAT(std::set<std::string>(calls.begin(), calls.end()), IsSubsetOf(accounted));
 }

@@ -1,7 +1,6 @@
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 
 #include <algorithm>
-#include <atomic>
 #include <new>
 #include <string_view>
 #include <utility>
@@ -30,9 +29,8 @@ constexpr std::string_view kBindingsPrefix = "srl_bindings";
 
 constinit rt::UnfairLock sharedInstanceLock;
 constinit bool isSharedInstanceMade RT_GUARDED_BY(sharedInstanceLock) = false;
-// Retained, and never released at exit, when other threads may still ask for services. Written under the
-// lock; read without it only to be compared.
-constinit std::atomic<SRLRegistry*> sharedRegistry{nullptr};
+// Retained, and never released at exit, when other threads may still ask for services.
+constinit SRLRegistry* sharedRegistry RT_GUARDED_BY(sharedInstanceLock) = nullptr;
 
 rt::String descriptionOf(const rt::Ref<SRLInstanceType>& type) {
   return type ? type->asObject()->description() : rt::String();
@@ -62,21 +60,20 @@ rt::Ref<SRLRegistry> SRLRegistry::sharedInstance() {
   if (!isSharedInstanceMade) [[unlikely]] {
     const rt::Ref<SRLRegistry> made = initPrivate();
     made->retain();
-    sharedRegistry.store(made.get(), std::memory_order_relaxed);
+    made->isShared_.store(true, std::memory_order_relaxed);
+    sharedRegistry = made.get();
     isSharedInstanceMade = true;
   }
-  return sharedRegistry.load(std::memory_order_relaxed);
+  return sharedRegistry;
 }
 
 rt::Ref<SRLRegistry> SRLRegistry::setSharedInstance(const rt::Ref<SRLRegistry>& registry) {
   if (registry) registry->retain();
   const rt::LockGuard guard(sharedInstanceLock);
   isSharedInstanceMade = true;
-  return rt::Ref<SRLRegistry>::adopt(sharedRegistry.exchange(registry.get(), std::memory_order_relaxed));
-}
-
-bool SRLRegistry::isShared() const noexcept {
-  return sharedRegistry.load(std::memory_order_relaxed) == this;
+  if (sharedRegistry != nullptr) sharedRegistry->isShared_.store(false, std::memory_order_relaxed);
+  if (registry) registry->isShared_.store(true, std::memory_order_relaxed);
+  return rt::Ref<SRLRegistry>::adopt(std::exchange(sharedRegistry, registry.get()));
 }
 
 rt::Ref<SRLRegistry> SRLRegistry::initPrivate() {
@@ -185,9 +182,12 @@ void SRLRegistry::registerBindings(const _SRLBindingRegistrationData& binding) {
     rt::Ref<SRLInstanceType> instanceType = SRLImplementationRegistrationDataInstanceType(record);
     SRLFactoryBlock factoryBlock =
         scopedBlockForFactory(record->factory, record, api->scopeType, record->scopeType, record->lifetime);
-    internalRegisterServiceAPI(api, SRLImplementation::initWithIdentifier(
-                                        record->identifier, std::move(instanceType), record->lifetime,
-                                        record->scopeType, std::move(factoryBlock), configuration));
+    const rt::Ref<SRLImplementation> implementation =
+        SRLImplementation::initWithIdentifier(record->identifier, std::move(instanceType), record->lifetime,
+                                              record->scopeType, std::move(factoryBlock), configuration);
+    implementation->record_ = record;
+    implementation->apiScope_ = api->scopeType;
+    internalRegisterServiceAPI(api, implementation);
   }
 }
 

@@ -27,6 +27,7 @@
 ///
 /// Not for: what a constructor's argument can do.
 
+#include <atomic>
 #include <cstdint>
 #include <memory>
 #include <span>
@@ -92,7 +93,6 @@ class SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
 
   /// @}
   /// @name Services
-  /// The caller keeps the registry until a request returns.
   /// @{
 
   /// An instance of what is bound to `api`, not null, for the scope `scopeTags`. That nothing is bound is
@@ -223,21 +223,22 @@ class SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
   explicit SRLRegistry(std::unique_ptr<SRLRegistryIvars> ivars);
 
  private:
-  // Whether this is the shared registry at the moment.
-  bool isShared() const noexcept;
+  // What is bound to an API for one, unless there is an instance already.
+  struct Found {
+    rt::Ref<SRLImplementation> implementation;
+    rt::Ref<rt::Object> instance;
+  };
+  Found find(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) RT_REQUIRES(ivars_->lock);
 
-  // The instance in the scope with these tags, made by `factory` if there is none.
-  rt::Ref<rt::Object> scopedInstance(const SRLScopeTagSet& tags,
-                                     const SRLImplementationRegistrationData* implementationIdentifier,
-                                     bool* instanceCreated,
-                                     rt::Ref<rt::Object> (*factory)(SRLScopeTagSet tags));
-
-  // An instance of an implementation that the caller keeps, measured where profiling is on.
-  rt::Ref<rt::Object> instanceOf(SRLImplementation& implementation, const SRLAPIRegistrationData* api,
-                                 const SRLScopeTagSet& tags);
+  // The instance that a scope of this registry has already, where this is the shared one; null where there is
+  // none, or no telling.
+  rt::Ref<rt::Object> keptInstanceOf(const SRLImplementation& implementation,
+                                     const SRLScopeTagSet& tags) const RT_REQUIRES(ivars_->lock);
 
   std::unique_ptr<SRLRegistryIvars> ivars_;
   const rt::Ref<SRLMemoizingScope> configScope_;
+  // Written with the shared registry itself.
+  std::atomic<bool> isShared_{false};
   mutable rt::UnfairLock delegateLock_;
   rt::Weak<SRLScopeLifecycleDelegate> scopeLifecycleDelegate_ RT_GUARDED_BY(delegateLock_);
 };

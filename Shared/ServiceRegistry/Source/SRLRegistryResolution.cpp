@@ -38,17 +38,14 @@ constexpr const char* kFile = "Shared/ServiceRegistry/Source/SRLRegistry";
   return instance;
 }
 
-// The registry that the calling thread is asking for an instance, which keeps it meanwhile; null for none.
-constinit thread_local SRLRegistry* asked = nullptr;
-
-struct Asking {
-  explicit Asking(SRLRegistry* registry) noexcept : before(std::exchange(asked, registry)) {}
-  Asking(const Asking&) = delete;
-  Asking& operator=(const Asking&) = delete;
-  ~Asking() { asked = before; }
-
-  SRLRegistry* const before;
-};
+// The caller keeps the implementation.
+rt::Ref<rt::Object> instanceOf(SRLImplementation& implementation, const SRLAPIRegistrationData* api,
+                               const SRLScopeTagSet& tags) {
+  if (SRLPProfilingEnabled()) [[unlikely]]
+    return measuredInstance(&implementation, api, tags);
+  bool instanceCreated = false;
+  return implementation.factoryBlock().callKept(tags, &instanceCreated);
+}
 
 rt::String instanceTypeOf(const SRLImplementation& implementation) {
   const rt::Ref<SRLInstanceType>& type = implementation.instanceType();
@@ -57,23 +54,40 @@ rt::String instanceTypeOf(const SRLImplementation& implementation) {
 
 }  // namespace
 
-rt::Ref<rt::Object> SRLRegistry::instanceOf(SRLImplementation& implementation,
-                                            const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) {
-  const Asking asking(this);
-  if (SRLPProfilingEnabled()) [[unlikely]]
-    return measuredInstance(&implementation, api, tags);
-  bool instanceCreated = false;
-  return implementation.factoryBlock().callKept(tags, &instanceCreated);
+rt::Ref<rt::Object> SRLRegistry::keptInstanceOf(const SRLImplementation& implementation,
+                                                const SRLScopeTagSet& tags) const {
+  const SRLImplementationRegistrationData* record = implementation.record_;
+  if (record == nullptr || record->lifetime != 0 || !isShared_.load(std::memory_order_relaxed))
+    return nullptr;
+  const SRLScopeType apiScope = implementation.apiScope_;
+  // Tags that do not fit are for the factory block to report.
+  if ((record->scopeType & ~apiScope) != 0 || !SRLScopeTagSetDetail::hasOneTagForEachBit(tags, apiScope))
+    return nullptr;
+  const auto scope = ivars_->scopes.find(SRLScopeTagSetMaskingWithScopes(tags, apiScope, record->scopeType));
+  rt::Ref<rt::Object> instance;
+  if (scope != ivars_->scopes.end()) scope->second->findInstance(record, instance);
+  return instance;
 }
 
-// Flat, as is what it calls for an instance that is there: most requests are of that kind.
+SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) {
+  const auto binding = ivars_->singleBindings.find(api);
+  if (binding == ivars_->singleBindings.end()) return {implementationForSingleBoundService(api), nullptr};
+  if (!binding->second) return {};
+  if (rt::Ref<rt::Object> instance = keptInstanceOf(*binding->second, tags))
+    return {nullptr, std::move(instance)};
+  return {binding->second, nullptr};
+}
+
+// Flat, since most requests are for an instance that is there.
 [[gnu::flatten]] rt::Ref<rt::Object> SRLRegistry::internalService(const SRLAPIRegistrationData* api,
                                                                   const SRLScopeTagSet& scopeTags) {
   constexpr const char* kFunction = "-[SRLRegistry internalService:scopeTags:]";
   rt::Ref<SRLImplementation> implementation;
   {
     const rt::LockGuard guard(ivars_->lock);
-    implementation = implementationForSingleBoundService(api);
+    Found found = find(api, scopeTags);
+    if (found.instance) return std::move(found.instance);
+    implementation = std::move(found.implementation);
     if (!implementation || !implementation->factoryBlock()) [[unlikely]] {
       if (ivars_->bindingsState == SRLBindingsState::kRegistered) {
         PECReport({kFile, kFunction}, "No binding was found for required, single-bound service: %@"_s,
@@ -102,7 +116,9 @@ rt::Ref<rt::Object> SRLRegistry::internalOptionalService(const SRLAPIRegistratio
   rt::Ref<SRLImplementation> implementation;
   {
     const rt::LockGuard guard(ivars_->lock);
-    implementation = implementationForSingleBoundService(api);
+    Found found = find(api, scopeTags);
+    if (found.instance) return std::move(found.instance);
+    implementation = std::move(found.implementation);
     if (!implementation || !implementation->factoryBlock()) {
       if (ivars_->bindingsState == SRLBindingsState::kInProgress) {
         PECReport(
@@ -139,6 +155,8 @@ rt::Ref<rt::Array> SRLRegistry::internalMultiBoundService(const SRLAPIRegistrati
     return nullptr;
   }
   rt::Ref<rt::Set> implementations;
+  // Of each implementation in turn; null where there is none yet.
+  std::vector<rt::Ref<rt::Object>> instances;
   {
     const rt::LockGuard guard(ivars_->lock);
     auto found = ivars_->multiBindings.find(api);
@@ -155,14 +173,19 @@ rt::Ref<rt::Array> SRLRegistry::internalMultiBoundService(const SRLAPIRegistrati
       }
       return nullptr;
     }
+    instances.reserve(implementations->count());
+    for (const rt::Ref<rt::Object>& element : *implementations) {
+      instances.push_back(keptInstanceOf(static_cast<const SRLImplementation&>(*element), scopeTags));
+    }
   }
-  std::vector<rt::Ref<rt::Object>> instances;
-  instances.reserve(implementations->count());
+  std::size_t count = 0;
+  auto kept = instances.begin();
   for (const rt::Ref<rt::Object>& element : *implementations) {
     auto& implementation = static_cast<SRLImplementation&>(*element);
-    rt::Ref<rt::Object> instance = instanceOf(implementation, api, scopeTags);
+    rt::Ref<rt::Object> instance = std::move(*kept++);
+    if (!instance) instance = instanceOf(implementation, api, scopeTags);
     if (instance) {
-      instances.push_back(std::move(instance));
+      instances[count++] = std::move(instance);
     } else {
       PECReport(
           {kFile, kFunction},
@@ -171,6 +194,7 @@ rt::Ref<rt::Array> SRLRegistry::internalMultiBoundService(const SRLAPIRegistrati
           instanceTypeOf(implementation), SRLAPIIdentifier(api), implementation.description());
     }
   }
+  instances.resize(count);
   return rt::make<rt::Array>(std::move(instances));
 }
 
@@ -245,22 +269,6 @@ rt::Ref<SRLMemoizingScope> SRLRegistry::scopeWithTags(const SRLScopeTagSet& tags
   return scope;
 }
 
-[[gnu::flatten]] rt::Ref<rt::Object> SRLRegistry::scopedInstance(
-    const SRLScopeTagSet& tags, const SRLImplementationRegistrationData* implementationIdentifier,
-    bool* instanceCreated, rt::Ref<rt::Object> (*factory)(SRLScopeTagSet tags)) {
-  {
-    // An instance that is there is got at one go, and its scope needs no reference.
-    const rt::LockGuard guard(ivars_->lock);
-    rt::Ref<rt::Object> instance;
-    const auto scope = ivars_->scopes.find(tags);
-    if (scope != ivars_->scopes.end() && scope->second->findInstance(implementationIdentifier, instance))
-        [[likely]]
-      return instance;
-  }
-  return scopeWithTags(tags)->instanceForIdentifier(implementationIdentifier, instanceCreated,
-                                                    [&] { return factory(tags); });
-}
-
 void SRLRegistry::removeScopesWithTag(const rt::Ref<rt::Object>& tag) {
   if (!tag) {
     PECReport({kFile, "-[SRLRegistry removeScopesWithTag:]"}, "tag cannot be nil!"_s);
@@ -318,14 +326,9 @@ SRLFactoryBlock SRLRegistry::scopedBlockForFactory(
   }
   return [=](const SRLScopeTagSet& tags, bool* instanceCreated) -> rt::Ref<rt::Object> {
     const SRLScopeTagSet masked = SRLScopeTagSetMaskingWithScopes(tags, apiScope, implScope);
-    // Mostly it is the shared registry that is asked, and needs no reference.
-    rt::Ref<SRLRegistry> reference;
-    SRLRegistry* registry = asked;
-    if (registry == nullptr || !registry->isShared()) {
-      reference = sharedInstance();
-      registry = reference.get();
-      if (registry == nullptr) return nullptr;
-    }
-    return registry->scopedInstance(masked, implementationIdentifier, instanceCreated, factory);
+    const rt::Ref<SRLRegistry> registry = sharedInstance();
+    if (!registry) return nullptr;
+    return registry->scopeWithTags(masked)->instanceForIdentifier(implementationIdentifier, instanceCreated,
+                                                                  [&] { return factory(masked); });
   };
 }

@@ -21,6 +21,7 @@
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLInstanceType.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLFactoryBlock.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementationConfiguration.h"
+#include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeType.h"
 
 class SRLImplementation final : public rt::Implements<SRLImplementation, rt::Object> {
@@ -62,10 +63,17 @@ class SRLImplementation final : public rt::Implements<SRLImplementation, rt::Obj
         factoryBlock_(std::move(factoryBlock)),
         configuration_(std::move(configuration)) {}
 
+  friend class SRLRegistry;
+
   const std::string_view identifier_;
   const SRLScopeType scopeType_;
   const rt::Ref<SRLInstanceType> instanceType_;
   const std::uint64_t lifetime_;
   const SRLFactoryBlock factoryBlock_;
   const rt::Ref<SRLImplementationConfiguration> configuration_;
+
+  // Where a registry that has made it from a record, for an API of this scope, looks for its instances. Set
+  // before anybody else knows it.
+  const SRLImplementationRegistrationData* record_ = nullptr;
+  SRLScopeType apiScope_ = 0;
 };

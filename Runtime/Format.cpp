@@ -163,6 +163,7 @@ class Formatter {
   String run();
 
  private:
+  bool writeSimple(char conversion);
   bool canTakeArguments(const FormatDirective& directive, std::size_t start);
   void write(FormatDirective& directive);
   void writeSigned(const FormatDirective& directive, std::int64_t value);
@@ -208,6 +209,10 @@ String Formatter::run() {
     const std::size_t percent = std::min(format_.find('%', i), format_.size());
     out_.append(format_.substr(i, percent - i));
     if (percent == format_.size()) return out_.string();
+    if (percent + 1 < format_.size() && writeSimple(format_[percent + 1])) {
+      i = percent + 2;
+      continue;
+    }
     FormatDirective directive;
     const std::size_t length = parseFormatDirective(format_, percent, directive);
     if (length != 0 && canTakeArguments(directive, percent)) {
@@ -218,6 +223,24 @@ String Formatter::run() {
       i = percent + 1;
     }
   }
+}
+
+// Writes "%@", "%s" and "%d" without anything between, which is what most directives are, and returns true;
+// returns false, having done nothing, for any other, and where the format goes by positions.
+bool Formatter::writeSimple(char conversion) {
+  constexpr FormatDirective kPlain;
+  if (positional_ || (conversion != '@' && conversion != 's' && conversion != 'd')) return false;
+  isDecided_ = true;
+  width_ = 0;
+  precision_ = FormatDirective::kNone;
+  if (conversion == 'd') {
+    writeDigits(std::int64_t{list_.next(FormatArgument::kInt).integer}, 10);
+  } else if (const void* pointer = list_.next(FormatArgument::kPointer).pointer; conversion == 's') {
+    writeBytes(kPlain, static_cast<const char*>(pointer));
+  } else {
+    writeObject(kPlain, static_cast<const Object*>(pointer));
+  }
+  return true;
 }
 
 bool Formatter::canTakeArguments(const FormatDirective& directive, std::size_t start) {

@@ -8,6 +8,21 @@ namespace rt {
 
 namespace {
 
+// Word by word, the last one with some bytes that have been looked at, so that no byte is looked at alone.
+bool isASCII(std::string_view bytes) noexcept {
+  constexpr std::uint64_t kHighBits = 0x8080808080808080U;
+  constexpr std::size_t kSize = sizeof kHighBits;
+  if (bytes.size() < kSize) return false;
+  const auto wordAt = [bytes](std::size_t position) {
+    std::uint64_t word = 0;
+    std::memcpy(&word, bytes.data() + position, kSize);
+    return word;
+  };
+  std::uint64_t all = wordAt(bytes.size() - kSize);
+  for (std::size_t i = 0; i + kSize <= bytes.size(); i += kSize) all |= wordAt(i);
+  return (all & kHighBits) == 0;
+}
+
 /// How many bytes the white space or line end takes that `text` begins with; 0 where it begins with none.
 std::size_t leadingSpace(std::string_view text) {
   if (text.empty()) return 0;
@@ -44,7 +59,7 @@ String String::fromUTF8(const char* text) {
 }
 
 String String::fromUTF8Repaired(std::string_view bytes) {
-  if (isValidUTF8(bytes)) return copy(bytes);
+  if (isASCII(bytes) || isValidUTF8(bytes)) return copy(bytes);
   const auto visit = [bytes](auto&& put) {
     for (std::string_view rest = bytes; !rest.empty();) {
       const UTF8Sequence next = nextUTF8(rest);

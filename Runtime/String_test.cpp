@@ -347,4 +347,18 @@ TEST(StringBuilder, RefusesWhatCannotBe) {
   EXPECT_EQ(builder.string(), "kept");
 }
 
+// Wherever in a text of whatever length the one byte is that is not UTF-8.
+TEST(String, IsRepairedAtEveryPlace) {
+  for (std::size_t length = 1; length <= 40; ++length) {
+    const std::string plain(length, 'a');
+    EXPECT_EQ(rt::String::fromUTF8Repaired(plain).view(), plain);
+    for (std::size_t place = 0; place < length; ++place) {
+      std::string torn = plain;
+      torn[place] = '\xff';
+      const std::string repaired = plain.substr(0, place) + "\uFFFD" + plain.substr(place + 1);
+      EXPECT_EQ(rt::String::fromUTF8Repaired(torn).view(), repaired);
+    }
+  }
+}
+
 }  // namespace

@@ -74,12 +74,11 @@ rt::Ref<rt::Dictionary> safeParametersIn(std::va_list list, std::int32_t count,
 // The calls that a call stack leaves out: that of `logArguments` and that of `LUMLog`.
 constexpr std::uint64_t kOwnFrameCount = 2;
 
-[[gnu::noinline]] rt::Ref<LUMLogMessage> logArguments(LUMLogLevel level, const char* file,
-                                                      const char* function, std::uint64_t line,
-                                                      const rt::Ref<LUMLogMetadata>& metadata,
-                                                      std::int32_t argumentCount,
-                                                      const LUMLogArgumentKind* argumentKinds,
-                                                      const rt::String& format, std::va_list arguments) {
+// Flat, but a frame of its own.
+[[gnu::noinline, gnu::flatten]] rt::Ref<LUMLogMessage> logArguments(
+    LUMLogLevel level, const char* file, const char* function, std::uint64_t line,
+    const rt::Ref<LUMLogMetadata>& metadata, std::int32_t argumentCount,
+    const LUMLogArgumentKind* argumentKinds, const rt::String& format, std::va_list arguments) {
   LUMLogMultiplexer& multiplexer = *LUMLogMultiplexer::sharedInstance();
   rt::Ref<LUMLogCallstack> callstack;
   if ((level == LUMLogLevelError || level == LUMLogLevelFault) && multiplexer.captureCallStack()) {

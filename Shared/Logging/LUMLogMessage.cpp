@@ -20,13 +20,11 @@ std::uint64_t hashOf(const rt::Object* object) {
 
 }  // namespace
 
-rt::Ref<LUMLogMessage> LUMLogMessage::initWithLevel(LUMLogLevel level, rt::String format,
-                                                    rt::String formattedString, rt::String file,
-                                                    rt::String function, std::uint64_t line,
-                                                    rt::String threadName, rt::String dispatchQueueLabel,
-                                                    const rt::Ref<LUMLogCallstack>& callstack,
-                                                    rt::Ref<rt::Dictionary> safeParameters,
-                                                    rt::Ref<LUMLogMetadata> logMetadata) {
+[[gnu::flatten]] rt::Ref<LUMLogMessage> LUMLogMessage::initWithLevel(
+    LUMLogLevel level, rt::String format, rt::String formattedString, rt::String file, rt::String function,
+    std::uint64_t line, rt::String threadName, rt::String dispatchQueueLabel,
+    const rt::Ref<LUMLogCallstack>& callstack, rt::Ref<rt::Dictionary> safeParameters,
+    rt::Ref<LUMLogMetadata> logMetadata) {
   return rt::Ref<LUMLogMessage>::adopt(
       new LUMLogMessage(level, std::move(format), std::move(formattedString), std::move(file),
                         std::move(function), line, std::move(threadName), std::move(dispatchQueueLabel),

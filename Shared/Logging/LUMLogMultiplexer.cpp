@@ -81,7 +81,7 @@ rt::Ref<LUMLogMultiplexer::Members> LUMLogMultiplexer::members() const {
   return members_;
 }
 
-void LUMLogMultiplexer::logWithMessage(const rt::Ref<LUMLogMessage>& message) {
+[[gnu::flatten]] void LUMLogMultiplexer::logWithMessage(const rt::Ref<LUMLogMessage>& message) {
   if (!message) return;
   const rt::Ref<Members> current = members();
   const Lists& lists = current->lists;

@@ -1,0 +1,81 @@
+// What it costs to measure how long services take, and what it costs to be able to.
+
+#include <benchmark/benchmark.h>
+
+#include <thread>
+
+#include "Comparison.h"
+#include "Runtime/Class.h"
+#include "Runtime/Ref.h"
+#include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
+#include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementation.h"
+#include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingEnabled.h"
+#include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingMeasurement.h"
+
+namespace {
+
+using rt::Ref;
+
+// Other parts of a program have had threads.
+[[maybe_unused]] const bool hasHadThreads = (std::thread([] {}).join(), true);
+
+class Service final : public rt::Implements<Service, rt::Object> {};
+
+constexpr SRLAPIRegistrationData kAPI{.identifier = "Service", .identifierLength = 7};
+
+// New at each request, so that what is measured is added up and not kept.
+Ref<SRLImplementation> implementation() {
+  return SRLImplementation::initWithIdentifier(
+      "Service", SRLClassType::initWithClass(&rt::classInfo<Service>()), 1, 0,
+      [](const SRLScopeTagSet&, bool* instanceCreated) -> Ref<rt::Object> {
+        *instanceCreated = true;
+        return rt::make<Service>();
+      },
+      nullptr);
+}
+
+Ref<rt::Object> make(const SRLImplementation& implementation) {
+  bool isCreated = false;
+  return implementation.factoryBlock()({}, &isCreated);
+}
+
+void makeBare(benchmark::State& state) {
+  const Ref<SRLImplementation> asked = implementation();
+  for (auto _ : state) benchmark::DoNotOptimize(make(*asked));
+}
+
+void makeUnmeasured(benchmark::State& state) {
+  const Ref<SRLImplementation> asked = implementation();
+  for (auto _ : state) {
+    if (SRLPProfilingEnabled()) state.SkipWithError("profiling is on in this build");
+    benchmark::DoNotOptimize(make(*asked));
+  }
+}
+
+void makeMeasured(benchmark::State& state) {
+  const Ref<SRLImplementation> asked = implementation();
+  for (auto _ : state) {
+    const SRLPProfilingMeasurementPartial partial = SRLPCaptureInjectionStart(asked);
+    benchmark::DoNotOptimize(make(*asked));
+    SRLPCaptureInjectionEnd(partial, &kAPI, asked);
+  }
+}
+
+void makeCancelled(benchmark::State& state) {
+  const Ref<SRLImplementation> asked = implementation();
+  for (auto _ : state) {
+    SRLPCaptureInjectionStart(asked);
+    benchmark::DoNotOptimize(make(*asked));
+    SRLPCaptureInjectionCancel();
+  }
+}
+
+BENCHMARK(makeUnmeasured)->Name("Profiling/off/ours");
+BENCHMARK(makeBare)->Name("Profiling/off/bare");
+const Bound offBound{"Profiling/off", "bare", 1.1};
+BENCHMARK(makeMeasured)->Name("Profiling/on/ours");
+BENCHMARK(makeBare)->Name("Profiling/on/bare");
+BENCHMARK(makeCancelled)->Name("Profiling/on, instance there already/ours");
+BENCHMARK(makeBare)->Name("Profiling/on, instance there already/bare");
+
+}  // namespace

@@ -17,7 +17,7 @@
 #include "Runtime/Exception.h"
 #include "Runtime/KeyedUnarchiver.h"
 #include "Runtime/Number.h"
-#include "tests/Process.h"
+#include "tests/PlistlibTest.h"
 
 namespace {
 
@@ -600,29 +600,7 @@ TEST(KeyedUnarchiver, SurvivesDamage) {
   EXPECT_GT(refused, 0);
 }
 
-class KeyedArchiveAndPython : public testing::Test {
- protected:
-  void SetUp() override {
-    if (runProcess({"python3", "-c", "import plistlib"}).exitStatus != 0) {
-      GTEST_SKIP() << "python3 with its plistlib is not here";
-    }
-    std::string directory = testing::TempDir() + "keyed-archive.XXXXXX";
-    ASSERT_NE(mkdtemp(directory.data()), nullptr);
-    directory_ = directory;
-  }
-  void TearDown() override {
-    if (!directory_.empty()) std::filesystem::remove_all(directory_);
-  }
-  std::string python(const std::string& script) const {
-    const ProcessResult result =
-        runProcess({"python3", "-c", "import plistlib, sys\npath = sys.argv[1]\n" + script, path()});
-    EXPECT_EQ(result.exitStatus, 0) << result.standardError;
-    return result.standardOutput;
-  }
-  std::string path() const { return directory_ / "archive"; }
-
-  std::filesystem::path directory_;
-};
+class KeyedArchiveAndPython : public PlistlibTest {};
 
 TEST_F(KeyedArchiveAndPython, PythonReadsOurs) {
   KeyedArchiver archiver;

@@ -13,7 +13,7 @@
 #include <limits>
 #include <random>
 
-#include "tests/Process.h"
+#include "tests/PlistlibTest.h"
 
 namespace {
 
@@ -314,31 +314,7 @@ TEST(PropertyList, SurvivesDamage) {
   EXPECT_GT(accepted, 0);
 }
 
-class PropertyListAndPython : public testing::Test {
- protected:
-  void SetUp() override {
-    if (runProcess({"python3", "-c", "import plistlib"}).exitStatus != 0) {
-      GTEST_SKIP() << "python3 with its plistlib is not here";
-    }
-    std::string directory = testing::TempDir() + "property-list.XXXXXX";
-    ASSERT_NE(mkdtemp(directory.data()), nullptr);
-    directory_ = directory;
-  }
-  void TearDown() override {
-    if (!directory_.empty()) std::filesystem::remove_all(directory_);
-  }
-
-  // Runs `script`, which finds plistlib imported and the path of the file in `path`; returns its output.
-  std::string python(const std::string& script) const {
-    const ProcessResult result =
-        runProcess({"python3", "-c", "import plistlib, sys\npath = sys.argv[1]\n" + script, path()});
-    EXPECT_EQ(result.exitStatus, 0) << result.standardError;
-    return result.standardOutput;
-  }
-  std::string path() const { return directory_ / "list.plist"; }
-
-  std::filesystem::path directory_;
-};
+class PropertyListAndPython : public PlistlibTest {};
 
 TEST_F(PropertyListAndPython, PythonReadsOurs) {
   PropertyList list;

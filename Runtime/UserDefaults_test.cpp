@@ -748,7 +748,7 @@ TEST_F(UserDefaultsOfOthers, AreToldOfAgainAfterTheSystemHasFailed) {
     ++replaced;
   }
   close(nothing);
-  if (replaced == 0) GTEST_SKIP() << "no descriptors of this system's watch to be found";
+  ASSERT_GT(replaced, 0) << "the file is not watched";
   // Either wakes the thread, which then finds that it cannot watch.
   inShell(R"(echo 'key = 1' > "$1")", path());
   await("1"_s);

@@ -23,7 +23,7 @@
 #include "Runtime/PropertyList.h"
 #include "Runtime/String.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTag.h"
-#include "tests/Process.h"
+#include "tests/PlistlibTest.h"
 #include "tests/TestReports.h"
 
 namespace {
@@ -251,29 +251,7 @@ TEST(SRLScopeTagSetCodableWrapperArchive, MayBeTruncatedOrDamagedAnywhere) {
   }
 }
 
-class SRLScopeTagSetCodableWrapperAndPython : public testing::Test {
- protected:
-  void SetUp() override {
-    if (runProcess({"python3", "-c", "import plistlib"}).exitStatus != 0) {
-      GTEST_SKIP() << "python3 with its plistlib is not here";
-    }
-    std::string directory = testing::TempDir() + "tag-set.XXXXXX";
-    ASSERT_NE(mkdtemp(directory.data()), nullptr);
-    directory_ = directory;
-  }
-  void TearDown() override {
-    if (!directory_.empty()) std::filesystem::remove_all(directory_);
-  }
-  std::string python(const std::string& script) const {
-    const ProcessResult result =
-        runProcess({"python3", "-c", "import plistlib, sys\npath = sys.argv[1]\n" + script, path()});
-    EXPECT_EQ(result.exitStatus, 0) << result.standardError;
-    return result.standardOutput;
-  }
-  std::string path() const { return directory_ / "archive"; }
-
-  std::filesystem::path directory_;
-};
+class SRLScopeTagSetCodableWrapperAndPython : public PlistlibTest {};
 
 TEST_F(SRLScopeTagSetCodableWrapperAndPython, PythonReadsOurs) {
   const Bytes bytes = KeyedArchiver::archivedDataWithRootObject(

@@ -1,0 +1,50 @@
+#pragma once
+
+/// A fixture for what Python's plistlib reads and writes: a file in a directory of the test's own, and
+/// scripts that find plistlib imported and the file's path in `path`.
+///
+///     class KeyedArchiveAndPython : public PlistlibTest {};
+///
+///     TEST_F(KeyedArchiveAndPython, PythonReadsOurs) {
+///       write(path());
+///       EXPECT_EQ(python("print(plistlib.load(open(path, 'rb')))"), "7\n");
+///     }
+///
+/// Skips its tests where there is no python3 with plistlib.
+///
+/// Not for: anything but tests.
+
+#include <gtest/gtest.h>
+#include <stdlib.h>
+
+#include <filesystem>
+#include <string>
+
+#include "tests/Process.h"
+
+class PlistlibTest : public testing::Test {
+ protected:
+  void SetUp() override {
+    if (runProcess({"python3", "-c", "import plistlib"}).exitStatus != 0) {
+      GTEST_SKIP() << "python3 with its plistlib is not here";
+    }
+    std::string directory = testing::TempDir() + "plistlib.XXXXXX";
+    ASSERT_NE(mkdtemp(directory.data()), nullptr);
+    directory_ = directory;
+  }
+  void TearDown() override {
+    if (!directory_.empty()) std::filesystem::remove_all(directory_);
+  }
+
+  /// Runs `script`, which must succeed; returns its output.
+  std::string python(const std::string& script) const {
+    const ProcessResult result =
+        runProcess({"python3", "-c", "import plistlib, sys\npath = sys.argv[1]\n" + script, path()});
+    EXPECT_EQ(result.exitStatus, 0) << result.standardError;
+    return result.standardOutput;
+  }
+  std::string path() const { return directory_ / "file"; }
+
+ private:
+  std::filesystem::path directory_;
+};

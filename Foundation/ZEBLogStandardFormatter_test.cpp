@@ -4,6 +4,7 @@
 #include <pthread.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <chrono>
 #include <cstdio>
 #include <cstdlib>
@@ -191,7 +192,9 @@ TEST_F(ZEBLogStandardFormatterTest, ServesManyThreads) {
       for (int i = 0; i < 500; ++i) {
         const std::string text = line();
         ASSERT_EQ(text.substr(23), expected);
-        ASSERT_EQ(text[19], '.');
+        std::string shape = text.substr(0, 23);
+        std::ranges::replace_if(shape, [](char c) { return c >= '0' && c <= '9'; }, '0');
+        ASSERT_EQ(shape, "0000-00-00 00:00:00.000") << text;
       }
     });
   }

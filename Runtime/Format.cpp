@@ -2,6 +2,7 @@
 
 #include <algorithm>
 #include <array>
+#include <bit>
 #include <charconv>
 #include <cstdint>
 #include <cstdio>
@@ -163,6 +164,7 @@ class Formatter {
   String run();
 
  private:
+  std::size_t writeLiteral(std::size_t start);
   bool writeSimple(char conversion);
   bool canTakeArguments(const FormatDirective& directive, std::size_t start);
   void write(FormatDirective& directive);
@@ -206,8 +208,7 @@ class Formatter {
 
 String Formatter::run() {
   for (std::size_t i = 0;;) {
-    const std::size_t percent = std::min(format_.find('%', i), format_.size());
-    out_.append(format_.substr(i, percent - i));
+    const std::size_t percent = writeLiteral(i);
     if (percent == format_.size()) return out_.string();
     if (percent + 1 < format_.size() && writeSimple(format_[percent + 1])) {
       i = percent + 2;
@@ -225,6 +226,30 @@ String Formatter::run() {
   }
 }
 
+// Writes what stands from `start` to the next '%', or to the end, and returns where that is. Word by word,
+// since most of it is short.
+std::size_t Formatter::writeLiteral(std::size_t start) {
+  constexpr std::uint64_t kEach = 0x0101010101010101U;
+  constexpr std::uint64_t kLow = 0x7F * kEach;
+  constexpr std::size_t kSize = sizeof kEach;
+  std::size_t i = start;
+  for (; format_.size() - i >= kSize; i += kSize) {
+    std::uint64_t word = 0;
+    std::memcpy(&word, format_.data() + i, kSize);
+    std::memcpy(out_.prepare(kSize), &word, kSize);
+    // The highest bit of each byte that is a '%', which comes first in the lowest byte.
+    const std::uint64_t other = word ^ ('%' * kEach);
+    if (const std::uint64_t found = ~(((other & kLow) + kLow) | other | kLow); found != 0) {
+      const auto count = static_cast<std::size_t>(std::countr_zero(found)) / 8;
+      out_.commit(count);
+      return i + count;
+    }
+    out_.commit(kSize);
+  }
+  for (; i < format_.size() && format_[i] != '%'; ++i) out_.append(format_[i]);
+  return i;
+}
+
 // Writes "%@", "%s" and "%d" without anything between, which is what most directives are, and returns true;
 // returns false, having done nothing, for any other, and where the format goes by positions.
 bool Formatter::writeSimple(char conversion) {
@@ -236,7 +261,7 @@ bool Formatter::writeSimple(char conversion) {
   if (conversion == 'd') {
     writeDigits(std::int64_t{list_.next(FormatArgument::kInt).integer}, 10);
   } else if (const void* pointer = list_.next(FormatArgument::kPointer).pointer; conversion == 's') {
-    writeBytes(kPlain, static_cast<const char*>(pointer));
+    out_.append(pointer != nullptr ? std::string_view(static_cast<const char*>(pointer)) : kNullText);
   } else {
     writeObject(kPlain, static_cast<const Object*>(pointer));
   }

@@ -167,7 +167,9 @@ class FormatString {
   constexpr std::string_view view() const noexcept { return text_; }
 
   /// The text as a string; allocates if the format was a plain literal, and may throw std::bad_alloc then.
-  String string() const { return object_ != nullptr ? String::from(object_) : String::overStatic(text_); }
+  String string() const {
+    return object_ != nullptr ? String::from(Ref<StringObject>(object_)) : String::overStatic(text_);
+  }
 
  private:
   consteval void check() const {
@@ -177,7 +179,7 @@ class FormatString {
   }
 
   std::string_view text_;
-  const StringObject* object_ = nullptr;
+  StringObject* object_ = nullptr;
 };
 
 }  // namespace rt

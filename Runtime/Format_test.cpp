@@ -290,6 +290,21 @@ TEST(Format, LongResultsGrow) {
   }
 }
 
+// Text between directives is copied in words, which a text may end in the middle of. Of the bytes, some
+// differ from '%' in one bit.
+TEST(Format, TextOfAnyLengthStandsBetweenDirectives) {
+  const std::string text = "\u00a5$&\x05'e\u20ac5-\u00e5!\x7f\u0425 tail of it all";
+  for (std::size_t before = 0; before < text.size(); ++before) {
+    for (std::size_t after = 0; after < text.size(); ++after) {
+      const std::string format =
+          text.substr(before) + "%d" + text.substr(after) + "%%%s" + text.substr(before);
+      ASSERT_EQ(formatted(format.c_str(), 7, "x"),
+                rt::String::fromUTF8Repaired(expected(format.c_str(), 7, "x")))
+          << format;
+    }
+  }
+}
+
 TEST(Format, LeavesTheListWhereItIs) {
   const auto twice = [](const char* format, auto... rest) {
     const auto call = [](const char* text, ...) {
@@ -343,6 +358,18 @@ TEST(Format, AllocatesTheStringAndNothingElse) {
   EXPECT_EQ(count.allocations(), 2);
   const rt::String empty = rt::format("");
   EXPECT_EQ(count.allocations(), 2);
+}
+
+TEST(Format, WhatFitsExactlyAllocatesNothingElse) {
+  if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
+  const std::string text(rt::StringBuilder::kInlineCapacity - 1, 'a');
+  const auto allocationsFor = [&](const char* format) {
+    const AllocationCount count;
+    const rt::String result = formatted(format, text.c_str(), 7);
+    EXPECT_EQ(result.length(), rt::StringBuilder::kInlineCapacity) << format;
+    return count.allocations();
+  };
+  for (const char* format : {"%sx", "%s%%", "%s%d", "%s%x", "%s%c"}) EXPECT_EQ(allocationsFor(format), 1);
 }
 
 // Random directives, one at a time, against snprintf.

@@ -64,8 +64,6 @@ void Object::destroy() const noexcept {
 
 void Object::checkNotEscaped() const noexcept {
   const std::uint32_t count = count_.load(std::memory_order_relaxed);
-  if (count == kDestroying) [[likely]]
-    return;
   // On the stack, or left by its constructor with an exception.
   if (count == 1) return;
   std::string_view name = "object";

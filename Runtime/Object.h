@@ -47,7 +47,8 @@ class Object {
   Object(const Object&) = delete;
   Object& operator=(const Object&) = delete;
   constexpr virtual ~Object() {
-    if (!std::is_constant_evaluated()) checkNotEscaped();
+    if (!std::is_constant_evaluated() && count_.load(std::memory_order_relaxed) != kDestroying) [[unlikely]]
+      checkNotEscaped();
   }
 
   /// Adds a reference. `Ref` does this; call it only where a reference is kept in something untyped.
@@ -119,8 +120,8 @@ class Object {
     return (count_.load(std::memory_order_relaxed) & (kImmortal | kDestroying)) == kDestroying;
   }
   bool retainUnlessDestroyed() const noexcept;
-  [[gnu::cold, gnu::noinline]] void destroy() const noexcept;
-  void checkNotEscaped() const noexcept;
+  [[gnu::noinline]] void destroy() const noexcept;
+  [[gnu::cold]] void checkNotEscaped() const noexcept;
 
   // The cell of the weak references, if there are any; while the object is being destroyed, its class's
   // record instead, which ~Object would not know.

@@ -68,10 +68,13 @@ class StringBuilder {
  private:
   void grow(std::size_t count);
 
+  // What is prepared may be more than what is then committed.
+  static constexpr std::size_t kSlack = 32;
+
   char* bytes_ = inline_;
   std::size_t length_ = 0;
-  std::size_t capacity_ = kInlineCapacity;
-  char inline_[kInlineCapacity];
+  std::size_t capacity_ = kInlineCapacity + kSlack;
+  char inline_[kInlineCapacity + kSlack];
 };
 
 }  // namespace rt

@@ -11,7 +11,8 @@ using namespace rt::literals;
 
 rt::String currentThreadName() {
   rt::String name = rt::Thread::currentName();
-  return name ? name : ""_s;
+  if (!name) name = ""_s;
+  return name;
 }
 
 std::uint64_t hashOf(const rt::Object* object) {

@@ -90,14 +90,8 @@ rt::Ref<LUMLogMultiplexer::Members> LUMLogMultiplexer::members() const {
     if (!filter->allowLogMessage(*message)) return;
   }
 
-  std::vector<rt::Ref<LUMAsyncLogger>> laterLoggers;
   std::vector<rt::Ref<LUMAsyncLogger>> blockingLoggers;
-  for (const rt::Ref<LUMAsyncLogger>& logger : lists.asyncLoggers) {
-    const bool isBlocking = admits(*logger, *message) &&
-                            logger->dispatchModeForMessage(*message) == LUMLogDispatchModeSynchronous;
-    (isBlocking ? blockingLoggers : laterLoggers).push_back(logger);
-  }
-  if (!laterLoggers.empty()) deliverLater(std::move(laterLoggers), message);
+  if (!lists.asyncLoggers.empty()) blockingLoggers = deliverLater(lists.asyncLoggers, message);
 
   for (const rt::Ref<LUMSyncLogger>& logger : lists.syncLoggers) deliver(*logger, message);
 
@@ -108,15 +102,24 @@ rt::Ref<LUMLogMultiplexer::Members> LUMLogMultiplexer::members() const {
   }
 }
 
-void LUMLogMultiplexer::deliverLater(std::vector<rt::Ref<LUMAsyncLogger>> loggers,
-                                     const rt::Ref<LUMLogMessage>& message) {
-  loggingQueue_->async([loggers = std::move(loggers), message] {
+std::vector<rt::Ref<LUMAsyncLogger>> LUMLogMultiplexer::deliverLater(
+    const std::vector<rt::Ref<LUMAsyncLogger>>& loggers, const rt::Ref<LUMLogMessage>& message) {
+  std::vector<rt::Ref<LUMAsyncLogger>> laterLoggers;
+  std::vector<rt::Ref<LUMAsyncLogger>> blockingLoggers;
+  for (const rt::Ref<LUMAsyncLogger>& logger : loggers) {
+    const bool isBlocking = admits(*logger, *message) &&
+                            logger->dispatchModeForMessage(*message) == LUMLogDispatchModeSynchronous;
+    (isBlocking ? blockingLoggers : laterLoggers).push_back(logger);
+  }
+  if (laterLoggers.empty()) return blockingLoggers;
+  loggingQueue_->async([loggers = std::move(laterLoggers), message] {
     for (const rt::Ref<LUMAsyncLogger>& logger : loggers) {
       if (const rt::Ref<rt::Queue> queue = logger->operationQueue()) {
         queue->async([logger, message] { deliver(*logger, message); });
       }
     }
   });
+  return blockingLoggers;
 }
 
 /// Has `change` make the next members of those that there are. It runs without the lock, since objects are

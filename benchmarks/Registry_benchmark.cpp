@@ -320,6 +320,7 @@ const Bound scopedContainer{"Registry/scoped", "container", 1.0};
 BENCHMARK(findFresh)->Name("Registry/fresh/ours");
 BENCHMARK(findFreshBare)->Name("Registry/fresh/bare");
 BENCHMARK(findFreshInContainer)->Name("Registry/fresh/container");
+const Bound freshBare{"Registry/fresh", "bare", 1.2};
 const Bound freshContainer{"Registry/fresh", "container", 1.0};
 BENCHMARK(missOptional)->Name("Registry/miss/ours");
 BENCHMARK(missInContainer)->Name("Registry/miss/container");

@@ -235,6 +235,10 @@ class SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
   rt::Ref<rt::Object> keptInstanceOf(const SRLImplementation& implementation,
                                      const SRLScopeTagSet& tags) const RT_REQUIRES(ivars_->lock);
 
+  // An instance of what the caller keeps, new or kept; null where its factory gives none.
+  static rt::Ref<rt::Object> instanceOf(SRLImplementation& implementation, const SRLAPIRegistrationData* api,
+                                        const SRLScopeTagSet& tags);
+
   std::unique_ptr<SRLRegistryIvars> ivars_;
   const rt::Ref<SRLMemoizingScope> configScope_;
   // Written with the shared registry itself.

@@ -38,18 +38,32 @@ constexpr const char* kFile = "Shared/ServiceRegistry/Source/SRLRegistry";
   return instance;
 }
 
-// The caller keeps the implementation.
-rt::Ref<rt::Object> instanceOf(SRLImplementation& implementation, const SRLAPIRegistrationData* api,
-                               const SRLScopeTagSet& tags) {
-  if (SRLPProfilingEnabled()) [[unlikely]]
-    return measuredInstance(&implementation, api, tags);
-  bool instanceCreated = false;
-  return implementation.factoryBlock().callKept(tags, &instanceCreated);
-}
-
 rt::String instanceTypeOf(const SRLImplementation& implementation) {
   const rt::Ref<SRLInstanceType>& type = implementation.instanceType();
   return type ? type->asObject()->description() : rt::String();
+}
+
+// Reports are functions of their own so that requests, which are flat, stay small.
+
+[[gnu::cold, gnu::noinline]] void reportNoBinding(const char* function, const SRLAPIRegistrationData* api) {
+  PECReport({kFile, function}, "No binding was found for required, single-bound service: %@"_s,
+            SRLAPIIdentifier(api));
+}
+
+[[gnu::cold, gnu::noinline]] void reportEarlyRequest(const char* function,
+                                                     const SRLAPIRegistrationData* api) {
+  PECReport({kFile, function},
+            "A service injector was called prior to service bindings being registered.\n\nService: %@"_s,
+            SRLAPIIdentifier(api));
+}
+
+[[gnu::cold, gnu::noinline]] void reportNoInstance(const char* function,
+                                                   const SRLImplementation& implementation,
+                                                   const SRLAPIRegistrationData* api) {
+  PECReport({kFile, function},
+            "Implementation of %@, bound to required service %@, returned nil.\nImplementation metadata: %@"
+            "\nSee docs/registry.md#initializer-return-nil."_s,
+            instanceTypeOf(implementation), SRLAPIIdentifier(api), implementation.description());
 }
 
 }  // namespace
@@ -67,6 +81,21 @@ rt::Ref<rt::Object> SRLRegistry::keptInstanceOf(const SRLImplementation& impleme
   rt::Ref<rt::Object> instance;
   if (scope != ivars_->scopes.end()) scope->second->findInstance(record, instance);
   return instance;
+}
+
+// The caller keeps the implementation.
+rt::Ref<rt::Object> SRLRegistry::instanceOf(SRLImplementation& implementation,
+                                            const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) {
+  if (SRLPProfilingEnabled()) [[unlikely]]
+    return measuredInstance(&implementation, api, tags);
+  const SRLImplementationRegistrationData* record = implementation.record_;
+  // What the factory block would do, at one go.
+  if (record != nullptr && record->lifetime == 1) {
+    return record->factory(
+        SRLScopeTagSetMaskingWithScopes(tags, implementation.apiScope_, record->scopeType));
+  }
+  bool instanceCreated = false;
+  return implementation.factoryBlock().callKept(tags, &instanceCreated);
 }
 
 SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) {
@@ -90,24 +119,16 @@ SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SR
     implementation = std::move(found.implementation);
     if (!implementation || !implementation->factoryBlock()) [[unlikely]] {
       if (ivars_->bindingsState == SRLBindingsState::kRegistered) {
-        PECReport({kFile, kFunction}, "No binding was found for required, single-bound service: %@"_s,
-                  SRLAPIIdentifier(api));
+        reportNoBinding(kFunction, api);
       } else {
-        PECReport(
-            {kFile, kFunction},
-            "A service injector was called prior to service bindings being registered.\n\nService: %@"_s,
-            SRLAPIIdentifier(api));
+        reportEarlyRequest(kFunction, api);
       }
       return nullptr;
     }
   }
   rt::Ref<rt::Object> instance = instanceOf(*implementation, api, scopeTags);
-  if (!instance) [[unlikely]] {
-    PECReport({kFile, kFunction},
-              "Implementation of %@, bound to required service %@, returned nil.\nImplementation metadata: %@"
-              "\nSee docs/registry.md#initializer-return-nil."_s,
-              instanceTypeOf(*implementation), SRLAPIIdentifier(api), implementation->description());
-  }
+  if (!instance) [[unlikely]]
+    reportNoInstance(kFunction, *implementation, api);
   return instance;
 }
 
@@ -121,10 +142,7 @@ rt::Ref<rt::Object> SRLRegistry::internalOptionalService(const SRLAPIRegistratio
     implementation = std::move(found.implementation);
     if (!implementation || !implementation->factoryBlock()) {
       if (ivars_->bindingsState == SRLBindingsState::kInProgress) {
-        PECReport(
-            {kFile, "-[SRLRegistry internalOptionalService:scopeTags:]"},
-            "A service injector was called prior to service bindings being registered.\n\nService: %@"_s,
-            SRLAPIIdentifier(api));
+        reportEarlyRequest("-[SRLRegistry internalOptionalService:scopeTags:]", api);
       }
       return nullptr;
     }
@@ -166,10 +184,7 @@ rt::Ref<rt::Array> SRLRegistry::internalMultiBoundService(const SRLAPIRegistrati
     if (found != ivars_->multiBindings.end()) implementations = found->second;
     if (!implementations) {
       if (ivars_->bindingsState == SRLBindingsState::kInProgress) {
-        PECReport(
-            {kFile, kFunction},
-            "A service injector was called prior to service bindings being registered.\n\nService: %@"_s,
-            SRLAPIIdentifier(api));
+        reportEarlyRequest(kFunction, api);
       }
       return nullptr;
     }

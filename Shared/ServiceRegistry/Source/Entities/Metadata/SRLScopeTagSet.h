@@ -4,9 +4,9 @@
 ///
 ///     rt::Ref<rt::Array> tags = rt::Array::of(account, window);
 ///     SRLScopeTagSet set = SRLScopeTagSetCreateWithTags(tags.get());
-///     SRLScopeTagSet masked = SRLScopeTagSetMaskingWithScopes(set, /*apiScope=*/0b0110,
-///     /*implScope=*/0b0100); SRLScopeTagSetCFRefTypeForIndex(masked, 0);                              //
-///     window
+///     SRLScopeTagSet masked =
+///         SRLScopeTagSetMaskingWithScopes(set, /*apiScope=*/0b0110, /*implScope=*/0b0100);
+///     SRLScopeTagSetCFRefTypeForIndex(masked, 0);          // window
 ///
 /// A set for a scope type has one tag for each of the type's bits, the lowest bit's first.
 ///

@@ -6,6 +6,7 @@
 #include <array>
 #include <atomic>
 #include <cstddef>
+#include <functional>
 #include <latch>
 #include <memory>
 #include <random>
@@ -33,67 +34,65 @@ using namespace rt::literals;
 using rt::Queue;
 using rt::Ref;
 
-// Each kind makes a queue for a test and runs the test's body while the queue is being served.
+/// A kind of queue. It makes one for a test, and runs the test's body while that is being served. A value and
+/// no type, so that the suite is compiled once.
+struct Kind {
+  std::string name;
+  rt::String label;
+  int niceness;
+  Ref<Queue> (*make)();
+  void (*serveDuring)(const std::function<void()>& body);
+};
 
-struct SerialQueue {
-  static constexpr rt::String kLabel = "conformance"_s;
-  static constexpr int kNiceness = 5;
-  static Ref<Queue> make() { return rt::make<Queue>(kLabel, rt::QualityOfService::kUtility, -2); }
-  template <class Body>
-  static void serveDuring(Body body) {
+Ref<Queue> makeSerialQueue() {
+  return rt::make<Queue>("conformance"_s, rt::QualityOfService::kUtility, -2);
+}
+
+Ref<Queue> mainQueue() {
+  return Queue::main();
+}
+
+void runBody(const std::function<void()>& body) {
+  body();
+}
+
+void runMainQueueDuring(const std::function<void()>& body) {
+  std::thread thread([&] {
     body();
-  }
-};
+    rt::MainQueue::stop();
+  });
+  rt::MainQueue::run();
+  thread.join();
+}
 
-struct RunMainQueue {
-  static constexpr rt::String kLabel = rt::MainQueue::kLabel;
-  static constexpr int kNiceness = 0;
-  static Ref<Queue> make() { return Queue::main(); }
-  template <class Body>
-  static void serveDuring(Body body) {
-    std::thread thread([&] {
-      body();
-      rt::MainQueue::stop();
-    });
-    rt::MainQueue::run();
-    thread.join();
+void pollMainQueueDuring(const std::function<void()>& body) {
+  std::atomic<bool> isDone = false;
+  std::thread thread([&] {
+    body();
+    Queue::main()->async([&] { isDone = true; });
+  });
+  pollfd event{.fd = rt::MainQueue::fileDescriptor(), .events = POLLIN, .revents = 0};
+  while (!isDone) {
+    EXPECT_EQ(poll(&event, 1, -1), 1);
+    rt::MainQueue::drain();
   }
-};
+  thread.join();
+}
 
-struct PolledMainQueue : RunMainQueue {
-  template <class Body>
-  static void serveDuring(Body body) {
-    std::atomic<bool> isDone = false;
-    std::thread thread([&] {
-      body();
-      Queue::main()->async([&] { isDone = true; });
-    });
-    pollfd event{.fd = rt::MainQueue::fileDescriptor(), .events = POLLIN, .revents = 0};
-    while (!isDone) {
-      EXPECT_EQ(poll(&event, 1, -1), 1);
-      rt::MainQueue::drain();
-    }
-    thread.join();
-  }
-};
-
-template <class Kind>
-class QueueConformance : public testing::Test {
+class QueueConformance : public testing::TestWithParam<Kind> {
  protected:
   QueueConformance() { GTEST_FLAG_SET(death_test_style, "threadsafe"); }
 
   /// Runs `body(queue)` while the queue is being served, and until all that it has queued has run.
-  template <class Body>
-  void serve(Body body) {
-    Kind::serveDuring([&] {
-      const Ref<Queue> queue = Kind::make();
+  static void serve(const std::function<void(Queue&)>& body) {
+    GetParam().serveDuring([&] {
+      const Ref<Queue> queue = GetParam().make();
       body(*queue);
       queue->barrierSync();
     });
   }
 
-  template <class Body>
-  static void inThreads(int count, Body body) {
+  static void inThreads(int count, const std::function<void(int)>& body) {
     std::vector<std::thread> threads;
     threads.reserve(static_cast<std::size_t>(count));
     for (int i = 0; i < count; ++i) threads.emplace_back([&body, i] { body(i); });
@@ -101,43 +100,46 @@ class QueueConformance : public testing::Test {
   }
 };
 
-class NameOfKind {
- public:
-  template <class Kind>
-  static std::string GetName(int) {
-    if (std::is_same_v<Kind, SerialQueue>) return "Serial";
-    return std::is_same_v<Kind, RunMainQueue> ? "Main" : "PolledMain";
-  }
+using QueueConformanceDeathTest = QueueConformance;
+
+const Kind kKinds[] = {
+    {"Serial", "conformance"_s, 5, makeSerialQueue, runBody},
+    {"Main", rt::MainQueue::kLabel, 0, mainQueue, runMainQueueDuring},
+    {"PolledMain", rt::MainQueue::kLabel, 0, mainQueue, pollMainQueueDuring},
 };
 
-using Kinds = testing::Types<SerialQueue, RunMainQueue, PolledMainQueue>;
-TYPED_TEST_SUITE(QueueConformance, Kinds, NameOfKind);
+std::string nameOf(const testing::TestParamInfo<Kind>& info) {
+  return info.param.name;
+}
 
-TYPED_TEST(QueueConformance, BarrierOfAnEmptyQueueReturns) {
-  this->serve([](Queue& queue) {
+INSTANTIATE_TEST_SUITE_P(Each, QueueConformance, testing::ValuesIn(kKinds), nameOf);
+INSTANTIATE_TEST_SUITE_P(Each, QueueConformanceDeathTest, testing::ValuesIn(kKinds), nameOf);
+
+TEST_P(QueueConformance, BarrierOfAnEmptyQueueReturns) {
+  serve([](Queue& queue) {
     queue.barrierSync();
     queue.barrierSync([] {});
   });
 }
 
-TYPED_TEST(QueueConformance, RunsATaskOnce) {
+TEST_P(QueueConformance, RunsATaskOnce) {
   int runs = 0;
-  this->serve([&](Queue& queue) { queue.async([&] { ++runs; }); });
+  serve([&](Queue& queue) { queue.async([&] { ++runs; }); });
   EXPECT_EQ(runs, 1);
 }
 
-TYPED_TEST(QueueConformance, KeepsTheOrder) {
+TEST_P(QueueConformance, KeepsTheOrder) {
   constexpr int kTasks = 1000;
   std::vector<int> order;
-  this->serve([&](Queue& queue) {
+  serve([&](Queue& queue) {
     for (int i = 0; i < kTasks; ++i) queue.async([&order, i] { order.push_back(i); });
   });
   ASSERT_EQ(order.size(), std::size_t{kTasks});
   for (int i = 0; i < kTasks; ++i) ASSERT_EQ(order[static_cast<std::size_t>(i)], i);
 }
 
-TYPED_TEST(QueueConformance, SyncRunsAfterWhatIsQueued) {
-  this->serve([](Queue& queue) {
+TEST_P(QueueConformance, SyncRunsAfterWhatIsQueued) {
+  serve([](Queue& queue) {
     int count = 0;
     for (int round = 1; round <= 200; ++round) {
       queue.async([&] { ++count; });
@@ -146,8 +148,8 @@ TYPED_TEST(QueueConformance, SyncRunsAfterWhatIsQueued) {
   });
 }
 
-TYPED_TEST(QueueConformance, BarrierWaitsForAllBefore) {
-  this->serve([](Queue& queue) {
+TEST_P(QueueConformance, BarrierWaitsForAllBefore) {
+  serve([](Queue& queue) {
     std::atomic<int> count = 0;
     for (int round = 1; round <= 100; ++round) {
       for (int i = 0; i < 10; ++i) queue.async([&] { ++count; });
@@ -157,8 +159,8 @@ TYPED_TEST(QueueConformance, BarrierWaitsForAllBefore) {
   });
 }
 
-TYPED_TEST(QueueConformance, SyncReturnsWhatTheTaskReturns) {
-  this->serve([](Queue& queue) {
+TEST_P(QueueConformance, SyncReturnsWhatTheTaskReturns) {
+  serve([](Queue& queue) {
     std::string text = "changed in place";
     EXPECT_EQ(queue.sync([] { return 42; }), 42);
     EXPECT_EQ(queue.barrierSync([] { return std::string("moved"); }), "moved");
@@ -172,8 +174,8 @@ TYPED_TEST(QueueConformance, SyncReturnsWhatTheTaskReturns) {
   });
 }
 
-TYPED_TEST(QueueConformance, SyncThrowsWhatTheTaskThrows) {
-  this->serve([](Queue& queue) {
+TEST_P(QueueConformance, SyncThrowsWhatTheTaskThrows) {
+  serve([](Queue& queue) {
     try {
       queue.sync([]() -> int { throw std::out_of_range("of the task"); });
       ADD_FAILURE() << "nothing was thrown";
@@ -184,8 +186,8 @@ TYPED_TEST(QueueConformance, SyncThrowsWhatTheTaskThrows) {
   });
 }
 
-TYPED_TEST(QueueConformance, SyncThrowsAlsoWhenTheQueueIsBusy) {
-  this->serve([](Queue& queue) {
+TEST_P(QueueConformance, SyncThrowsAlsoWhenTheQueueIsBusy) {
+  serve([](Queue& queue) {
     for (int round = 0; round < 50; ++round) {
       queue.async([] { std::this_thread::yield(); });
       EXPECT_THROW(queue.sync([] { throw std::runtime_error("of the task"); }), std::runtime_error);
@@ -193,37 +195,36 @@ TYPED_TEST(QueueConformance, SyncThrowsAlsoWhenTheQueueIsBusy) {
   });
 }
 
-TYPED_TEST(QueueConformance, TasksMayOnlyBeMovable) {
+TEST_P(QueueConformance, TasksMayOnlyBeMovable) {
   int value = 0;
-  this->serve(
-      [&](Queue& queue) { queue.async([&value, owned = std::make_unique<int>(5)] { value = *owned; }); });
+  serve([&](Queue& queue) { queue.async([&value, owned = std::make_unique<int>(5)] { value = *owned; }); });
   EXPECT_EQ(value, 5);
 }
 
 // Invariant: a task has gone, with all that it holds, when the next one starts.
-TYPED_TEST(QueueConformance, ATaskIsDestroyedOnceItHasRun) {
-  this->serve([](Queue& queue) {
+TEST_P(QueueConformance, ATaskIsDestroyedOnceItHasRun) {
+  serve([](Queue& queue) {
     auto held = std::make_shared<int>(0);
     queue.async([held] {});
     EXPECT_EQ(queue.sync([&] { return held.use_count(); }), 1);
   });
 }
 
-TYPED_TEST(QueueConformance, NothingIsQueuedWhenTheTaskCannotBeCopied) {
+TEST_P(QueueConformance, NothingIsQueuedWhenTheTaskCannotBeCopied) {
   struct Uncopyable {
     Uncopyable() = default;
     Uncopyable(const Uncopyable&) { throw std::bad_alloc(); }
     void operator()() const { ADD_FAILURE() << "was queued"; }
   };
-  this->serve([](Queue& queue) {
+  serve([](Queue& queue) {
     const Uncopyable task;
     EXPECT_THROW(queue.async(task), std::bad_alloc);
   });
 }
 
-TYPED_TEST(QueueConformance, TasksThatTasksQueueComeAfterWhatIsQueued) {
+TEST_P(QueueConformance, TasksThatTasksQueueComeAfterWhatIsQueued) {
   std::vector<int> order;
-  this->serve([&](Queue& queue) {
+  serve([&](Queue& queue) {
     queue.sync([&] {
       queue.async([&] {
         order.push_back(1);
@@ -236,7 +237,7 @@ TYPED_TEST(QueueConformance, TasksThatTasksQueueComeAfterWhatIsQueued) {
   EXPECT_EQ(order, (std::vector<int>{1, 2, 3}));
 }
 
-TYPED_TEST(QueueConformance, TasksQueueTasksManyTimesOver) {
+TEST_P(QueueConformance, TasksQueueTasksManyTimesOver) {
   constexpr int kTasks = 2000;
   int count = 0;
   std::latch allHaveRun(1);
@@ -252,7 +253,7 @@ TYPED_TEST(QueueConformance, TasksQueueTasksManyTimesOver) {
       }
     }
   };
-  this->serve([&](Queue& queue) {
+  serve([&](Queue& queue) {
     queue.async(Next{queue, count, allHaveRun});
     allHaveRun.wait();
   });
@@ -260,15 +261,15 @@ TYPED_TEST(QueueConformance, TasksQueueTasksManyTimesOver) {
 }
 
 // Invariant: at most one task is inside at any time, whoever queues and however.
-TYPED_TEST(QueueConformance, TasksDoNotOverlap) {
+TEST_P(QueueConformance, TasksDoNotOverlap) {
   std::atomic<int> inside = 0;
   const auto task = [&] {
     EXPECT_EQ(inside.fetch_add(1), 0);
     std::this_thread::yield();
     EXPECT_EQ(inside.fetch_sub(1), 1);
   };
-  this->serve([&](Queue& queue) {
-    this->inThreads(4, [&](int thread) {
+  serve([&](Queue& queue) {
+    inThreads(4, [&](int thread) {
       for (int i = 0; i < 200; ++i) {
         if ((i + thread) % 3 == 0) {
           queue.sync(task);
@@ -282,13 +283,13 @@ TYPED_TEST(QueueConformance, TasksDoNotOverlap) {
 
 // Invariant: `sum` and `last` are plain data that only tasks touch, so each task sees what the one before
 // it has left there, on whichever thread; the thread sanitizer sees no race.
-TYPED_TEST(QueueConformance, TasksSeeWhatTasksHaveWritten) {
+TEST_P(QueueConformance, TasksSeeWhatTasksHaveWritten) {
   constexpr int kThreads = 4;
   constexpr int kRounds = 250;
   long sum = 0;
   std::string last;
-  this->serve([&](Queue& queue) {
-    this->inThreads(kThreads, [&](int thread) {
+  serve([&](Queue& queue) {
+    inThreads(kThreads, [&](int thread) {
       for (int i = 0; i < kRounds; ++i) {
         queue.async([&, text = std::to_string(thread) + " in a string of its own"] {
           sum += 1;
@@ -307,12 +308,12 @@ TYPED_TEST(QueueConformance, TasksSeeWhatTasksHaveWritten) {
 }
 
 // Invariant: what one thread queues runs in that thread's order, whatever the other threads do.
-TYPED_TEST(QueueConformance, EveryThreadsOrderIsKept) {
+TEST_P(QueueConformance, EveryThreadsOrderIsKept) {
   constexpr int kThreads = 8;
   constexpr int kTasks = 1000;
   std::vector<int> next(kThreads, 0);
-  this->serve([&](Queue& queue) {
-    this->inThreads(kThreads, [&](int thread) {
+  serve([&](Queue& queue) {
+    inThreads(kThreads, [&](int thread) {
       for (int i = 0; i < kTasks; ++i) {
         queue.async([&mine = next[static_cast<std::size_t>(thread)], i] {
           ASSERT_EQ(mine, i);
@@ -326,8 +327,8 @@ TYPED_TEST(QueueConformance, EveryThreadsOrderIsKept) {
 
 // Against a model: a thread that queues and waits in a random order sees the queue as if its tasks had run
 // at once.
-TYPED_TEST(QueueConformance, IsLikeRunningTasksAtOnceForOneThread) {
-  this->serve([](Queue& queue) {
+TEST_P(QueueConformance, IsLikeRunningTasksAtOnceForOneThread) {
+  serve([](Queue& queue) {
     std::mt19937 random(20240611);
     std::vector<unsigned> ours;
     std::vector<unsigned> model;
@@ -358,33 +359,33 @@ TYPED_TEST(QueueConformance, IsLikeRunningTasksAtOnceForOneThread) {
   });
 }
 
-TYPED_TEST(QueueConformance, LabelIsTheCurrentOneInTasksOnly) {
+TEST_P(QueueConformance, LabelIsTheCurrentOneInTasksOnly) {
   EXPECT_EQ(Queue::currentLabel(), ""_s);
-  this->serve([](Queue& queue) {
-    EXPECT_EQ(queue.label(), TypeParam::kLabel);
+  serve([](Queue& queue) {
+    EXPECT_EQ(queue.label(), GetParam().label);
     EXPECT_EQ(Queue::currentLabel(), ""_s);
     rt::String inAsync;
     queue.async([&] { inAsync = Queue::currentLabel(); });
-    EXPECT_EQ(queue.sync([] { return Queue::currentLabel(); }), TypeParam::kLabel);
-    EXPECT_EQ(inAsync, TypeParam::kLabel);
+    EXPECT_EQ(queue.sync([] { return Queue::currentLabel(); }), GetParam().label);
+    EXPECT_EQ(inAsync, GetParam().label);
     EXPECT_THROW(queue.sync([] { throw std::runtime_error("of the task"); }), std::runtime_error);
     EXPECT_EQ(Queue::currentLabel(), ""_s);
   });
   EXPECT_EQ(Queue::currentLabel(), ""_s);
 }
 
-TYPED_TEST(QueueConformance, LabelOfTheInnerQueueIsTheCurrentOne) {
-  this->serve([](Queue& queue) {
+TEST_P(QueueConformance, LabelOfTheInnerQueueIsTheCurrentOne) {
+  serve([](Queue& queue) {
     const Ref<Queue> inner = rt::make<Queue>("inner"_s);
     queue.sync([&] {
       EXPECT_EQ(inner->sync([] { return Queue::currentLabel(); }), "inner"_s);
-      EXPECT_EQ(Queue::currentLabel(), TypeParam::kLabel);
+      EXPECT_EQ(Queue::currentLabel(), GetParam().label);
     });
   });
 }
 
-TYPED_TEST(QueueConformance, KnowsItsOwnTasks) {
-  this->serve([](Queue& queue) {
+TEST_P(QueueConformance, KnowsItsOwnTasks) {
+  serve([](Queue& queue) {
     const Ref<Queue> other = rt::make<Queue>("other"_s);
     EXPECT_FALSE(queue.isCurrent());
     queue.sync([&] {
@@ -397,9 +398,9 @@ TYPED_TEST(QueueConformance, KnowsItsOwnTasks) {
 }
 
 #if !defined(__APPLE__)
-TYPED_TEST(QueueConformance, AsyncTasksRunWithTheNicenessOfTheirClass) {
+TEST_P(QueueConformance, AsyncTasksRunWithTheNicenessOfTheirClass) {
   const int ofProcess = getpriority(PRIO_PROCESS, static_cast<id_t>(getpid()));
-  this->serve([&](Queue& queue) {
+  serve([&](Queue& queue) {
     std::latch hasRun(1);
     int ofTask = 0;
     queue.async([&] {
@@ -407,17 +408,17 @@ TYPED_TEST(QueueConformance, AsyncTasksRunWithTheNicenessOfTheirClass) {
       hasRun.count_down();
     });
     hasRun.wait();
-    EXPECT_EQ(ofTask, std::min(19, ofProcess + TypeParam::kNiceness));
+    EXPECT_EQ(ofTask, std::min(19, ofProcess + GetParam().niceness));
   });
 }
 #endif
 
 // Invariant: a queue that nobody refers to any more lives until its tasks have run.
-TYPED_TEST(QueueConformance, ReleasedWithTasksItRunsThemAll) {
-  TypeParam::serveDuring([] {
+TEST_P(QueueConformance, ReleasedWithTasksItRunsThemAll) {
+  GetParam().serveDuring([] {
     std::latch mayGoOn(1);
     std::latch allHaveRun(100);
-    Ref<Queue> queue = TypeParam::make();
+    Ref<Queue> queue = GetParam().make();
     queue->async([&] { mayGoOn.wait(); });
     for (int i = 0; i < 100; ++i) queue->async([&] { allHaveRun.count_down(); });
     queue = nullptr;
@@ -426,16 +427,16 @@ TYPED_TEST(QueueConformance, ReleasedWithTasksItRunsThemAll) {
   });
 }
 
-TYPED_TEST(QueueConformance, ATaskMayReleaseItsQueue) {
-  TypeParam::serveDuring([] {
-    Ref<Queue> queue = TypeParam::make();
+TEST_P(QueueConformance, ATaskMayReleaseItsQueue) {
+  GetParam().serveDuring([] {
+    Ref<Queue> queue = GetParam().make();
     std::latch hasRun(2);
     queue->async([&] { hasRun.count_down(); });
     Queue& alias = *queue;
     alias.sync([&] {
       queue->async([&] { hasRun.count_down(); });
       queue = nullptr;
-      EXPECT_EQ(Queue::currentLabel(), TypeParam::kLabel);
+      EXPECT_EQ(Queue::currentLabel(), GetParam().label);
     });
     hasRun.wait();
   });
@@ -443,10 +444,10 @@ TYPED_TEST(QueueConformance, ATaskMayReleaseItsQueue) {
 
 constinit std::atomic<int> uncaughtCount = 0;
 
-TYPED_TEST(QueueConformance, UncaughtExceptionsGoToTheHandler) {
+TEST_P(QueueConformance, UncaughtExceptionsGoToTheHandler) {
   const auto before = Queue::setUncaughtExceptionHandler([](const Queue& queue) {
-    EXPECT_EQ(queue.label(), TypeParam::kLabel);
-    EXPECT_EQ(Queue::currentLabel(), TypeParam::kLabel);
+    EXPECT_EQ(queue.label(), GetParam().label);
+    EXPECT_EQ(Queue::currentLabel(), GetParam().label);
     try {
       std::rethrow_exception(std::current_exception());
     } catch (const std::runtime_error& exception) {
@@ -457,7 +458,7 @@ TYPED_TEST(QueueConformance, UncaughtExceptionsGoToTheHandler) {
   EXPECT_EQ(before, nullptr);
   uncaughtCount = 0;
   bool hasGoneOn = false;
-  this->serve([&](Queue& queue) {
+  serve([&](Queue& queue) {
     queue.async([] { throw std::runtime_error("of the task"); });
     queue.async([&] { hasGoneOn = true; });
   });
@@ -466,9 +467,9 @@ TYPED_TEST(QueueConformance, UncaughtExceptionsGoToTheHandler) {
   EXPECT_NE(Queue::setUncaughtExceptionHandler(nullptr), nullptr);
 }
 
-TYPED_TEST(QueueConformance, AsyncAllocatesOnceAndSyncNever) {
+TEST_P(QueueConformance, AsyncAllocatesOnceAndSyncNever) {
   if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
-  this->serve([](Queue& queue) {
+  serve([](Queue& queue) {
     queue.async([] {});
     queue.barrierSync();  // What is made once has been made.
     std::latch mayGoOn(1);
@@ -484,45 +485,39 @@ TYPED_TEST(QueueConformance, AsyncAllocatesOnceAndSyncNever) {
   });
 }
 
-template <class Kind>
-using QueueConformanceDeathTest = QueueConformance<Kind>;
-TYPED_TEST_SUITE(QueueConformanceDeathTest, Kinds, NameOfKind);
-
 std::string textOfRefusal(const rt::String& label) {
   return "rt: sync on the queue \"" + std::string(label.view()) + "\" from one of its own tasks";
 }
 
-TYPED_TEST(QueueConformanceDeathTest, SyncFromASyncTaskIsRefused) {
-  EXPECT_DEATH(this->serve([](Queue& queue) {
-    queue.sync([&]() RT_NO_THREAD_SAFETY_ANALYSIS { queue.sync([] {}); });
-  }),
-               textOfRefusal(TypeParam::kLabel));
-}
-
-TYPED_TEST(QueueConformanceDeathTest, BarrierFromAnAsyncTaskIsRefused) {
-  EXPECT_DEATH(this->serve([](Queue& queue) { queue.async([&] { queue.barrierSync(); }); }),
-               textOfRefusal(TypeParam::kLabel));
-}
-
-TYPED_TEST(QueueConformanceDeathTest, SyncFromWithinAnotherQueuesTaskIsRefused) {
-  EXPECT_DEATH(this->serve([](Queue& queue) {
-    queue.sync([&] { rt::make<Queue>("other"_s)->sync([&] { queue.sync([] {}); }); });
-  }),
-               textOfRefusal(TypeParam::kLabel));
-}
-
-TYPED_TEST(QueueConformanceDeathTest, UncaughtExceptionsEndTheProgram) {
+TEST_P(QueueConformanceDeathTest, SyncFromASyncTaskIsRefused) {
   EXPECT_DEATH(
-      this->serve([](Queue& queue) { queue.async([] { throw std::runtime_error("what it says"); }); }),
-      "rt: an exception has left a task of the queue \"" + std::string(TypeParam::kLabel.view()) +
-          "\": what it says");
-  EXPECT_DEATH(this->serve([](Queue& queue) { queue.async([] { throw 1; }); }),
-               "\"" + std::string(TypeParam::kLabel.view()) + "\": something that is no std::exception");
+      serve([](Queue& queue) { queue.sync([&]() RT_NO_THREAD_SAFETY_ANALYSIS { queue.sync([] {}); }); }),
+      textOfRefusal(GetParam().label));
 }
 
-TYPED_TEST(QueueConformanceDeathTest, AssertIsCurrentOutsideEndsTheProgram) {
-  EXPECT_DEATH(this->serve([](Queue& queue) { queue.assertIsCurrent(); }),
-               "rt: outside of the tasks of the queue \"" + std::string(TypeParam::kLabel.view()) + "\"");
+TEST_P(QueueConformanceDeathTest, BarrierFromAnAsyncTaskIsRefused) {
+  EXPECT_DEATH(serve([](Queue& queue) { queue.async([&] { queue.barrierSync(); }); }),
+               textOfRefusal(GetParam().label));
+}
+
+TEST_P(QueueConformanceDeathTest, SyncFromWithinAnotherQueuesTaskIsRefused) {
+  EXPECT_DEATH(serve([](Queue& queue) {
+                 queue.sync([&] { rt::make<Queue>("other"_s)->sync([&] { queue.sync([] {}); }); });
+               }),
+               textOfRefusal(GetParam().label));
+}
+
+TEST_P(QueueConformanceDeathTest, UncaughtExceptionsEndTheProgram) {
+  EXPECT_DEATH(serve([](Queue& queue) { queue.async([] { throw std::runtime_error("what it says"); }); }),
+               "rt: an exception has left a task of the queue \"" + std::string(GetParam().label.view()) +
+                   "\": what it says");
+  EXPECT_DEATH(serve([](Queue& queue) { queue.async([] { throw 1; }); }),
+               "\"" + std::string(GetParam().label.view()) + "\": something that is no std::exception");
+}
+
+TEST_P(QueueConformanceDeathTest, AssertIsCurrentOutsideEndsTheProgram) {
+  EXPECT_DEATH(serve([](Queue& queue) { queue.assertIsCurrent(); }),
+               "rt: outside of the tasks of the queue \"" + std::string(GetParam().label.view()) + "\"");
 }
 
 }  // namespace

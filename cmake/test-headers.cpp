@@ -1,0 +1,1 @@
+// Compiled for the headers that the tests share; see Testing.cmake.

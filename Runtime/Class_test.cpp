@@ -9,22 +9,9 @@
 
 #include "AllocationCount.h"
 #include "Runtime/Ref.h"
+#include "tests/TestClocks.h"
 
 namespace {
-
-struct Clock : rt::Protocol<Clock> {
-  virtual int now() const = 0;
-
- protected:
-  ~Clock() = default;
-};
-
-struct AlarmClock : rt::Protocol<AlarmClock, Clock> {
-  virtual int alarm() const = 0;
-
- protected:
-  ~AlarmClock() = default;
-};
 
 struct Stopwatch : rt::Protocol<Stopwatch, Clock> {
   virtual int elapsed() const = 0;

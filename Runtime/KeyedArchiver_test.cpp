@@ -4,10 +4,7 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
-#include <filesystem>
-#include <fstream>
 #include <functional>
-#include <iterator>
 #include <limits>
 #include <random>
 #include <stdexcept>
@@ -605,9 +602,7 @@ class KeyedArchiveAndPython : public PlistlibTest {};
 TEST_F(KeyedArchiveAndPython, PythonReadsOurs) {
   KeyedArchiver archiver;
   archiver.encodeObject(rt::Array::of(rt::make<Tag>("ü"_s), rt::Number::of(7)), "kTagsID");
-  const Bytes bytes = archiver.encodedData();
-  std::ofstream(path(), std::ios::binary)
-      .write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
+  writeFile(archiver.encodedData());
   EXPECT_EQ(python(R"(
 archive = plistlib.load(open(path, 'rb'))
 objects = archive['$objects']
@@ -635,11 +630,8 @@ plistlib.dump({'$archiver': 'PythonArchiver', '$version': 100000, '$top': {'root
     2.5,
     2**64 - 1,
 ]}, open(path, 'wb'), fmt=plistlib.FMT_BINARY))");
-  std::ifstream stream(path(), std::ios::binary);
-  const std::string content{std::istreambuf_iterator<char>(stream), {}};
   rt::String error;
-  const Ref<Tag> tag =
-      KeyedUnarchiver::unarchivedObjectOfClass<Tag>(std::as_bytes(std::span(content)), &error);
+  const Ref<Tag> tag = KeyedUnarchiver::unarchivedObjectOfClass<Tag>(readFile(), &error);
   ASSERT_TRUE(tag) << error.view();
   const Ref<Tag> expected = rt::make<Tag>(
       "from Python"_s, rt::Array::of("from Python"_s, rt::Number::of(2.5),

@@ -5,11 +5,8 @@
 
 #include <bit>
 #include <cstdio>
-#include <filesystem>
-#include <fstream>
 #include <functional>
 #include <initializer_list>
-#include <iterator>
 #include <limits>
 #include <random>
 
@@ -334,9 +331,7 @@ TEST_F(PropertyListAndPython, PythonReadsOurs) {
   add("array", PropertyList::Array{0, 1});
   for (int i = 0; i < 300; ++i) list.add(std::int64_t{i});  // so that references take two bytes
   list.root = list.add(root);
-  const Bytes bytes = list.encoded();
-  std::ofstream(path(), std::ios::binary)
-      .write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
+  writeFile(list.encoded());
 
   EXPECT_EQ(
       python("print(ascii(plistlib.load(open(path, 'rb'))))"),
@@ -351,9 +346,7 @@ import datetime
 plistlib.dump({'yes': True, 'int': -1, 'large': 2**64 - 1, 'real': 0.5, 'date': datetime.datetime(2001, 1, 2),
     'data': b'\x00\x01', 'text': '\xfc\U0001f600', 'uid': plistlib.UID(70000),
     'array': list(range(500))}, open(path, 'wb'), fmt=plistlib.FMT_BINARY))");
-  std::ifstream stream(path(), std::ios::binary);
-  const std::string content{std::istreambuf_iterator<char>(stream), {}};
-  const PropertyList list = PropertyList::decoded(std::as_bytes(std::span(content)));
+  const PropertyList list = PropertyList::decoded(readFile());
 
   const auto at = [&list](std::string_view key) { return list.values.at(list.find(list.root, key).value()); };
   EXPECT_EQ(at("yes"), PropertyList::Value(true));

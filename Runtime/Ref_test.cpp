@@ -11,22 +11,9 @@
 #include <vector>
 
 #include "AllocationCount.h"
+#include "tests/TestClocks.h"
 
 namespace {
-
-struct Clock : rt::Protocol<Clock> {
-  virtual int now() const = 0;
-
- protected:
-  ~Clock() = default;
-};
-
-struct AlarmClock : rt::Protocol<AlarmClock, Clock> {
-  virtual int alarm() const = 0;
-
- protected:
-  ~AlarmClock() = default;
-};
 
 struct Closing : rt::Protocol<Closing> {
  protected:

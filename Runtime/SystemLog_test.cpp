@@ -1,5 +1,6 @@
-// The system log against the machine's journald, run in a private root, and against sockets and streams
-// that behave as daemons and terminals do. The suite runs as root and as an ordinary user.
+// The system log against the machine's journald, run in a private root. The suite runs as root and as an
+// ordinary user. Where no journal is, and daemons that do not read, are in SystemLog_fallback_test.cpp and
+// SystemLog_stuck_test.cpp.
 
 #include "Runtime/SystemLog.h"
 
@@ -7,23 +8,16 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/socket.h>
-#include <sys/stat.h>
-#include <sys/time.h>
 #include <sys/un.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <array>
 #include <atomic>
 #include <cerrno>
-#include <chrono>
-#include <csignal>
-#include <cstring>
-#include <filesystem>
-#include <functional>
+#include <cstddef>
+#include <cstdint>
 #include <random>
-#include <regex>
 #include <set>
 #include <string>
 #include <thread>
@@ -33,109 +27,16 @@
 #include "tests/AllocationCount.h"
 #include "tests/PrivateJournal.h"
 #include "tests/PrivateRoot.h"
+#include "tests/Sanitizers.h"
 #include "tests/StandardErrorPipe.h"
+#include "tests/SystemLogTest.h"
 
 namespace {
 
 using namespace rt::literals;
-namespace fs = std::filesystem;
 using testing::ElementsAre;
 using testing::IsEmpty;
 using Type = rt::SystemLog::Type;
-
-constexpr const char* kJournalSocket = "/run/systemd/journal/socket";
-constexpr const char* kClassicSocket = "/dev/log";
-
-// Why there is no private journal; empty when there is one.
-std::string refusal;
-
-const rt::SystemLog& testLog() {
-  static const rt::SystemLog log("com.example.test"_s, "unit"_s);
-  return log;
-}
-
-// The descriptors of this process that are sockets.
-std::vector<int> sockets() {
-  std::vector<int> found;
-  for (const fs::directory_entry& entry : fs::directory_iterator("/proc/self/fd")) {
-    const int descriptor = std::stoi(entry.path().filename());
-    struct stat status{};
-    if (fstat(descriptor, &status) == 0 && S_ISSOCK(status.st_mode)) found.push_back(descriptor);
-  }
-  return found;
-}
-
-// Makes the log start as in a new process.
-void closeSockets() {
-  for (const int descriptor : sockets()) close(descriptor);
-}
-
-std::uint64_t droppedBefore = 0;
-
-std::uint64_t dropped() {
-  return rt::SystemLog::droppedCount() - droppedBefore;
-}
-
-std::vector<PrivateJournal::Entry> testEntries(const PrivateJournal& journal) {
-  return journal.entries("SUBSYSTEM=com.example.test");
-}
-
-std::vector<std::string> messages(const PrivateJournal& journal) {
-  std::vector<std::string> all;
-  for (PrivateJournal::Entry& entry : testEntries(journal)) all.push_back(entry["MESSAGE"]);
-  return all;
-}
-
-// How many dropped entries the journal tells of.
-std::uint64_t reportedDropped(const PrivateJournal& journal) {
-  std::uint64_t sum = 0;
-  for (PrivateJournal::Entry& entry : journal.entries("SUBSYSTEM=rt")) sum += std::stoull(entry["DROPPED"]);
-  return sum;
-}
-
-// A classic daemon's socket.
-class ClassicSocket {
- public:
-  ClassicSocket() : descriptor_(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0)) {
-    sockaddr_un address{};
-    address.sun_family = AF_UNIX;
-    std::strncpy(address.sun_path, kClassicSocket, sizeof address.sun_path - 1);
-    EXPECT_EQ(bind(descriptor_, reinterpret_cast<const sockaddr*>(&address), sizeof address), 0);
-  }
-  ClassicSocket(const ClassicSocket&) = delete;
-  ClassicSocket& operator=(const ClassicSocket&) = delete;
-  ~ClassicSocket() {
-    close(descriptor_);
-    fs::remove(kClassicSocket);
-  }
-
-  // The packets that have come.
-  std::vector<std::string> packets() {
-    std::vector<std::string> all;
-    std::string buffer(65536, '\0');
-    for (ssize_t length; (length = recv(descriptor_, buffer.data(), buffer.size(), MSG_DONTWAIT)) >= 0;) {
-      all.emplace_back(buffer, 0, static_cast<std::size_t>(length));
-    }
-    return all;
-  }
-
- private:
-  int descriptor_;
-};
-
-class SystemLogTest : public testing::Test {
- protected:
-  void SetUp() override {
-    if (!PrivateJournal::entered()) GTEST_SKIP() << refusal;
-    fs::remove(kClassicSocket);
-    // What earlier cases left untold is told now.
-    if (rt::SystemLog::droppedCount() != 0) {
-      const StandardErrorPipe standardError;
-      testLog().write(Type::info, "ended");
-    }
-    droppedBefore = rt::SystemLog::droppedCount();
-  }
-};
 
 TEST_F(SystemLogTest, OpensNothingUntilTheFirstEntry) {
   closeSockets();
@@ -360,11 +261,9 @@ TEST_F(SystemLogTest, LogsOnInTheChildOfAFork) {
 
 // Invariant: a child logs whatever the threads of its parent were doing when it was forked.
 TEST_F(SystemLogTest, LogsOnInTheChildrenOfAProcessWhoseThreadsWrite) {
-#if defined(__has_feature)
-#if __has_feature(thread_sanitizer)
-  GTEST_SKIP() << "the thread sanitizer's own locks may be held in the child of a fork";
-#endif
-#endif
+  if (RT_TEST_THREAD_SANITIZER) {
+    GTEST_SKIP() << "the thread sanitizer's own locks may be held in the child of a fork";
+  }
   PrivateJournal journal;
   journal.start();
   std::atomic<bool> isEnding = false;
@@ -409,275 +308,6 @@ TEST_F(SystemLogTest, LogsOnInTheChildrenOfAProcessWhoseThreadsWrite) {
   for (const std::string& message : messages(journal)) ++(message == "child" ? ofChildren : ofParent);
   EXPECT_EQ(ofChildren, kChildren);
   EXPECT_EQ(ofParent + dropped(), sent);
-}
-
-TEST_F(SystemLogTest, WritesToTheClassicSocketWhereNoJournalIs) {
-  ClassicSocket socket;
-  testLog().write(Type::error, "no\nway\x1b[0m \xc3\xa9");
-  const std::vector<std::string> packets = socket.packets();
-  ASSERT_EQ(packets.size(), 1U);
-  const std::regex format("<11>(Jan|Feb|Mar|Apr|May|Jun|Jul|Aug|Sep|Oct|Nov|Dec) [ 1-3][0-9] [0-9:]{8} (.*)");
-  std::smatch match;
-  ASSERT_TRUE(std::regex_match(packets[0], match, format)) << packets[0];
-  EXPECT_EQ(match[2].str(), "SystemLog_test[" + std::to_string(getpid()) +
-                                "]: [com.example.test:unit] no\\nway\\x1b[0m \xc3\xa9");
-  EXPECT_EQ(dropped(), 0U);
-}
-
-TEST_F(SystemLogTest, WritesSeverityOfUserMessagesToTheClassicSocket) {
-  ClassicSocket socket;
-  std::vector<std::string> heads;
-  for (const Type type : {Type::debug, Type::info, Type::error, Type::fault}) testLog().write(type, "x");
-  for (const std::string& packet : socket.packets()) heads.push_back(packet.substr(0, packet.find('>') + 1));
-  EXPECT_THAT(heads, ElementsAre("<15>", "<14>", "<11>", "<10>"));
-}
-
-TEST_F(SystemLogTest, CutsALongEntryIntoClassicPacketsBetweenCharacters) {
-  ClassicSocket socket;
-  std::string text = "x";
-  while (text.size() < 5000) text += "\xe2\x82\xac";
-  testLog().write(Type::info, text);
-  std::string whole;
-  const std::vector<std::string> packets = socket.packets();
-  EXPECT_EQ(packets.size(), 6U);
-  for (const std::string& packet : packets) {
-    EXPECT_LE(packet.size(), 1024U);
-    const std::string part = packet.substr(packet.find("]: ") + 3);
-    EXPECT_NE(rt::String::fromUTF8(part), nullptr);
-    whole += part;
-  }
-  EXPECT_EQ(whole, "[com.example.test:unit] " + text);
-}
-
-// journald itself is a daemon that listens for classic packets.
-TEST_F(SystemLogTest, IsUnderstoodByAClassicDaemon) {
-  PrivateJournal journal;
-  journal.start();
-  fs::remove(kJournalSocket);
-  fs::create_symlink("/run/systemd/journal/dev-log", kClassicSocket);
-  testLog().write(Type::fault, "classic");
-  std::vector<PrivateJournal::Entry> entries = journal.entries("SYSLOG_IDENTIFIER=SystemLog_test");
-  ASSERT_EQ(entries.size(), 1U);
-  EXPECT_EQ(entries[0]["_TRANSPORT"], "syslog");
-  EXPECT_EQ(entries[0]["MESSAGE"], "[com.example.test:unit] classic");
-  EXPECT_EQ(entries[0]["PRIORITY"], "2");
-  EXPECT_EQ(entries[0]["SYSLOG_FACILITY"], "1");
-  EXPECT_EQ(entries[0]["SYSLOG_PID"], std::to_string(getpid()));
-  EXPECT_TRUE(entries[0].contains("SYSLOG_TIMESTAMP"));
-}
-
-TEST_F(SystemLogTest, WritesALineToStandardErrorWhereNobodyListens) {
-  StandardErrorPipe standardError;
-  testLog().write(Type::error, std::string_view("a\tb\0c\nd\x7f", 8));
-  rt::SystemLog(nullptr, nullptr).write(Type::debug, "e");
-  const std::string sender = "SystemLog_test[" + std::to_string(getpid()) + "] ";
-  EXPECT_EQ(standardError.text(),
-            sender + "error: [com.example.test:unit] a\\tb\\x00c\\nd\\x7f\n" + sender + "debug: e\n");
-  EXPECT_EQ(dropped(), 0U);
-}
-
-TEST_F(SystemLogTest, WritesALongLineToStandardErrorWhole) {
-  StandardErrorPipe standardError;
-  const std::string text(50'000, 'l');
-  testLog().write(Type::info, text);
-  EXPECT_THAT(standardError.text(), testing::EndsWith("] " + text + "\n"));
-}
-
-TEST_F(SystemLogTest, CountsWhatStandardErrorDoesNotTake) {
-  {
-    StandardErrorPipe stuck;
-    stuck.fill();
-    testLog().write(Type::info, "stuck");
-    EXPECT_EQ(dropped(), 1U);
-    testLog().write(Type::info, "still stuck");
-    EXPECT_EQ(dropped(), 2U);
-  }
-  {
-    // Its reader is gone; that must not end the process.
-    StandardErrorPipe broken;
-    broken.closeReader();
-    testLog().write(Type::info, "broken");
-    EXPECT_EQ(dropped(), 3U);
-  }
-  {
-    const StandardErrorPipe closed;
-    close(STDERR_FILENO);
-    testLog().write(Type::info, "closed");
-    EXPECT_EQ(dropped(), 4U);
-  }
-  StandardErrorPipe working;
-  testLog().write(Type::info, "working");
-  const std::string sender = "SystemLog_test[" + std::to_string(getpid()) + "] ";
-  EXPECT_EQ(working.text(),
-            sender + "error: [rt:SystemLog] 4 log entries were dropped: nothing took them in time\n" +
-                sender + "info: [com.example.test:unit] working\n");
-}
-
-// A suspended daemon's socket is filled; what does not fit is counted and told of, and all of it takes
-// much less time than it would if each entry waited.
-TEST_F(SystemLogTest, NeitherWaitsForADaemonThatIsStuckNorLosesCount) {
-  PrivateJournal journal;
-  journal.start();
-  testLog().write(Type::info, "before");
-  journal.suspend();
-  std::uint64_t sent = 1;
-  const auto begin = std::chrono::steady_clock::now();
-  while (dropped() < 2000) {
-    testLog().write(Type::info, "stuck");
-    ++sent;
-  }
-  EXPECT_LT(std::chrono::steady_clock::now() - begin, std::chrono::seconds(20));
-  journal.resume();
-  EXPECT_EQ(messages(journal).size() + dropped(), sent);
-  testLog().write(Type::info, "after");
-  ++sent;
-  EXPECT_EQ(messages(journal).size() + dropped(), sent);
-  EXPECT_EQ(messages(journal).back(), "after");
-  EXPECT_EQ(reportedDropped(journal), dropped());
-  std::vector<PrivateJournal::Entry> reports = journal.entries("SUBSYSTEM=rt");
-  ASSERT_EQ(reports.size(), 1U);
-  EXPECT_EQ(reports[0]["MESSAGE"],
-            std::to_string(dropped()) + " log entries were dropped: nothing took them in time");
-  EXPECT_EQ(reports[0]["PRIORITY"], "3");
-  EXPECT_EQ(reports[0]["CATEGORY"], "SystemLog");
-}
-
-TEST_F(SystemLogTest, CountsWhatAClassicDaemonThatIsStuckDoesNotTake) {
-  ClassicSocket socket;
-  std::uint64_t sent = 0;
-  while (dropped() < 2000) {
-    testLog().write(Type::info, "stuck");
-    ++sent;
-  }
-  EXPECT_EQ(socket.packets().size() + dropped(), sent);
-  testLog().write(Type::info, "after");
-  const std::vector<std::string> packets = socket.packets();
-  ASSERT_EQ(packets.size(), 2U);
-  EXPECT_THAT(packets[0], testing::HasSubstr("]: [rt:SystemLog] " + std::to_string(dropped()) +
-                                             " log entries were dropped"));
-  EXPECT_THAT(packets[1], testing::EndsWith("]: [com.example.test:unit] after"));
-}
-
-// An entry that is to become many packets, or a file, waits no longer than any other. The shortest of a few
-// attempts counts, as others may keep the machine busy.
-TEST_F(SystemLogTest, HoldsACallerUpNoLongerThanItSays) {
-  using Clock = std::chrono::steady_clock;
-  const auto longestWait = [&](const std::string& text, const std::function<void()>& unstick) {
-    Clock::duration shortest = std::chrono::hours(1);
-    for (int attempt = 0; attempt < 3; ++attempt) {
-      unstick();
-      const std::uint64_t before = dropped();
-      Clock::duration longest{0};
-      while (dropped() == before) {
-        const Clock::time_point begin = Clock::now();
-        testLog().write(Type::info, text);
-        longest = std::max(longest, Clock::now() - begin);
-      }
-      shortest = std::min(shortest, longest);
-    }
-    return shortest;
-  };
-  const std::string huge(1'000'000, 'h');
-  {
-    ClassicSocket socket;
-    const auto unstick = [&] {
-      socket.packets();
-      testLog().write(Type::info, "taken");  // which ends the state in which nobody waits
-    };
-    for (const std::string& text : {std::string("short"), huge}) {
-      EXPECT_LE(longestWait(text, unstick), rt::SystemLog::kLongestWait) << text.size();
-    }
-  }
-  PrivateJournal journal;
-  journal.start();
-  const auto unstick = [&] {
-    journal.resume();
-    messages(journal);
-    testLog().write(Type::info, "taken");
-    messages(journal);
-    journal.suspend();
-  };
-  for (const std::string& text : {std::string("short"), huge}) {
-    EXPECT_LE(longestWait(text, unstick), rt::SystemLog::kLongestWait) << text.size();
-  }
-  journal.resume();
-}
-
-TEST_F(SystemLogTest, DropsWhatIsTooLargeForADaemonThatIsStuck) {
-  PrivateJournal journal;
-  journal.start();
-  journal.suspend();
-  const std::string huge(1'000'000, 'h');
-  std::uint64_t sent = 0;
-  while (dropped() < 2) {
-    testLog().write(Type::info, huge);
-    ++sent;
-  }
-  journal.resume();
-  EXPECT_EQ(messages(journal).size() + dropped(), sent);
-}
-
-// Signals interrupt what waits; the caller neither waits for ever nor loses an entry without its count.
-TEST_F(SystemLogTest, KeepsToItsBoundWhileSignalsArrive) {
-  PrivateJournal journal;
-  journal.start();
-  journal.suspend();
-  struct sigaction action{};
-  action.sa_handler = [](int) {};
-  sigaction(SIGALRM, &action, nullptr);
-  const itimerval everyMillisecond{{0, 1000}, {0, 1000}};
-  setitimer(ITIMER_REAL, &everyMillisecond, nullptr);
-  std::uint64_t sent = 0;
-  while (dropped() == 0) {
-    testLog().write(Type::info, "interrupted");
-    ++sent;
-  }
-  const itimerval never{};
-  setitimer(ITIMER_REAL, &never, nullptr);
-  journal.resume();
-  EXPECT_EQ(messages(journal).size() + dropped(), sent);
-}
-
-TEST_F(SystemLogTest, TellsAtExitWhatWasDropped) {
-  PrivateJournal journal;
-  journal.start();
-  journal.suspend();
-  StandardErrorPipe standardError;
-  const pid_t child = fork();
-  if (child == 0) {
-    droppedBefore = rt::SystemLog::droppedCount();
-    while (dropped() < 3) testLog().write(Type::info, "stuck");
-    std::exit(0);
-  }
-  int status = -1;
-  ASSERT_EQ(waitpid(child, &status, 0), child);
-  EXPECT_EQ(status, 0);
-  EXPECT_EQ(standardError.text(), "SystemLog_test[" + std::to_string(child) +
-                                      "] error: [rt:SystemLog] 3 log entries were dropped: nothing took them "
-                                      "in time\n");
-  journal.resume();
-}
-
-TEST_F(SystemLogTest, CountsAnewInTheChildOfAFork) {
-  PrivateJournal journal;
-  journal.start();
-  journal.suspend();
-  while (dropped() == 0) testLog().write(Type::info, "stuck");
-  const pid_t child = fork();
-  if (child == 0) {
-    const bool isAnew = rt::SystemLog::droppedCount() == 0;
-    journal.resume();
-    while (rt::SystemLog::droppedCount() == 0 && messages(journal).empty()) {
-    }
-    testLog().write(Type::info, "child");
-    _exit(isAnew ? 0 : 1);
-  }
-  int status = -1;
-  ASSERT_EQ(waitpid(child, &status, 0), child);
-  EXPECT_EQ(status, 0);
-  EXPECT_EQ(reportedDropped(journal), 0U);
-  testLog().write(Type::info, "parent");
-  EXPECT_EQ(reportedDropped(journal), 1U);
 }
 
 // Invariant: every entry arrives once, and those of one thread in the order in which it wrote them, under

@@ -29,21 +29,17 @@ function(mount_point_test name)
   gtest_discover_tests(${name} TEST_PREFIX "${name}." DISCOVERY_TIMEOUT 60)
 endfunction()
 
-# mount_point_must_not_compile(NAME SOURCE FILE MESSAGE REGEX [DEFINITION MACRO] [COMPILER ID])
+# mount_point_must_not_compile(TEST SOURCE FILE [COMPILER ID] MISTAKES MACRO REGEX…)
 #
-# Adds the ctest entry NAME: with MACRO defined (MUST_NOT_COMPILE unless named) FILE does not compile, and
-# the compiler's complaint matches REGEX; and, once for each FILE, the entry must-compile.FILE: it compiles
-# as it is. So FILE holds what is right and, between
-# `#ifdef MUST_NOT_COMPILE` and `#endif`, the mistake. Nothing is linked; includes are from the
-# repository's root. With COMPILER (GNU or Clang) the entry is left out under any other; all are in an
-# instrumented build, where the compiler would say the same once more.
-function(mount_point_must_not_compile name)
-  cmake_parse_arguments(PARSE_ARGV 1 test "" "SOURCE;MESSAGE;DEFINITION;COMPILER" "")
-  if(MOUNT_POINT_INSTRUMENTATION OR (test_COMPILER AND NOT CMAKE_CXX_COMPILER_ID STREQUAL test_COMPILER))
+# FILE holds what is right and, between `#ifdef MACRO` and `#endif`, mistakes. Adds for each MACRO the ctest entry
+# TEST.must-not-compile.MACRO: with MACRO defined FILE does not compile, and the compiler's complaint matches
+# REGEX; and the entry must-compile.FILE: it compiles as it is. Nothing is linked; includes are from the
+# repository's root. With COMPILER (GNU or Clang) all are left out under any other; so are they in an instrumented
+# build, where the compiler would say the same once more.
+function(mount_point_must_not_compile test)
+  cmake_parse_arguments(PARSE_ARGV 1 given "" "SOURCE;COMPILER" "MISTAKES")
+  if(MOUNT_POINT_INSTRUMENTATION OR (given_COMPILER AND NOT CMAKE_CXX_COMPILER_ID STREQUAL given_COMPILER))
     return()
-  endif()
-  if(NOT test_DEFINITION)
-    set(test_DEFINITION MUST_NOT_COMPILE)
   endif()
   set(command "${CMAKE_CXX_COMPILER}" -std=c++20 -fsyntax-only -Wall -Wextra -Werror -fno-caret-diagnostics
     "-I${PROJECT_SOURCE_DIR}")
@@ -53,13 +49,13 @@ function(mount_point_must_not_compile name)
   else()
     list(APPEND command -Wthread-safety -Wthread-safety-beta)
   endif()
-  cmake_path(ABSOLUTE_PATH test_SOURCE)
-  # That the file compiles as it is needs to be tried once only.
-  cmake_path(RELATIVE_PATH test_SOURCE BASE_DIRECTORY "${PROJECT_SOURCE_DIR}" OUTPUT_VARIABLE source)
-  if(NOT TEST "must-compile.${source}")
-    add_test(NAME "must-compile.${source}" COMMAND ${command} "${test_SOURCE}")
-  endif()
-  add_test(NAME ${name} COMMAND "${CMAKE_COMMAND}"
-    "-DCOMMAND_LINE=${command}" "-DSOURCE=${test_SOURCE}" "-DDEFINITION=${test_DEFINITION}"
-    "-DMESSAGE=${test_MESSAGE}" -P "${PROJECT_SOURCE_DIR}/cmake/must-not-compile.cmake")
+  cmake_path(ABSOLUTE_PATH given_SOURCE OUTPUT_VARIABLE file)
+  cmake_path(RELATIVE_PATH file BASE_DIRECTORY "${PROJECT_SOURCE_DIR}" OUTPUT_VARIABLE source)
+  add_test(NAME "must-compile.${source}" COMMAND ${command} "${file}")
+  while(given_MISTAKES)
+    list(POP_FRONT given_MISTAKES macro regex)
+    add_test(NAME "${test}.must-not-compile.${macro}" COMMAND "${CMAKE_COMMAND}"
+      "-DCOMMAND_LINE=${command}" "-DSOURCE=${file}" "-DDEFINITION=${macro}" "-DMESSAGE=${regex}"
+      -P "${PROJECT_SOURCE_DIR}/cmake/must-not-compile.cmake")
+  endwhile()
 endfunction()

@@ -6,7 +6,7 @@
 ///     class KeyedArchiveAndPython : public PlistlibTest {};
 ///
 ///     TEST_F(KeyedArchiveAndPython, PythonReadsOurs) {
-///       write(path());
+///       writeFile(rt::KeyedArchiver::archivedDataWithRootObject(number));
 ///       EXPECT_EQ(python("print(plistlib.load(open(path, 'rb')))"), "7\n");
 ///     }
 ///
@@ -17,8 +17,13 @@
 #include <gtest/gtest.h>
 #include <stdlib.h>
 
+#include <cstddef>
 #include <filesystem>
+#include <fstream>
+#include <iterator>
+#include <span>
 #include <string>
+#include <vector>
 
 #include "tests/Process.h"
 
@@ -44,6 +49,19 @@ class PlistlibTest : public testing::Test {
     return result.standardOutput;
   }
   std::string path() const { return directory_ / "file"; }
+
+  /// Makes `bytes` what is in the file.
+  void writeFile(std::span<const std::byte> bytes) const {
+    std::ofstream(path(), std::ios::binary)
+        .write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
+  }
+  /// What is in the file.
+  std::vector<std::byte> readFile() const {
+    std::ifstream stream(path(), std::ios::binary);
+    const std::string content{std::istreambuf_iterator<char>(stream), {}};
+    const std::span<const std::byte> bytes = std::as_bytes(std::span(content));
+    return {bytes.begin(), bytes.end()};
+  }
 
  private:
   std::filesystem::path directory_;

@@ -8,6 +8,7 @@
 
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
+#include "tests/Sanitizers.h"
 
 namespace {
 
@@ -16,15 +17,8 @@ constinit thread_local int allowed = -1;
 
 }  // namespace
 
-#if defined(__SANITIZE_THREAD__)
-#define BRINGS_ITS_OWN_NEW 1
-#elif defined(__has_feature)
-#if __has_feature(thread_sanitizer)
-#define BRINGS_ITS_OWN_NEW 1
-#endif
-#endif
-
-#ifndef BRINGS_ITS_OWN_NEW
+// The thread sanitizer brings its own.
+#if !RT_TEST_THREAD_SANITIZER
 
 // Not inlined, or g++ sees `free` where it looks for a `delete`.
 [[gnu::noinline]] void* operator new(std::size_t size) {
@@ -58,9 +52,7 @@ int failuresOf(Take take) {
 }
 
 TEST(LUMLogCallstackMemory, IsMissedAsAStackIs) {
-#ifdef BRINGS_ITS_OWN_NEW
-  GTEST_SKIP() << "the thread sanitizer's operator new cannot be replaced";
-#endif
+  if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the thread sanitizer's operator new cannot be replaced";
   EXPECT_GE(failuresOf([] { return LUMLogAddressCallstack::addressCallstackIgnoringFrameCount(0); }), 1);
   EXPECT_GE(failuresOf([] { return LUMLogSymbolCallstack::symbolCallstackIgnoringFrameCount(0); }), 3);
 }

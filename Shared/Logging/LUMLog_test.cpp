@@ -5,7 +5,6 @@
 
 #include <cstdarg>
 #include <cstdint>
-#include <span>
 #include <stdexcept>
 #include <string>
 #include <string_view>
@@ -22,6 +21,7 @@
 #include "Shared/Logging/LUMSafeNumberParameter.h"
 #include "Shared/Logging/LUMSafeStringParameter.h"
 #include "tests/AllocationCount.h"
+#include "tests/FirstSymbol.h"
 
 namespace {
 
@@ -251,19 +251,6 @@ TEST_F(LUMLogTest, HasACallStackAtTwoLevels) {
       LUMLog(LUMLogLevelFault, "file", "function", 1, nullptr, 0, nullptr, "text"_s);
   rt::CallStack::keepFrame();
   return message;
-}
-
-std::string firstSymbolOf(const LUMLogMessage& message) {
-  if (auto* symbols = rt::cast<LUMLogSymbolCallstack>(message.callstack().get())) {
-    return std::string(symbols->symbols()->stringAt(0).view());
-  }
-  std::string line;
-  rt::cast<LUMLogAddressCallstack>(message.callstack().get())
-      ->enumerateAddressesWithBlock([&](std::uint64_t address, std::uint64_t /*index*/, bool* stop) {
-        line = rt::CallStack::symbols(std::span(&address, 1)).front().view();
-        *stop = true;
-      });
-  return line;
 }
 
 TEST_F(LUMLogTest, HasTheCallingFunctionFirstInItsCallStack) {

@@ -12,7 +12,6 @@
 #include <cstdint>
 #include <cstdio>
 #include <cstdlib>
-#include <functional>
 #include <latch>
 #include <limits>
 #include <stdexcept>
@@ -29,6 +28,7 @@
 #include "Shared/Logging/LUMLogMinimumLevelFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMSystemLogger.h"
+#include "tests/AtEnd.h"
 #include "tests/TestLoggers.h"
 
 namespace {
@@ -70,22 +70,6 @@ class Recorder final : public rt::Implements<Recorder, rt::AssertionHandler> {
   }
 
   std::vector<Failure> failures;
-};
-
-// Runs `body` when it is destroyed.
-class AtEnd {
- public:
-  explicit AtEnd(std::function<void()> body) : body_(std::move(body)) {}
-  AtEnd(const AtEnd&) = delete;
-  AtEnd& operator=(const AtEnd&) = delete;
-  AtEnd(AtEnd&& other) noexcept : body_(std::exchange(other.body_, nullptr)) {}
-  AtEnd& operator=(AtEnd&&) = delete;
-  ~AtEnd() {
-    if (body_) body_();
-  }
-
- private:
-  std::function<void()> body_;
 };
 
 // The system's log would only repeat what is reported here.

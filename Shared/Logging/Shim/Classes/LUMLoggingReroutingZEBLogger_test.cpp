@@ -5,7 +5,6 @@
 
 #include <cstdarg>
 #include <cstdint>
-#include <span>
 #include <stdexcept>
 #include <string>
 #include <thread>
@@ -16,13 +15,13 @@
 #include "Foundation/ZEBLoggerMacroHelpers.h"
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
 #include "Runtime/AssertionHandler.h"
-#include "Runtime/CallStack.h"
 #include "Runtime/Exception.h"
 #include "Runtime/Queue.h"
 #include "Runtime/Thread.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
+#include "tests/FirstSymbol.h"
 
 namespace {
 
@@ -210,19 +209,6 @@ TEST_F(ReroutingTest, TakesNoCallStackForAMultiplexerThatCannotSay) {
 
 [[gnu::noinline]] void functionThatLogs(ZEBLogger& logger) {
   logger.logError("%d", 1);
-}
-
-std::string firstSymbolOf(const LUMLogMessage& message) {
-  if (auto* symbols = rt::cast<LUMLogSymbolCallstack>(message.callstack().get())) {
-    return std::string(symbols->symbols()->stringAt(0).view());
-  }
-  std::string line;
-  rt::cast<LUMLogAddressCallstack>(message.callstack().get())
-      ->enumerateAddressesWithBlock([&](std::uint64_t address, std::uint64_t /*index*/, bool* stop) {
-        line = rt::CallStack::symbols(std::span(&address, 1)).front().view();
-        *stop = true;
-      });
-  return line;
 }
 
 TEST_F(ReroutingTest, HasTheCallingFunctionFirstInItsCallStacks) {

@@ -17,6 +17,7 @@
 #include "Runtime/String.h"
 #include "Runtime/Weak.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScopeIvars.h"
+#include "tests/TestFactories.h"
 #include "tests/TestReports.h"
 
 struct SRLMemoizingScopeTestAccess {
@@ -30,18 +31,6 @@ using rt::Ref;
 using testing::IsEmpty;
 using Access = SRLMemoizingScopeTestAccess;
 using Factory = rt::Block<Ref<rt::Object>()>;
-
-class Instance final : public rt::Implements<Instance, rt::Object> {};
-
-Ref<rt::Object> makeInstance() {
-  return rt::make<Instance>();
-}
-
-// For requests that find what they ask for.
-Ref<rt::Object> mustNotRun() {
-  ADD_FAILURE() << "a factory ran";
-  return nullptr;
-}
 
 // What identifies instances: addresses, whatever is there.
 struct Identifiers {

@@ -23,23 +23,12 @@
 #include "Runtime/Class.h"
 #include "Runtime/ThreadIdentifier.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope.h"
+#include "tests/TestFactories.h"
 
 namespace {
 
 using rt::Ref;
 using Factory = rt::Block<Ref<rt::Object>()>;
-
-class Instance final : public rt::Implements<Instance, rt::Object> {};
-
-Ref<rt::Object> makeInstance() {
-  return rt::make<Instance>();
-}
-
-// For requests that find what they ask for.
-Ref<rt::Object> mustNotRun() {
-  ADD_FAILURE() << "a factory ran";
-  return nullptr;
-}
 
 // Each factory waits until the other one runs too.
 TEST(SRLMemoizingScopeThreads, MakesDifferentInstancesAtTheSameTime) {

@@ -6,9 +6,6 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstdlib>
-#include <filesystem>
-#include <fstream>
-#include <iterator>
 #include <span>
 #include <string>
 #include <utility>
@@ -254,10 +251,8 @@ TEST(SRLScopeTagSetCodableWrapperArchive, MayBeTruncatedOrDamagedAnywhere) {
 class SRLScopeTagSetCodableWrapperAndPython : public PlistlibTest {};
 
 TEST_F(SRLScopeTagSetCodableWrapperAndPython, PythonReadsOurs) {
-  const Bytes bytes = KeyedArchiver::archivedDataWithRootObject(
-      Wrapper::initWithTags(rt::Array::of(rt::make<AccountTag>("Ann"_s), rt::Number::of(7))));
-  std::ofstream(path(), std::ios::binary)
-      .write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
+  writeFile(KeyedArchiver::archivedDataWithRootObject(
+      Wrapper::initWithTags(rt::Array::of(rt::make<AccountTag>("Ann"_s), rt::Number::of(7)))));
   EXPECT_EQ(python(R"(
 archive = plistlib.load(open(path, 'rb'))
 objects = archive['$objects']
@@ -285,10 +280,8 @@ plistlib.dump({'$archiver': 'PythonArchiver', '$version': 100000, '$top': {'root
     'Ann',
     7,
 ]}, open(path, 'wb'), fmt=plistlib.FMT_BINARY))");
-  std::ifstream stream(path(), std::ios::binary);
-  const std::string content{std::istreambuf_iterator<char>(stream), {}};
   rt::String error;
-  const Ref<Wrapper> wrapper = read(std::as_bytes(std::span(content)), &error);
+  const Ref<Wrapper> wrapper = read(readFile(), &error);
   ASSERT_TRUE(wrapper) << error.view();
   EXPECT_TRUE(rt::isEqual(
       wrapper, Wrapper::initWithTags(rt::Array::of(rt::make<AccountTag>("Ann"_s), rt::Number::of(7)))));

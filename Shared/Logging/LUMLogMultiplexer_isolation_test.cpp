@@ -1,0 +1,255 @@
+// What filters and loggers may do while a message is delivered: come and go, log, wait, throw.
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <atomic>
+#include <latch>
+#include <thread>
+#include <utility>
+#include <vector>
+
+#include "Runtime/Weak.h"
+#include "tests/LUMLogMultiplexerTest.h"
+
+namespace {
+
+using namespace rt::literals;
+using rt::Ref;
+using testing::ElementsAre;
+using testing::IsEmpty;
+using testing::UnorderedElementsAre;
+
+// Snapshots.
+
+TEST_F(LUMLogMultiplexerTest, AMessageGoesToThoseThatWereThereWhenItCame) {
+  const auto first = filter("first", true);
+  const auto added = sync("added");
+  const auto addedAsync = async("added async");
+  const auto addedFilter = filter("added filter", true);
+  multiplexer_->addLogFilter(rt::make<TestFilter>([&](const LUMLogMessage&) {
+    multiplexer_->addSyncLogger(added);
+    multiplexer_->addAsyncLogger(addedAsync);
+    multiplexer_->addLogFilter(addedFilter);
+    return true;
+  }));
+  EXPECT_THAT(logAndDrain(), IsEmpty());
+  EXPECT_THAT(logAndDrain(), UnorderedElementsAre("added filter", "added", "added async"));
+}
+
+TEST_F(LUMLogMultiplexerTest, ThoseThatAreRemovedMeanwhileStillGetTheMessage) {
+  const auto asyncLogger = async("async");
+  const auto blockingLogger = blocking("blocking");
+  std::vector<Ref<LUMSyncLogger>> syncLoggers;
+  const auto removeAll = [&](const Ref<LUMLogMessage>&) {
+    trace_.add("sync");
+    for (const Ref<LUMSyncLogger>& logger : syncLoggers) multiplexer_->removeSyncLogger(logger);
+    multiplexer_->removeAsyncLogger(asyncLogger);
+    multiplexer_->removeAsyncLogger(blockingLogger);
+  };
+  std::latch mayFanOut(1);
+  multiplexer_->loggingQueue()->async([&] { mayFanOut.wait(); });
+  multiplexer_->addAsyncLogger(asyncLogger);
+  multiplexer_->addAsyncLogger(blockingLogger);
+  for (int i = 0; i < 3; ++i) {
+    syncLoggers.emplace_back(rt::make<TestSyncLogger>(removeAll));
+    multiplexer_->addSyncLogger(syncLoggers.back());
+  }
+  log();
+  EXPECT_THAT(trace_.events(), ElementsAre("sync", "sync", "sync", "blocking"));
+  mayFanOut.count_down();
+  drain();
+  EXPECT_THAT(trace_.events(), ElementsAre("async"));
+  EXPECT_THAT(logAndDrain(), IsEmpty());
+}
+
+TEST_F(LUMLogMultiplexerTest, FiltersThatRemoveEachOtherAreAllAsked) {
+  std::vector<Ref<LUMLogFilter>> filters;
+  filters.reserve(3);
+  for (int i = 0; i < 3; ++i) {
+    filters.emplace_back(rt::make<TestFilter>([&](const LUMLogMessage&) {
+      trace_.add("filter");
+      for (const Ref<LUMLogFilter>& other : filters) multiplexer_->removeLogFilter(other);
+      return true;
+    }));
+  }
+  for (const Ref<LUMLogFilter>& filter : filters) multiplexer_->addLogFilter(filter);
+  EXPECT_THAT(logAndDrain(), ElementsAre("filter", "filter", "filter"));
+  EXPECT_THAT(logAndDrain(), IsEmpty());
+}
+
+TEST_F(LUMLogMultiplexerTest, KeepsAliveWhomItDeliversToAndNobodyElse) {
+  rt::Weak<TestAsyncLogger> weak;
+  std::latch mayFanOut(1);
+  {
+    const auto logger = async("async");
+    weak = logger;
+    multiplexer_->addAsyncLogger(logger);
+    multiplexer_->loggingQueue()->async([&] { mayFanOut.wait(); });
+    log();
+    multiplexer_->removeAsyncLogger(logger);
+  }
+  mayFanOut.count_down();
+  drain();
+  EXPECT_THAT(trace_.events(), ElementsAre("async"));
+  // The tasks that delivered are gone when the queues have run once more.
+  drain();
+  EXPECT_EQ(weak.lock(), nullptr);
+}
+
+TEST_F(LUMLogMultiplexerTest, ALoggerMayLogFromWithin) {
+  multiplexer_->addSyncLogger(rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) {
+    trace_.add(text(*message));
+    if (text(*message) == "x") log("from within"_s);
+    trace_.add("end of " + text(*message));
+  }));
+  log();
+  EXPECT_THAT(trace_.events(), ElementsAre("x", "from within", "end of from within", "end of x"));
+}
+
+TEST_F(LUMLogMultiplexerTest, AnAsyncLoggerMayLogFromWithin) {
+  multiplexer_->addAsyncLogger(rt::make<TestAsyncLogger>(queue_, [&](const Ref<LUMLogMessage>& message) {
+    trace_.add(text(*message));
+    if (text(*message) == "x") log("from within"_s);
+  }));
+  log();
+  drain();
+  drain();
+  EXPECT_THAT(trace_.events(), ElementsAre("x", "from within"));
+}
+
+// No lock is held while anything of the user's runs: another thread gets through meanwhile.
+
+TEST_F(LUMLogMultiplexerTest, HoldsNoLockWhileFiltersAndLoggersRun) {
+  std::atomic<int> count = 0;
+  const auto another = sync("another");
+  const auto useMeanwhile = [&] {
+    ++count;
+    inAnotherThread([&] {
+      multiplexer_->addSyncLogger(another);
+      multiplexer_->removeSyncLogger(another);
+      multiplexer_->addAsyncLogger(nullptr);
+    });
+  };
+  const auto ask = [&](const LUMLogMessage&) {
+    useMeanwhile();
+    return true;
+  };
+  const auto hear = [&](const Ref<LUMLogMessage>&) { useMeanwhile(); };
+  multiplexer_->addLogFilter(rt::make<TestFilter>(ask));
+  multiplexer_->addSyncLogger(rt::make<TestSyncLogger>(hear, rt::make<TestFilter>(ask)));
+  for (const LUMLogDispatchMode mode : {0U, LUMLogDispatchModeSynchronous}) {
+    const auto logger = rt::make<TestAsyncLogger>(queue_, hear);
+    logger->filter_ = rt::make<TestFilter>(ask);
+    logger->dispatchMode_ = [&, mode](const LUMLogMessage&) {
+      useMeanwhile();
+      return mode;
+    };
+    logger->operationQueue_ = [&] {
+      useMeanwhile();
+      return queue_;
+    };
+    multiplexer_->addAsyncLogger(logger);
+    log();
+    drain();
+    multiplexer_->removeAsyncLogger(logger);
+  }
+  EXPECT_EQ(count, 2 * (1 + 2 + 5));
+}
+
+// What is thrown.
+
+TEST_F(LUMLogMultiplexerTest, PassesOnWhatAFilterThrowsAndDeliversToNobody) {
+  const auto throwing = rt::make<TestFilter>([](const LUMLogMessage&) -> bool { throw Thrown(); });
+  multiplexer_->addLogFilter(throwing);
+  multiplexer_->addSyncLogger(sync("sync"));
+  multiplexer_->addAsyncLogger(async("async"));
+  EXPECT_THROW(log(), Thrown);
+  drain();
+  EXPECT_THAT(trace_.events(), IsEmpty());
+  multiplexer_->removeLogFilter(throwing);
+  EXPECT_THAT(logAndDrain(), UnorderedElementsAre("sync", "async"));
+}
+
+TEST_F(LUMLogMultiplexerTest, PassesOnWhatAnAsyncLoggerThrowsWhenItIsAskedAndDeliversToNobody) {
+  multiplexer_->addSyncLogger(sync("sync"));
+  multiplexer_->addAsyncLogger(async("async"));
+  const auto throwing = async("throwing");
+  throwing->dispatchMode_ = [](const LUMLogMessage&) -> LUMLogDispatchMode { throw Thrown(); };
+  multiplexer_->addAsyncLogger(throwing);
+  EXPECT_THROW(log(), Thrown);
+  throwing->filter_ = rt::make<TestFilter>([](const LUMLogMessage&) -> bool { throw Thrown(); });
+  EXPECT_THROW(log(), Thrown);
+  drain();
+  EXPECT_THAT(trace_.events(), IsEmpty());
+  multiplexer_->removeAsyncLogger(throwing);
+  EXPECT_THAT(logAndDrain(), UnorderedElementsAre("sync", "async"));
+}
+
+// What is queued by then is delivered, what would come later is not.
+TEST_F(LUMLogMultiplexerTest, PassesOnWhatASyncLoggerThrows) {
+  multiplexer_->addAsyncLogger(async("async"));
+  multiplexer_->addAsyncLogger(blocking("blocking"));
+  const auto throwing = rt::make<TestSyncLogger>([](const Ref<LUMLogMessage>&) { throw Thrown(); });
+  multiplexer_->addSyncLogger(throwing);
+  EXPECT_THROW(log(), Thrown);
+  drain();
+  EXPECT_THAT(trace_.events(), ElementsAre("async"));
+  inAnotherThread([&] { multiplexer_->removeSyncLogger(throwing); });
+  multiplexer_->addSyncLogger(sync("sync"));
+  EXPECT_THAT(logAndDrain(), UnorderedElementsAre("async", "sync", "blocking"));
+}
+
+TEST_F(LUMLogMultiplexerTest, PassesOnWhatABlockingLoggerThrows) {
+  multiplexer_->addSyncLogger(sync("sync"));
+  multiplexer_->addAsyncLogger(async("async"));
+  const auto throwing = rt::make<TestAsyncLogger>(queue_, [](const Ref<LUMLogMessage>&) { throw Thrown(); });
+  throwing->dispatchMode_ = [](const LUMLogMessage&) { return LUMLogDispatchModeSynchronous; };
+  multiplexer_->addAsyncLogger(throwing);
+  EXPECT_THROW(log(), Thrown);
+  drain();
+  EXPECT_THAT(trace_.events(), UnorderedElementsAre("sync", "async"));
+  multiplexer_->removeAsyncLogger(throwing);
+  EXPECT_THAT(logAndDrain(), UnorderedElementsAre("sync", "async"));
+}
+
+// One that blocks holds up its own caller only.
+TEST_F(LUMLogMultiplexerTest, ALoggerThatBlocksHoldsNobodyElseUp) {
+  std::latch isBlocked(1);
+  std::latch mayGoOn(1);
+  multiplexer_->addSyncLogger(rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) {
+    if (text(*message) != "block") {
+      trace_.add(text(*message));
+      return;
+    }
+    isBlocked.count_down();
+    mayGoOn.wait();
+    trace_.add("unblocked");
+  }));
+  multiplexer_->addAsyncLogger(async("async"));
+  std::thread blocked([&] { log("block"_s); });
+  isBlocked.wait();
+  log("b"_s);
+  const auto added = sync("added");
+  multiplexer_->addSyncLogger(added);
+  multiplexer_->removeSyncLogger(added);
+  drain();
+  EXPECT_THAT(trace_.events(), UnorderedElementsAre("async", "async", "b"));
+  mayGoOn.count_down();
+  blocked.join();
+  EXPECT_THAT(trace_.events(), ElementsAre("unblocked"));
+}
+
+TEST_F(LUMLogMultiplexerTest, ALoggerThatRemovesItselfHearsNoMore) {
+  Ref<LUMSyncLogger> leaving;
+  leaving = rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>&) {
+    multiplexer_->removeSyncLogger(leaving);
+    leaving = nullptr;  // The last reference but the one that the delivery has.
+    trace_.add("leaving");
+  });
+  multiplexer_->addSyncLogger(leaving);
+  EXPECT_THAT(logAndDrain(), ElementsAre("leaving"));
+  EXPECT_THAT(logAndDrain(), IsEmpty());
+}
+
+}  // namespace

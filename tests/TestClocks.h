@@ -1,0 +1,21 @@
+#pragma once
+
+/// Protocols for classes to conform to, one of which inherits the other.
+///
+/// Not for: anything but tests and benchmarks.
+
+#include "Runtime/Class.h"
+
+struct Clock : rt::Protocol<Clock> {
+  virtual int now() const = 0;
+
+ protected:
+  ~Clock() = default;
+};
+
+struct AlarmClock : rt::Protocol<AlarmClock, Clock> {
+  virtual int alarm() const = 0;
+
+ protected:
+  ~AlarmClock() = default;
+};

@@ -1,0 +1,76 @@
+#pragma once
+
+// What the tests of user defaults share: a folder of their own, and what is reported.
+
+#include <gtest/gtest.h>
+#include <sys/stat.h>
+
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <functional>
+#include <iterator>
+#include <mutex>
+#include <stdexcept>
+#include <string>
+#include <string_view>
+#include <utility>
+#include <vector>
+
+#include "Runtime/UserDefaults.h"
+
+inline std::string contentOf(const std::filesystem::path& path) {
+  std::ifstream stream(path, std::ios::binary);
+  return {std::istreambuf_iterator<char>(stream), {}};
+}
+
+inline void write(const std::filesystem::path& path, std::string_view content) {
+  std::ofstream(path, std::ios::binary) << content;
+}
+
+inline void setMode(const std::filesystem::path& path, mode_t mode) {
+  ASSERT_EQ(chmod(path.c_str(), mode), 0);
+}
+
+inline std::string whatOf(const std::function<void()>& function) {
+  try {
+    function();
+  } catch (const std::exception& error) {
+    return error.what();
+  }
+  return "";
+}
+
+class UserDefaults : public testing::Test {
+ protected:
+  UserDefaults() {
+    std::string folder = testing::TempDir() + "user-defaults.XXXXXX";
+    if (mkdtemp(folder.data()) == nullptr) throw std::runtime_error("no temporary folder");
+    folder_ = folder;
+    rt::UserDefaults::setReportHandler([this](const rt::String& line) {
+      const std::scoped_lock lock(mutex_);
+      reports_.emplace_back(line.view());
+    });
+  }
+  ~UserDefaults() override {
+    rt::UserDefaults::setReportHandler(nullptr);
+    std::filesystem::remove_all(folder_);
+  }
+
+  std::filesystem::path path() const { return folder_ / "defaults.conf"; }
+  rt::Ref<rt::UserDefaults> defaults() const { return defaultsAt(path()); }
+  static rt::Ref<rt::UserDefaults> defaultsAt(const std::filesystem::path& path) {
+    return rt::UserDefaults::initWithPath(rt::String::fromUTF8(path.string()));
+  }
+  // What was reported since the last call.
+  std::vector<std::string> reports() {
+    const std::scoped_lock lock(mutex_);
+    return std::exchange(reports_, {});
+  }
+
+  std::filesystem::path folder_;
+
+ private:
+  std::mutex mutex_;
+  std::vector<std::string> reports_;
+};

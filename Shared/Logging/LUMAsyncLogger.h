@@ -12,7 +12,14 @@
 ///       }
 ///     };
 ///
-/// Messages of one thread come in the order in which they were logged.
+/// Messages of one thread that come later are in the order in which they were logged, given that the logger
+/// keeps to one queue. One that is wanted at once may overtake those that still wait.
+///
+/// What a logger throws when it is called later has no caller to go to, whether `logWithMessage`, its filter
+/// or `operationQueue` throws it: it leaves a task of a queue, and unless rt::Queue's
+/// `setUncaughtExceptionHandler` says otherwise, the program ends with a line that names the queue. What is
+/// thrown while the caller waits, `LUMLog` throws: by the filter and `dispatchModeForMessage`, which every
+/// message asks first, and by a logger that wants the message at once.
 ///
 /// Not for: what must see a message before the caller goes on, as a rule; see LUMSyncLogger.
 
@@ -29,7 +36,8 @@ using LUMLogDispatchMode = std::uint32_t;
 inline constexpr LUMLogDispatchMode LUMLogDispatchModeSynchronous = 2;
 
 struct LUMAsyncLogger : rt::Protocol<LUMAsyncLogger, LUMLogger> {
-  /// The queue to be called on; without one the logger receives nothing.
+  /// The queue to be called on; without one the logger receives nothing. Asked on the multiplexer's queue,
+  /// or on the thread that logs where the logger wants the message at once.
   virtual rt::Ref<rt::Queue> operationQueue() const = 0;
 
   /// How to be called with `message`; asked on the thread that logs. Must not be

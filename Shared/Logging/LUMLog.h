@@ -15,8 +15,9 @@
 /// The format is a literal and is checked, while compiling, against the arguments (Runtime/FormatString.h).
 /// With `_s` it costs no allocation.
 ///
-/// Any thread may log, at any time, also while the program is being loaded. What a description, a filter or a
-/// synchronous logger throws passes through; so does std::bad_alloc.
+/// Any thread may log, at any time, also while the program is being loaded. What a description throws passes
+/// through, and what filters and loggers throw before the call returns (Shared/Logging/LUMLogMultiplexing.h);
+/// so does std::bad_alloc.
 ///
 /// Not for: text that was made beforehand and may hold a '%': log it as an argument of "%@".
 

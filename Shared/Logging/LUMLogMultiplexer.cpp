@@ -35,6 +35,8 @@ void deliver(LUMLogger& logger, const rt::Ref<LUMLogMessage>& message) {
 
 }  // namespace
 
+constinit rt::ForkSafeLock LUMLogMultiplexer::lock_;
+
 struct LUMLogMultiplexer::Lists {
   std::vector<rt::Ref<LUMLogFilter>> filters;
   std::vector<rt::Ref<LUMSyncLogger>> syncLoggers;
@@ -109,7 +111,9 @@ std::vector<rt::Ref<LUMAsyncLogger>> LUMLogMultiplexer::deliverLater(
   for (const rt::Ref<LUMAsyncLogger>& logger : loggers) {
     const bool isBlocking = admits(*logger, *message) &&
                             logger->dispatchModeForMessage(*message) == LUMLogDispatchModeSynchronous;
-    (isBlocking ? blockingLoggers : laterLoggers).push_back(logger);
+    std::vector<rt::Ref<LUMAsyncLogger>>& list = isBlocking ? blockingLoggers : laterLoggers;
+    list.reserve(loggers.size());
+    list.push_back(logger);
   }
   if (laterLoggers.empty()) return blockingLoggers;
   loggingQueue_->async([loggers = std::move(laterLoggers), message] {

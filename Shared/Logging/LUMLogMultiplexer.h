@@ -18,8 +18,15 @@
 /// from within a logger: a message goes to those that were there when it came. At the start there is one
 /// synchronous logger, a LUMSystemLogger with a LUMDefaultMinimumLogLevelFilter.
 ///
-/// Any thread may use it. No lock is held while filters and loggers run; what one throws passes through, and
-/// those after it do not get the message.
+/// Any thread may use it. No lock is held while filters and loggers run. What one throws on the way of a
+/// message passes through, and those after it do not get the message. What an asynchronous logger throws
+/// later has no caller: it ends the program, or goes to the handler that rt::Queue has for that
+/// (LUMAsyncLogger.h). If then it was `operationQueue` that threw, the asynchronous loggers after it do not
+/// get the message either; later messages go their way.
+///
+/// In the child of a fork it may be used at once, whatever other threads were doing, given that it had been
+/// used before the fork, and that filters and loggers bear it. The messages that were queued are the
+/// parent's, as all tasks are (Runtime/Queue.h).
 ///
 /// Not for: many of them in a program; LUMLog uses the shared one.
 
@@ -27,11 +34,11 @@
 #include <vector>
 
 #include "Runtime/Class.h"
+#include "Runtime/ForkSafeLock.h"
 #include "Runtime/Object.h"
 #include "Runtime/Queue.h"
 #include "Runtime/Ref.h"
 #include "Runtime/ThreadSafety.h"
-#include "Runtime/UnfairLock.h"
 #include "Shared/Logging/LUMLogAppControl.h"
 #include "Shared/Logging/LUMLogMultiplexing.h"
 #include "Shared/Logging/LUMSystemLogger.h"
@@ -92,8 +99,9 @@ class LUMLogMultiplexer
   [[gnu::noinline]] std::vector<rt::Ref<LUMAsyncLogger>> deliverLater(
       const std::vector<rt::Ref<LUMAsyncLogger>>& loggers, const rt::Ref<LUMLogMessage>& message);
 
-  // Held to read or replace the reference, never while anything else runs.
-  mutable rt::UnfairLock lock_;
+  // Held to read or replace the reference, never while anything else runs. One for all multiplexers, of which
+  // a process has hardly more than one.
+  static constinit rt::ForkSafeLock lock_;
   // Replaced, never changed, so that a message goes on with those that it has found.
   rt::Ref<Members> members_ RT_GUARDED_BY(lock_);
 

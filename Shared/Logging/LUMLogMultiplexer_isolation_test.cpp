@@ -5,6 +5,8 @@
 
 #include <atomic>
 #include <latch>
+#include <stdexcept>
+#include <string>
 #include <thread>
 #include <utility>
 #include <vector>
@@ -211,6 +213,98 @@ TEST_F(LUMLogMultiplexerTest, PassesOnWhatABlockingLoggerThrows) {
   EXPECT_THAT(trace_.events(), UnorderedElementsAre("sync", "async"));
   multiplexer_->removeAsyncLogger(throwing);
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("sync", "async"));
+}
+
+// Later there is nobody to throw to.
+
+TEST_F(LUMLogMultiplexerDeathTest, EndsTheProgramByWhatAnAsyncLoggerThrowsLater) {
+  const auto logTo = [&](const Ref<TestAsyncLogger>& logger) {
+    multiplexer_->addAsyncLogger(logger);
+    log();
+    drain();
+  };
+  const std::string line = "rt: an exception has left a task of the queue ";
+  EXPECT_DEATH(logTo(rt::make<TestAsyncLogger>(
+                   queue_, [](const Ref<LUMLogMessage>&) { throw std::runtime_error("by the logger"); })),
+               line + "\"logger\": by the logger");
+  const auto withFilter = async("async", rt::make<TestFilter>([&](const LUMLogMessage&) {
+                                  if (queue_->isCurrent()) throw std::runtime_error("by its filter");
+                                  return true;
+                                }));
+  EXPECT_DEATH(logTo(withFilter), line + "\"logger\": by its filter");
+  const auto withoutQueue = async("async");
+  withoutQueue->operationQueue_ = []() -> Ref<rt::Queue> { throw std::runtime_error("by its queue"); };
+  EXPECT_DEATH(logTo(withoutQueue), line + "\"LUMLogMultiplexer\": by its queue");
+}
+
+// The labels of the queues that had a task which threw.
+Trace uncaught;
+
+class LUMLogMultiplexerUncaughtTest : public LUMLogMultiplexerTest {
+ protected:
+  LUMLogMultiplexerUncaughtTest() {
+    rt::Queue::setUncaughtExceptionHandler(
+        [](const rt::Queue& queue) { uncaught.add(std::string(queue.label().view())); });
+  }
+  ~LUMLogMultiplexerUncaughtTest() override { rt::Queue::setUncaughtExceptionHandler(nullptr); }
+};
+
+TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereAnAsyncLoggerThrowsLater) {
+  bool throws = true;  // Touched by tasks of the queue only.
+  multiplexer_->addAsyncLogger(rt::make<TestAsyncLogger>(queue_, [&](const Ref<LUMLogMessage>& message) {
+    if (std::exchange(throws, false)) throw Thrown();
+    trace_.add(text(*message));
+  }));
+  multiplexer_->addAsyncLogger(async("other"));
+  EXPECT_NO_THROW(log("thrown at"_s));
+  log("next"_s);
+  drain();
+  EXPECT_THAT(trace_.events(), UnorderedElementsAre("other", "next", "other"));
+  EXPECT_THAT(uncaught.events(), ElementsAre("logger"));
+}
+
+TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereTheFilterOfAnAsyncLoggerThrowsLater) {
+  bool throws = true;  // Touched by tasks of the queue only.
+  multiplexer_->addAsyncLogger(async("async", rt::make<TestFilter>([&](const LUMLogMessage&) {
+                                       if (queue_->isCurrent() && std::exchange(throws, false)) {
+                                         throw Thrown();
+                                       }
+                                       return true;
+                                     })));
+  EXPECT_NO_THROW(log());
+  drain();
+  EXPECT_THAT(trace_.events(), IsEmpty());
+  EXPECT_THAT(uncaught.events(), ElementsAre("logger"));
+  EXPECT_THAT(logAndDrain(), ElementsAre("async"));
+  EXPECT_THAT(uncaught.events(), IsEmpty());
+}
+
+// Those that come after it miss the message, whichever these are.
+TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereAnAsyncLoggerThrowsWhenItIsAskedForItsQueue) {
+  Trace asked;
+  bool throws = true;  // Touched by tasks of the multiplexer's queue only.
+  const auto add = [&](const std::string& name, bool isThrowing) {
+    const Ref<TestAsyncLogger> logger = async(name);
+    logger->operationQueue_ = [&, name, isThrowing] {
+      asked.add(name);
+      if (isThrowing && std::exchange(throws, false)) throw Thrown();
+      return queue_;
+    };
+    multiplexer_->addAsyncLogger(logger);
+  };
+  add("other", false);
+  add("throwing", true);
+  add("another", false);
+  EXPECT_NO_THROW(log());
+  drain();
+  std::vector<std::string> askedUntilThrown = asked.events();
+  ASSERT_FALSE(askedUntilThrown.empty());
+  EXPECT_EQ(askedUntilThrown.back(), "throwing");
+  askedUntilThrown.pop_back();
+  EXPECT_EQ(trace_.events(), askedUntilThrown);
+  EXPECT_THAT(uncaught.events(), ElementsAre("LUMLogMultiplexer"));
+  EXPECT_THAT(logAndDrain(), UnorderedElementsAre("other", "throwing", "another"));
+  EXPECT_THAT(uncaught.events(), IsEmpty());
 }
 
 // One that blocks holds up its own caller only.

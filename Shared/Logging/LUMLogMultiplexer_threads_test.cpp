@@ -4,6 +4,8 @@
 // order in which it logged them; one that comes and goes gets some of them, once each and in the same order.
 
 #include <gtest/gtest.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
 #include <array>
 #include <atomic>
@@ -306,6 +308,46 @@ TEST_F(LUMLogMultiplexerThreadsTest, KeepsItsPromisesAmongHostileLoggers) {
   drain();
   EXPECT_EQ(byAsync, kThreads * kMessages);
   EXPECT_EQ(thrown, kThreads * kMessages / 8);
+}
+
+// Invariant: the child of a fork can log and add loggers at once, whatever the other threads were doing.
+TEST_F(LUMLogMultiplexerThreadsTest, IsUsableInTheChildOfAFork) {
+  constexpr int kForks = 200;
+  constexpr unsigned kPatienceInSeconds = 30;
+  std::atomic<std::uint64_t> heard = 0;
+  multiplexer_->addSyncLogger(rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>&) { ++heard; }));
+  const Ref<LUMLogMessage> message = messageWith(LUMLogLevelInfo);
+  std::atomic<bool> isEnding = false;
+  std::vector<std::thread> threads;
+  threads.reserve(3);
+  for (int i = 0; i < 2; ++i) {
+    threads.emplace_back([&] {
+      while (!isEnding) multiplexer_->logWithMessage(message);
+    });
+  }
+  threads.emplace_back([&] {
+    const Ref<LUMLogFilter> filter = LUMLogNoFilter::init();
+    while (!isEnding) {
+      multiplexer_->addLogFilter(filter);
+      multiplexer_->removeLogFilter(filter);
+    }
+  });
+  int status = 0;
+  for (int i = 0; i < kForks && status == 0; ++i) {
+    const pid_t child = fork();
+    if (child == 0) {
+      alarm(kPatienceInSeconds);  // Ends a child that waits for a thread which it does not have.
+      const std::uint64_t heardBefore = heard;
+      multiplexer_->logWithMessage(message);
+      multiplexer_->addSyncLogger(rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>&) { ++heard; }));
+      multiplexer_->logWithMessage(message);
+      _exit(heard == heardBefore + 3 ? 0 : 1);
+    }
+    if (waitpid(child, &status, 0) != child) status = -1;
+  }
+  isEnding = true;
+  for (std::thread& thread : threads) thread.join();
+  EXPECT_EQ(status, 0);
 }
 
 }  // namespace

@@ -3,6 +3,8 @@
 /// What takes messages and passes them on to filters and loggers that come and go: see LUMLogMultiplexer.
 ///
 ///     void Host::attach(LUMLogMultiplexing& multiplexer) { multiplexer.addSyncLogger(terminal_); }
+///
+/// Not for: whoever logs, who calls LUMLogAt (LUMLog.h).
 
 #include "Runtime/Class.h"
 #include "Runtime/Ref.h"
@@ -12,7 +14,9 @@
 #include "Shared/Logging/LUMSyncLogger.h"
 
 struct LUMLogMultiplexing : rt::Protocol<LUMLogMultiplexing> {
-  /// Passes `message` on; null is ignored. Throws what a filter or a synchronous logger throws.
+  /// Passes `message` on; null is ignored. Throws what is thrown on the way: by a filter, also one that a
+  /// logger has, by a synchronous logger, by an asynchronous one that is asked how it wants to be called, and
+  /// by one that wants `message` at once or is asked for its queue then.
   virtual void logWithMessage(const rt::Ref<LUMLogMessage>& message) = 0;
 
   /// Adds or removes one that all messages must pass. Null is ignored, and so is adding what is there and

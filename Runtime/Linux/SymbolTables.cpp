@@ -10,6 +10,7 @@
 #include <bit>
 #include <cerrno>
 #include <cstring>
+#include <new>
 #include <span>
 #include <type_traits>
 
@@ -78,6 +79,8 @@ class ElfFile {
 }  // namespace
 
 std::optional<SymbolTables::Symbol> SymbolTables::find(std::uint64_t address) {
+  constexpr int kFound = 1;
+  constexpr int kOutOfMemory = 2;
   Image image{.address = address, .path = {}, .headers = {}};
   const auto isThere = [](dl_phdr_info* info, std::size_t, void* argument) -> int {
     Image& found = *static_cast<Image*>(argument);
@@ -97,12 +100,19 @@ std::optional<SymbolTables::Symbol> SymbolTables::find(std::uint64_t address) {
     }
     if (!contains) return 0;
     found.start = found.bias + lowest;
-    // Copied while the image cannot be unloaded.
-    found.path = info->dlpi_name;
-    found.headers.assign(headers.begin(), headers.end());
-    return 1;
+    // Copied while the image cannot be unloaded. Nothing is thrown through the C library, which loads what it
+    // needs for that when it is first thrown through, and ends a program that has no memory then.
+    try {
+      found.path = info->dlpi_name;
+      found.headers.assign(headers.begin(), headers.end());
+      return kFound;
+    } catch (const std::bad_alloc&) {
+      return kOutOfMemory;
+    }
   };
-  if (dl_iterate_phdr(isThere, &image) == 0) return std::nullopt;
+  const int result = dl_iterate_phdr(isThere, &image);
+  if (result == kOutOfMemory) throw std::bad_alloc();
+  if (result != kFound) return std::nullopt;
 
   const auto [known, isNew] = tables_.try_emplace(image.start);
   Table& table = known->second;

@@ -1,29 +1,77 @@
-// Call stacks where memory runs out: null, and nothing thrown. This program's operator new fails on demand.
+// Call stacks where memory runs out: null, and nothing thrown. In this program allocations fail on demand.
 
 #include <gtest/gtest.h>
 
+#include <cerrno>
 #include <cstddef>
 #include <cstdlib>
 #include <new>
 
+#include "Runtime/CallStack.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
 #include "tests/Sanitizers.h"
+
+// Whether malloc and its relatives fail too, where the C library lets a program bring its own.
+#if defined(__GLIBC__) && !RT_TEST_ADDRESS_SANITIZER && !RT_TEST_THREAD_SANITIZER
+#define FAILS_MALLOC 1
+#else
+#define FAILS_MALLOC 0
+#endif
 
 namespace {
 
 // How many allocations more the calling thread gets; less than none for any number.
 constinit thread_local int allowed = -1;
+// How many it was refused.
+constinit thread_local int refused = 0;
+
+[[maybe_unused]] bool isRefused() noexcept {
+  if (allowed == 0) {
+    ++refused;
+    return true;
+  }
+  if (allowed > 0) --allowed;
+  return false;
+}
 
 }  // namespace
 
-// The thread sanitizer brings its own.
-#if !RT_TEST_THREAD_SANITIZER
+#if FAILS_MALLOC
+
+// NOLINTBEGIN(bugprone-reserved-identifier,cert-dcl37-c,cert-dcl51-cpp,readability-identifier-naming,readability-inconsistent-declaration-parameter-name)
+extern "C" {
+
+void* __libc_malloc(std::size_t size);
+void* __libc_calloc(std::size_t count, std::size_t size);
+void* __libc_realloc(void* block, std::size_t size);
+
+void* malloc(std::size_t size) {
+  if (!isRefused()) return __libc_malloc(size);
+  errno = ENOMEM;
+  return nullptr;
+}
+
+void* calloc(std::size_t nmemb, std::size_t size) {
+  if (!isRefused()) return __libc_calloc(nmemb, size);
+  errno = ENOMEM;
+  return nullptr;
+}
+
+void* realloc(void* ptr, std::size_t size) {
+  if (!isRefused()) return __libc_realloc(ptr, size);
+  errno = ENOMEM;
+  return nullptr;
+}
+
+}  // extern "C"
+// NOLINTEND(bugprone-reserved-identifier,cert-dcl37-c,cert-dcl51-cpp,readability-identifier-naming,readability-inconsistent-declaration-parameter-name)
+
+#elif !RT_TEST_THREAD_SANITIZER  // Which brings its own operator new.
 
 // Not inlined, or g++ sees `free` where it looks for a `delete`.
 [[gnu::noinline]] void* operator new(std::size_t size) {
-  if (allowed == 0) throw std::bad_alloc();
-  if (allowed > 0) --allowed;
+  if (isRefused()) throw std::bad_alloc();
   if (void* memory = std::malloc(size)) return memory;
   throw std::bad_alloc();
 }
@@ -38,22 +86,56 @@ constinit thread_local int allowed = -1;
 
 namespace {
 
-// Takes stacks with one allocation more each time, until that is enough; returns how often it was not.
+// Takes stacks with one allocation more each time, until none is refused; returns how often there was no
+// stack.
 template <class Take>
 int failuresOf(Take take) {
-  for (int failures = 0; failures < 100000; ++failures) {
-    allowed = failures;
+  int failures = 0;
+  for (int count = 0; count < 100000; ++count) {
     bool isTaken = false;
-    EXPECT_NO_THROW(isTaken = static_cast<bool>(take()));
+    bool isThrown = false;
+    refused = 0;
+    allowed = count;
+    try {
+      isTaken = static_cast<bool>(take());
+    } catch (...) {
+      isThrown = true;
+    }
     allowed = -1;
-    if (isTaken) return failures;
+    EXPECT_FALSE(isThrown) << "after " << count;
+    if (!isTaken) ++failures;
+    if (refused > 0) continue;
+    EXPECT_TRUE(isTaken);
+    return failures;
   }
   return -1;
 }
 
-TEST(LUMLogCallstackMemory, IsMissedAsAStackIs) {
-  if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the thread sanitizer's operator new cannot be replaced";
-  EXPECT_GE(failuresOf([] { return LUMLogAddressCallstack::addressCallstackIgnoringFrameCount(0); }), 1);
+// The same of a stack of addresses that is taken `depth` calls further in.
+// NOLINTNEXTLINE(misc-no-recursion)
+[[gnu::noinline]] int failuresAtDepth(int depth) {
+  const int failures =
+      depth > 0 ? failuresAtDepth(depth - 1)
+                : failuresOf([] { return LUMLogAddressCallstack::addressCallstackIgnoringFrameCount(0); });
+  rt::CallStack::keepFrame();
+  return failures;
+}
+
+class LUMLogCallstackMemoryTest : public testing::Test {
+ protected:
+  void SetUp() override {
+    if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the thread sanitizer's operator new cannot be replaced";
+  }
+};
+
+// Without the object, or any of the buffers, which begin with room for 128 addresses and double.
+TEST_F(LUMLogCallstackMemoryTest, IsMissedAsAStackOfAddressesIs) {
+  EXPECT_EQ(failuresAtDepth(0), FAILS_MALLOC ? 2 : 1);
+  EXPECT_EQ(failuresAtDepth(150), FAILS_MALLOC ? 3 : 1);
+  EXPECT_EQ(failuresAtDepth(300), FAILS_MALLOC ? 4 : 1);
+}
+
+TEST_F(LUMLogCallstackMemoryTest, IsMissedAsAStackOfNamesIs) {
   EXPECT_GE(failuresOf([] { return LUMLogSymbolCallstack::symbolCallstackIgnoringFrameCount(0); }), 3);
 }
 

@@ -5,6 +5,8 @@
 
 #include <cstdarg>
 #include <cstdint>
+#include <latch>
+#include <optional>
 #include <stdexcept>
 #include <string>
 #include <string_view>
@@ -16,12 +18,14 @@
 #include "Runtime/Queue.h"
 #include "Runtime/Thread.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
+#include "Shared/Logging/LUMLogDropAllFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
 #include "Shared/Logging/LUMSafeNumberParameter.h"
 #include "Shared/Logging/LUMSafeStringParameter.h"
 #include "tests/AllocationCount.h"
 #include "tests/FirstSymbol.h"
+#include "tests/TestLoggers.h"
 
 namespace {
 
@@ -52,6 +56,7 @@ class LUMLogTest : public testing::Test {
     multiplexer_->removeSyncLogger(recorder_);
     multiplexer_->setCaptureCallStack(true);
     multiplexer_->setCaptureCallStackAddresses(true);
+    multiplexer_->setCaptureSwiftCallStackOnErrorAndAbove(false);
   }
 
   /// A message by the entry for programs, with `arguments` passed as they are.
@@ -85,6 +90,17 @@ TEST_F(LUMLogTest, LogsTheMessageThatItReturns) {
   EXPECT_EQ(message->dispatchQueueLabel(), "");
   EXPECT_FALSE(message->safeParameters());
   EXPECT_EQ(message->logMetadata(), metadata);
+}
+
+TEST_F(LUMLogTest, ReturnsTheMessageThatAFilterRefuses) {
+  const rt::Ref<LUMLogFilter> filter = LUMLogDropAllFilter::init();
+  multiplexer_->addLogFilter(filter);
+  const rt::Ref<LUMLogMessage> message = LUMLogAt(LUMLogLevelError, "%d entries", 3);
+  multiplexer_->removeLogFilter(filter);
+  ASSERT_TRUE(message);
+  EXPECT_EQ(message->formattedString(), "3 entries");
+  EXPECT_TRUE(message->callstack());
+  EXPECT_TRUE(recorder_->messages.empty());
 }
 
 TEST_F(LUMLogTest, TellsWhereItIsCalled) {
@@ -239,6 +255,16 @@ TEST_F(LUMLogTest, HasACallStackAtTwoLevels) {
   }
 }
 
+TEST_F(LUMLogTest, HasNoCallStackBecauseOfTheThirdSwitch) {
+  const auto stackAt = [](LUMLogLevel level) { return LUMLogAt(level, "text")->callstack(); };
+  multiplexer_->setCaptureSwiftCallStackOnErrorAndAbove(true);
+  for (const LUMLogLevel level : {LUMLogLevel{0}, LUMLogLevelInfo, LUMLogLevel{5}, ~LUMLogLevel{0}}) {
+    EXPECT_FALSE(stackAt(level)) << level;
+  }
+  multiplexer_->setCaptureCallStack(false);
+  for (const LUMLogLevel level : {LUMLogLevelError, LUMLogLevelFault}) EXPECT_FALSE(stackAt(level)) << level;
+}
+
 // What these log is the last thing that they do.
 [[gnu::noinline]] rt::Ref<LUMLogMessage> functionThatLogs(const rt::Ref<LUMLogMetadata>& metadata) {
   return LUMLogAt(LUMLogLevelError, metadata, "%d", 1);
@@ -319,20 +345,107 @@ class Reader final : public rt::Implements<Reader, rt::Object, LUMSyncLogger> {
   std::size_t length = 0;
 };
 
-TEST_F(LUMLogTest, AllocatesTwicePerMessage) {
-  if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations on this system";
-  multiplexer_->removeSyncLogger(recorder_);
-  const rt::Ref<Reader> reader = rt::make<Reader>();
-  multiplexer_->addSyncLogger(reader);
-  const auto logOnce = [] { LUMLogAt(LUMLogLevelInfo, "%s has %d entries"_s, "holiday.tar", 3); };
-  logOnce();  // The place becomes known.
-  {
-    const AllocationCount count;
-    logOnce();
-    // The message and its text.
-    EXPECT_EQ(count.allocations(), 2);
+/// With a reader in the recorder's place.
+class LUMLogAllocationTest : public LUMLogTest {
+ protected:
+  void SetUp() override {
+    if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations on this system";
+    multiplexer_->removeSyncLogger(recorder_);
+    multiplexer_->addSyncLogger(reader_);
   }
-  multiplexer_->removeSyncLogger(reader);
+  void TearDown() override { multiplexer_->removeSyncLogger(reader_); }
+
+  /// How often `log` allocates once the place is known.
+  template <class Body>
+  static std::int64_t allocationsOf(Body body) {
+    body();
+    const AllocationCount count;
+    body();
+    return count.allocations();
+  }
+  static std::int64_t allocationsOfOneMessage() {
+    return allocationsOf([] { LUMLogAt(LUMLogLevelInfo, "%s has %d entries"_s, "holiday.tar", 3); });
+  }
+
+ private:
+  const rt::Ref<Reader> reader_ = rt::make<Reader>();
+};
+
+// The message and its text.
+TEST_F(LUMLogAllocationTest, AllocatesTwicePerMessage) {
+  EXPECT_EQ(allocationsOfOneMessage(), 2);
+}
+
+// The addresses, which fit into the first buffer, and the object that has them.
+TEST_F(LUMLogAllocationTest, AllocatesTwiceMoreForACallStackOfAddresses) {
+  for (const LUMLogLevel level : {LUMLogLevelError, LUMLogLevelFault}) {
+    EXPECT_EQ(allocationsOf([=] { LUMLogAt(level, "%s has %d entries"_s, "holiday.tar", 3); }), 4);
+  }
+}
+
+// The table and the object that has it, and of each parameter its place and its entry.
+TEST_F(LUMLogAllocationTest, AllocatesFourTimesMoreForASafeParameterAndTwiceForEachFurtherOne) {
+  const auto name = LUMSafeStringParameter::parameterWithString("holiday.tar"_s, 1);
+  EXPECT_EQ(allocationsOf([&] { LUMLogAt(LUMLogLevelInfo, "%@ has %d entries"_s, name, 3); }), 6);
+  EXPECT_EQ(allocationsOf([&] { LUMLogAt(LUMLogLevelInfo, "%@ is in %@ %d times"_s, name, name, 3); }), 8);
+}
+
+// The list of the loggers and the task that goes through it, however many there are.
+TEST_F(LUMLogAllocationTest, AllocatesTwiceMoreForAsyncLoggers) {
+  const auto queue = rt::make<rt::Queue>("logger"_s);
+  std::vector<rt::Ref<LUMAsyncLogger>> loggers;
+  for (int i = 0; i < 5; ++i) {
+    loggers.emplace_back(rt::make<TestAsyncLogger>(queue, [](const rt::Ref<LUMLogMessage>&) {}));
+    multiplexer_->addAsyncLogger(loggers.back());
+    // The task runs elsewhere, or nobody could say whose allocations these are.
+    std::latch isRunning(1);
+    std::latch mayFanOut(1);
+    multiplexer_->loggingQueue()->async([&] {
+      isRunning.count_down();
+      mayFanOut.wait();
+    });
+    isRunning.wait();
+    EXPECT_EQ(allocationsOfOneMessage(), 4) << loggers.size() << " loggers";
+    mayFanOut.count_down();
+    multiplexer_->waitForLogging();
+  }
+  for (const rt::Ref<LUMAsyncLogger>& logger : loggers) multiplexer_->removeAsyncLogger(logger);
+  queue->barrierSync();
+}
+
+// The task by which a message comes to a logger is made after the logger is asked for its queue, and before
+// the next one is.
+TEST_F(LUMLogAllocationTest, AllocatesOnceForEachAsyncLoggerOnTheMultiplexersQueue) {
+  const auto queue = rt::make<rt::Queue>("logger"_s);
+  std::optional<AllocationCount> count;
+  std::vector<std::int64_t> counts;
+  std::vector<rt::Ref<TestAsyncLogger>> loggers;
+  for (int i = 0; i < 2; ++i) {
+    loggers.push_back(rt::make<TestAsyncLogger>(queue, [](const rt::Ref<LUMLogMessage>&) {}));
+    loggers.back()->operationQueue_ = [&] {
+      if (count) {
+        counts.push_back(count->allocations());
+      } else {
+        count.emplace();
+      }
+      return rt::Ref<rt::Queue>(queue);
+    };
+    multiplexer_->addAsyncLogger(loggers.back());
+  }
+  // A queue that runs needs no thread, which would have to be made.
+  std::latch isRunning(1);
+  std::latch mayLog(1);
+  queue->async([&] {
+    isRunning.count_down();
+    mayLog.wait();
+  });
+  isRunning.wait();
+  LUMLogAt(LUMLogLevelInfo, "text"_s);
+  multiplexer_->waitForLogging();
+  mayLog.count_down();
+  queue->barrierSync();
+  for (const rt::Ref<TestAsyncLogger>& logger : loggers) multiplexer_->removeAsyncLogger(logger);
+  EXPECT_THAT(counts, testing::ElementsAre(1));
 }
 
 // What is logged before `main` is logged, whatever the order in which a program is initialized.

@@ -6,6 +6,7 @@
 #include <gmock/gmock.h>
 #include <grp.h>
 #include <gtest/gtest.h>
+#include <pthread.h>
 #include <sys/prctl.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -225,6 +226,32 @@ TEST_F(LUMSystemLoggerTest, WritesNothingWhereItsFormatterThrows) {
   });
   logger->logWithMessage(message);
   logger->logWithMessage(message);
+  EXPECT_THAT(messages(), ElementsAre("the next one"));
+}
+
+// Whoever holds up a cancellation ends the program.
+TEST_F(LUMSystemLoggerTest, LetsAThreadBeCancelledInItsFormatter) {
+  bool cancels = true;
+  const Ref<LUMSystemLogger> logger = loggerWith([&](const LUMLogMessage&) {
+    if (std::exchange(cancels, false)) {
+      pthread_cancel(pthread_self());
+      pthread_testcancel();
+    }
+    return "the next one"_s;
+  });
+  pthread_t thread{};
+  ASSERT_EQ(pthread_create(
+                &thread, nullptr,
+                [](void* argument) -> void* {
+                  static_cast<LUMSystemLogger*>(argument)->logWithMessage(messageWith(LUMLogLevelFault));
+                  return nullptr;
+                },
+                logger.get()),
+            0);
+  void* result = nullptr;
+  ASSERT_EQ(pthread_join(thread, &result), 0);
+  EXPECT_EQ(result, PTHREAD_CANCELED);
+  logger->logWithMessage(messageWith(LUMLogLevelFault));
   EXPECT_THAT(messages(), ElementsAre("the next one"));
 }
 

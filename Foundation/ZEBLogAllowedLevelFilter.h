@@ -2,8 +2,8 @@
 
 /// The filter that lets the lines of some levels pass.
 ///
-///     logger->setFilter(ZEBLogAllowedLevelFilter::initWithAllowedLevels({ZEBLogLevelDebug,
-///     ZEBLogLevelError}));
+///     logger->setFilter(
+///         ZEBLogAllowedLevelFilter::initWithAllowedLevels({ZEBLogLevelDebug, ZEBLogLevelError}));
 ///
 /// It is immutable: any thread may use it.
 ///

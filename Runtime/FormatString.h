@@ -3,8 +3,8 @@
 /// A literal format that has been checked, while compiling, against the types of its arguments.
 ///
 ///     template <class... Arguments>
-///     void report(rt::FormatString<std::type_identity_t<Arguments>...> format, const Arguments&...
-///     arguments);
+///     void report(rt::FormatString<std::type_identity_t<Arguments>...> format,
+///                 const Arguments&... arguments);
 ///
 ///     report("%@ has %d entries", name, 3);
 ///     report("%@ has %d entries", name);                   // does not compile: tooFewArguments

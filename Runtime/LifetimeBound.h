@@ -4,8 +4,7 @@
 ///
 ///     T& operator*() const RT_LIFETIME_BOUND;
 ///
-///     for (const rt::Ref<rt::Object>& name : *names()) ...        // clang: the array is gone after the
-///     first line
+///     for (const rt::Ref<rt::Object>& name : *names()) ...        // clang: the array is gone by then
 ///
 /// Elsewhere it is nothing.
 ///

@@ -5,6 +5,8 @@
 ///     LUMLogMultiplexer::sharedInstance()->setCaptureCallStackAddresses(false);       // names instead
 ///
 /// A change is seen by other threads sooner or later.
+///
+/// Not for: a call stack of one message only; all that are logged from then on have one, or have none.
 
 #include "Runtime/Class.h"
 

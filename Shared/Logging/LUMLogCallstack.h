@@ -3,7 +3,9 @@
 /// A call stack that goes with a log message. It has no operations of its own: who shows messages prints its
 /// `description`, or asks for the class that it knows.
 ///
-///     if (auto* addresses = rt::cast<LUMLogAddressCallstack>(message->callstack())) ...
+///     if (const auto addresses = rt::cast<LUMLogAddressCallstack>(message->callstack())) {
+///       send(addresses->frameCount());
+///     }
 ///
 /// Not for: a call stack without a message (Runtime/CallStack.h).
 

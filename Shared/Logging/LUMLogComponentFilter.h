@@ -2,9 +2,10 @@
 
 /// Lets the messages of one component pass: those whose metadata names it.
 ///
-///     filter = LUMLogComponentFilter::initWithComponent("Importer"_s);
-///     LUMLogAt(LUMLogLevelInfo, LUMLogMetadata::metadataWithComponent("Importer"_s), "started"_s);   //
-///     passes
+///     multiplexer->addLogFilter(LUMLogComponentFilter::initWithComponent("Importer"_s));
+///     const auto importer = LUMLogMetadata::metadataWithComponent("Importer"_s);
+///     LUMLogAt(LUMLogLevelInfo, importer, "started"_s);      // passes
+///     LUMLogAt(LUMLogLevelInfo, "started"_s);                // does not
 ///
 /// Not for: categories or other metadata, which take a filter of one's own.
 

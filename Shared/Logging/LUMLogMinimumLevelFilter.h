@@ -2,7 +2,7 @@
 
 /// Lets messages of a level pass, and of all levels above it.
 ///
-///     logger->setFilter(LUMLogMinimumLevelFilter::initWithMinimumLevel(LUMLogLevelError));
+///     multiplexer->addLogFilter(LUMLogMinimumLevelFilter::initWithMinimumLevel(LUMLogLevelError));
 ///
 /// Not for: what the environment is to decide; see LUMDefaultMinimumLogLevelFilter.
 

@@ -3,6 +3,11 @@
 /// Where messages go. A logger is either a LUMSyncLogger, called by whoever logs, or a LUMAsyncLogger,
 /// called on a queue of its own.
 ///
+///     bool wants(const LUMLogger& logger, const LUMLogMessage& message) {
+///       const rt::Ref<LUMLogFilter> filter = logger.filter();
+///       return !filter || filter->allowLogMessage(message);
+///     }
+///
 /// Not for: classes to conform to directly; name one of the two.
 
 #include "Runtime/Class.h"

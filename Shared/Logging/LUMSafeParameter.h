@@ -3,8 +3,8 @@
 /// An argument of a log message that gives away nothing about anybody: a message keeps it by itself, beside
 /// the text that it is printed into.
 ///
-///     LUMLogAt(LUMLogLevelError, "%@ is not a %@", LUMSafeStringParameter::parameterWithString(key, 1),
-///     other);
+///     const auto key = LUMSafeStringParameter::parameterWithString("greeting"_s, 1);
+///     LUMLogAt(LUMLogLevelError, "%@ cannot be %@"_s, key, value);       // `value` is in the text only
 ///
 /// Two classes conform, LUMSafeStringParameter and LUMSafeNumberParameter. A message keeps what is of a class
 /// with a name that begins with one of theirs.

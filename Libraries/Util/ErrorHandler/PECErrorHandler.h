@@ -14,9 +14,12 @@
 /// The handler is a synchronous logger of the shared LUMLogMultiplexer from the first report on
 /// (Libraries/Util/ErrorHandler/PECReport.h), or from a call of `register_`.
 ///
+/// A fork does not wait for the handler, whose lock is held while the callback runs: in the child of a fork
+/// that came while another thread reported an error, the next error may wait for ever.
+///
 /// A test asks what is reported by some code:
 ///
-///     PECErrorHandler::assertBlockReportsError([&] { registry->internalRegisterBindings(nullptr); });
+///     PECErrorHandler::assertBlockReportsError([&] { registry->removeScopesWithTag(nullptr); });
 ///
 /// Not for: errors that a correct program can meet: those are results, or messages of LUMLogLevelError.
 
@@ -59,15 +62,17 @@ class PECErrorHandler : public rt::Implements<PECErrorHandler, rt::Object, LUMSy
   rt::Ref<LUMLogFilter> filter() const override { return filter_; }
 
   /// Makes `block` the callback. It cannot be null and there can be no callback yet: both are errors that are
-  /// reported, and the callback stays as it is.
+  /// reported, and the callback stays as it is. Throws what the callback throws that is told of them; that is
+  /// an rt::InternalInconsistencyException where `block` is null and there is no callback. Waits for a
+  /// callback that runs on another thread. Any thread may call it.
   void registerErrorHandlerBlock(PECErrorHandlerBlock block);
 
   /// The callback that stands in where none is set: it fails an assertion, by the thread's
   /// rt::AssertionHandler. The same at every call.
   static PECErrorHandlerBlock defaultErrorHandlerBlock();
 
-  /// The callback, and the number of errors that it was told of. Setting them asks nothing and waits for
-  /// nobody; any thread may do it.
+  /// The callback, null where none is set, and the number of errors that were handled: one whose callback
+  /// threw is not counted. Setting them asks nothing and waits for nobody; any thread may do it.
   PECErrorHandlerBlock errorHandlerBlock() const;
   void setErrorHandlerBlock(PECErrorHandlerBlock block);
   std::int32_t errorCount() const noexcept { return errorCount_.load(std::memory_order_relaxed); }
@@ -79,7 +84,8 @@ class PECErrorHandler : public rt::Implements<PECErrorHandler, rt::Object, LUMSy
   static void resetAfterTest();
 
   /// How many errors `block`, which is not null, reports; the callback is told of none of them. If `block`
-  /// throws, it is told of none from then on either, until `resetAfterTest`.
+  /// throws, a callback that does nothing stays in its place, until `setErrorHandlerBlock` sets another or
+  /// `resetAfterTest` brings the default back.
   static std::int32_t errorCountInBlock(const rt::Block<void()>& block);
 
   /// Throws an rt::Exception of the name "Assertion Failed!" unless `block` reports an error, or if it does.

@@ -2,11 +2,15 @@
 
 /// How the libraries report misuse: the one line at the place where it is found.
 ///
-///     constexpr const char* kFile = "Shared/ServiceRegistry/Source/SRLRegistry";
+///     using namespace rt::literals;
 ///
-///     PECReport({kFile, "-[SRLRegistry internalRegisterBindings:]"},
-///               "API %@ is bound %@ times."_s, identifier, count);
-///     return nullptr;
+///     constexpr const char* kFile = "Shared/Entrance/Source/ENTDoor";
+///
+///     rt::Ref<Key> ENTDoor::keyNamed(const rt::String& name) {
+///       if (const auto found = keys_.find(name); found != keys_.end()) return found->second;
+///       PECReport({kFile, "-[ENTDoor keyNamed:]"}, "None of %@ keys is named %@."_s, keys_.size(), name);
+///       return nullptr;
+///     }
 ///
 /// It makes sure that the error handler is told, and logs a message of LUMLogLevelFault of which the caller's
 /// own function is first in the call stack. Every parameter is printed by "%@" and kept by itself in the

@@ -21,8 +21,9 @@
 #include "Runtime/Array.h"
 #include "Runtime/RecursiveLock.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 
-class ZEBArrayCompositeLogWriter final
+class RT_VISIBLE ZEBArrayCompositeLogWriter final
     : public rt::Implements<ZEBArrayCompositeLogWriter, rt::Object, ZEBLogWriter> {
  public:
   /// A writer to the elements of `array`; null for null.

@@ -15,8 +15,10 @@
 #include "Foundation/ZEBLogWriter.h"
 #include "Runtime/FileHandle.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 
-class ZEBFileHandleLogWriter final : public rt::Implements<ZEBFileHandleLogWriter, rt::Object, ZEBLogWriter> {
+class RT_VISIBLE ZEBFileHandleLogWriter final
+    : public rt::Implements<ZEBFileHandleLogWriter, rt::Object, ZEBLogWriter> {
  public:
   /// A writer over `fileHandle`; null for null.
   static rt::Ref<ZEBFileHandleLogWriter> initWithFileHandle(rt::Ref<rt::FileHandle> fileHandle);

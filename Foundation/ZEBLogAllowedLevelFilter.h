@@ -14,8 +14,10 @@
 
 #include "Foundation/ZEBLogFilter.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 
-class ZEBLogAllowedLevelFilter : public rt::Implements<ZEBLogAllowedLevelFilter, rt::Object, ZEBLogFilter> {
+class RT_VISIBLE ZEBLogAllowedLevelFilter
+    : public rt::Implements<ZEBLogAllowedLevelFilter, rt::Object, ZEBLogFilter> {
  public:
   /// One that allows `allowedLevels`; null where there are none, or one of them is not from 0 to 4.
   static rt::Ref<ZEBLogAllowedLevelFilter> initWithAllowedLevels(const std::set<ZEBLogLevel>& allowedLevels);

@@ -7,8 +7,10 @@
 /// Any thread may use it.
 
 #include "Foundation/ZEBLogFormatter.h"
+#include "Runtime/Visibility.h"
 
-class ZEBLogBasicFormatter : public rt::Implements<ZEBLogBasicFormatter, rt::Object, ZEBLogFormatter> {
+class RT_VISIBLE ZEBLogBasicFormatter
+    : public rt::Implements<ZEBLogBasicFormatter, rt::Object, ZEBLogFormatter> {
  public:
   ZEBLogBasicFormatter() = default;
 

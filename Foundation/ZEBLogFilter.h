@@ -14,8 +14,9 @@
 #include "Foundation/ZEBLogLevel.h"
 #include "Runtime/Class.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 
-struct ZEBLogFilter : rt::Protocol<ZEBLogFilter> {
+struct RT_VISIBLE ZEBLogFilter : rt::Protocol<ZEBLogFilter> {
   /// Whether the finished line `message` is written. Called by any thread that logs, by several at once.
   /// What it throws the logger drops, with the line.
   virtual bool filterAllowsMessage(const rt::String& message, ZEBLogLevel level) = 0;

@@ -17,8 +17,9 @@
 #include "Foundation/ZEBLogLevel.h"
 #include "Runtime/Class.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 
-struct ZEBLogFormatter : rt::Protocol<ZEBLogFormatter> {
+struct RT_VISIBLE ZEBLogFormatter : rt::Protocol<ZEBLogFormatter> {
   /// The line, without an end, for the format `withFormat` with the arguments of `valist`, which is left
   /// where it is; null for none, and then nothing is logged. `func` is the name of the function that logs,
   /// or null. Called by any thread that logs, by several at once. What it throws the logger drops, with the

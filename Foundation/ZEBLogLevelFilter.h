@@ -22,8 +22,10 @@
 #include "Runtime/RecursiveLock.h"
 #include "Runtime/Ref.h"
 #include "Runtime/UserDefaults.h"
+#include "Runtime/Visibility.h"
 
-class ZEBLogLevelFilter final : public rt::Implements<ZEBLogLevelFilter, rt::Object, ZEBLogFilter> {
+class RT_VISIBLE ZEBLogLevelFilter final
+    : public rt::Implements<ZEBLogLevelFilter, rt::Object, ZEBLogFilter> {
  public:
   /// One that is in no logger yet.
   static rt::Ref<ZEBLogLevelFilter> init();

@@ -5,8 +5,9 @@
 ///     logger->setFilter(ZEBLogMaximumLevelFilter::initWithMaximumLevel(ZEBLogLevelInfo));
 
 #include "Foundation/ZEBLogAllowedLevelFilter.h"
+#include "Runtime/Visibility.h"
 
-class ZEBLogMaximumLevelFilter final
+class RT_VISIBLE ZEBLogMaximumLevelFilter final
     : public rt::Implements<ZEBLogMaximumLevelFilter, ZEBLogAllowedLevelFilter> {
  public:
   /// One that allows the levels 0 to `maximumLevel`; null where that is not from 0 to 4.

@@ -7,8 +7,9 @@
 /// Its name is spelled like this for good: classes are found by their names.
 
 #include "Foundation/ZEBLogAllowedLevelFilter.h"
+#include "Runtime/Visibility.h"
 
-class ZEBLogMininumLevelFilter final
+class RT_VISIBLE ZEBLogMininumLevelFilter final
     : public rt::Implements<ZEBLogMininumLevelFilter, ZEBLogAllowedLevelFilter> {
  public:
   /// One that allows the levels `minimumLevel` to 4; null where that is not from 0 to 4.

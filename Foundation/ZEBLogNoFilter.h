@@ -7,8 +7,9 @@
 /// Any thread may use it.
 
 #include "Foundation/ZEBLogFilter.h"
+#include "Runtime/Visibility.h"
 
-class ZEBLogNoFilter final : public rt::Implements<ZEBLogNoFilter, rt::Object, ZEBLogFilter> {
+class RT_VISIBLE ZEBLogNoFilter final : public rt::Implements<ZEBLogNoFilter, rt::Object, ZEBLogFilter> {
  public:
   /// True.
   bool filterAllowsMessage(const rt::String& message, ZEBLogLevel level) override;

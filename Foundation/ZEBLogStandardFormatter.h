@@ -17,8 +17,10 @@
 #include "Foundation/ZEBLogBasicFormatter.h"
 #include "Runtime/LocalTimeFormatter.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 
-class ZEBLogStandardFormatter : public rt::Implements<ZEBLogStandardFormatter, ZEBLogBasicFormatter> {
+class RT_VISIBLE ZEBLogStandardFormatter
+    : public rt::Implements<ZEBLogStandardFormatter, ZEBLogBasicFormatter> {
  public:
   /// A formatter for this process; null where its name or a formatter of dates cannot be had.
   static rt::Ref<ZEBLogStandardFormatter> init();

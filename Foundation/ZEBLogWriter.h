@@ -17,8 +17,9 @@
 #include "Foundation/ZEBLogLevel.h"
 #include "Runtime/Class.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 
-struct ZEBLogWriter : rt::Protocol<ZEBLogWriter> {
+struct RT_VISIBLE ZEBLogWriter : rt::Protocol<ZEBLogWriter> {
   /// Writes one finished line, which comes without its end. Called by any thread that logs, by several at
   /// once. What it throws the logger drops, with the line.
   virtual void logMessage(const rt::String& message, ZEBLogLevel level) = 0;

@@ -32,8 +32,9 @@
 #include "Runtime/RecursiveLock.h"
 #include "Runtime/Ref.h"
 #include "Runtime/UnfairLock.h"
+#include "Runtime/Visibility.h"
 
-class ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLogWriter> {
+class RT_VISIBLE ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLogWriter> {
  public:
   /// The process's logger: what `setSharedLogger` has set or, before that and after it has set null, a
   /// `standardLogger`, which is made by the first call. Null only where that is.

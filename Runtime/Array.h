@@ -23,10 +23,11 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 
 namespace rt {
 
-class Array : public Implements<Array, Object> {
+class RT_VISIBLE Array : public Implements<Array, Object> {
  public:
   /// Throws std::invalid_argument if one of the elements is null.
   explicit Array(std::vector<Ref<Object>> elements = {});

@@ -20,10 +20,11 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 
 namespace rt {
 
-class AssertionHandler : public Implements<AssertionHandler, Object> {
+class RT_VISIBLE AssertionHandler : public Implements<AssertionHandler, Object> {
  public:
   /// The calling thread's handler; never null. A thread that has set none has the default one, which is
   /// an AssertionHandler itself and shared by all threads.

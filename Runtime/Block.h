@@ -31,13 +31,14 @@
 #include "Runtime/Class.h"
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 
 namespace rt {
 
 namespace detail {
 
 /// The class of what blocks refer to.
-class BlockObject : public Implements<BlockObject, Object> {
+class RT_VISIBLE BlockObject : public Implements<BlockObject, Object> {
  public:
   static constexpr std::string_view kClassName = "Block";
 

@@ -28,6 +28,7 @@
 #include "Runtime/ClassMethod.h"
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 
 namespace rt {
 
@@ -35,7 +36,7 @@ class KeyedArchiver;
 class KeyedUnarchiver;
 
 /// An object that can be put into an archive.
-struct Coding : Protocol<Coding> {
+struct RT_VISIBLE Coding : Protocol<Coding> {
   /// Has `coder` encode what the object is made of, each part under a key of its own. It must not keep
   /// `coder`. An exception ends the archiving.
   virtual void encodeWithCoder(KeyedArchiver& coder) const = 0;
@@ -46,7 +47,7 @@ struct Coding : Protocol<Coding> {
 
 /// An object whose class can be trusted with what stands in an archive from anywhere: its `initWithCoder`
 /// asks for every part by the classes that it may have. Only such objects are archived.
-struct SecureCoding : Protocol<SecureCoding, Coding> {
+struct RT_VISIBLE SecureCoding : Protocol<SecureCoding, Coding> {
  protected:
   ~SecureCoding() = default;
 };

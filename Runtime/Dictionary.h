@@ -28,10 +28,11 @@
 #include "Runtime/ObjectHash.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 
 namespace rt {
 
-class Dictionary final : public Implements<Dictionary, Object> {
+class RT_VISIBLE Dictionary final : public Implements<Dictionary, Object> {
  public:
   using Entries = std::unordered_map<Ref<Object>, Ref<Object>, ObjectHash, ObjectEqual>;
 

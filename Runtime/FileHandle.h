@@ -22,10 +22,11 @@
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
 #include "Runtime/UnfairLock.h"
+#include "Runtime/Visibility.h"
 
 namespace rt {
 
-class FileHandle final : public Implements<FileHandle, Object> {
+class RT_VISIBLE FileHandle final : public Implements<FileHandle, Object> {
  public:
   /// Whether releasing a handle closes its descriptor.
   enum class Closing : bool { leavesOpen, closes };

@@ -36,10 +36,11 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 
 namespace rt {
 
-class LocalTimeFormatter final : public Implements<LocalTimeFormatter, Object> {
+class RT_VISIBLE LocalTimeFormatter final : public Implements<LocalTimeFormatter, Object> {
  public:
   /// A formatter for `pattern`; null where that is null, has letters that are no field, or an apostrophe
   /// without its partner.

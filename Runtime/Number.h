@@ -20,10 +20,11 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 
 namespace rt {
 
-class Number final : public Implements<Number, Object> {
+class RT_VISIBLE Number final : public Implements<Number, Object> {
  public:
   enum class Kind : std::uint8_t {
     kBoolean,

@@ -50,6 +50,7 @@
 #include "Runtime/String.h"
 #include "Runtime/ThreadSafety.h"
 #include "Runtime/UnfairLock.h"
+#include "Runtime/Visibility.h"
 #include "Runtime/WorkerPool.h"
 
 namespace rt::detail {
@@ -58,7 +59,7 @@ class QueueRegistry;
 
 namespace rt {
 
-class RT_CAPABILITY("queue") Queue : public Implements<Queue, Object>, private detail::Work {
+class RT_VISIBLE RT_CAPABILITY("queue") Queue : public Implements<Queue, Object>, private detail::Work {
  public:
   /// How often what tasks queue at exit is run in turn.
   static constexpr int kExitRounds = 16;

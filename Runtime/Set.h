@@ -25,10 +25,11 @@
 #include "Runtime/ObjectHash.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 
 namespace rt {
 
-class Set final : public Implements<Set, Object> {
+class RT_VISIBLE Set final : public Implements<Set, Object> {
  public:
   using Elements = std::unordered_set<Ref<Object>, ObjectHash, ObjectEqual>;
 

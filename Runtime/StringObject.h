@@ -18,10 +18,11 @@
 #include "Runtime/Class.h"
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 
 namespace rt {
 
-class StringObject final : public Implements<StringObject, Object> {
+class RT_VISIBLE StringObject final : public Implements<StringObject, Object> {
  public:
   static constexpr std::string_view kClassName = "String";
 

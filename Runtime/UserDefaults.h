@@ -44,6 +44,7 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 
 namespace rt {
 
@@ -52,7 +53,7 @@ class DefaultsStore;
 struct DefaultsObserver;
 }  // namespace detail
 
-class UserDefaults final : public Implements<UserDefaults, Object> {
+class RT_VISIBLE UserDefaults final : public Implements<UserDefaults, Object> {
  public:
   /// When an observer is called.
   enum class Notify : std::uint8_t {

@@ -27,6 +27,7 @@
 
 #include "Runtime/Queue.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogger.h"
 
 /// How a LUMAsyncLogger wants to be called.
@@ -35,7 +36,7 @@ using LUMLogDispatchMode = std::uint32_t;
 /// Before `LUMLog` returns. Any other value: later.
 inline constexpr LUMLogDispatchMode LUMLogDispatchModeSynchronous = 2;
 
-struct LUMAsyncLogger : rt::Protocol<LUMAsyncLogger, LUMLogger> {
+struct RT_VISIBLE LUMAsyncLogger : rt::Protocol<LUMAsyncLogger, LUMLogger> {
   /// The queue to be called on; without one the logger receives nothing. Asked on the multiplexer's queue,
   /// or on the thread that logs where the logger wants the message at once.
   virtual rt::Ref<rt::Queue> operationQueue() const = 0;

@@ -12,9 +12,10 @@
 #include "Runtime/Class.h"
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogFilter.h"
 
-class LUMDefaultMinimumLogLevelFilter
+class RT_VISIBLE LUMDefaultMinimumLogLevelFilter
     : public rt::Implements<LUMDefaultMinimumLogLevelFilter, rt::Object, LUMLogFilter> {
  public:
   static rt::Ref<LUMDefaultMinimumLogLevelFilter> init() {

@@ -27,9 +27,11 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogCallstack.h"
 
-class LUMLogAddressCallstack : public rt::Implements<LUMLogAddressCallstack, rt::Object, LUMLogCallstack> {
+class RT_VISIBLE LUMLogAddressCallstack
+    : public rt::Implements<LUMLogAddressCallstack, rt::Object, LUMLogCallstack> {
  public:
   /// Called with an address, its place from 0, and where to write true for this call to be the last.
   using Visitor = rt::Block<void(std::uint64_t address, std::uint64_t index, bool* stop)>;

@@ -9,8 +9,9 @@
 /// Not for: a call stack of one message only; all that are logged from then on have one, or have none.
 
 #include "Runtime/Class.h"
+#include "Runtime/Visibility.h"
 
-struct LUMLogAppControl : rt::Protocol<LUMLogAppControl> {
+struct RT_VISIBLE LUMLogAppControl : rt::Protocol<LUMLogAppControl> {
   /// Whether messages of the levels 3 and 4 have a call stack.
   virtual bool captureCallStack() const = 0;
   virtual void setCaptureCallStack(bool capture) = 0;

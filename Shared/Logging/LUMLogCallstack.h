@@ -10,8 +10,9 @@
 /// Not for: a call stack without a message (Runtime/CallStack.h).
 
 #include "Runtime/Class.h"
+#include "Runtime/Visibility.h"
 
-struct LUMLogCallstack : rt::Protocol<LUMLogCallstack> {
+struct RT_VISIBLE LUMLogCallstack : rt::Protocol<LUMLogCallstack> {
  protected:
   ~LUMLogCallstack() = default;
 };

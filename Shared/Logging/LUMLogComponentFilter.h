@@ -15,9 +15,11 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogFilter.h"
 
-class LUMLogComponentFilter : public rt::Implements<LUMLogComponentFilter, rt::Object, LUMLogFilter> {
+class RT_VISIBLE LUMLogComponentFilter
+    : public rt::Implements<LUMLogComponentFilter, rt::Object, LUMLogFilter> {
  public:
   /// Lets nothing pass if `component` is null: a message without metadata or without a component has none
   /// that could be equal.

@@ -9,9 +9,10 @@
 #include "Runtime/Class.h"
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogFilter.h"
 
-class LUMLogDropAllFilter : public rt::Implements<LUMLogDropAllFilter, rt::Object, LUMLogFilter> {
+class RT_VISIBLE LUMLogDropAllFilter : public rt::Implements<LUMLogDropAllFilter, rt::Object, LUMLogFilter> {
  public:
   static rt::Ref<LUMLogDropAllFilter> init() { return rt::make<LUMLogDropAllFilter>(); }
 

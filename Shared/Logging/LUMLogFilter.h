@@ -13,9 +13,10 @@
 /// Not for: changing messages, which nobody can.
 
 #include "Runtime/Class.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogMessage.h"
 
-struct LUMLogFilter : rt::Protocol<LUMLogFilter> {
+struct RT_VISIBLE LUMLogFilter : rt::Protocol<LUMLogFilter> {
   /// Whether `message` may pass.
   virtual bool allowLogMessage(const LUMLogMessage& message) const = 0;
 

@@ -12,9 +12,10 @@
 
 #include "Runtime/Class.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogMessage.h"
 
-struct LUMLogFormatter : rt::Protocol<LUMLogFormatter> {
+struct RT_VISIBLE LUMLogFormatter : rt::Protocol<LUMLogFormatter> {
   /// The text for `message`; may be null.
   virtual rt::String formattedLogMessage(const LUMLogMessage& message) const = 0;
 

@@ -17,9 +17,11 @@
 #include "Runtime/Class.h"
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogFilter.h"
 
-class LUMLogLogicalAndFilter : public rt::Implements<LUMLogLogicalAndFilter, rt::Object, LUMLogFilter> {
+class RT_VISIBLE LUMLogLogicalAndFilter
+    : public rt::Implements<LUMLogLogicalAndFilter, rt::Object, LUMLogFilter> {
  public:
   /// Of `filters`, which are asked in order until one refuses the message; what is no LUMLogFilter refuses
   /// all. Where there are none, or `filters` is null, nothing passes.

@@ -14,9 +14,11 @@
 #include "Runtime/Class.h"
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogFilter.h"
 
-class LUMLogLogicalOrFilter : public rt::Implements<LUMLogLogicalOrFilter, rt::Object, LUMLogFilter> {
+class RT_VISIBLE LUMLogLogicalOrFilter
+    : public rt::Implements<LUMLogLogicalOrFilter, rt::Object, LUMLogFilter> {
  public:
   /// Of `filters`, which are asked in order until one lets the message pass; what is no LUMLogFilter lets
   /// none pass. Where there are none, or `filters` is null, nothing passes.

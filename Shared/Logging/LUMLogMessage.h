@@ -19,11 +19,12 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogCallstack.h"
 #include "Shared/Logging/LUMLogLevel.h"
 #include "Shared/Logging/LUMLogMetadata.h"
 
-class LUMLogMessage : public rt::Implements<LUMLogMessage, rt::Object> {
+class RT_VISIBLE LUMLogMessage : public rt::Implements<LUMLogMessage, rt::Object> {
  public:
   /// A message with these fields. Where `threadName` or `dispatchQueueLabel` is null, the calling thread's
   /// name or the label of the queue that it runs for stands there instead, "" without one. All others may be

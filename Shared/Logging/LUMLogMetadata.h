@@ -20,8 +20,9 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 
-class LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Object> {
+class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Object> {
  public:
   /// The keys, as they are in `properties`.
   static const rt::String kObfuscatedKiriIDKey;  // "LUMLogMetadataObfuscatedKiriID"

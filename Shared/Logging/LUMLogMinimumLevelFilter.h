@@ -9,10 +9,12 @@
 #include "Runtime/Class.h"
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogFilter.h"
 #include "Shared/Logging/LUMLogLevel.h"
 
-class LUMLogMinimumLevelFilter : public rt::Implements<LUMLogMinimumLevelFilter, rt::Object, LUMLogFilter> {
+class RT_VISIBLE LUMLogMinimumLevelFilter
+    : public rt::Implements<LUMLogMinimumLevelFilter, rt::Object, LUMLogFilter> {
  public:
   static rt::Ref<LUMLogMinimumLevelFilter> initWithMinimumLevel(LUMLogLevel minimumLevel) {
     return rt::Ref<LUMLogMinimumLevelFilter>::adopt(new LUMLogMinimumLevelFilter(minimumLevel));

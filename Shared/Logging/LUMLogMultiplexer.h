@@ -39,11 +39,12 @@
 #include "Runtime/Queue.h"
 #include "Runtime/Ref.h"
 #include "Runtime/ThreadSafety.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogAppControl.h"
 #include "Shared/Logging/LUMLogMultiplexing.h"
 #include "Shared/Logging/LUMSystemLogger.h"
 
-class LUMLogMultiplexer
+class RT_VISIBLE LUMLogMultiplexer
     : public rt::Implements<LUMLogMultiplexer, rt::Object, LUMLogAppControl, LUMLogMultiplexing> {
  public:
   /// The one that LUMLog uses; made when it is first asked for, and never destroyed.

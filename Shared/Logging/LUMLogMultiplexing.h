@@ -8,12 +8,13 @@
 
 #include "Runtime/Class.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMAsyncLogger.h"
 #include "Shared/Logging/LUMLogFilter.h"
 #include "Shared/Logging/LUMLogMessage.h"
 #include "Shared/Logging/LUMSyncLogger.h"
 
-struct LUMLogMultiplexing : rt::Protocol<LUMLogMultiplexing> {
+struct RT_VISIBLE LUMLogMultiplexing : rt::Protocol<LUMLogMultiplexing> {
   /// Passes `message` on; null is ignored. Throws what is thrown on the way: by a filter, also one that a
   /// logger has, by a synchronous logger, by an asynchronous one that is asked how it wants to be called, and
   /// by one that wants `message` at once or is asked for its queue then.

@@ -9,9 +9,10 @@
 #include "Runtime/Class.h"
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogFilter.h"
 
-class LUMLogNoFilter : public rt::Implements<LUMLogNoFilter, rt::Object, LUMLogFilter> {
+class RT_VISIBLE LUMLogNoFilter : public rt::Implements<LUMLogNoFilter, rt::Object, LUMLogFilter> {
  public:
   static rt::Ref<LUMLogNoFilter> init() { return rt::make<LUMLogNoFilter>(); }
 

@@ -17,9 +17,11 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogCallstack.h"
 
-class LUMLogSymbolCallstack : public rt::Implements<LUMLogSymbolCallstack, rt::Object, LUMLogCallstack> {
+class RT_VISIBLE LUMLogSymbolCallstack
+    : public rt::Implements<LUMLogSymbolCallstack, rt::Object, LUMLogCallstack> {
  public:
   /// Where the calling thread is, without its `count` innermost calls, of which the caller of this function
   /// is the first. Null if the stack has no more than `count` calls, this one included, and without memory.

@@ -12,10 +12,11 @@
 
 #include "Runtime/Class.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogFilter.h"
 #include "Shared/Logging/LUMLogMessage.h"
 
-struct LUMLogger : rt::Protocol<LUMLogger> {
+struct RT_VISIBLE LUMLogger : rt::Protocol<LUMLogger> {
   /// Takes `message`, which is not null. No lock is held: it may log, and add and remove loggers.
   virtual void logWithMessage(const rt::Ref<LUMLogMessage>& message) = 0;
 

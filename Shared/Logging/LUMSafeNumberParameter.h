@@ -16,9 +16,11 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMSafeParameter.h"
 
-class LUMSafeNumberParameter : public rt::Implements<LUMSafeNumberParameter, rt::Object, LUMSafeParameter> {
+class RT_VISIBLE LUMSafeNumberParameter
+    : public rt::Implements<LUMSafeNumberParameter, rt::Object, LUMSafeParameter> {
  public:
   /// A parameter of `number`, which may be null. Throws std::bad_alloc.
   static rt::Ref<LUMSafeNumberParameter> parameterWithNumber(rt::Ref<rt::Number> number, std::uint64_t type) {

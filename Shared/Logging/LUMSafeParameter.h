@@ -14,8 +14,9 @@
 #include <cstdint>
 
 #include "Runtime/Class.h"
+#include "Runtime/Visibility.h"
 
-struct LUMSafeParameter : rt::Protocol<LUMSafeParameter> {
+struct RT_VISIBLE LUMSafeParameter : rt::Protocol<LUMSafeParameter> {
   /// What the value is, in the caller's own numbers.
   virtual std::uint64_t type() const = 0;
 

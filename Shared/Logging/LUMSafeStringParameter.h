@@ -15,9 +15,11 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMSafeParameter.h"
 
-class LUMSafeStringParameter : public rt::Implements<LUMSafeStringParameter, rt::Object, LUMSafeParameter> {
+class RT_VISIBLE LUMSafeStringParameter
+    : public rt::Implements<LUMSafeStringParameter, rt::Object, LUMSafeParameter> {
  public:
   /// A parameter of `string`, which may be null. Throws std::bad_alloc.
   static rt::Ref<LUMSafeStringParameter> parameterWithString(rt::String string, std::uint64_t type) {

@@ -14,9 +14,10 @@
 ///
 /// Not for: what takes long; see LUMAsyncLogger.
 
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogger.h"
 
-struct LUMSyncLogger : rt::Protocol<LUMSyncLogger, LUMLogger> {
+struct RT_VISIBLE LUMSyncLogger : rt::Protocol<LUMSyncLogger, LUMLogger> {
  protected:
   ~LUMSyncLogger() = default;
 };

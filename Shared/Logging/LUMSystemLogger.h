@@ -14,11 +14,12 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogFilter.h"
 #include "Shared/Logging/LUMLogFormatter.h"
 #include "Shared/Logging/LUMSyncLogger.h"
 
-class LUMSystemLogger : public rt::Implements<LUMSystemLogger, rt::Object, LUMSyncLogger> {
+class RT_VISIBLE LUMSystemLogger : public rt::Implements<LUMSystemLogger, rt::Object, LUMSyncLogger> {
  public:
   /// With `filter`, which may be null, and with `formatter`, or a LUMSystemLoggerFormatter where that is
   /// null. Keeps the identifier that the main bundle has now.

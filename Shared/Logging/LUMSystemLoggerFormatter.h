@@ -11,9 +11,10 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogFormatter.h"
 
-class LUMSystemLoggerFormatter
+class RT_VISIBLE LUMSystemLoggerFormatter
     : public rt::Implements<LUMSystemLoggerFormatter, rt::Object, LUMLogFormatter> {
  public:
   static rt::Ref<LUMSystemLoggerFormatter> init() { return rt::make<LUMSystemLoggerFormatter>(); }

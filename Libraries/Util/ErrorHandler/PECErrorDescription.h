@@ -15,8 +15,9 @@
 #include "Runtime/Class.h"
 #include "Runtime/Object.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 
-class PECErrorDescription : public rt::Implements<PECErrorDescription, rt::Object> {
+class RT_VISIBLE PECErrorDescription : public rt::Implements<PECErrorDescription, rt::Object> {
  public:
   PECErrorDescription() = default;
 

@@ -15,8 +15,9 @@
 #include "Runtime/Class.h"
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 
-class AVOProvider final : public rt::Implements<AVOProvider, rt::Object> {
+class RT_VISIBLE AVOProvider final : public rt::Implements<AVOProvider, rt::Object> {
  public:
   using ProviderBlock = rt::Block<rt::Ref<rt::Object>()>;
 

@@ -19,9 +19,10 @@
 #include "Runtime/Class.h"
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 #include "Runtime/Weak.h"
 
-struct SRLScopeLifecycleDelegate : rt::Protocol<SRLScopeLifecycleDelegate> {
+struct RT_VISIBLE SRLScopeLifecycleDelegate : rt::Protocol<SRLScopeLifecycleDelegate> {
   /// The scopes with `tag` have been removed, and have given up the instances that they had:
   /// `serviceInstances`, of which those that are still there are kept by somebody else. Called on the thread
   /// that removed them, without a lock. `serviceInstances` is empty where the delegate was set only after the

@@ -29,9 +29,11 @@
 #include "Runtime/Class.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogMultiplexing.h"
 
-class LUMLoggingReroutingZEBLogger : public rt::Implements<LUMLoggingReroutingZEBLogger, ZEBLogger> {
+class RT_VISIBLE LUMLoggingReroutingZEBLogger
+    : public rt::Implements<LUMLoggingReroutingZEBLogger, ZEBLogger> {
  public:
   /// With messages for `logMultiplexer`; null where that is null. `stackTraceFilter`, which may be null, is
   /// asked with text and level which messages have a call stack, as far as the multiplexer wants any; without

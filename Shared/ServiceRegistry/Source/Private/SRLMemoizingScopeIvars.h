@@ -14,9 +14,10 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/UnfairLock.h"
+#include "Runtime/Visibility.h"
 
 /// The making of an instance: a lock that whoever makes it holds meanwhile, and for which the others wait.
-class SRLPendingCreation final : public rt::Implements<SRLPendingCreation, rt::Object> {
+class RT_VISIBLE SRLPendingCreation final : public rt::Implements<SRLPendingCreation, rt::Object> {
  public:
   // A thread takes and lets go the lock in different functions, and only for the time between them.
   void begin() noexcept RT_NO_THREAD_SAFETY_ANALYSIS { lock_.lock(); }

@@ -18,10 +18,12 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationEventProtocol.h"
 
-class SRLPServiceInitializationEvent final : public rt::Implements<SRLPServiceInitializationEvent, rt::Object,
-                                                                   SRLPServiceInitializationEventProtocol> {
+class RT_VISIBLE SRLPServiceInitializationEvent final
+    : public rt::Implements<SRLPServiceInitializationEvent, rt::Object,
+                            SRLPServiceInitializationEventProtocol> {
  public:
   /// With what its accessors return. Each string may be null. Throws std::bad_alloc.
   static rt::Ref<SRLPServiceInitializationEvent> initWithAPIDescription(

@@ -15,8 +15,10 @@
 
 #include "Runtime/Class.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 
-struct SRLPServiceInitializationEventProtocol : rt::Protocol<SRLPServiceInitializationEventProtocol> {
+struct RT_VISIBLE SRLPServiceInitializationEventProtocol
+    : rt::Protocol<SRLPServiceInitializationEventProtocol> {
   /// The API's identifier; repaired where it is not UTF-8.
   virtual const rt::String& apiDescription() const = 0;
   /// The implementation, described in full.

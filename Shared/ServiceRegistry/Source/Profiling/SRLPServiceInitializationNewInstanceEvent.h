@@ -17,9 +17,10 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationNewInstanceEventProtocol.h"
 
-class SRLPServiceInitializationNewInstanceEvent final
+class RT_VISIBLE SRLPServiceInitializationNewInstanceEvent final
     : public rt::Implements<SRLPServiceInitializationNewInstanceEvent, rt::Object,
                             SRLPServiceInitializationNewInstanceEventProtocol> {
  public:

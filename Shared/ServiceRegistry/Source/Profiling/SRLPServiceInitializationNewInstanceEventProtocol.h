@@ -13,8 +13,9 @@
 
 #include "Runtime/Class.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 
-struct SRLPServiceInitializationNewInstanceEventProtocol
+struct RT_VISIBLE SRLPServiceInitializationNewInstanceEventProtocol
     : rt::Protocol<SRLPServiceInitializationNewInstanceEventProtocol> {
   /// The identifier of the API for which the first instance was made; repaired where it is not UTF-8.
   virtual const rt::String& apiDescription() const = 0;

@@ -21,11 +21,12 @@
 #include "Runtime/String.h"
 #include "Runtime/ThreadSafety.h"
 #include "Runtime/UnfairLock.h"
+#include "Runtime/Visibility.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationEvent.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationNewInstanceEvent.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLProfilingStorageProtocol.h"
 
-class SRLProfilingStorage final
+class RT_VISIBLE SRLProfilingStorage final
     : public rt::Implements<SRLProfilingStorage, rt::Object, SRLProfilingStorageProtocol> {
  public:
   /// The one that measurements go into; made when it is first asked for, and never destroyed.

@@ -17,9 +17,10 @@
 #include "Runtime/Class.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationEvent.h"
 
-struct SRLProfilingStorageProtocol : rt::Protocol<SRLProfilingStorageProtocol> {
+struct RT_VISIBLE SRLProfilingStorageProtocol : rt::Protocol<SRLProfilingStorageProtocol> {
   /// Keeps `event`; null is ignored. Throws std::bad_alloc; nothing is kept then.
   virtual void storeServiceInitializationEvent(const rt::Ref<SRLPServiceInitializationEvent>& event) = 0;
 

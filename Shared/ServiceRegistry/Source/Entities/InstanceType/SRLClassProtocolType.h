@@ -16,9 +16,11 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLInstanceType.h"
 
-class SRLClassProtocolType final : public rt::Implements<SRLClassProtocolType, rt::Object, SRLInstanceType> {
+class RT_VISIBLE SRLClassProtocolType final
+    : public rt::Implements<SRLClassProtocolType, rt::Object, SRLInstanceType> {
  public:
   /// For both. If either is null, that is reported, and yields null. Throws what the error callback throws,
   /// and std::bad_alloc.

@@ -15,9 +15,10 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLInstanceType.h"
 
-class SRLClassType final : public rt::Implements<SRLClassType, rt::Object, SRLInstanceType> {
+class RT_VISIBLE SRLClassType final : public rt::Implements<SRLClassType, rt::Object, SRLInstanceType> {
  public:
   /// For `concreteClass`. Null is reported, and yields null. Throws what the error callback throws, and
   /// std::bad_alloc.

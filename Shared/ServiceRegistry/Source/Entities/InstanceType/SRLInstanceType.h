@@ -13,8 +13,9 @@
 /// Not for: asking an object what it is (`rt::cast`, Runtime/Class.h).
 
 #include "Runtime/Class.h"
+#include "Runtime/Visibility.h"
 
-struct SRLInstanceType : rt::Protocol<SRLInstanceType> {
+struct RT_VISIBLE SRLInstanceType : rt::Protocol<SRLInstanceType> {
   /// Whether every instance of `aClass` is of this type. Any thread may ask.
   virtual bool doesRepresentSupertypeOfClass(const rt::ClassInfo& aClass) const = 0;
 

@@ -15,9 +15,10 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLInstanceType.h"
 
-class SRLProtocolType final : public rt::Implements<SRLProtocolType, rt::Object, SRLInstanceType> {
+class RT_VISIBLE SRLProtocolType final : public rt::Implements<SRLProtocolType, rt::Object, SRLInstanceType> {
  public:
   /// For `concreteProtocol`. Null is reported, and yields null. Throws what the error callback throws, and
   /// std::bad_alloc.

@@ -25,13 +25,14 @@
 #include "Runtime/Block.h"
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
+#include "Runtime/Visibility.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"
 
 /// For the addresses that stand for configurations, what makes them. A configuration is made once for each
 /// registry.
 using SRLConfigurationFactories = std::unordered_map<const void*, rt::Block<rt::Ref<rt::Object>()>>;
 
-struct SRLBindingsModuleData {
+struct RT_VISIBLE SRLBindingsModuleData {
   /// The module's bindings, sorted by their APIs' identifiers: see SRLAreBindingsSorted.
   const _SRLBindingRegistrationData* bindingsBegin = nullptr;
   const _SRLBindingRegistrationData* bindingsEnd = nullptr;

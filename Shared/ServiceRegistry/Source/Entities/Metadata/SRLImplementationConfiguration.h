@@ -16,9 +16,10 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLInstanceType.h"
 
-class SRLImplementationConfiguration final
+class RT_VISIBLE SRLImplementationConfiguration final
     : public rt::Implements<SRLImplementationConfiguration, rt::Object> {
  public:
   /// For a configuration of the type `configurationInstanceType`. That it is null is reported, and yields

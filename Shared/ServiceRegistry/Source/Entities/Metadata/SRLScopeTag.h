@@ -14,8 +14,9 @@
 /// Not for: objects that are equal to themselves alone, by which no scope is found again.
 
 #include "Runtime/Class.h"
+#include "Runtime/Visibility.h"
 
-struct SRLScopeTag : rt::Protocol<SRLScopeTag> {
+struct RT_VISIBLE SRLScopeTag : rt::Protocol<SRLScopeTag> {
  protected:
   ~SRLScopeTag() = default;
 };

@@ -28,9 +28,10 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSet.h"
 
-class SRLScopeTagSetCodableWrapper final
+class RT_VISIBLE SRLScopeTagSetCodableWrapper final
     : public rt::Implements<SRLScopeTagSetCodableWrapper, rt::Object, rt::SecureCoding> {
  public:
   /// With a copy of `tags`, of any number. That it is null is reported, and yields null. Throws what the

@@ -75,7 +75,7 @@ BENCHMARK(makeBare)->Name("Profiling/off/bare");
 const Bound offBound{"Profiling/off", "bare", 1.1};
 BENCHMARK(makeMeasured)->Name("Profiling/on/ours");
 BENCHMARK(makeBare)->Name("Profiling/on/bare");
-BENCHMARK(makeCancelled)->Name("Profiling/on, instance there already/ours");
-BENCHMARK(makeBare)->Name("Profiling/on, instance there already/bare");
+BENCHMARK(makeCancelled)->Name("Profiling/on, nothing new/ours");
+BENCHMARK(makeBare)->Name("Profiling/on, nothing new/bare");
 
 }  // namespace

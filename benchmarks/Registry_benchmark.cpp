@@ -2,6 +2,7 @@
 
 #include <benchmark/benchmark.h>
 
+#include <algorithm>
 #include <array>
 #include <cstddef>
 #include <cstdint>
@@ -9,17 +10,20 @@
 #include <memory>
 #include <mutex>
 #include <string>
+#include <string_view>
 #include <thread>
 #include <unordered_map>
 #include <utility>
 #include <vector>
 
 #include "Comparison.h"
+#include "Runtime/Array.h"
 #include "Runtime/Class.h"
 #include "Runtime/Ref.h"
 #include "Runtime/Set.h"
 #include "Runtime/String.h"
 #include "Runtime/UnfairLock.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLAPIIdentifier.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 
 namespace {
@@ -254,6 +258,21 @@ void missOptional(benchmark::State& state) {
   SRLRegistry& asked = registry();
   for (auto _ : state) benchmark::DoNotOptimize(asked.internalOptionalService(&kUnknown, {}));
 }
+// A module may bind it, so it is looked for among the module's bindings.
+const _SRLBindingRegistrationData* bindingOf(const SRLAPIRegistrationData& api) {
+  const auto identifierOf = [](const auto& binding) { return SRLIdentifierBytes(*binding.api); };
+  const auto found = std::ranges::lower_bound(module().bindings, std::string_view(api.identifier),
+                                              SRLIsIdentifierBefore, identifierOf);
+  return found != module().bindings.end() && identifierOf(*found) == api.identifier ? &*found : nullptr;
+}
+void missBare(benchmark::State& state) {
+  static Floor& floor = *new Floor();
+  for (auto _ : state) {
+    const rt::LockGuard guard(floor.lock);
+    const bool isKnown = floor.implementations.find(&kUnknown) != floor.implementations.end();
+    benchmark::DoNotOptimize(isKnown || bindingOf(kUnknown) != nullptr);
+  }
+}
 void missInContainer(benchmark::State& state) {
   Container& asked = container();
   const std::string name = "Unknown";
@@ -265,6 +284,20 @@ void findMany(benchmark::State& state) {
   SRLRegistry& asked = registry();
   const SRLScopeTagSet tags{{account().get()}};
   for (auto _ : state) benchmark::DoNotOptimize(asked.internalMultiBoundService(&module().many, tags));
+}
+void findManyBare(benchmark::State& state) {
+  static Floor& floor = *new Floor();
+  const SRLScopeTagSet tags{{account().get()}};
+  for (auto _ : state) {
+    const Ref<rt::Object> implementations = lookUp(floor.lock, floor.implementations, scopedAPI());
+    std::vector<Ref<rt::Object>> services;
+    services.reserve(8);
+    for (std::size_t i = 0; i < 8; ++i) {
+      const Ref<rt::Object> scope = lookUp(floor.lock, floor.scopes, tags);
+      services.push_back(lookUp(floor.scopeLock, floor.instances, &module().apis.at(3 * i)));
+    }
+    benchmark::DoNotOptimize(rt::make<rt::Array>(std::move(services)));
+  }
 }
 void findManyInContainer(benchmark::State& state) {
   Container& asked = container();
@@ -284,7 +317,29 @@ void findByString(benchmark::State& state) {
   for (auto _ : state) benchmark::DoNotOptimize(asked.eg_internalService(name, tags));
 }
 
+// Identifiers are looked through one after the other.
+void findByStringBare(benchmark::State& state) {
+  static Floor& floor = *new Floor();
+  const std::string& name = module().identifiers.back();
+  const SRLScopeTagSet tags{{account().get()}};
+  for (auto _ : state) {
+    const rt::LockGuard guard(floor.sharedLock);
+    const auto found = std::ranges::find_if(
+        module().bindings, [&](const auto& binding) { return SRLIdentifierBytes(*binding.api) == name; });
+    const Ref<rt::Object> implementation = lookUp(floor.lock, floor.implementations, found->api);
+    const Ref<rt::Object> scope = lookUp(floor.lock, floor.scopes, tags);
+    benchmark::DoNotOptimize(lookUp(floor.scopeLock, floor.instances, found->api));
+  }
+}
+void findByStringInContainer(benchmark::State& state) {
+  Container& asked = container();
+  const std::string& name = module().identifiers.back();
+  const Container::Tags tags = {"account"};
+  for (auto _ : state) benchmark::DoNotOptimize(asked.find(name, tags));
+}
+
 // With all checks of its binding.
+constexpr std::size_t kFirst = 100;
 void findFirst(benchmark::State& state) {
   registry();
   const SRLScopeTagSet tags{{account().get()}};
@@ -292,16 +347,57 @@ void findFirst(benchmark::State& state) {
     state.PauseTiming();
     Ref<SRLRegistry> asked = registryWith(module().data);
     state.ResumeTiming();
-    for (std::size_t i = 0; i < 100; ++i)
+    for (std::size_t i = 0; i < kFirst; ++i)
       benchmark::DoNotOptimize(asked->internalService(&module().apis.at(i), tags));
     state.PauseTiming();
     asked = nullptr;
     state.ResumeTiming();
   }
-  state.SetItemsProcessed(100 * state.iterations());
+}
+// What has to be there after it: an implementation with its type and a block, in a table, and an instance.
+void findFirstBare(benchmark::State& state) {
+  rt::UnfairLock lock;
+  for (auto _ : state) {
+    state.PauseTiming();
+    auto implementations = std::make_unique<std::unordered_map<const void*, Ref<rt::Object>>>();
+    auto instances = std::make_unique<std::unordered_map<const void*, Ref<rt::Object>>>();
+    state.ResumeTiming();
+    for (std::size_t i = 0; i < kFirst; ++i) {
+      const SRLAPIRegistrationData& api = module().apis.at(i);
+      const rt::LockGuard guard(lock);
+      const SRLImplementationRegistrationData* record = *bindingOf(api)->implementations;
+      implementations->emplace(
+          &api, SRLImplementation::initWithIdentifier(
+                    record->identifier, SRLImplementationRegistrationDataInstanceType(record),
+                    record->lifetime, record->scopeType,
+                    [record](const SRLScopeTagSet& tags, bool*) { return record->factory(tags); }, nullptr));
+      benchmark::DoNotOptimize(instances->emplace(record, record->factory({})));
+    }
+    state.PauseTiming();
+    implementations = nullptr;
+    instances = nullptr;
+    state.ResumeTiming();
+  }
+}
+void findFirstInContainer(benchmark::State& state) {
+  const Container::Tags tags = {"account"};
+  for (auto _ : state) {
+    state.PauseTiming();
+    auto asked = std::make_unique<Container>();
+    state.ResumeTiming();
+    for (std::size_t i = 0; i < kFirst; ++i) {
+      asked->bind(
+          module().identifiers.at(i), [](const Container::Tags&) { return std::make_shared<int>(1); },
+          i % 3 == 2);
+      benchmark::DoNotOptimize(asked->find(module().identifiers.at(i), tags));
+    }
+    state.PauseTiming();
+    asked = nullptr;
+    state.ResumeTiming();
+  }
 }
 
-// A registry, and the modules that it is told of when a program is loaded.
+// A registry, and the modules that it is told of when a program is loaded, of a thousand APIs each.
 void start(benchmark::State& state) {
   const std::vector<const SRLBindingsModuleData*> modules(static_cast<std::size_t>(state.range(0)),
                                                           &module().data);
@@ -323,12 +419,21 @@ BENCHMARK(findFreshInContainer)->Name("Registry/fresh/container");
 const Bound freshBare{"Registry/fresh", "bare", 1.2};
 const Bound freshContainer{"Registry/fresh", "container", 1.0};
 BENCHMARK(missOptional)->Name("Registry/miss/ours");
+BENCHMARK(missBare)->Name("Registry/miss/bare");
 BENCHMARK(missInContainer)->Name("Registry/miss/container");
+const Bound missBound{"Registry/miss", "bare", 1.2};
 BENCHMARK(findMany)->Name("Registry/eight/ours");
+BENCHMARK(findManyBare)->Name("Registry/eight/bare");
 BENCHMARK(findManyInContainer)->Name("Registry/eight/container");
+const Bound eightBare{"Registry/eight", "bare", 1.2};
 const Bound eightContainer{"Registry/eight", "container", 1.0};
 BENCHMARK(findByString)->Name("Registry/by string, last of 1000/ours");
+BENCHMARK(findByStringBare)->Name("Registry/by string, last of 1000/bare");
+BENCHMARK(findByStringInContainer)->Name("Registry/by string, last of 1000/container");
+const Bound byStringBare{"Registry/by string, last of 1000", "bare", 1.2};
 BENCHMARK(findFirst)->Name("Registry/first of 100 APIs/ours");
-BENCHMARK(start)->Name("Registry/start, modules/ours")->Arg(1)->Arg(1000);
+BENCHMARK(findFirstBare)->Name("Registry/first of 100 APIs/bare");
+BENCHMARK(findFirstInContainer)->Name("Registry/first of 100 APIs/container");
+BENCHMARK(start)->Name("Registry/modules told of/ours")->Arg(1)->Arg(1000);
 
 }  // namespace

@@ -43,12 +43,19 @@ const SRLBindingsModuleData* noModule() {
   return nullptr;
 }
 
+void noModuleEither() {
+  trace("is called");
+}
+
 }  // namespace
 
 template struct rt::AddedClassMethod<SRLRegistry, "srl_bindings", &noModule<'1'>>;
 template struct rt::AddedClassMethod<SRLRegistry, "srl_binding", &noModule<'2'>>;
 template struct rt::AddedClassMethod<SRLRegistry, "srl_BindingsA", &noModule<'3'>>;
 template struct rt::AddedClassMethod<SRLRegistry, "_srl_bindingsA", &noModule<'4'>>;
+// One that is asked and has none, and one that cannot be asked.
+template struct rt::AddedClassMethod<SRLRegistry, "srl_bindingsNone", &noModule<'5'>>;
+template struct rt::AddedClassMethod<SRLRegistry, "srl_bindingsOfAnotherType", &noModuleEither>;
 
 void trace(const char* text, const char* name) {
   add(text);
@@ -88,6 +95,7 @@ int main(int argumentCount, char** arguments) {
   const char* const names[] = {"InArchive1", "InArchive2", "InArchive3", "InProgram", "InShared"};
   std::string expected = "start-up hook\n" + prior + "early\n";
   for (const std::string name : names) expected += "is asked: " + name + "\n";
+  expected += "is asked, and no module: 5\n";
   for (const std::string name : names) {
     expected.append("configures ").append(name).append("\n").append(prior).append(name).append("\n");
   }

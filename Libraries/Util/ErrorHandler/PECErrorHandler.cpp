@@ -30,6 +30,22 @@ void failAssertion(const rt::Ref<PECErrorDescription>& error) {
       description);
 }
 
+/// An error callback that runs on this thread. They may nest.
+class CallbackScope {
+ public:
+  CallbackScope() noexcept { ++depth_; }
+  CallbackScope(const CallbackScope&) = delete;
+  CallbackScope& operator=(const CallbackScope&) = delete;
+  ~CallbackScope() { --depth_; }
+
+  static bool isEntered() noexcept { return depth_ > 0; }
+
+ private:
+  static constinit thread_local int depth_;
+};
+
+constinit thread_local int CallbackScope::depth_ = 0;
+
 [[noreturn]] void failExpectation(const rt::String& reason) {
   throw rt::Exception("Assertion Failed!"_s, reason);
 }
@@ -66,8 +82,15 @@ void PECErrorHandler::logWithMessage(const rt::Ref<LUMLogMessage>& message) {
   PECErrorHandlerBlock block;
   const rt::LockGuard guard(lock_);
   block = errorHandlerBlock();
-  (block ? block : defaultErrorHandlerBlock())(error);
+  {
+    const CallbackScope scope;
+    (block ? block : defaultErrorHandlerBlock())(error);
+  }
   errorCount_.fetch_add(1, std::memory_order_relaxed);
+}
+
+bool PECErrorHandler::isCallingBack() noexcept {
+  return CallbackScope::isEntered();
 }
 
 void PECErrorHandler::registerErrorHandlerBlock(PECErrorHandlerBlock block) {

@@ -34,6 +34,7 @@
 #include "Runtime/Ref.h"
 #include "Runtime/ThreadSafety.h"
 #include "Runtime/UnfairLock.h"
+#include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogFilter.h"
 #include "Shared/Logging/LUMLogMessage.h"
 #include "Shared/Logging/LUMSyncLogger.h"
@@ -41,7 +42,7 @@
 /// What is told of an error, which is not null. Never run by two threads at once.
 using PECErrorHandlerBlock = rt::Block<void(const rt::Ref<PECErrorDescription>& error)>;
 
-class PECErrorHandler : public rt::Implements<PECErrorHandler, rt::Object, LUMSyncLogger> {
+class RT_VISIBLE PECErrorHandler : public rt::Implements<PECErrorHandler, rt::Object, LUMSyncLogger> {
  public:
   /// The process's handler; never destroyed. Any thread may ask for it.
   static const rt::Ref<PECErrorHandler>& sharedInstance();
@@ -66,6 +67,10 @@ class PECErrorHandler : public rt::Implements<PECErrorHandler, rt::Object, LUMSy
   /// an rt::InternalInconsistencyException where `block` is null and there is no callback. Waits for a
   /// callback that runs on another thread. Any thread may call it.
   void registerErrorHandlerBlock(PECErrorHandlerBlock block);
+
+  /// Whether the calling thread is running an error callback of any handler. For locks of which an error
+  /// callback must not wait, since errors are reported while they are held.
+  static bool isCallingBack() noexcept;
 
   /// The callback that stands in where none is set: it fails an assertion, by the thread's
   /// rt::AssertionHandler. The same at every call.

@@ -17,13 +17,16 @@
 /// Any thread may use a registry. Its lock, which is not recursive, is never held while an instance is made
 /// or destroyed or the delegate is told, so that factories may ask for other services. It is held while tags
 /// are hashed and compared, while an API's bindings are looked at for the first time, with its generated
-/// functions and instance types, and during some reports. What these, or the error callback, ask the registry
-/// for then ends the program.
+/// functions and instance types, while an implementation that was bound by hand is given up for another, and
+/// during some reports. What these ask the registry for then ends the program. Error callbacks, log filters
+/// and loggers must not ask a registry for anything at any time (SRLUnfairLock.h).
 ///
 /// Misuse is reported (PECErrorHandler) and yields null, false or nothing. Throughout, an API is named by the
-/// address of its record, and what is thrown is what the error callback, the factories and the generated
-/// functions throw, and std::bad_alloc. The registry is whole then; of an API whose bindings were being
-/// looked at, some may be bound and the others not.
+/// address of its record, and what is thrown is what the error callback, the factories, the generated
+/// functions, the delegate, tags and instance types throw, and std::bad_alloc. The registry is usable then;
+/// but of an API whose bindings were being looked at, some may be bound and the others not, and the instance
+/// for a scope whose factory has thrown stays in the making as long as the scope is there: whoever asks for
+/// it waits for ever, or, on the same thread, ends the program.
 ///
 /// Not for: what a constructor's argument can do.
 
@@ -40,6 +43,7 @@
 #include "Runtime/Set.h"
 #include "Runtime/String.h"
 #include "Runtime/UnfairLock.h"
+#include "Runtime/Visibility.h"
 #include "Runtime/Weak.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLBindingsModuleData.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLFactoryBlock.h"
@@ -52,7 +56,7 @@
 #include "Shared/ServiceRegistry/Source/SRLScopeLifecycleDelegate.h"
 #include "Shared/ServiceRegistry/Source/SRLUnfairLock.h"
 
-class SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
+class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
  public:
   /// @name The shared registry
   /// @{
@@ -66,10 +70,11 @@ class SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
   /// process ends it.
   static void initialize(const rt::ClassInfo& receiver);
 
-  /// The registry that injectors ask; made when it is first asked for.
+  /// The registry that injectors ask; made when it is first asked for. Null where null was set.
   static rt::Ref<SRLRegistry> sharedInstance();
 
-  /// Makes `registry` the shared one, and returns the one that was. For tests.
+  /// Makes `registry`, which may be null, the shared one, and returns the one that was. Without one, services
+  /// that live in scopes are null. For tests.
   static rt::Ref<SRLRegistry> setSharedInstance(const rt::Ref<SRLRegistry>& registry);
 
   /// @}

@@ -1,5 +1,6 @@
 // How a registry hands out instances, and the scopes that they live in.
 
+#include <algorithm>
 #include <cstddef>
 #include <unordered_map>
 #include <utility>
@@ -195,10 +196,15 @@ rt::Ref<rt::Array> SRLRegistry::internalMultiBoundService(const SRLAPIRegistrati
   }
   std::size_t count = 0;
   auto kept = instances.begin();
+  bool hasFactoryRun = false;
   for (const rt::Ref<rt::Object>& element : *implementations) {
     auto& implementation = static_cast<SRLImplementation&>(*element);
     rt::Ref<rt::Object> instance = std::move(*kept++);
-    if (!instance) instance = instanceOf(implementation, api, scopeTags);
+    if (!instance) {
+      // A factory may do anything, such as end a scope: what was found before counts no more.
+      if (!std::exchange(hasFactoryRun, true)) std::fill(kept, instances.end(), nullptr);
+      instance = instanceOf(implementation, api, scopeTags);
+    }
     if (instance) {
       instances[count++] = std::move(instance);
     } else {

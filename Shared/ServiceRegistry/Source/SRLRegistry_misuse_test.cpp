@@ -6,7 +6,9 @@
 #include <csignal>
 #include <cstdio>
 #include <functional>
+#include <latch>
 #include <string>
+#include <thread>
 
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "tests/TestBindings.h"
@@ -27,6 +29,8 @@ constexpr const char* kTwice =
     "in the same app or test. See docs/registry.md#registering-bindings-module-twice.";
 constexpr const char* kTakenAgain =
     "rt: the lock at 0x[0-9a-f]+ is taken again by thread [0-9]+, which holds it\n";
+constexpr const char* kAsksInCallback =
+    "SRLRegistry: an error callback asks a registry whose lock at 0x[0-9a-f]+ is held; callbacks must not\n";
 constexpr const char* kNotHeld =
     "rt: the lock at 0x[0-9a-f]+ is needed by thread [0-9]+, but no thread holds it\n";
 
@@ -134,7 +138,7 @@ TEST_F(SRLRegistryDeathTest, WhatTakesTheLockEndsTheProgramWithIt) {
   }
 }
 
-// A report that is made with the lock held: the callback must not ask the registry for anything.
+// Of reports that are made with the lock held.
 TEST_F(SRLRegistryDeathTest, AnErrorCallbackThatUsesTheRegistryUnderItsLockEndsTheProgram) {
   setCallback([this](const Ref<PECErrorDescription>& error) {
     print(error);
@@ -143,14 +147,33 @@ TEST_F(SRLRegistryDeathTest, AnErrorCallbackThatUsesTheRegistryUnderItsLockEndsT
   const SRLAPIRegistrationData unknown{.identifier = "Unknown", .identifierLength = 7};
   EXPECT_EXIT(registry_->internalService(&unknown, {}), KilledBySignal(SIGABRT),
               AllOf(HasSubstr("No binding was found for required, single-bound service: Unknown"),
-                    ContainsRegex(kTakenAgain)));
+                    ContainsRegex(kAsksInCallback)));
   const auto bindStone = [this] {
     const rt::LockGuard guard(*registry_->lock());
     registry_->internalRegisterServiceAPI(&testClockAPI, implementationOf<TestStone>("stone"));
   };
   EXPECT_EXIT(bindStone(), KilledBySignal(SIGABRT),
               AllOf(HasSubstr("Implementation TestStone should conform to id<TestClock>"),
-                    ContainsRegex(kTakenAgain)));
+                    ContainsRegex(kAsksInCallback)));
+}
+
+// Also where another thread holds the lock: it may wait to report, until this callback returns.
+TEST_F(SRLRegistryDeathTest, AnErrorCallbackThatWouldWaitForTheRegistryEndsTheProgram) {
+  GTEST_FLAG_SET(death_test_style, "threadsafe");
+  const auto report = [this] {
+    setCallback([this](const Ref<PECErrorDescription>&) {
+      std::latch isHeld(1);
+      const std::jthread other([&] {
+        const rt::LockGuard guard(*registry_->lock());
+        isHeld.count_down();
+        registry_->implementationForSingleBoundService(nullptr);
+      });
+      isHeld.wait();
+      registry_->registeredAPIIdentifiers();
+    });
+    registry_->removeScopesWithTag(nullptr);
+  };
+  EXPECT_EXIT(report(), KilledBySignal(SIGABRT), ContainsRegex(kAsksInCallback));
 }
 
 }  // namespace

@@ -97,6 +97,21 @@ TEST_F(SRLRegistryProfiling, MeasuresEachOfMany) {
   EXPECT_EQ(freshOnes() - before, 2 * kOne);
 }
 
+// Null that was made before, and what a registry asks another for.
+TEST_F(SRLRegistryProfiling, ForgetsWhatIsNotNew) {
+  const Ref<SRLRegistry> copy = registry->mutableCopy();
+  const auto ask = [&] {
+    registry->internalOptionalService(&nullAPI, {});
+    registry->internalMultiBoundService(&manyAPI, tags);
+    copy->internalService(&scopedAPI, tags);
+  };
+  ask();
+  EXPECT_EQ(newEvents().size(), 2 * kOne);
+  ask();
+  EXPECT_EQ(newEvents().size(), 0U);
+  EXPECT_EQ(SRLPProfilingDetail::countOfStacks(), 0U);
+}
+
 TEST_F(SRLRegistryProfiling, ForgetsWhatThrows) {
   EXPECT_THROW(registry->internalService(&throwingAPI, {}), Failure);
   EXPECT_EQ(SRLPProfilingDetail::countOfStacks(), 0U);

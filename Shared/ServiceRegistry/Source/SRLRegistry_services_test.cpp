@@ -4,6 +4,8 @@
 #include <gtest/gtest.h>
 
 #include <array>
+#include <csignal>
+#include <cstddef>
 #include <iterator>
 #include <string>
 #include <vector>
@@ -87,6 +89,22 @@ TEST_F(SRLRegistryServices, GetNoTagsWhereTheirsDoNotFitTheScope) {
   EXPECT_THAT(reports.texts(), ElementsAre("The tag set must contain all API scope tags."));
   ASSERT_TRUE(thing);
   EXPECT_EQ(tagsOf(thing).tags, SRLScopeTagSet().tags);
+}
+
+// They are then in the scope without tags, and the same for all.
+TEST_F(SRLRegistryServices, AreSharedWhereTagsDoNotFitTheScope) {
+  const std::string report = "The tag set must contain all API scope tags.";
+  const Ref<rt::Object> thing = registry->internalService(&scopedAPI, tagSet(account));
+  EXPECT_THAT(reports.texts(), ElementsAre(report));
+  ASSERT_TRUE(thing);
+  EXPECT_EQ(tagsOf(thing).tags, SRLScopeTagSet().tags);
+  EXPECT_TRUE(registry->scopeWithTags({})->instances()->contains(thing.get()));
+  EXPECT_EQ(registry->internalService(&scopedAPI, tagSet(account)), thing);
+  EXPECT_THAT(reports.texts(), ElementsAre(report));
+  EXPECT_EQ(registry->internalOptionalService(&scopedAPI, {}), thing);
+  EXPECT_THAT(reports.texts(), ElementsAre(report));
+  EXPECT_NE(registry->internalService(&scopedAPI, tags), thing);
+  EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
 TEST_F(SRLRegistryServices, RequiredOnesAreReportedWhereNothingIsBound) {
@@ -277,6 +295,91 @@ TEST_F(SRLRegistryServices, MayThrowAndLeaveTheRegistryWhole) {
   EXPECT_THROW(registry->internalService(&throwingAPI, {}), Failure);
   EXPECT_THROW(registry->internalOptionalService(&throwingAPI, {}), Failure);
   EXPECT_TRUE(registry->internalService(&globalAPI, {}));
+}
+
+// A thing for each account, the making of which fails as long as the test says so.
+bool shallThrow = false;
+Ref<rt::Object> makeThingAtTimes(SRLScopeTagSet given) {
+  if (shallThrow) throw Failure();
+  return makeThing(given);
+}
+
+// The instance that was in the making stays so, as long as its scope is there.
+TEST_F(SRLRegistryServices, ThatAreScopedAndThrowAreBackInTheNextScope) {
+  static constexpr SRLImplementationRegistrationData implementation{.identifier = "AtTimes",
+                                                                    .instanceType = {.className = "Thing"},
+                                                                    .factory = makeThingAtTimes,
+                                                                    .scopeType = 0b01};
+  static constexpr Implementations list[] = {&implementation, nullptr};
+  static constexpr SRLAPIRegistrationData api{
+      .identifier = "AtTimes", .instanceType = kThingType, .scopeType = 0b01, .identifierLength = 7};
+  static constexpr _SRLBindingRegistrationData bindings[] = {{&api, list}};
+  const SRLBindingsModuleData module{.bindingsBegin = std::begin(bindings),
+                                     .bindingsEnd = std::end(bindings)};
+  const Ref<SRLRegistry> other = SRLRegistry::initPrivate();
+  other->internalRegisterBindings(std::array{&module});
+  SRLRegistry::setSharedInstance(other);
+  shallThrow = true;
+  EXPECT_THROW(other->internalService(&api, tagSet(account)), Failure);
+  shallThrow = false;
+  EXPECT_TRUE(other->internalService(&api, tagSet(window)));
+  EXPECT_EXIT(other->internalService(&api, tagSet(account)), testing::KilledBySignal(SIGABRT),
+              "is taken again by thread");
+  other->removeScopesWithTag(account);
+  EXPECT_TRUE(other->internalService(&api, tagSet(account)));
+}
+
+// A nest, with the making of which the scopes of its account end.
+Ref<rt::Object> makeNestAndEndScopes(SRLScopeTagSet given) {
+  SRLRegistry::sharedInstance()->removeScopesWithTag(given.tags[0]);
+  return rt::make<Nest>(given, nullptr);
+}
+
+// Used to be those of the scope that had been there when the request came, and the delegate to be told that
+// they had outlived it.
+TEST_F(SRLRegistryServices, OfManyAreNotOfAScopeThatOneOfThemHasEnded) {
+  static constexpr SRLImplementationRegistrationData ending{.identifier = "Ending",
+                                                            .instanceType = {.className = "Nest"},
+                                                            .factory = makeNestAndEndScopes,
+                                                            .scopeType = 0b01,
+                                                            .lifetime = 1};
+  static constexpr std::array kNames = {"A", "B", "C", "D", "E", "F", "G", "H"};
+  static std::array<SRLImplementationRegistrationData, kNames.size()> kept;
+  static std::array<Implementations, kNames.size() + 2> list{};
+  for (std::size_t i = 0; i < kNames.size(); ++i) {
+    kept.at(i) = scopedThing;
+    kept.at(i).identifier = kNames.at(i);
+    list.at(i) = &kept.at(i);
+  }
+  list.at(kNames.size()) = &ending;
+  static constexpr SRLAPIRegistrationData api{.identifier = "Ended",
+                                              .instanceType = kThingType,
+                                              .scopeType = 0b01,
+                                              .identifierLength = 5,
+                                              .isMultibound = 1};
+  static const _SRLBindingRegistrationData bindings[] = {{&api, list.data()}};
+  const SRLBindingsModuleData module{.bindingsBegin = std::begin(bindings),
+                                     .bindingsEnd = std::end(bindings)};
+  const Ref<SRLRegistry> other = SRLRegistry::initPrivate();
+  other->internalRegisterBindings(std::array{&module});
+  SRLRegistry::setSharedInstance(other);
+
+  const Ref<rt::Array> before = other->internalMultiBoundService(&api, tagSet(account));
+  const Ref<rt::Array> things = other->internalMultiBoundService(&api, tagSet(account));
+  ASSERT_EQ(things->count(), list.size() - 1);
+  const Ref<rt::Array> live = other->scopeWithTags(tagSet(account))->instances();
+  std::size_t countAfterEnd = 0;
+  bool hasEnded = false;
+  for (const Ref<rt::Object>& thing : *things) {
+    EXPECT_EQ(live->contains(thing.get()), hasEnded);
+    if (hasEnded) {
+      EXPECT_FALSE(before->contains(thing.get()));
+      ++countAfterEnd;
+    }
+    hasEnded = hasEnded || rt::cast<Nest>(thing.get()) != nullptr;
+  }
+  EXPECT_EQ(live->count(), countAfterEnd);
+  ASSERT_GT(countAfterEnd, 0U) << "the one that ends the scope must not be the last; give it another name";
 }
 
 TEST_F(SRLRegistryServices, ThatAreScopedLiveInTheSharedRegistry) {

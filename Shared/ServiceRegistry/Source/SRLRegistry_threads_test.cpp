@@ -28,9 +28,16 @@ constexpr std::size_t kLevels = 4;
 constexpr std::size_t kAPIsInLevel = 250;
 constexpr std::size_t kAPIs = kLevels * kAPIsInLevel;
 
+// What the thread is asking: the shared registry, or a copy.
+constinit thread_local SRLRegistry* askedHere = nullptr;
+
 // Taken by all that is the user's own: a registry that held its lock meanwhile would end the program here.
 void takeTheLock() {
-  const rt::LockGuard guard(*SRLRegistry::sharedInstance()->lock());
+  const Ref<SRLRegistry> shared = SRLRegistry::sharedInstance();
+  {
+    const rt::LockGuard guard(*shared->lock());
+  }
+  if (askedHere != nullptr) const rt::LockGuard guard(*askedHere->lock());
 }
 
 std::atomic<int> tagsAlive{0};
@@ -79,7 +86,15 @@ class Instance final : public rt::Implements<Instance, rt::Object> {
 std::array<SRLAPIRegistrationData, kAPIs> apis;
 std::array<SRLImplementationRegistrationData, kAPIs> implementations;
 std::array<std::array<const SRLImplementationRegistrationData*, 2>, kAPIs> lists;
-std::array<_SRLBindingRegistrationData, kAPIs> bindings;
+std::array<_SRLBindingRegistrationData, kAPIs + 1> bindings;
+// Some of the lowest level, for one API.
+constexpr std::size_t kMany = 8;
+constinit SRLAPIRegistrationData apiOfMany{.identifier = "APIsOfMany",
+                                           .instanceType = {.names = {.className = "Instance"}},
+                                           .scopeType = 0b1,
+                                           .identifierLength = 10,
+                                           .isMultibound = 1};
+std::array<const SRLImplementationRegistrationData*, kMany + 1> many{};
 std::array<std::string, kAPIs> identifiers;
 thread_local std::minstd_rand chance;
 
@@ -122,7 +137,9 @@ const SRLBindingsModuleData& moduleOfAll() {
     implementations.at(i).lifetime = isNew(i) ? 1 : 0;
     lists.at(i) = {&implementations.at(i), nullptr};
     bindings.at(i) = {&apis.at(i), lists.at(i).data()};
+    if (i < kMany) many.at(i) = &implementations.at(i);
   }
+  bindings.at(kAPIs) = {&apiOfMany, many.data()};
   static const SRLBindingsModuleData module{.bindingsBegin = bindings.data(),
                                             .bindingsEnd = bindings.data() + bindings.size()};
   return module;
@@ -141,7 +158,7 @@ void removeScopesOf(SRLRegistry& registry, std::size_t number) {
 }
 
 // What holds for every request, whatever the other threads do:
-// - a service comes out, and nothing is reported;
+// - a service comes out, however it is asked for, and nothing is reported;
 // - one that is made anew each time is another each time;
 // - one that lives in an account's scope was made after every removal that was over before the request;
 // - a second request gets the same one unless a removal was under way before the first, or has begun since;
@@ -156,7 +173,16 @@ void request(SRLRegistry& registry, std::size_t api, std::size_t number) {
   // The tag lives as long as this request only, unless the registry keeps it.
   const auto ask = [&] {
     const Ref<Tag> tag = rt::make<Tag>(number);
-    return registry.internalService(&apis.at(api), SRLScopeTagSet{{tag.get()}});
+    const SRLScopeTagSet tags{{tag.get()}};
+    switch (chance() % 8) {
+      case 0:
+        return registry.internalOptionalService(&apis.at(api), tags);
+      case 1:
+        return registry.eg_internalService(rt::String::fromUTF8(identifiers.at(api)),
+                                           SRLScopeTagSetCodableWrapper::initWithTagSet(tags));
+      default:
+        return registry.internalService(&apis.at(api), tags);
+    }
   };
   const Ref<rt::Object> first = ask();
   const Ref<rt::Object> second = ask();
@@ -169,6 +195,24 @@ void request(SRLRegistry& registry, std::size_t api, std::size_t number) {
   } else {
     EXPECT_EQ(first, second);
   }
+}
+
+// The same for an API for many: all of them come out, each as above.
+void requestMany(SRLRegistry& registry, std::size_t number) {
+  const std::uint64_t lastRemoval = accounts.at(number).lastRemoval;
+  const Ref<Tag> tag = rt::make<Tag>(number);
+  const Ref<rt::Array> instances =
+      registry.internalMultiBoundService(&apiOfMany, SRLScopeTagSet{{tag.get()}});
+  ASSERT_TRUE(instances);
+  ASSERT_EQ(instances->count(), kMany);
+  std::size_t madeSince = 0;
+  for (const Ref<rt::Object>& instance : *instances) {
+    madeSince += rt::cast<Instance>(instance.get())->madeAt() > lastRemoval ? 1 : 0;
+  }
+  // All but those that live in no account's scope.
+  std::size_t expected = 0;
+  for (std::size_t api = 0; api < kMany; ++api) expected += isNew(api) || isOfAccount(api) ? 1 : 0;
+  EXPECT_GE(madeSince, expected);
 }
 
 class Delegate final : public rt::Implements<Delegate, rt::Object, SRLScopeLifecycleDelegate> {
@@ -196,9 +240,12 @@ TEST(SRLRegistryThreads, KeepEveryPromise) {
       chance.seed(static_cast<unsigned>(thread + 1));
       Ref<SRLRegistry> asked = registry;
       for (std::size_t i = 0; i < kRequests; ++i) {
+        askedHere = asked.get();
         request(*asked, chance() % kAPIs, chance() % kAccounts);
+        if (chance() % 8 == 0) requestMany(*asked, chance() % kAccounts);
         if (chance() % 50 == 0) removeScopesOf(*registry, chance() % kAccounts);
         // Copies keep what is scoped in the shared registry, too.
+        askedHere = nullptr;
         if (chance() % 200 == 0) asked = chance() % 2 == 0 ? registry : registry->mutableCopy();
       }
     });

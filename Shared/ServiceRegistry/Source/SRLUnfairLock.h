@@ -5,15 +5,21 @@
 ///     const rt::LockGuard guard(*registry->lock());
 ///     registry->internalRegisterServiceAPI(&clockAPI, implementation);
 ///
-/// It is not recursive: what takes it itself must not be called with it held, nor may the error callback ask
-/// the registry for anything while a report is made under it. Both end the program.
+/// It is not recursive: what takes it itself must not be called with it held, which ends the program.
+///
+/// Some errors are reported while it is held, so error callbacks, log filters and loggers must not ask a
+/// registry for anything. One thread that reports and another whose callback asks would wait for each other
+/// for ever; a callback that finds the lock held ends the program instead, with a line on standard error.
 ///
 /// Not for: anything but registries.
 
 #include "Runtime/UnfairLock.h"
 
 struct RT_CAPABILITY("lock") SRLUnfairLock {
-  void lock() noexcept RT_ACQUIRE() RT_NO_THREAD_SAFETY_ANALYSIS { unfair_lock_.lock(); }
+  void lock() noexcept RT_ACQUIRE() RT_NO_THREAD_SAFETY_ANALYSIS {
+    if (!unfair_lock_.tryLock()) [[unlikely]]
+      lockHeld();
+  }
   void unlock() noexcept RT_RELEASE() RT_NO_THREAD_SAFETY_ANALYSIS { unfair_lock_.unlock(); }
   /// Ends the program when the caller does not hold the lock.
   void assertOwner() const noexcept RT_ASSERT_CAPABILITY(this) RT_NO_THREAD_SAFETY_ANALYSIS {
@@ -21,4 +27,8 @@ struct RT_CAPABILITY("lock") SRLUnfairLock {
   }
 
   rt::UnfairLock unfair_lock_;
+
+ private:
+  // What `lock` does where somebody holds it.
+  [[gnu::cold]] void lockHeld() noexcept;
 };

@@ -14,6 +14,9 @@
 /// is kept: whoever asks for it later waits for ever, too, or ends the program where the thread is the same.
 /// What the factory threw comes out of the request that called it.
 ///
+/// A registry looks for instances with its own lock held, so nothing else is locked or called under the
+/// scope's.
+///
 /// Not for: hosts. They ask SRLRegistry, which has a scope for each set of tags.
 
 #include <concepts>
@@ -25,9 +28,10 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/UnfairLock.h"
+#include "Runtime/Visibility.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScopeIvars.h"
 
-class SRLMemoizingScope final : public rt::Implements<SRLMemoizingScope, rt::Object> {
+class RT_VISIBLE SRLMemoizingScope final : public rt::Implements<SRLMemoizingScope, rt::Object> {
  public:
   /// Without instances. Throws std::bad_alloc.
   static rt::Ref<SRLMemoizingScope> init();

@@ -18,16 +18,18 @@
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/Visibility.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLInstanceType.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLFactoryBlock.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementationConfiguration.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeType.h"
 
-class SRLImplementation final : public rt::Implements<SRLImplementation, rt::Object> {
+class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementation, rt::Object> {
  public:
   /// `identifier` is kept as it is, and outlives the implementation. `lifetime` is 0 for one instance in a
-  /// scope, 1 for a new one at every request. `instanceType` and `configuration` may be null. Throws
+  /// scope, 1 for a new one at every request. `instanceType` and `configuration` may be null. So may
+  /// `factoryBlock` of what is bound to an API for one, which then counts as not bound. Throws
   /// std::bad_alloc.
   static rt::Ref<SRLImplementation> initWithIdentifier(
       std::string_view identifier, rt::Ref<SRLInstanceType> instanceType, std::uint64_t lifetime,
@@ -72,8 +74,8 @@ class SRLImplementation final : public rt::Implements<SRLImplementation, rt::Obj
   const SRLFactoryBlock factoryBlock_;
   const rt::Ref<SRLImplementationConfiguration> configuration_;
 
-  // Where a registry that has made it from a record, for an API of this scope, looks for its instances. Set
-  // before anybody else knows it.
+  // What a registry has made it of, for an API of this scope: its factory block does nothing that the
+  // registry could not do at one go. Set before anybody else knows it.
   const SRLImplementationRegistrationData* record_ = nullptr;
   SRLScopeType apiScope_ = 0;
 };

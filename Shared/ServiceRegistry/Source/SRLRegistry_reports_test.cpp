@@ -1,0 +1,95 @@
+// Which reports a registry makes while its lock is held, and which without it.
+
+#include <gtest/gtest.h>
+
+#include <array>
+#include <functional>
+#include <string>
+#include <vector>
+
+#include "Runtime/UnfairLock.h"
+#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "tests/TestServices.h"
+
+namespace {
+
+using namespace TestServices;
+using namespace rt::literals;
+using rt::Ref;
+
+class SRLRegistryReports : public ServicesTest {
+ protected:
+  // Whether `asked`'s lock was held at each report of `request`.
+  static std::vector<bool> locksHeld(SRLRegistry& asked, const std::function<void()>& request) {
+    std::vector<bool> held;
+    PECErrorHandler::sharedInstance()->setErrorHandlerBlock([&](const Ref<PECErrorDescription>&) {
+      const bool isFree = asked.lock()->unfair_lock_.tryLock();
+      if (isFree) asked.lock()->unfair_lock_.unlock();
+      held.push_back(!isFree);
+    });
+    request();
+    return held;
+  }
+};
+
+const std::vector<bool> kFreeOnce = {false};
+const std::vector<bool> kHeldOnce = {true};
+
+TEST_F(SRLRegistryReports, AreMadeWithoutTheLockWhereNothingIsLookedUp) {
+  const auto wrapper = SRLScopeTagSetCodableWrapper::initWithTagSet({});
+  const std::function<void()> requests[] = {
+      [this] { registry->internalService(&nullAPI, {}); },
+      [this] { registry->internalMultiBoundService(&manyAPI, tags); },
+      [this] { registry->internalMultiBoundService(nullptr, tags); },
+      [this] { registry->internalHasImplementationForService(nullptr); },
+      [this] { registry->internalService(&freshAPI, tagSet(account)); },
+      [this] { registry->internalService(&scopedAPI, tagSet(account)); },
+      [this] { registry->removeScopesWithTag(nullptr); },
+      [this] { registry->apiIdentifierFromString(nullptr); },
+      [this] { registry->eg_internalService("Scoped"_s, nullptr); },
+      [this] { registry->eg_internalOptionalService("Scoped"_s, nullptr); },
+      [this] { registry->eg_internalMultiBoundService("Many"_s, nullptr); },
+      [&] { registry->eg_internalService("Nobody's"_s, wrapper); },
+      [this] { registry->eg_internalHasImplementationForService("Nobody's"_s); },
+  };
+  for (std::size_t i = 0; i < std::size(requests); ++i) {
+    EXPECT_EQ(locksHeld(*registry, requests[i]), kFreeOnce) << i;
+    // What is there already by then changes nothing.
+    EXPECT_EQ(locksHeld(*registry, requests[i]), kFreeOnce) << i;
+  }
+}
+
+TEST_F(SRLRegistryReports, AreMadeWithTheLockWhereALookUpFails) {
+  EXPECT_EQ(locksHeld(*registry, [this] { registry->internalService(&unboundAPI, {}); }), kHeldOnce);
+  EXPECT_EQ(locksHeld(*registry, [this] { registry->internalService(&unknownAPI, {}); }), kHeldOnce);
+  const Ref<SRLRegistry> early = SRLRegistry::initPrivate();
+  EXPECT_EQ(locksHeld(*early, [&] { early->internalService(&scopedAPI, tags); }), kHeldOnce);
+  EXPECT_EQ(locksHeld(*registry,
+                      [this] {
+                        const rt::LockGuard guard(*registry->lock());
+                        registry->implementationForSingleBoundService(nullptr);
+                      }),
+            kHeldOnce);
+  // That there is no API, and that nothing is bound to it.
+  EXPECT_EQ(locksHeld(*registry, [this] { registry->internalService(nullptr, {}); }),
+            (std::vector<bool>{true, true}));
+}
+
+// Of the registry in the making, from a module's own callback.
+SRLRegistry* inTheMaking = nullptr;
+
+TEST_F(SRLRegistryReports, AreMadeWithTheLockWhereALookUpComesTooEarly) {
+  const SRLBindingsModuleData module{.bindingsBegin = kModule.bindingsBegin,
+                                     .bindingsEnd = kModule.bindingsEnd,
+                                     .addConfigurationFactories = [](SRLConfigurationFactories&) {
+                                       inTheMaking->internalService(&globalAPI, {});
+                                       inTheMaking->internalOptionalService(&globalAPI, {});
+                                       inTheMaking->internalMultiBoundService(&noneOfManyAPI, {});
+                                     }};
+  const Ref<SRLRegistry> other = SRLRegistry::initPrivate();
+  inTheMaking = other.get();
+  EXPECT_EQ(locksHeld(*other, [&] { other->internalRegisterBindings(std::array{&module}); }),
+            (std::vector<bool>{true, true, true}));
+}
+
+}  // namespace

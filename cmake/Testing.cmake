@@ -5,11 +5,14 @@ find_package(GTest REQUIRED)
 include(GoogleTest)
 
 # What a test takes to compile is mostly GoogleTest's headers, which are compiled once for all, and what becomes of
-# its many temporaries: tests get few symbols for the debugger, and are not optimised where a sanitizer multiplies
-# what there is. The libraries are compiled as ever.
+# its many temporaries: but in the build for the debugger, tests get few symbols, and where a sanitizer multiplies
+# what there is they are not optimised. The libraries are compiled as ever.
 add_library(test-options INTERFACE)
-target_compile_options(test-options INTERFACE
-  $<$<CONFIG:RelWithDebInfo>:-g1> $<$<BOOL:${MOUNT_POINT_INSTRUMENTATION}>:-O0>)
+if(MOUNT_POINT_INSTRUMENTATION)
+  target_compile_options(test-options INTERFACE -g1 -O0)
+else()
+  target_compile_options(test-options INTERFACE $<$<NOT:$<CONFIG:Debug>>:-g1>)
+endif()
 target_link_libraries(test-options INTERFACE MountPoint::Options GTest::gmock GTest::gtest_main)
 # A program like the tests, since it must be compiled as they are.
 add_executable(test-headers "${PROJECT_SOURCE_DIR}/cmake/test-headers.cpp")

@@ -26,7 +26,8 @@ inline constexpr const char* kClassicSocket = "/dev/log";
 inline std::string refusal;
 
 inline const rt::SystemLog& testLog() {
-  static const rt::SystemLog log(rt::String::fromUTF8("com.example.test"), rt::String::fromUTF8("unit"));
+  using namespace rt::literals;
+  static const rt::SystemLog log("com.example.test"_s, "unit"_s);
   return log;
 }
 
@@ -105,6 +106,8 @@ class SystemLogTest : public testing::Test {
   void SetUp() override {
     if (!PrivateJournal::entered()) GTEST_SKIP() << refusal;
     std::filesystem::remove(kClassicSocket);
+    // Made now: the child of a fork would wait for ever for a thread of its parent's that is making it.
+    testLog();
     // What earlier cases left untold is told now.
     if (rt::SystemLog::droppedCount() != 0) {
       const StandardErrorPipe standardError;

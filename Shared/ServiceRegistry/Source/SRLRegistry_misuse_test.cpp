@@ -25,8 +25,7 @@ using testing::Not;
 
 constexpr const char* kTwice =
     "Trying to register bindings module data twice. This is likely caused by loading multiple bindings "
-    "modules "
-    "in the same app or test. See docs/registry.md#registering-bindings-module-twice.";
+    "modules in the same app or test. See docs/registry.md#registering-bindings-module-twice.";
 constexpr const char* kTakenAgain =
     "rt: the lock at 0x[0-9a-f]+ is taken again by thread [0-9]+, which holds it\n";
 constexpr const char* kAsksInCallback =

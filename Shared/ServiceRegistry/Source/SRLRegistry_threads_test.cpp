@@ -207,11 +207,13 @@ void requestMany(SRLRegistry& registry, std::size_t number) {
   ASSERT_EQ(instances->count(), kMany);
   std::size_t madeSince = 0;
   for (const Ref<rt::Object>& instance : *instances) {
-    madeSince += rt::cast<Instance>(instance.get())->madeAt() > lastRemoval ? 1 : 0;
+    if (rt::cast<Instance>(instance.get())->madeAt() > lastRemoval) ++madeSince;
   }
   // All but those that live in no account's scope.
   std::size_t expected = 0;
-  for (std::size_t api = 0; api < kMany; ++api) expected += isNew(api) || isOfAccount(api) ? 1 : 0;
+  for (std::size_t api = 0; api < kMany; ++api) {
+    if (isNew(api) || isOfAccount(api)) ++expected;
+  }
   EXPECT_GE(madeSince, expected);
 }
 

@@ -235,6 +235,9 @@ class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
   };
   Found find(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) RT_REQUIRES(ivars_->lock);
 
+  // What the modules bind to an API, not null, that is not in the table yet.
+  rt::Ref<SRLImplementation> newlyBound(const SRLAPIRegistrationData* api) RT_REQUIRES(ivars_->lock);
+
   // The instance that a scope of this registry has already, where this is the shared one; null where there is
   // none, or no telling.
   rt::Ref<rt::Object> keptInstanceOf(const SRLImplementation& implementation,

@@ -101,7 +101,9 @@ rt::Ref<rt::Object> SRLRegistry::instanceOf(SRLImplementation& implementation,
 
 SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) {
   const auto binding = ivars_->singleBindings.find(api);
-  if (binding == ivars_->singleBindings.end()) return {implementationForSingleBoundService(api), nullptr};
+  if (binding == ivars_->singleBindings.end()) {
+    return {api != nullptr ? newlyBound(api) : implementationForSingleBoundService(api), nullptr};
+  }
   if (!binding->second) return {};
   if (rt::Ref<rt::Object> instance = keptInstanceOf(*binding->second, tags))
     return {nullptr, std::move(instance)};
@@ -133,8 +135,8 @@ SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SR
   return instance;
 }
 
-rt::Ref<rt::Object> SRLRegistry::internalOptionalService(const SRLAPIRegistrationData* api,
-                                                         const SRLScopeTagSet& scopeTags) {
+[[gnu::flatten]] rt::Ref<rt::Object> SRLRegistry::internalOptionalService(const SRLAPIRegistrationData* api,
+                                                                          const SRLScopeTagSet& scopeTags) {
   rt::Ref<SRLImplementation> implementation;
   {
     const rt::LockGuard guard(ivars_->lock);
@@ -161,6 +163,10 @@ rt::Ref<SRLImplementation> SRLRegistry::implementationForSingleBoundService(
   if (const auto found = ivars_->singleBindings.find(api); found != ivars_->singleBindings.end()) {
     return found->second;
   }
+  return newlyBound(api);
+}
+
+rt::Ref<SRLImplementation> SRLRegistry::newlyBound(const SRLAPIRegistrationData* api) {
   if (!lazilyRegisterBindingsForAPI(api)) return nullptr;
   // Made known even where registration has refused what there was.
   return ivars_->singleBindings[api];

@@ -372,8 +372,8 @@ void Formatter::writeSigned(const FormatDirective& directive, std::int64_t value
 
 void Formatter::writeUnsigned(const FormatDirective& directive, std::uint64_t value) {
   if (isPlain(directive) && directive.conversion != 'X') {
-    const bool isOctal = directive.conversion == 'o';
-    writeDigits(value, directive.conversion == 'x' ? 16 : (isOctal ? 8 : 10));
+    const int base = directive.conversion == 'x' ? 16 : 10;
+    writeDigits(value, directive.conversion == 'o' ? 8 : base);
   } else {
     writeAsC(directive, "ll", static_cast<unsigned long long>(value));
   }

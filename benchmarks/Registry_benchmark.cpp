@@ -261,8 +261,8 @@ void missOptional(benchmark::State& state) {
 // A module may bind it, so it is looked for among the module's bindings.
 const _SRLBindingRegistrationData* bindingOf(const SRLAPIRegistrationData& api) {
   const auto identifierOf = [](const auto& binding) { return SRLIdentifierBytes(*binding.api); };
-  const auto found = std::ranges::lower_bound(module().bindings, std::string_view(api.identifier),
-                                              SRLIsIdentifierBefore, identifierOf);
+  const auto* const found = std::ranges::lower_bound(module().bindings, std::string_view(api.identifier),
+                                                     SRLIsIdentifierBefore, identifierOf);
   return found != module().bindings.end() && identifierOf(*found) == api.identifier ? &*found : nullptr;
 }
 void missBare(benchmark::State& state) {
@@ -304,6 +304,7 @@ void findManyInContainer(benchmark::State& state) {
   const Container::Tags tags = {"account"};
   for (auto _ : state) {
     std::vector<Container::Service> services;
+    services.reserve(8);
     for (std::size_t i = 0; i < 8; ++i) services.push_back(asked.find(module().identifiers.at(3 * i), tags));
     benchmark::DoNotOptimize(services);
   }
@@ -324,7 +325,7 @@ void findByStringBare(benchmark::State& state) {
   const SRLScopeTagSet tags{{account().get()}};
   for (auto _ : state) {
     const rt::LockGuard guard(floor.sharedLock);
-    const auto found = std::ranges::find_if(
+    const auto* const found = std::ranges::find_if(
         module().bindings, [&](const auto& binding) { return SRLIdentifierBytes(*binding.api) == name; });
     const Ref<rt::Object> implementation = lookUp(floor.lock, floor.implementations, found->api);
     const Ref<rt::Object> scope = lookUp(floor.lock, floor.scopes, tags);

@@ -302,7 +302,7 @@ void SRLRegistry::removeScopesWithTag(const rt::Ref<rt::Object>& tag) {
     return;
   }
   // What the caller's reference is a part of may end with a scope.
-  const rt::Ref<rt::Object> keptTag = tag;
+  const rt::Ref<rt::Object> keptTag = tag;  // NOLINT(performance-unnecessary-copy-initialization)
   const bool isDelegateSet = scopeLifecycleDelegate() != nullptr;
   std::vector<rt::Weak<rt::Object>> instances;
   {
@@ -341,6 +341,8 @@ void SRLRegistry::setScopeLifecycleDelegate(const rt::Ref<SRLScopeLifecycleDeleg
   scopeLifecycleDelegate_ = std::move(weak);
 }
 
+// Asked of a registry, whichever registry the instances are to live in.
+// NOLINTNEXTLINE(readability-convert-member-functions-to-static)
 SRLFactoryBlock SRLRegistry::scopedBlockForFactory(
     rt::Ref<rt::Object> (*factory)(SRLScopeTagSet tags),
     const SRLImplementationRegistrationData* implementationIdentifier, SRLScopeType apiScope,

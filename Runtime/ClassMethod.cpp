@@ -1,7 +1,7 @@
 #include "Runtime/ClassMethod.h"
 
 #include <algorithm>
-#include <utility>
+#include <compare>
 
 #include "Runtime/UnfairLock.h"
 
@@ -13,29 +13,29 @@ namespace {
 constinit std::atomic<detail::ClassMethodEntry*> first{nullptr};
 constinit UnfairLock lock;
 constinit std::atomic<detail::ClassMethodEntry*>* end RT_GUARDED_BY(lock) = &first;
-constinit std::size_t count RT_GUARDED_BY(lock) = 0;
 
 }  // namespace
 
 void detail::announce(ClassMethodEntry& entry) noexcept {
   const LockGuard guard(lock);
-  if (entry.position != 0) return;
-  entry.position = ++count;
+  if (entry.isAnnounced) return;
+  entry.isAnnounced = true;
   end->store(&entry, std::memory_order_release);
   end = &entry.next;
 }
 
 std::vector<ClassMethod> classMethods(const ClassInfo& info) {
-  std::vector<std::pair<std::size_t, ClassMethod>> found;
+  std::vector<ClassMethod> methods;
   for (const detail::ClassMethodEntry* entry = first.load(std::memory_order_acquire); entry != nullptr;
        entry = entry->next.load(std::memory_order_acquire)) {
-    if (entry->owner == &info) found.emplace_back(entry->position, entry->method());
+    if (entry->owner != &info) continue;
+    methods.push_back(entry->method());
+    methods.back().position_ = methods.size();
   }
-  std::ranges::sort(found, {},
-                    [](const auto& each) { return std::pair(each.second.selector(), each.first); });
-  std::vector<ClassMethod> methods;
-  methods.reserve(found.size());
-  for (const auto& [position, method] : found) methods.push_back(method);
+  std::ranges::sort(methods, [](const ClassMethod& one, const ClassMethod& other) {
+    const std::strong_ordering order = one.selector_ <=> other.selector_;
+    return order != 0 ? order < 0 : one.position_ < other.position_;
+  });
   return methods;
 }
 

@@ -54,6 +54,7 @@ class ClassMethod {
  private:
   template <ClassType, detail::StringLiteral, auto>
   friend struct AddedClassMethod;
+  friend std::vector<ClassMethod> classMethods(const ClassInfo& info);
 
   template <class Function>
   ClassMethod(std::string_view selector, Function* function) noexcept
@@ -64,6 +65,8 @@ class ClassMethod {
   std::string_view selector_;
   void (*function_)();
   const char* type_;
+  // Among the class's methods, in the order in which they were loaded.
+  std::size_t position_ = 0;
 };
 
 /// The class methods added to `info` itself, not to classes that it derives from, by what has been
@@ -77,7 +80,7 @@ struct ClassMethodEntry {
   const ClassInfo* owner;
   ClassMethod (*method)();
   std::atomic<ClassMethodEntry*> next{nullptr};
-  std::size_t position = 0;
+  bool isAnnounced = false;
 };
 
 void announce(ClassMethodEntry& entry) noexcept;

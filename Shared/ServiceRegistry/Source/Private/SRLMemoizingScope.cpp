@@ -9,8 +9,29 @@
 using namespace rt::literals;
 
 namespace {
+
 constexpr const char* kFile = "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope";
+
+void beginCreation(SRLMemoizingScopeIvars& ivars, const void* identifier) RT_REQUIRES(ivars.lock) {
+  SRLPendingCreation* creation = nullptr;
+  if (auto entry = std::move(ivars.spareCreation)) {
+    entry.key() = identifier;
+    creation = entry.mapped().get();
+    ivars.pendingCreations.insert(std::move(entry));
+  } else {
+    creation = ivars.pendingCreations.emplace(identifier, rt::make<SRLPendingCreation>()).first->second.get();
+  }
+  creation->begin();
 }
+
+void endCreation(SRLMemoizingScopeIvars& ivars, const void* identifier) RT_REQUIRES(ivars.lock) {
+  auto entry = ivars.pendingCreations.extract(identifier);
+  entry.mapped()->end();
+  // One that threads wait for is theirs until they have woken up.
+  if (!entry.mapped()->isAwaited()) ivars.spareCreation = std::move(entry);
+}
+
+}  // namespace
 
 rt::Ref<SRLMemoizingScope> SRLMemoizingScope::init() {
   return rt::Ref<SRLMemoizingScope>::adopt(new SRLMemoizingScope());
@@ -19,30 +40,25 @@ rt::Ref<SRLMemoizingScope> SRLMemoizingScope::init() {
 rt::Ref<rt::Object> SRLMemoizingScope::makeOrAwaitInstance(const void* identifier, bool* instanceCreated,
                                                            const FactoryReference& factory) {
   SRLMemoizingScopeIvars& ivars = *ivars_;
-  rt::Ref<SRLPendingCreation> creation;
-  bool isCreator = false;
+  rt::Ref<SRLPendingCreation> awaited;
   {
     const rt::LockGuard guard(ivars.lock);
     // It may have been made since.
-    if (const auto found = ivars.instances.find(identifier); found != ivars.instances.end())
-      return found->second;
+    if (const auto* made = ivars.instances.find(identifier)) return made->second;
     if (const auto found = ivars.pendingCreations.find(identifier); found != ivars.pendingCreations.end()) {
-      creation = found->second;
+      awaited = found->second;
+      awaited->expectWaiter();
     } else {
-      creation = rt::make<SRLPendingCreation>();
-      ivars.pendingCreations.emplace(identifier, creation);
-      creation->begin();
-      isCreator = true;
+      beginCreation(ivars, identifier);
     }
   }
-  if (instanceCreated != nullptr) *instanceCreated = isCreator;
+  if (instanceCreated != nullptr) *instanceCreated = !awaited;
 
-  if (!isCreator) {
-    creation->wait();
+  if (awaited) {
+    awaited->wait();
     {
       const rt::LockGuard guard(ivars.lock);
-      if (const auto found = ivars.instances.find(identifier); found != ivars.instances.end())
-        return found->second;
+      if (const auto* made = ivars.instances.find(identifier)) return made->second;
     }
     PECReport({kFile, "-[SRLMemoizingScope instanceForIdentifier:instanceCreated:factoryBlock:]"},
               "We blocked waiting on instance creation but no instance was created."_s);
@@ -50,14 +66,10 @@ rt::Ref<rt::Object> SRLMemoizingScope::makeOrAwaitInstance(const void* identifie
   }
 
   rt::Ref<rt::Object> instance = factory.call(factory.factory);
-  // Destroyed when no lock is held any more.
-  rt::Ref<rt::Object> replaced;
-  {
-    const rt::LockGuard guard(ivars.lock);
-    replaced = std::exchange(ivars.instances[identifier], instance);
-    ivars.pendingCreations.erase(identifier);
-  }
-  creation->end();
+  const rt::LockGuard guard(ivars.lock);
+  // Nobody else has made one: they would have waited.
+  ivars.instances.insert(identifier, instance);
+  endCreation(ivars, identifier);
   return instance;
 }
 
@@ -65,8 +77,9 @@ rt::Ref<rt::Array> SRLMemoizingScope::instances() const {
   std::vector<rt::Ref<rt::Object>> instances;
   {
     const rt::LockGuard guard(ivars_->lock);
-    instances.reserve(ivars_->instances.size());
-    for (const auto& [identifier, instance] : ivars_->instances) {
+    const auto& entries = ivars_->instances.entries();
+    instances.reserve(entries.size());
+    for (const auto& [identifier, instance] : entries) {
       if (instance) instances.push_back(instance);
     }
   }

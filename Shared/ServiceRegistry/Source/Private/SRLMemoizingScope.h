@@ -14,14 +14,12 @@
 /// is kept: whoever asks for it later waits for ever, too, or ends the program where the thread is the same.
 /// What the factory threw comes out of the request that called it.
 ///
-/// A registry looks for instances with its own lock held, so nothing else is locked or called under the
-/// scope's.
-///
 /// Not for: hosts. They ask SRLRegistry, which has a scope for each set of tags.
 
 #include <concepts>
 #include <memory>
 #include <type_traits>
+#include <utility>
 
 #include "Runtime/Array.h"
 #include "Runtime/Class.h"
@@ -61,11 +59,11 @@ class RT_VISIBLE SRLMemoizingScope final : public rt::Implements<SRLMemoizingSco
   }
 
   /// Has `instance` be the one for `identifier`, which may be null, and returns true; false where there is
-  /// none yet.
-  bool findInstance(const void* identifier, rt::Ref<rt::Object>& instance) const {
-    const rt::LockGuard guard(ivars_->lock);
-    const auto found = ivars_->instances.find(identifier);
-    if (found == ivars_->instances.end()) return false;
+  /// none yet. Takes no lock.
+  bool findInstance(const void* identifier,
+                    rt::Ref<rt::Object>& instance) const RT_NO_THREAD_SAFETY_ANALYSIS {
+    const auto* found = std::as_const(ivars_->instances).find(identifier);
+    if (found == nullptr) return false;
     instance = found->second;
     return true;
   }
@@ -82,9 +80,9 @@ class RT_VISIBLE SRLMemoizingScope final : public rt::Implements<SRLMemoizingSco
     rt::Ref<rt::Object> (*call)(const void* factory);
   };
 
-  SRLMemoizingScope() : ivars_(std::make_unique<SRLMemoizingScopeIvars>()) {}
+  SRLMemoizingScope() : ivars_(std::make_unique_for_overwrite<SRLMemoizingScopeIvars>()) {}
 
-  // What `instanceForIdentifier` does where there was no instance yet. It looks once more.
+  // What `instanceForIdentifier` does where it found no instance. It looks once more, under the lock.
   [[gnu::noinline]] rt::Ref<rt::Object> makeOrAwaitInstance(const void* identifier, bool* instanceCreated,
                                                             const FactoryReference& factory);
 

@@ -4,7 +4,7 @@
 ///
 ///     SRLMemoizingScopeIvars ivars;
 ///     const rt::LockGuard guard(ivars.lock);
-///     ivars.instances.emplace(identifier, instance);
+///     ivars.instances.insert(identifier, instance);
 ///
 /// Not for: anything but the scope and its tests.
 
@@ -15,6 +15,7 @@
 #include "Runtime/Ref.h"
 #include "Runtime/UnfairLock.h"
 #include "Runtime/Visibility.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLTable.h"
 
 /// The making of an instance: a lock that whoever makes it holds meanwhile, and for which the others wait.
 class RT_VISIBLE SRLPendingCreation final : public rt::Implements<SRLPendingCreation, rt::Object> {
@@ -23,15 +24,23 @@ class RT_VISIBLE SRLPendingCreation final : public rt::Implements<SRLPendingCrea
   void begin() noexcept RT_NO_THREAD_SAFETY_ANALYSIS { lock_.lock(); }
   void end() noexcept RT_NO_THREAD_SAFETY_ANALYSIS { lock_.unlock(); }
 
+  /// Says that a thread is going to wait. Whoever calls this and `isAwaited` holds the scope's lock.
+  void expectWaiter() noexcept { isAwaited_ = true; }
+  bool isAwaited() const noexcept { return isAwaited_; }
+
   /// Waits until nobody makes the instance any more.
   void wait() noexcept { const rt::LockGuard guard(lock_); }
 
  private:
   rt::UnfairLock lock_;
+  bool isAwaited_ = false;
 };
 
 struct SRLMemoizingScopeIvars {
-  std::unordered_map<const void*, rt::Ref<rt::Object>> instances RT_GUARDED_BY(lock);
+  /// Nothing is taken out or replaced, so that whoever looks for an instance needs no lock.
+  SRLTable<const void*, rt::Ref<rt::Object>> instances RT_GUARDED_BY(lock);
   std::unordered_map<const void*, rt::Ref<SRLPendingCreation>> pendingCreations RT_GUARDED_BY(lock);
+  /// An entry that was pending, and that no thread has waited for, to be used again; or none.
+  std::unordered_map<const void*, rt::Ref<SRLPendingCreation>>::node_type spareCreation RT_GUARDED_BY(lock);
   rt::UnfairLock lock;
 };

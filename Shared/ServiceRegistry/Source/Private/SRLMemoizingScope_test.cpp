@@ -54,9 +54,9 @@ TEST_F(SRLMemoizingScopeTest, IsEmptyAtFirst) {
   EXPECT_TRUE(scope_->instances()->isEmpty());
   SRLMemoizingScopeIvars& ivars = Access::ivars(scope_);
   const rt::LockGuard guard(ivars.lock);
-  EXPECT_THAT(ivars.instances, IsEmpty());
+  EXPECT_THAT(ivars.instances.entries(), IsEmpty());
   EXPECT_THAT(ivars.pendingCreations, IsEmpty());
-  EXPECT_EQ(ivars.instances.max_load_factor(), 1.0F);
+  EXPECT_EQ(ivars.instances.entries().max_load_factor(), 1.0F);
   EXPECT_EQ(ivars.pendingCreations.max_load_factor(), 1.0F);
 }
 
@@ -130,9 +130,9 @@ TEST_F(SRLMemoizingScopeTest, ListsTheInstancesInTheOrderOfItsTable) {
   std::vector<Ref<rt::Object>> expected;
   SRLMemoizingScopeIvars& ivars = Access::ivars(scope_);
   const rt::LockGuard guard(ivars.lock);
-  EXPECT_EQ(ivars.instances.size(), 50U);
+  EXPECT_EQ(ivars.instances.entries().size(), 50U);
   EXPECT_THAT(ivars.pendingCreations, IsEmpty());
-  for (const auto& [identifier, instance] : ivars.instances) {
+  for (const auto& [identifier, instance] : ivars.instances.entries()) {
     if (instance) expected.push_back(instance);
   }
   EXPECT_TRUE(std::ranges::equal(*listed, expected));
@@ -160,27 +160,51 @@ TEST_F(SRLMemoizingScopeTest, LetsAFactoryUseTheScope) {
   EXPECT_EQ(ask(&identifiers_.second, mustNotRun), inner);
 }
 
-// An instance whose end uses the scope that it was in.
-class Watcher final : public rt::Implements<Watcher, rt::Object> {
- public:
-  explicit Watcher(std::function<void()> atEnd) : atEnd_(std::move(atEnd)) {}
-  ~Watcher() override { atEnd_(); }
+// What others could wait for is used again, whichever instances are made within each other.
+TEST_F(SRLMemoizingScopeTest, MakesInstancesOneAfterAnotherAndWithinEachOther) {
+  std::array<char, 30> places{};
+  std::vector<Ref<rt::Object>> made(places.size());
+  const auto make = [&](std::size_t i) {
+    return made[i] = ask(&places[i], [] { return Ref<rt::Object>(rt::make<Instance>()); });
+  };
+  for (std::size_t i = 0; i + 3 <= places.size(); i += 3) {
+    made[i] = ask(&places[i], [&] {
+      make(i + 1);
+      make(i + 2);
+      return Ref<rt::Object>(rt::make<Instance>());
+    });
+  }
+  for (std::size_t i = 0; i < places.size(); ++i) {
+    EXPECT_TRUE(made[i]);
+    EXPECT_EQ(ask(&places[i], mustNotRun), made[i]);
+  }
+  SRLMemoizingScopeIvars& ivars = Access::ivars(scope_);
+  const rt::LockGuard guard(ivars.lock);
+  EXPECT_THAT(ivars.pendingCreations, IsEmpty());
+  EXPECT_FALSE(ivars.spareCreation.empty());
+}
 
- private:
-  const std::function<void()> atEnd_;
-};
-
-TEST_F(SRLMemoizingScopeTest, ReplacesWhatCameToBeThereMeanwhileAndDestroysItWithoutALock) {
-  std::size_t countAtEnd = 0;
-  const Ref<rt::Object> made = ask(&identifiers_.first, [&]() -> Ref<rt::Object> {
-    SRLMemoizingScopeIvars& ivars = Access::ivars(scope_);
-    Ref<rt::Object> other = rt::make<Watcher>([&] { countAtEnd = scope_->instances()->count(); });
-    const rt::LockGuard guard(ivars.lock);
-    ivars.instances[&identifiers_.first] = std::move(other);
-    return rt::make<Instance>();
+// A lock that a thread may still be about to wait for is left to it: with the next creation's it would wait
+// for that one, too, and perhaps for ever.
+TEST_F(SRLMemoizingScopeTest, LeavesALockToThoseWhoWaitForIt) {
+  SRLMemoizingScopeIvars& ivars = Access::ivars(scope_);
+  std::thread other;
+  ask(&identifiers_.first, [&] {
+    other = std::thread([&] { EXPECT_TRUE(ask(&identifiers_.first, mustNotRun)); });
+    while (true) {
+      const rt::LockGuard guard(ivars.lock);
+      if (ivars.pendingCreations.at(&identifiers_.first)->isAwaited()) break;
+    }
+    return Ref<rt::Object>(rt::make<Instance>());
   });
-  EXPECT_EQ(countAtEnd, 1U);
-  EXPECT_EQ(ask(&identifiers_.first, mustNotRun), made);
+  other.join();
+  {
+    const rt::LockGuard guard(ivars.lock);
+    EXPECT_TRUE(ivars.spareCreation.empty());
+  }
+  ask(&identifiers_.second, makeInstance);
+  const rt::LockGuard guard(ivars.lock);
+  EXPECT_FALSE(ivars.spareCreation.empty());
 }
 
 TEST_F(SRLMemoizingScopeTest, ReportsThatItWaitedForNothing) {
@@ -228,7 +252,7 @@ TEST_F(SRLMemoizingScopeTest, LetsAnExceptionOutAndTheInstanceBeInTheMaking) {
 
   SRLMemoizingScopeIvars& ivars = Access::ivars(scope_);
   const rt::LockGuard guard(ivars.lock);
-  EXPECT_FALSE(ivars.instances.contains(&identifiers_.first));
+  EXPECT_EQ(ivars.instances.find(&identifiers_.first), nullptr);
   ASSERT_TRUE(ivars.pendingCreations.contains(&identifiers_.first));
   EXPECT_EQ(ivars.pendingCreations.size(), 1U);
   // Ends the program if the lock is not held.

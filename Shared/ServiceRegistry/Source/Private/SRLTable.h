@@ -1,0 +1,152 @@
+#pragma once
+
+/// A table that is quick to look into, also for threads that hold no lock.
+///
+///     SRLTable<const void*, rt::Ref<rt::Object>> instances;
+///     instances.insert(identifier, instance);                                   // with the lock
+///     if (const auto* found = instances.find(identifier)) use(found->second);   // with it or without
+///
+/// The entries are those of a `std::unordered_map`, which would find them by a division that takes longer
+/// than most of what a request needs besides. Here an index finds them: a power of two of places, at least
+/// half of them free. When it grows, the one that was there is kept for those who may still look into it.
+///
+/// Threads that change a table, or walk through it, take turns. Others may look into it meanwhile, as long as
+/// none takes entries out, or assigns to a value that another may look at.
+///
+/// Not for: tables that are rarely looked into.
+
+#include <algorithm>
+#include <atomic>
+#include <bit>
+#include <cstddef>
+#include <cstdint>
+#include <functional>
+#include <limits>
+#include <memory>
+#include <new>
+#include <type_traits>
+#include <unordered_map>
+#include <utility>
+#include <vector>
+
+template <class Key, class Value, class Hash = std::hash<Key>, class Equal = std::equal_to<Key>>
+class SRLTable {
+  static_assert(std::is_nothrow_invocable_v<const Hash&, const Key&>);
+
+ public:
+  using Entries = std::unordered_map<Key, Value, Hash, Equal>;
+  using Entry = typename Entries::value_type;
+
+  SRLTable() = default;
+  SRLTable(const SRLTable& other) : entries_(other.entries_), index_(makeIndex().release()) {}
+  SRLTable& operator=(const SRLTable&) = delete;
+  ~SRLTable() { delete index(); }
+
+  /// The entry for `key`, which stays where it is; null where there is none. Neither locks nor allocates.
+  /// Throws what comparing keys throws.
+  const Entry* find(const Key& key) const {
+    const Index* index = index_.load(std::memory_order_acquire);
+    return index != nullptr ? index->find(key) : nullptr;
+  }
+  Entry* find(const Key& key) { return const_cast<Entry*>(std::as_const(*this).find(key)); }
+
+  /// The entry for `key`: the one that there is, or else a new one with `value`. Throws std::bad_alloc, and
+  /// what comparing keys throws; then nothing has changed.
+  template <class Given>
+  Entry& insert(const Key& key, Given&& value) {
+    if (index() == nullptr || index()->isFull()) {
+      std::unique_ptr<Index> larger = makeIndex();
+      larger->keep(index());
+      index_.store(larger.release(), std::memory_order_release);
+    }
+    const auto [entry, isNew] = entries_.try_emplace(key, std::forward<Given>(value));
+    if (isNew) index()->insert(*entry);
+    return *entry;
+  }
+
+  /// The same where nobody minds if there is no entry: without memory there is none.
+  template <class Given>
+  void tryInsert(const Key& key, Given&& value) {
+    try {
+      insert(key, std::forward<Given>(value));
+    } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): as it says
+    }
+  }
+
+  /// The value for `key`, made where there is none. Throws as `insert` does.
+  Value& operator[](const Key& key) {
+    Entry* found = find(key);
+    return (found != nullptr ? *found : insert(key, Value())).second;
+  }
+
+  /// Takes entries of the table out of it. Throws std::bad_alloc; then nothing has changed.
+  std::vector<typename Entries::node_type> extract(
+      const std::vector<typename Entries::const_iterator>& entries) {
+    std::vector<typename Entries::node_type> nodes;
+    if (entries.empty()) return nodes;
+    nodes.reserve(entries.size());
+    auto rest = std::make_unique<Index>(entries_.size());
+    for (const auto& entry : entries) nodes.push_back(entries_.extract(entry));
+    for (const Entry& entry : entries_) rest->insert(entry);
+    delete index_.exchange(rest.release(), std::memory_order_relaxed);
+    return nodes;
+  }
+
+  /// The entries, to walk through.
+  const Entries& entries() const noexcept { return entries_; }
+
+ private:
+  class Index {
+   public:
+    // With room for twice as many entries as `count`.
+    explicit Index(std::size_t count)
+        : places_(std::bit_ceil(std::max(4 * count, kPlacesOfSmallest))),
+          shift_(kBits - std::countr_zero(places_.size())) {}
+
+    bool isFull() const noexcept { return 2 * count_ >= places_.size(); }
+
+    const Entry* find(const Key& key) const {
+      for (std::size_t at = start(key);; at = next(at)) {
+        const Entry* entry = places_[at].load(std::memory_order_acquire);
+        if (entry == nullptr || Equal()(entry->first, key)) return entry;
+      }
+    }
+
+    // There is room, and no entry with its key.
+    void insert(const Entry& entry) noexcept {
+      std::size_t at = start(entry.first);
+      while (places_[at].load(std::memory_order_relaxed) != nullptr) at = next(at);
+      places_[at].store(&entry, std::memory_order_release);
+      ++count_;
+    }
+
+    // Owned from now on.
+    void keep(const Index* replaced) noexcept { replaced_.reset(replaced); }
+
+   private:
+    static constexpr std::size_t kPlacesOfSmallest = 8;
+    static constexpr int kBits = std::numeric_limits<std::uint64_t>::digits;
+
+    // By the upper bits of a product, which depend on all bits of the hash: that of an address ends in zeros.
+    std::size_t start(const Key& key) const noexcept { return Hash()(key) * 0x9E3779B97F4A7C15U >> shift_; }
+    std::size_t next(std::size_t at) const noexcept { return (at + 1) & (places_.size() - 1); }
+
+    std::vector<std::atomic<const Entry*>> places_;
+    const int shift_;
+    std::size_t count_ = 0;
+    std::unique_ptr<const Index> replaced_;
+  };
+
+  // One with room for another entry.
+  std::unique_ptr<Index> makeIndex() const {
+    auto made = std::make_unique<Index>(entries_.size() + 1);
+    for (const Entry& entry : entries_) made->insert(entry);
+    return made;
+  }
+
+  Index* index() const noexcept { return index_.load(std::memory_order_relaxed); }
+
+  Entries entries_;
+  // Owned.
+  std::atomic<Index*> index_ = nullptr;
+};

@@ -32,6 +32,31 @@ constinit bool isSharedInstanceMade RT_GUARDED_BY(sharedInstanceLock) = false;
 // Retained, and never released at exit, when other threads may still ask for services.
 constinit SRLRegistry* sharedRegistry RT_GUARDED_BY(sharedInstanceLock) = nullptr;
 
+// A module's binding of the API with this identifier; null where it has none.
+const _SRLBindingRegistrationData* bindingOf(const SRLBindingsModuleData& module,
+                                             std::string_view identifier) {
+  const auto identifierOf = [](const auto& binding) { return SRLIdentifierBytes(*binding.api); };
+  const auto bindings = module.bindings();
+  const auto found = std::ranges::lower_bound(bindings, identifier, SRLIsIdentifierBefore, identifierOf);
+  return found != bindings.end() && identifierOf(*found) == identifier ? &*found : nullptr;
+}
+
+// Whether a class has the names that an API is given by, as most are. Spares an instance type, which may say
+// yes where this says no.
+bool hasNamesOf(const SRLAPIRegistrationData& api, const rt::ClassInfo& aClass) {
+  if (api.instanceTypeKind != SRLInstanceTypeKindNames) return false;
+  const auto& [protocolName, className] = api.instanceType.names;
+  if (className != nullptr) {
+    const rt::ClassInfo* named = rt::classNamed(className);
+    if (named == nullptr || !aClass.isSubclassOf(*named)) return false;
+  }
+  if (protocolName != nullptr) {
+    const rt::ProtocolInfo* named = rt::protocolNamed(protocolName);
+    if (named == nullptr || !aClass.conformsTo(*named)) return false;
+  }
+  return className != nullptr || protocolName != nullptr;
+}
+
 rt::String descriptionOf(const rt::Ref<SRLInstanceType>& type) {
   return type ? type->asObject()->description() : rt::String();
 }
@@ -45,8 +70,10 @@ void SRLRegistry::load() {
 void SRLRegistry::initialize(const rt::ClassInfo& receiver) {
   if (&receiver != &rt::classInfo<SRLRegistry>()) return;
   SRLStartUpHook();
+  const std::vector<rt::ClassMethod> methods = rt::classMethods(receiver);
   std::vector<const SRLBindingsModuleData*> modules;
-  for (const rt::ClassMethod& method : rt::classMethods(receiver)) {
+  modules.reserve(methods.size());
+  for (const rt::ClassMethod& method : methods) {
     if (!method.selector().starts_with(kBindingsPrefix) || method.selector() == kBindingsPrefix) continue;
     const auto bindings = method.as<const SRLBindingsModuleData*()>();
     if (bindings == nullptr) continue;
@@ -77,7 +104,8 @@ rt::Ref<SRLRegistry> SRLRegistry::setSharedInstance(const rt::Ref<SRLRegistry>& 
 }
 
 rt::Ref<SRLRegistry> SRLRegistry::initPrivate() {
-  return rt::Ref<SRLRegistry>::adopt(new SRLRegistry(std::make_unique<SRLRegistryIvars>()));
+  // Its members initialise themselves; there is nothing to clear before that.
+  return rt::Ref<SRLRegistry>::adopt(new SRLRegistry(std::make_unique_for_overwrite<SRLRegistryIvars>()));
 }
 
 SRLRegistry::SRLRegistry(std::unique_ptr<SRLRegistryIvars> ivars)
@@ -87,7 +115,7 @@ SRLRegistry::~SRLRegistry() {
   if (rt::isMainThread()) return;
   try {
     rt::Queue::main()->async([ivars = std::move(ivars_)] {});
-  } catch (const std::bad_alloc&) {
+  } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): what is to be done then happens anyway
     // There is no memory for a task: then they are released here and now, with the task that there was to be.
   }
 }
@@ -102,10 +130,10 @@ rt::String SRLRegistry::description() const {
   rt::Dictionary::Builder multis;
   {
     const rt::LockGuard guard(ivars_->lock);
-    for (const auto& [api, implementation] : ivars_->singleBindings) {
+    for (const auto& [api, implementation] : ivars_->singleBindings.entries()) {
       singles.set(SRLAPIIdentifier(api), implementation);
     }
-    for (const auto& [api, implementations] : ivars_->multiBindings) {
+    for (const auto& [api, implementations] : ivars_->multiBindings.entries()) {
       multis.set(SRLAPIIdentifier(api), implementations);
     }
   }
@@ -139,9 +167,15 @@ bool SRLRegistry::multipleBindingsModulesAllowed() const {
 }
 
 bool SRLRegistry::lazilyRegisterBindingsForAPI(const SRLAPIRegistrationData* api) {
-  const std::vector<const _SRLBindingRegistrationData*> bindings = registrationDatasForAPI(api);
-  for (const _SRLBindingRegistrationData* binding : bindings) registerBindings(*binding);
-  return !bindings.empty();
+  const std::string_view identifier = api->identifier;
+  bool isKnown = false;
+  for (const SRLBindingsModuleData* module : ivars_->bindingsModules) {
+    const _SRLBindingRegistrationData* binding = bindingOf(*module, identifier);
+    if (binding == nullptr) continue;
+    isKnown = true;
+    registerBindings(*binding);
+  }
+  return isKnown;
 }
 
 std::vector<const _SRLBindingRegistrationData*> SRLRegistry::registrationDatasForAPI(
@@ -149,12 +183,7 @@ std::vector<const _SRLBindingRegistrationData*> SRLRegistry::registrationDatasFo
   const std::string_view identifier = api->identifier;
   std::vector<const _SRLBindingRegistrationData*> found;
   for (const SRLBindingsModuleData* module : ivars_->bindingsModules) {
-    const auto bindings = module->bindings();
-    const auto position =
-        std::ranges::lower_bound(bindings, identifier, SRLIsIdentifierBefore,
-                                 [](const auto& binding) { return SRLIdentifierBytes(*binding.api); });
-    if (position != bindings.end() && SRLIdentifierBytes(*position->api) == identifier)
-      found.push_back(&*position);
+    if (const _SRLBindingRegistrationData* binding = bindingOf(*module, identifier)) found.push_back(binding);
   }
   return found;
 }
@@ -203,7 +232,8 @@ void SRLRegistry::internalRegisterServiceAPI(const SRLAPIRegistrationData* api,
     return;
   }
 
-  if (const auto* classType = rt::cast<SRLClassType>(implementation->instanceType().get())) {
+  if (const auto* classType = rt::cast<SRLClassType>(implementation->instanceType().get());
+      classType != nullptr && !hasNamesOf(*api, classType->concreteClass())) {
     const rt::Ref<SRLInstanceType> apiType = SRLAPIRegistrationDataInstanceType(api);
     if (!apiType || !apiType->doesRepresentSupertypeOfClass(classType->concreteClass())) {
       PECReport({kFile, kFunction}, "Implementation %@ should conform to %@"_s,
@@ -254,11 +284,11 @@ void SRLRegistry::internalRegisterImplementation(const rt::Ref<SRLImplementation
     return;
   }
   // The set is complete before the API is known: a type of the host's own may throw when it is hashed.
-  const auto found = ivars_->multiBindings.find(forMultiboundAPI);
-  const bool isBound = found != ivars_->multiBindings.end() && found->second;
-  rt::Set::Builder builder = isBound ? rt::Set::Builder(*found->second) : rt::Set::Builder();
+  const auto* known = ivars_->multiBindings.find(forMultiboundAPI);
+  const bool isBound = known != nullptr && known->second;
+  rt::Set::Builder builder = isBound ? rt::Set::Builder(*known->second) : rt::Set::Builder();
   builder.add(implementation);
-  ivars_->multiBindings.insert_or_assign(forMultiboundAPI, std::move(builder).set());
+  ivars_->multiBindings[forMultiboundAPI] = std::move(builder).set();
 }
 
 rt::Ref<rt::Object> SRLRegistry::internalImplementationConfigForIdentifier(const void* identifier) {
@@ -289,10 +319,16 @@ const SRLAPIRegistrationData* SRLRegistry::apiIdentifierFromString(
     PECReport({kFile, "-[SRLRegistry apiIdentifierFromString:]"}, "apiIdentifierString must not be nil"_s);
     return nullptr;
   }
+  const std::string_view identifier = apiIdentifierString.view();
+  const auto& apisByIdentifier = ivars_->apisByIdentifier;
+  if (const auto* known = apisByIdentifier.find(identifier)) return known->second;
   const rt::LockGuard guard(ivars_->lock);
   for (const SRLBindingsModuleData* module : ivars_->bindingsModules) {
     for (const _SRLBindingRegistrationData& binding : module->bindings()) {
-      if (SRLIdentifierBytes(*binding.api) == apiIdentifierString.view()) return binding.api;
+      const std::string_view bytes = SRLIdentifierBytes(*binding.api);
+      if (bytes != identifier) continue;
+      ivars_->apisByIdentifier.tryInsert(bytes, binding.api);
+      return binding.api;
     }
   }
   return nullptr;

@@ -33,6 +33,7 @@
 #include <atomic>
 #include <cstdint>
 #include <memory>
+#include <optional>
 #include <span>
 #include <vector>
 
@@ -213,7 +214,8 @@ class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
       RT_REQUIRES(ivars_->lock);
 
   /// The API with this identifier; null where no module knows one. Null is reported. Looks at one binding
-  /// after another: for tools.
+  /// after another where the API has not been asked for like that before. Not to be called with the lock
+  /// held, which then ends the program.
   const SRLAPIRegistrationData* apiIdentifierFromString(const rt::String& apiIdentifierString) const;
 
   /// The identifiers of all APIs that the modules know, as strings, whether they have been asked for or not.
@@ -228,24 +230,39 @@ class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
   explicit SRLRegistry(std::unique_ptr<SRLRegistryIvars> ivars);
 
  private:
-  // What is bound to an API for one, unless there is an instance already.
+  // For a request: an instance that is there already; or else what is bound to the API, and the scope that
+  // its instance is to be kept in, where that is one of this registry.
   struct Found {
-    rt::Ref<SRLImplementation> implementation;
     rt::Ref<rt::Object> instance;
+    rt::Ref<SRLImplementation> implementation;
+    rt::Ref<SRLMemoizingScope> scope;
   };
   Found find(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) RT_REQUIRES(ivars_->lock);
 
-  // What the modules bind to an API, not null, that is not in the table yet.
-  rt::Ref<SRLImplementation> newlyBound(const SRLAPIRegistrationData* api) RT_REQUIRES(ivars_->lock);
+  // What is bound to an API for one, which may be null; null where no module knows it. A null API is
+  // reported.
+  const rt::Ref<SRLImplementation>* boundTo(const SRLAPIRegistrationData* api) RT_REQUIRES(ivars_->lock);
+  // The same for one that is not in the table yet.
+  const rt::Ref<SRLImplementation>* newlyBound(const SRLAPIRegistrationData* api) RT_REQUIRES(ivars_->lock);
 
-  // The instance that a scope of this registry has already, where this is the shared one; null where there is
-  // none, or no telling.
+  // `lazilyRegisterBindingsForAPI`, after which it is known where no module knows the API.
+  bool registersBindingsFor(const SRLAPIRegistrationData* api) RT_REQUIRES(ivars_->lock);
+
+  SRLMemoizingScope& openScope(const SRLScopeTagSet& tags) RT_REQUIRES(ivars_->lock);
+  SRLMemoizingScope& newScope(const SRLScopeTagSet& tags) RT_REQUIRES(ivars_->lock);
+
+  // The tags of the scope of this registry that keeps an implementation's instance for a request with `tags`.
+  std::optional<SRLScopeTagSet> scopeTagsOf(const SRLImplementation& implementation,
+                                            const SRLScopeTagSet& tags) const RT_REQUIRES(ivars_->lock);
+
+  // The instance that a scope of this registry has already; null where there is none, or no telling.
   rt::Ref<rt::Object> keptInstanceOf(const SRLImplementation& implementation,
                                      const SRLScopeTagSet& tags) const RT_REQUIRES(ivars_->lock);
 
-  // An instance of what the caller keeps, new or kept; null where its factory gives none.
+  // An instance of what the caller keeps, new or kept; null where its factory gives none. Where `scope` is
+  // given, that is where it is kept.
   static rt::Ref<rt::Object> instanceOf(SRLImplementation& implementation, const SRLAPIRegistrationData* api,
-                                        const SRLScopeTagSet& tags);
+                                        const SRLScopeTagSet& tags, const rt::Ref<SRLMemoizingScope>& scope);
 
   std::unique_ptr<SRLRegistryIvars> ivars_;
   const rt::Ref<SRLMemoizingScope> configScope_;

@@ -2,8 +2,9 @@
 
 #include <algorithm>
 #include <cstddef>
-#include <unordered_map>
+#include <optional>
 #include <utility>
+#include <variant>
 #include <vector>
 
 #include "Libraries/Util/ErrorHandler/PECReport.h"
@@ -17,6 +18,8 @@ using namespace rt::literals;
 namespace {
 
 constexpr const char* kFile = "Shared/ServiceRegistry/Source/SRLRegistry";
+
+using ScopeKey = SRLRegistryIvars::ScopeKey;
 
 // Asks an implementation for an instance while it is measured. A factory that throws leaves no mark.
 [[gnu::noinline]] rt::Ref<rt::Object> measuredInstance(const rt::Ref<SRLImplementation>& implementation,
@@ -69,107 +72,126 @@ rt::String instanceTypeOf(const SRLImplementation& implementation) {
 
 }  // namespace
 
-rt::Ref<rt::Object> SRLRegistry::keptInstanceOf(const SRLImplementation& implementation,
-                                                const SRLScopeTagSet& tags) const {
+// Nothing where its instances are not kept by this registry, or not with these tags: what is wrong is for the
+// factory block to report.
+std::optional<SRLScopeTagSet> SRLRegistry::scopeTagsOf(const SRLImplementation& implementation,
+                                                       const SRLScopeTagSet& tags) const {
   const SRLImplementationRegistrationData* record = implementation.record_;
   if (record == nullptr || record->lifetime != 0 || !isShared_.load(std::memory_order_relaxed))
-    return nullptr;
+    return std::nullopt;
   const SRLScopeType apiScope = implementation.apiScope_;
-  // Tags that do not fit are for the factory block to report.
   if ((record->scopeType & ~apiScope) != 0 || !SRLScopeTagSetDetail::hasOneTagForEachBit(tags, apiScope))
-    return nullptr;
-  const auto scope = ivars_->scopes.find(SRLScopeTagSetMaskingWithScopes(tags, apiScope, record->scopeType));
+    return std::nullopt;
+  return SRLScopeTagSetMaskingWithScopes(tags, apiScope, record->scopeType);
+}
+
+rt::Ref<rt::Object> SRLRegistry::keptInstanceOf(const SRLImplementation& implementation,
+                                                const SRLScopeTagSet& tags) const {
   rt::Ref<rt::Object> instance;
-  if (scope != ivars_->scopes.end()) scope->second->findInstance(record, instance);
+  if (const std::optional<SRLScopeTagSet> scopeTags = scopeTagsOf(implementation, tags)) {
+    if (const SRLMemoizingScope* scope = ivars_->findScope(*scopeTags))
+      scope->findInstance(implementation.record_, instance);
+  }
   return instance;
 }
 
 // The caller keeps the implementation.
 rt::Ref<rt::Object> SRLRegistry::instanceOf(SRLImplementation& implementation,
-                                            const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) {
+                                            const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags,
+                                            const rt::Ref<SRLMemoizingScope>& scope) {
   if (SRLPProfilingEnabled()) [[unlikely]]
     return measuredInstance(&implementation, api, tags);
-  const SRLImplementationRegistrationData* record = implementation.record_;
   // What the factory block would do, at one go.
-  if (record != nullptr && record->lifetime == 1) {
+  const SRLImplementationRegistrationData* record = implementation.record_;
+  const auto make = [&] {
     return record->factory(
         SRLScopeTagSetMaskingWithScopes(tags, implementation.apiScope_, record->scopeType));
-  }
+  };
+  if (record != nullptr && record->lifetime == 1) return make();
+  if (scope) return scope->instanceForIdentifier(record, nullptr, make);
   bool instanceCreated = false;
   return implementation.factoryBlock().callKept(tags, &instanceCreated);
 }
 
 SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) {
-  const auto binding = ivars_->singleBindings.find(api);
-  if (binding == ivars_->singleBindings.end()) {
-    return {api != nullptr ? newlyBound(api) : implementationForSingleBoundService(api), nullptr};
+  Found found;
+  const rt::Ref<SRLImplementation>* bound = boundTo(api);
+  if (bound == nullptr || !*bound || !(*bound)->factoryBlock()) return found;
+  if (const std::optional<SRLScopeTagSet> scopeTags = scopeTagsOf(**bound, tags)) {
+    SRLMemoizingScope& scope = openScope(*scopeTags);
+    if (scope.findInstance((*bound)->record_, found.instance) && found.instance) return found;
+    found.scope = &scope;
   }
-  if (!binding->second) return {};
-  if (rt::Ref<rt::Object> instance = keptInstanceOf(*binding->second, tags))
-    return {nullptr, std::move(instance)};
-  return {binding->second, nullptr};
+  found.implementation = *bound;
+  return found;
 }
 
 // Flat, since most requests are for an instance that is there.
 [[gnu::flatten]] rt::Ref<rt::Object> SRLRegistry::internalService(const SRLAPIRegistrationData* api,
                                                                   const SRLScopeTagSet& scopeTags) {
   constexpr const char* kFunction = "-[SRLRegistry internalService:scopeTags:]";
-  rt::Ref<SRLImplementation> implementation;
-  {
+  Found found = [&] {
     const rt::LockGuard guard(ivars_->lock);
-    Found found = find(api, scopeTags);
-    if (found.instance) return std::move(found.instance);
-    implementation = std::move(found.implementation);
-    if (!implementation || !implementation->factoryBlock()) [[unlikely]] {
+    Found all = find(api, scopeTags);
+    if (!all.instance && !all.implementation) [[unlikely]] {
       if (ivars_->bindingsState == SRLBindingsState::kRegistered) {
         reportNoBinding(kFunction, api);
       } else {
         reportEarlyRequest(kFunction, api);
       }
-      return nullptr;
     }
-  }
-  rt::Ref<rt::Object> instance = instanceOf(*implementation, api, scopeTags);
+    return all;
+  }();
+  if (found.instance || !found.implementation) return std::move(found.instance);
+  rt::Ref<rt::Object> instance = instanceOf(*found.implementation, api, scopeTags, found.scope);
   if (!instance) [[unlikely]]
-    reportNoInstance(kFunction, *implementation, api);
+    reportNoInstance(kFunction, *found.implementation, api);
   return instance;
 }
 
 [[gnu::flatten]] rt::Ref<rt::Object> SRLRegistry::internalOptionalService(const SRLAPIRegistrationData* api,
                                                                           const SRLScopeTagSet& scopeTags) {
-  rt::Ref<SRLImplementation> implementation;
-  {
+  Found found = [&] {
     const rt::LockGuard guard(ivars_->lock);
-    Found found = find(api, scopeTags);
-    if (found.instance) return std::move(found.instance);
-    implementation = std::move(found.implementation);
-    if (!implementation || !implementation->factoryBlock()) {
-      if (ivars_->bindingsState == SRLBindingsState::kInProgress) {
-        reportEarlyRequest("-[SRLRegistry internalOptionalService:scopeTags:]", api);
-      }
-      return nullptr;
-    }
-  }
-  return instanceOf(*implementation, api, scopeTags);
+    Found all = find(api, scopeTags);
+    if (!all.instance && !all.implementation && ivars_->bindingsState == SRLBindingsState::kInProgress)
+      reportEarlyRequest("-[SRLRegistry internalOptionalService:scopeTags:]", api);
+    return all;
+  }();
+  if (found.instance || !found.implementation) return std::move(found.instance);
+  return instanceOf(*found.implementation, api, scopeTags, found.scope);
 }
 
 rt::Ref<SRLImplementation> SRLRegistry::implementationForSingleBoundService(
+    const SRLAPIRegistrationData* api) {
+  const rt::Ref<SRLImplementation>* bound = boundTo(api);
+  return bound != nullptr ? *bound : nullptr;
+}
+
+const rt::Ref<SRLImplementation>* SRLRegistry::boundTo(const SRLAPIRegistrationData* api) {
+  if (const auto* known = ivars_->singleBindings.find(api)) return &known->second;
+  return ivars_->isUnknown(api) ? nullptr : newlyBound(api);
+}
+
+[[gnu::noinline]] const rt::Ref<SRLImplementation>* SRLRegistry::newlyBound(
     const SRLAPIRegistrationData* api) {
   if (api == nullptr) [[unlikely]] {
     PECReport({kFile, "-[SRLRegistry implementationForSingleBoundService:]"},
               "|apiIdentifier| cannot be nil!"_s);
     return nullptr;
   }
-  if (const auto found = ivars_->singleBindings.find(api); found != ivars_->singleBindings.end()) {
-    return found->second;
-  }
-  return newlyBound(api);
+  if (!registersBindingsFor(api)) return nullptr;
+  // Made known even where registration has refused what there was.
+  return &ivars_->singleBindings[api];
 }
 
-rt::Ref<SRLImplementation> SRLRegistry::newlyBound(const SRLAPIRegistrationData* api) {
-  if (!lazilyRegisterBindingsForAPI(api)) return nullptr;
-  // Made known even where registration has refused what there was.
-  return ivars_->singleBindings[api];
+// Modules never change once they are registered, so one that none of them knows is looked for among them
+// once.
+bool SRLRegistry::registersBindingsFor(const SRLAPIRegistrationData* api) {
+  if (lazilyRegisterBindingsForAPI(api)) return true;
+  if (ivars_->bindingsState == SRLBindingsState::kRegistered)
+    ivars_->unknownAPIs.tryInsert(api, std::monostate());
+  return false;
 }
 
 rt::Ref<rt::Array> SRLRegistry::internalMultiBoundService(const SRLAPIRegistrationData* api,
@@ -184,11 +206,11 @@ rt::Ref<rt::Array> SRLRegistry::internalMultiBoundService(const SRLAPIRegistrati
   std::vector<rt::Ref<rt::Object>> instances;
   {
     const rt::LockGuard guard(ivars_->lock);
-    auto found = ivars_->multiBindings.find(api);
-    if (found == ivars_->multiBindings.end() && lazilyRegisterBindingsForAPI(api)) {
-      found = ivars_->multiBindings.try_emplace(api).first;
+    if (const auto* known = ivars_->multiBindings.find(api)) {
+      implementations = known->second;
+    } else if (!ivars_->isUnknown(api) && registersBindingsFor(api)) {
+      implementations = ivars_->multiBindings[api];
     }
-    if (found != ivars_->multiBindings.end()) implementations = found->second;
     if (!implementations) {
       if (ivars_->bindingsState == SRLBindingsState::kInProgress) {
         reportEarlyRequest(kFunction, api);
@@ -209,7 +231,7 @@ rt::Ref<rt::Array> SRLRegistry::internalMultiBoundService(const SRLAPIRegistrati
     if (!instance) {
       // A factory may do anything, such as end a scope: what was found before counts no more.
       if (!std::exchange(hasFactoryRun, true)) std::fill(kept, instances.end(), nullptr);
-      instance = instanceOf(implementation, api, scopeTags);
+      instance = instanceOf(implementation, api, scopeTags, nullptr);
     }
     if (instance) {
       instances[count++] = std::move(instance);
@@ -289,11 +311,18 @@ bool SRLRegistry::eg_internalHasImplementationForService(const rt::String& ident
 
 rt::Ref<SRLMemoizingScope> SRLRegistry::scopeWithTags(const SRLScopeTagSet& tags) {
   const rt::LockGuard guard(ivars_->lock);
-  if (const auto found = ivars_->scopes.find(tags); found != ivars_->scopes.end()) return found->second;
-  rt::Ref<SRLMemoizingScope> scope = SRLMemoizingScope::init();
-  ivars_->scopes.emplace(tags, scope);
+  return &openScope(tags);
+}
+
+SRLMemoizingScope& SRLRegistry::openScope(const SRLScopeTagSet& tags) {
+  if (SRLMemoizingScope* open = ivars_->findScope(tags)) return *open;
+  return newScope(tags);
+}
+
+[[gnu::noinline]] SRLMemoizingScope& SRLRegistry::newScope(const SRLScopeTagSet& tags) {
+  const auto& opened = ivars_->scopes.insert(ScopeKey(tags), SRLMemoizingScope::init());
   SRLScopeTagSetRetain(tags);
-  return scope;
+  return *opened.second;
 }
 
 void SRLRegistry::removeScopesWithTag(const rt::Ref<rt::Object>& tag) {
@@ -308,22 +337,24 @@ void SRLRegistry::removeScopesWithTag(const rt::Ref<rt::Object>& tag) {
   {
     // Entries that are taken out keep their scopes, and the tags that their keys have retained, until the
     // lock is let go.
-    struct Removed : std::vector<SRLRegistryIvars::Scopes::node_type> {
+    struct Removed {
       ~Removed() {
-        for (const auto& entry : *this) SRLScopeTagSetRelease(entry.key());
+        for (const auto& entry : entries) SRLScopeTagSetRelease(entry.key().tags);
       }
+      std::vector<SRLRegistryIvars::Scopes::Entries::node_type> entries;
     } removed;
-    std::vector<SRLRegistryIvars::Scopes::const_iterator> entries;
+    std::vector<SRLRegistryIvars::Scopes::Entries::const_iterator> entries;
     const rt::LockGuard guard(ivars_->lock);
-    for (auto entry = ivars_->scopes.cbegin(); entry != ivars_->scopes.cend(); ++entry) {
-      if (!SRLScopeTagSetContainsTag(entry->first, keptTag.get())) continue;
+    const auto& scopes = ivars_->scopes.entries();
+    for (auto entry = scopes.begin(); entry != scopes.end(); ++entry) {
+      if (!SRLScopeTagSetContainsTag(entry->first.tags, keptTag.get())) continue;
       entries.push_back(entry);
       if (!isDelegateSet) continue;
       const rt::Ref<rt::Array> kept = entry->second->instances();
       instances.insert(instances.end(), kept->begin(), kept->end());
     }
-    removed.reserve(entries.size());
-    for (const auto& entry : entries) removed.push_back(ivars_->scopes.extract(entry));
+    ivars_->lastScope = nullptr;
+    removed.entries = ivars_->scopes.extract(entries);
   }
   if (const rt::Ref<SRLScopeLifecycleDelegate> delegate = scopeLifecycleDelegate()) {
     delegate->didRemoveScopesWithTag(keptTag, instances);

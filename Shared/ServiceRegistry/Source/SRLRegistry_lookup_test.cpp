@@ -103,6 +103,33 @@ TEST(SRLAPIIdentifierFromString, IsTheFirstAPIOfThatIdentifier) {
             &testClocksAPI);
 }
 
+// However often it is asked for, and by whichever string.
+TEST(SRLAPIIdentifierFromString, IsAlwaysTheSame) {
+  const SRLAPIRegistrationData another = testClockAPI;
+  const TestModule one({{&testClockAPI, testNoClocks}, {&testClocksAPI, testNoClocks}});
+  const TestModule other({{&another, testNoClocks}});
+  const Ref<SRLRegistry> registry = registryWith({&other, &one});
+  const Ref<SRLRegistry> copy = [&] {
+    registry->apiIdentifierFromString("Clock"_s);
+    return registry->mutableCopy();
+  }();
+  for (int i = 0; i < 3; ++i) {
+    for (const Ref<SRLRegistry>& asked : {registry, copy}) {
+      EXPECT_EQ(asked->apiIdentifierFromString(rt::String::fromUTF8("Clock")), &another);
+      EXPECT_EQ(asked->apiIdentifierFromString("Clocks"_s), &testClocksAPI);
+      EXPECT_EQ(asked->apiIdentifierFromString("Sundials"_s), nullptr);
+    }
+  }
+}
+
+TEST(SRLAPIIdentifierFromString, IsLookedForAgainOnceThereAreModules) {
+  const Ref<SRLRegistry> registry = SRLRegistry::initPrivate();
+  EXPECT_EQ(registry->apiIdentifierFromString("Clock"_s), nullptr);
+  const TestModule module({{&testClockAPI, testNoClocks}});
+  registry->internalRegisterBindings(std::array{module.data()});
+  EXPECT_EQ(registry->apiIdentifierFromString("Clock"_s), &testClockAPI);
+}
+
 TEST(SRLAPIIdentifierFromString, IsNullWhereNoModuleHasIt) {
   TestReports reports;
   const TestModule module({{&testClockAPI, testNoClocks}});

@@ -3,12 +3,15 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <array>
 #include <functional>
+#include <iterator>
 #include <utility>
 #include <vector>
 
 #include "Runtime/Number.h"
 #include "Runtime/Weak.h"
+#include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "tests/TestServices.h"
 
@@ -96,6 +99,62 @@ TEST_F(SRLRegistryScopes, GiveUpTheirInstances) {
   EXPECT_FALSE(weak.lock());
   EXPECT_TRUE(registry->internalService(&scopedAPI, tags));
   EXPECT_THAT(reports.texts(), IsEmpty());
+}
+
+// Whichever was asked for last, and whichever of them has ended.
+TEST_F(SRLRegistryScopes, AreAskedForByTurns) {
+  const SRLScopeTagSet others = tagSet(window, window);
+  const Ref<rt::Object> first = registry->internalService(&scopedAPI, tags);
+  const Ref<rt::Object> second = registry->internalService(&scopedAPI, others);
+  const Ref<rt::Object> third = registry->internalService(&globalAPI, {});
+  for (int i = 0; i < 3; ++i) {
+    EXPECT_EQ(registry->internalService(&scopedAPI, tags), first);
+    EXPECT_EQ(registry->internalService(&scopedAPI, tags), first);
+    EXPECT_EQ(registry->internalService(&scopedAPI, others), second);
+    EXPECT_EQ(registry->internalService(&globalAPI, {}), third);
+  }
+  EXPECT_EQ(registry->internalService(&scopedAPI, tags), first);
+  registry->removeScopesWithTag(account);
+  const Ref<rt::Object> again = registry->internalService(&scopedAPI, tags);
+  EXPECT_NE(again, first);
+  EXPECT_EQ(registry->internalService(&scopedAPI, others), second);
+  EXPECT_EQ(registry->internalService(&scopedAPI, tags), again);
+  // Another one ends than was asked for last.
+  registry->removeScopesWithTag(window);
+  EXPECT_EQ(registry->internalService(&scopedAPI, tags), again);
+  EXPECT_NE(registry->internalService(&scopedAPI, others), second);
+  EXPECT_EQ(registry->internalService(&globalAPI, {}), third);
+}
+
+// A tag of the request before may be gone, and another be where it was.
+TEST_F(SRLRegistryScopes, AreNotTakenForThoseOfTagsThatAreGone) {
+  class Tag final : public rt::Implements<Tag, rt::Object> {
+   public:
+    explicit Tag(int number) : number_(number) {}
+    bool isEqual(const rt::Object* other) const override {
+      const auto* tag = rt::cast<Tag>(other);
+      return tag != nullptr && tag->number_ == number_;
+    }
+    std::uint64_t hash() const override { return 1; }
+
+   private:
+    const int number_;
+  };
+  const Ref<rt::Object> first = rt::make<Tag>(1);
+  const Ref<SRLMemoizingScope> scope = registry->scopeWithTags(tagSet(first));
+  alignas(Tag) std::array<std::byte, sizeof(Tag)> place;
+  const auto scopeWithTagAtPlace = [&](int number) {
+    Tag* tag = new (place.data()) Tag(number);
+    const Ref<SRLMemoizingScope> found = registry->scopeWithTags({{tag}});
+    // Where the scope is new it keeps the tag, which must then stay.
+    if (found == scope) tag->~Tag();
+    return found;
+  };
+  EXPECT_EQ(scopeWithTagAtPlace(1), scope);
+  EXPECT_EQ(scopeWithTagAtPlace(1), scope);
+  EXPECT_NE(scopeWithTagAtPlace(2), scope);
+  registry->removeScopesWithTag(rt::make<Tag>(2));
+  reinterpret_cast<Tag*>(place.data())->~Tag();
 }
 
 TEST_F(SRLRegistryScopes, EndAndTheDelegateLearnsWhatOutlivesThem) {
@@ -298,6 +357,70 @@ TEST_F(SRLRegistryByIdentifier, KeepsNoTagsOfItsOwn) {
   registry->eg_internalService("Fresh"_s, SRLScopeTagSetCodableWrapper::initWithTagSet(tagSet(tag, window)));
   tag = nullptr;
   EXPECT_FALSE(weak.lock());
+}
+
+// The tags of a request by identifier, to which this is the only reference; what the request calls drops it.
+Ref<SRLScopeTagSetCodableWrapper> onlyTags;
+const Ref<SRLScopeTagSetCodableWrapper>& newTags(std::size_t count = 1) {
+  std::vector<Ref<rt::Object>> tags;
+  while (tags.size() < count) tags.push_back(rt::String::fromUTF8("tag, and only here").object());
+  onlyTags = SRLScopeTagSetCodableWrapper::initWithTags(rt::make<rt::Array>(std::move(tags)));
+  return onlyTags;
+}
+
+Ref<rt::Object> makeAndDropTags(SRLScopeTagSet given) {
+  onlyTags = nullptr;
+  EXPECT_TRUE(given.tags[0] == nullptr || rt::String::from(given.tags[0]) == "tag, and only here");
+  return rt::make<Thing>(SRLScopeTagSet{});
+}
+Ref<SRLInstanceType> typeAndDropTags(const SRLAPIRegistrationData* /*api*/) {
+  onlyTags = nullptr;
+  return SRLClassType::initWithClass(&rt::classInfo<Thing>());
+}
+
+TEST_F(SRLRegistryByIdentifier, KeepsTheTagsUntilItIsDone) {
+  static constexpr SRLImplementationRegistrationData freshly{.identifier = "Freshly",
+                                                             .instanceType = {.className = "Thing"},
+                                                             .factory = makeAndDropTags,
+                                                             .scopeType = 0b1,
+                                                             .lifetime = 1};
+  static constexpr SRLImplementationRegistrationData once{
+      .identifier = "Once", .instanceType = {.className = "Thing"}, .factory = makeThing, .scopeType = 0b1};
+  static constexpr Implementations freshlyList[] = {&freshly, nullptr};
+  static constexpr Implementations onceList[] = {&once, nullptr};
+  static constexpr SRLAPIRegistrationData one{
+      .identifier = "One", .instanceType = kThingType, .scopeType = 0b1, .identifierLength = 3};
+  static constexpr SRLAPIRegistrationData many{.identifier = "Many",
+                                               .instanceType = kThingType,
+                                               .scopeType = 0b1,
+                                               .identifierLength = 4,
+                                               .isMultibound = 1};
+  static constexpr SRLAPIRegistrationData first{.identifier = "First",
+                                                .instanceType = {.function = typeAndDropTags},
+                                                .scopeType = 0b1,
+                                                .identifierLength = 5,
+                                                .instanceTypeKind = SRLInstanceTypeKindFunction};
+  static constexpr _SRLBindingRegistrationData bindings[] = {
+      {&one, freshlyList}, {&many, freshlyList}, {&first, onceList}};
+  static_assert(SRLAreBindingsSorted(bindings));
+  const SRLBindingsModuleData module{.bindingsBegin = std::begin(bindings),
+                                     .bindingsEnd = std::end(bindings)};
+  const Ref<SRLRegistry> other = SRLRegistry::initPrivate();
+  other->internalRegisterBindings(std::array{&module});
+  SRLRegistry::setSharedInstance(other);
+
+  // By the factory, and by the type that is asked for with the first request of an API.
+  EXPECT_TRUE(other->eg_internalService("One"_s, newTags()));
+  EXPECT_TRUE(other->eg_internalOptionalService("One"_s, newTags()));
+  EXPECT_EQ(other->eg_internalMultiBoundService("Many"_s, newTags())->count(), 1U);
+  EXPECT_FALSE(onlyTags);
+  EXPECT_TRUE(other->eg_internalService("First"_s, newTags()));
+  EXPECT_TRUE(other->mutableCopy()->eg_internalOptionalService("First"_s, newTags()));
+  EXPECT_THAT(reports.texts(), IsEmpty());
+  // By whoever is told that there are too many.
+  EXPECT_TRUE(other->eg_internalService("One"_s, newTags(5)));
+  EXPECT_EQ(reports.texts().size(), 2U);
+  onlyTags = nullptr;
 }
 
 }  // namespace

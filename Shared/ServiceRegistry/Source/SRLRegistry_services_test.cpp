@@ -6,12 +6,14 @@
 #include <array>
 #include <csignal>
 #include <cstddef>
+#include <cstdint>
 #include <iterator>
 #include <string>
 #include <vector>
 
 #include "Runtime/Number.h"
 #include "Runtime/UnfairLock.h"
+#include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "tests/AllocationCount.h"
 #include "tests/TestServices.h"
@@ -289,6 +291,93 @@ TEST_F(SRLRegistryServices, ThatAreThereCostNoAllocation) {
   EXPECT_EQ(registry->internalService(&scopedAPI, tags), thing);
   EXPECT_EQ(registry->internalOptionalService(&scopedAPI, tags), thing);
   EXPECT_EQ(count.allocations(), 0);
+}
+
+// The instance, and the entry that its scope keeps it in.
+TEST_F(SRLRegistryServices, ThatAreNewCostNoOtherAllocations) {
+  if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
+  registry->internalService(&freshAPI, tags);
+  const AllocationCount fresh;
+  registry->internalService(&freshAPI, tags);
+  EXPECT_EQ(fresh.allocations(), 1);
+
+  registry->internalService(&nestedAPI, tags);
+  registry->removeScopesWithTag(window);
+  registry->internalService(&scopedAPI, tagSet(window, window));
+  registry->scopeWithTags(tags)->instanceForIdentifier(nullptr, nullptr, [] { return nullptr; });
+  const AllocationCount scoped;
+  registry->internalService(&nestedAPI, tags);
+  EXPECT_EQ(scoped.allocations(), 2);
+}
+
+TEST_F(SRLRegistryServices, ThatNoModuleKnowsCostNoAllocationAgain) {
+  if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
+  EXPECT_FALSE(registry->internalOptionalService(&unknownAPI, {}));
+  EXPECT_FALSE(registry->internalMultiBoundService(&unknownManyAPI, {}));
+  const AllocationCount count;
+  EXPECT_FALSE(registry->internalOptionalService(&unknownAPI, {}));
+  EXPECT_FALSE(registry->internalHasImplementationForService(&unknownAPI));
+  EXPECT_FALSE(registry->internalMultiBoundService(&unknownManyAPI, {}));
+  EXPECT_EQ(count.allocations(), 0);
+}
+
+// Modules do not change. This one does, so that it shows.
+TEST_F(SRLRegistryServices, ThatNoModuleKnowsAreLookedForAmongModulesOnce) {
+  std::string identifier = "Elsewise";
+  const SRLAPIRegistrationData inModule{
+      .identifier = identifier.c_str(), .instanceType = kThingType, .identifierLength = 8};
+  const _SRLBindingRegistrationData bindings[] = {{&inModule, kGlobal}};
+  const SRLBindingsModuleData module{.bindingsBegin = std::begin(bindings),
+                                     .bindingsEnd = std::end(bindings)};
+  const SRLAPIRegistrationData api{
+      .identifier = "Midnight", .instanceType = kThingType, .identifierLength = 8};
+  const Ref<SRLRegistry> other = SRLRegistry::initPrivate();
+  other->internalRegisterBindings(std::array{&module});
+  const auto hasBound = [&] { return other->description().contains("GlobalThing"); };
+  EXPECT_FALSE(other->internalOptionalService(&api, {}));
+  identifier = "Midnight";
+  EXPECT_FALSE(other->internalOptionalService(&api, {}));
+  EXPECT_FALSE(other->internalMultiBoundService(&api, {}));
+  EXPECT_FALSE(hasBound());
+  {
+    const rt::LockGuard guard(*other->lock());
+    EXPECT_TRUE(other->lazilyRegisterBindingsForAPI(&api));
+  }
+  EXPECT_TRUE(hasBound());
+}
+
+// That no module knows an API is true as long as there is none, and no longer.
+TEST_F(SRLRegistryServices, AreLookedForAgainOnceThereAreModules) {
+  const Ref<SRLRegistry> other = SRLRegistry::initPrivate();
+  EXPECT_FALSE(other->internalOptionalService(&globalAPI, {}));
+  EXPECT_FALSE(other->internalHasImplementationForService(&freshAPI));
+  EXPECT_FALSE(other->internalMultiBoundService(&manyAPI, tags));
+  other->internalRegisterBindings(std::array{&kModule});
+  EXPECT_TRUE(other->internalOptionalService(&globalAPI, {}));
+  EXPECT_TRUE(other->internalHasImplementationForService(&freshAPI));
+  EXPECT_TRUE(other->internalMultiBoundService(&manyAPI, tags));
+}
+
+TEST_F(SRLRegistryServices, ThatNoModuleKnowsMayBeBoundByHand) {
+  for (int i = 0; i < 2; ++i) {
+    EXPECT_FALSE(registry->internalService(&unknownAPI, {}));
+    EXPECT_THAT(reportsOf(kService), ElementsAre(noBinding("Unknown")));
+    EXPECT_FALSE(registry->internalMultiBoundService(&unknownManyAPI, {}));
+  }
+  const Ref<SRLImplementation> implementation = SRLImplementation::initWithIdentifier(
+      "ByHand", SRLClassType::initWithClass(&rt::classInfo<Thing>()), /*lifetime=*/1, /*scope=*/0,
+      [](const SRLScopeTagSet& given, bool*) { return makeThing(given); }, nullptr);
+  {
+    const rt::LockGuard guard(*registry->lock());
+    EXPECT_FALSE(registry->lazilyRegisterBindingsForAPI(&unknownAPI));
+    registry->internalRegisterServiceAPI(&unknownAPI, implementation);
+    registry->internalRegisterServiceAPI(&unknownManyAPI, implementation);
+  }
+  EXPECT_TRUE(registry->internalService(&unknownAPI, {}));
+  EXPECT_TRUE(registry->internalHasImplementationForService(&unknownAPI));
+  ASSERT_TRUE(registry->internalMultiBoundService(&unknownManyAPI, {}));
+  EXPECT_EQ(registry->internalMultiBoundService(&unknownManyAPI, {})->count(), 1U);
+  EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
 TEST_F(SRLRegistryServices, MayThrowAndLeaveTheRegistryWhole) {

@@ -8,5 +8,5 @@ SRLRegistryIvars::SRLRegistryIvars(const SRLRegistryIvars& other)
       bindingsState(other.bindingsState) {}
 
 SRLRegistryIvars::~SRLRegistryIvars() {
-  for (const auto& [tags, scope] : scopes) SRLScopeTagSetRelease(tags);
+  for (const auto& [key, scope] : scopes.entries()) SRLScopeTagSetRelease(key.tags);
 }

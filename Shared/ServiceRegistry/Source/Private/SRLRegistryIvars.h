@@ -4,13 +4,14 @@
 ///
 ///     SRLRegistryIvars ivars;
 ///     const rt::LockGuard guard(ivars.lock);
-///     ivars.singleBindings.insert_or_assign(&clockAPI, implementation);
+///     ivars.singleBindings[&clockAPI] = implementation;
 ///
 /// Not for: anything but the registry.
 
 #include <cstddef>
 #include <cstdint>
-#include <unordered_map>
+#include <string_view>
+#include <variant>
 #include <vector>
 
 #include "Runtime/Ref.h"
@@ -19,35 +20,59 @@
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementation.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSet.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLAPIIdentifier.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLTable.h"
 #include "Shared/ServiceRegistry/Source/SRLUnfairLock.h"
 
 /// How far the registration of bindings modules is.
 enum class SRLBindingsState : std::uint8_t { kNone = 0, kInProgress = 1, kRegistered = 2 };
 
 struct SRLRegistryIvars {
-  struct TagSetHash {
-    std::size_t operator()(const SRLScopeTagSet& set) const { return SRLScopeTagSetHash(set); }
+  /// The key of a scope: its tags, whose hash is asked for once.
+  struct ScopeKey {
+    explicit ScopeKey(const SRLScopeTagSet& set) : tags(set), hash(SRLScopeTagSetHash(set)) {}
+
+    SRLScopeTagSet tags;
+    std::uint64_t hash;
   };
-  struct TagSetEqual {
-    bool operator()(const SRLScopeTagSet& first, const SRLScopeTagSet& second) const {
-      return SRLScopeTagSetEqual(first, second);
+  struct ScopeKeyHash {
+    std::size_t operator()(const ScopeKey& key) const noexcept { return key.hash; }
+  };
+  struct ScopeKeyEqual {
+    bool operator()(const ScopeKey& first, const ScopeKey& second) const {
+      return first.hash == second.hash && SRLScopeTagSetEqual(first.tags, second.tags);
     }
   };
-  using Scopes = std::unordered_map<SRLScopeTagSet, rt::Ref<SRLMemoizingScope>, TagSetHash, TagSetEqual>;
+  using Scopes = SRLTable<ScopeKey, rt::Ref<SRLMemoizingScope>, ScopeKeyHash, ScopeKeyEqual>;
 
   SRLRegistryIvars() = default;
-  /// The same, but for the scopes, of which there are none.
+  /// The same bindings and modules, and no scopes.
   SRLRegistryIvars(const SRLRegistryIvars& other) RT_REQUIRES(other.lock);
   SRLRegistryIvars& operator=(const SRLRegistryIvars&) = delete;
   ~SRLRegistryIvars();
 
+  /// The scope with these tags; null where there is none.
+  SRLMemoizingScope* findScope(const SRLScopeTagSet& tags) RT_REQUIRES(lock) {
+    if (lastScope == nullptr || lastTags != tags.tags || !SRLScopeTagSetEqual(lastScope->first.tags, tags)) {
+      const Scopes::Entry* found = scopes.find(ScopeKey(tags));
+      if (found == nullptr) return nullptr;
+      lastScope = found;
+      lastTags = tags.tags;
+    }
+    return lastScope->second.get();
+  }
+
+  /// Whether it is known that no module knows an API.
+  bool isUnknown(const SRLAPIRegistrationData* api) const RT_REQUIRES(lock) {
+    return unknownAPIs.find(api) != nullptr;
+  }
+
   /// The implementation of each API that is known; null where it has none.
-  std::unordered_map<const SRLAPIRegistrationData*, rt::Ref<SRLImplementation>> singleBindings
-      RT_GUARDED_BY(lock);
+  SRLTable<const SRLAPIRegistrationData*, rt::Ref<SRLImplementation>> singleBindings RT_GUARDED_BY(lock);
   /// The implementations of each API that is known; null where not even a set has been made. A set is never
   /// changed but replaced, so that whoever looks at one needs no lock.
-  std::unordered_map<const SRLAPIRegistrationData*, rt::Ref<rt::Set>> multiBindings RT_GUARDED_BY(lock);
+  SRLTable<const SRLAPIRegistrationData*, rt::Ref<rt::Set>> multiBindings RT_GUARDED_BY(lock);
   /// A key has retained its tags.
   Scopes scopes RT_GUARDED_BY(lock);
   // Written when the program is loaded, before it has a second thread.
@@ -55,4 +80,17 @@ struct SRLRegistryIvars {
   SRLConfigurationFactories configFactories;
   SRLBindingsState bindingsState = SRLBindingsState::kNone;
   SRLUnfairLock lock;
+
+  // What requests have found out, so that the next ones need not. No copy has it.
+
+  /// The scope that was asked for last, if it is still there.
+  const Scopes::Entry* lastScope RT_GUARDED_BY(lock) = nullptr;
+  /// The tags that it was asked for with, which may be gone. A request with the same ones most likely wants
+  /// the same scope.
+  decltype(SRLScopeTagSet::tags) lastTags RT_GUARDED_BY(lock){};
+  /// The APIs that no module knows, asked for when all modules were registered, which never change.
+  SRLTable<const SRLAPIRegistrationData*, std::monostate> unknownAPIs RT_GUARDED_BY(lock);
+  /// The APIs that were asked for by identifier, which is in their records. Changed under the lock, and
+  /// looked into without it.
+  SRLTable<std::string_view, const SRLAPIRegistrationData*, SRLIdentifierHash> apisByIdentifier;
 };

@@ -17,17 +17,10 @@ std::span<rt::Object* const> usedTags(const SRLScopeTagSet& set) noexcept {
 
 }  // namespace
 
-SRLScopeTagSet SRLScopeTagSetCreateWithTags(const rt::Array* tags) {
-  SRLScopeTagSet set;
-  if (tags == nullptr) return set;
-  if (tags->count() > SRLScopeTagSet::kCapacity) {
-    PECReport({kFile, "SRLScopeTagSetCreateWithTags"},
-              "SRLScopeTagSet only supports up to %@ tags, but received %@."_s, SRLScopeTagSet::kCapacity,
-              tags->count());
-    return set;
-  }
-  std::ranges::transform(*tags, set.tags.begin(), &rt::Ref<rt::Object>::get);
-  return set;
+[[gnu::cold]] void SRLScopeTagSetDetail::reportTooMany(std::size_t count) {
+  PECReport({kFile, "SRLScopeTagSetCreateWithTags"},
+            "SRLScopeTagSet only supports up to %@ tags, but received %@."_s, SRLScopeTagSet::kCapacity,
+            count);
 }
 
 rt::Object* SRLScopeTagSetCFRefTypeForIndex(const SRLScopeTagSet& set, std::size_t index) {
@@ -60,20 +53,6 @@ SRLScopeTagSet SRLScopeTagSetDetail::maskedToPart(const SRLScopeTagSet& set, SRL
     rest ^= lowest;
   }
   return masked;
-}
-
-bool SRLScopeTagSetEqual(const SRLScopeTagSet& first, const SRLScopeTagSet& second) {
-  for (std::size_t i = 0; i < SRLScopeTagSet::kCapacity; ++i) {
-    if (!rt::isEqual(first.tags[i], second.tags[i])) return false;
-    if (first.tags[i] == nullptr) return true;
-  }
-  return true;
-}
-
-std::uint64_t SRLScopeTagSetHash(const SRLScopeTagSet& set) {
-  std::uint64_t hash = kSRLScopeTagSetHashOfNone;
-  for (const rt::Object* tag : usedTags(set)) hash = hash * 41 + tag->hash();
-  return hash;
 }
 
 bool SRLScopeTagSetContainsTag(const SRLScopeTagSet& set, const rt::Object* tag) {

@@ -41,7 +41,7 @@ inline constexpr std::uint64_t kSRLScopeTagSetHashOfNone = 0x7FFFFFFF;
 
 /// A set of the elements of `tags`, in their order. Null counts as empty; more than four are reported and
 /// yield the empty set. Retains nothing.
-SRLScopeTagSet SRLScopeTagSetCreateWithTags(const rt::Array* tags);
+inline SRLScopeTagSet SRLScopeTagSetCreateWithTags(const rt::Array* tags);
 
 /// The tag at `index`, not retained. That there is none is reported, and yields null.
 rt::Object* SRLScopeTagSetCFRefTypeForIndex(const SRLScopeTagSet& set, std::size_t index);
@@ -53,11 +53,11 @@ inline SRLScopeTagSet SRLScopeTagSetMaskingWithScopes(const SRLScopeTagSet& set,
                                                       SRLScopeType implScope);
 
 /// Whether both have equal tags in the same order.
-bool SRLScopeTagSetEqual(const SRLScopeTagSet& first, const SRLScopeTagSet& second);
+inline bool SRLScopeTagSetEqual(const SRLScopeTagSet& first, const SRLScopeTagSet& second);
 
 /// A hash that suits SRLScopeTagSetEqual: from `kSRLScopeTagSetHashOfNone` on, for each tag in order, 41
 /// times what there is, plus the tag's own.
-std::uint64_t SRLScopeTagSetHash(const SRLScopeTagSet& set);
+inline std::uint64_t SRLScopeTagSetHash(const SRLScopeTagSet& set);
 
 /// Whether one of the set's tags equals `tag`; none equals null.
 bool SRLScopeTagSetContainsTag(const SRLScopeTagSet& set, const rt::Object* tag);
@@ -90,11 +90,42 @@ inline bool hasOneTagForEachBit(const SRLScopeTagSet& set, SRLScopeType scope) n
 // The same for an implementation whose scope is another than the API's, and for what is reported.
 SRLScopeTagSet maskedToPart(const SRLScopeTagSet& set, SRLScopeType apiScope, SRLScopeType implScope);
 
+void reportTooMany(std::size_t count);
+
 }  // namespace SRLScopeTagSetDetail
+
+inline SRLScopeTagSet SRLScopeTagSetCreateWithTags(const rt::Array* tags) {
+  SRLScopeTagSet set;
+  if (tags == nullptr) return set;
+  if (tags->count() > SRLScopeTagSet::kCapacity) {
+    SRLScopeTagSetDetail::reportTooMany(tags->count());
+    return set;
+  }
+  auto next = set.tags.begin();
+  for (const rt::Ref<rt::Object>& tag : *tags) *next++ = tag.get();
+  return set;
+}
 
 inline SRLScopeTagSet SRLScopeTagSetMaskingWithScopes(const SRLScopeTagSet& set, SRLScopeType apiScope,
                                                       SRLScopeType implScope) {
   if (implScope == apiScope && SRLScopeTagSetDetail::hasOneTagForEachBit(set, apiScope)) [[likely]]
     return set;
   return SRLScopeTagSetDetail::maskedToPart(set, apiScope, implScope);
+}
+
+inline bool SRLScopeTagSetEqual(const SRLScopeTagSet& first, const SRLScopeTagSet& second) {
+  for (std::size_t i = 0; i < SRLScopeTagSet::kCapacity; ++i) {
+    if (!rt::isEqual(first.tags[i], second.tags[i])) return false;
+    if (first.tags[i] == nullptr) return true;
+  }
+  return true;
+}
+
+inline std::uint64_t SRLScopeTagSetHash(const SRLScopeTagSet& set) {
+  std::uint64_t hash = kSRLScopeTagSetHashOfNone;
+  for (const rt::Object* tag : set.tags) {
+    if (tag == nullptr) break;
+    hash = hash * 41 + tag->hash();
+  }
+  return hash;
 }

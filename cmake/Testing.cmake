@@ -1,14 +1,14 @@
-# Tests: GoogleTest programs beside what they test, each test case an entry of ctest.
+# Tests: GoogleTest programs beside what they test, as entries of ctest.
 
 include_guard(GLOBAL)
 find_package(GTest REQUIRED)
 include(GoogleTest)
 
 # What a test takes to compile is mostly GoogleTest's headers, which are compiled once for all, and what becomes of
-# its many temporaries: but in the build for the debugger, tests get few symbols, and where a sanitizer multiplies
-# what there is they are not optimised. The libraries are compiled as ever.
+# its many temporaries: but in the build for the debugger, tests get few symbols, and they are optimised, like what
+# is shipped, by g++ alone. The libraries are compiled as ever.
 add_library(test-options INTERFACE)
-if(MOUNT_POINT_INSTRUMENTATION)
+if(MOUNT_POINT_INSTRUMENTATION OR CMAKE_CXX_COMPILER_ID STREQUAL "Clang")
   target_compile_options(test-options INTERFACE -g1 -O0)
 else()
   target_compile_options(test-options INTERFACE $<$<NOT:$<CONFIG:Debug>>:-g1>)
@@ -22,14 +22,26 @@ target_link_libraries(test-headers PRIVATE test-options)
 # mount_point_test(NAME SOURCES FILE… [LIBRARIES TARGET…] [DEFINITIONS DEFINITION…])
 #
 # Adds the test program NAME with GoogleTest's own main (name another one by not linking it: a source
-# that defines main wins). Every case in it becomes the ctest entry NAME.SUITE.CASE.
+# that defines main wins).
 function(mount_point_test name)
   cmake_parse_arguments(PARSE_ARGV 1 test "" "" "SOURCES;LIBRARIES;DEFINITIONS")
   add_executable(${name} ${test_SOURCES})
   target_link_libraries(${name} PRIVATE test-options ${test_LIBRARIES})
   target_precompile_headers(${name} REUSE_FROM test-headers)
   target_compile_definitions(${name} PRIVATE ${test_DEFINITIONS})
-  gtest_discover_tests(${name} TEST_PREFIX "${name}." DISCOVERY_TIMEOUT 60)
+  mount_point_test_entries(${name} ${name})
+endfunction()
+
+# mount_point_test_entries(NAME ENTRY [ARGUMENT…])
+#
+# Adds the cases of the test program NAME, run with these arguments, to ctest as ENTRY.SUITE.CASE, each in a
+# process of its own; in an instrumented build, which takes longer to start than a case to run, all in one, as ENTRY.
+function(mount_point_test_entries name entry)
+  if(MOUNT_POINT_INSTRUMENTATION)
+    add_test(NAME ${entry} COMMAND ${name} ${ARGN})
+  else()
+    gtest_discover_tests(${name} TEST_PREFIX "${entry}." DISCOVERY_TIMEOUT 60 EXTRA_ARGS ${ARGN})
+  endif()
 endfunction()
 
 # mount_point_must_not_compile(TEST SOURCE FILE [COMPILER ID] MISTAKES MACRO REGEX…)

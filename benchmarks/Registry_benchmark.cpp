@@ -5,12 +5,7 @@
 #include <algorithm>
 #include <array>
 #include <cstddef>
-#include <cstdint>
-#include <forward_list>
-#include <functional>
 #include <memory>
-#include <mutex>
-#include <span>
 #include <string>
 #include <string_view>
 #include <thread>
@@ -19,9 +14,9 @@
 #include <vector>
 
 #include "Comparison.h"
+#include "RegistryBenchmark.h"
 #include "Runtime/Array.h"
 #include "Runtime/Class.h"
-#include "Runtime/ClassMethod.h"
 #include "Runtime/Ref.h"
 #include "Runtime/Set.h"
 #include "Runtime/String.h"
@@ -31,60 +26,12 @@
 
 namespace {
 
-using namespace rt::literals;
+using namespace RegistryBenchmark;
 using rt::Ref;
 
 // Other parts of a program have threads: nothing may skip its atomic operations.
 [[maybe_unused]] const bool hasHadThreads = (std::thread([] {}).join(), true);
 
-class Service final : public rt::Implements<Service, rt::Object> {};
-
-Ref<rt::Object> makeService(SRLScopeTagSet /*tags*/) {
-  return rt::make<Service>();
-}
-
-constexpr std::size_t kAPIs = 1000;
-constexpr SRLAPIInstanceType kType{.names = {.protocolName = nullptr, .className = "Service"}};
-
-// A thousand APIs of one account's each, every third of which is made anew each time; and one for eight.
-struct Module {
-  Module() {
-    for (std::size_t i = 0; i < kAPIs; ++i) {
-      identifiers.at(i) = "Service" + std::to_string(1000 + i);
-      apis.at(i).identifier = identifiers.at(i).c_str();
-      apis.at(i).identifierLength = static_cast<std::uint16_t>(identifiers.at(i).size());
-      apis.at(i).instanceType = kType;
-      apis.at(i).scopeType = 0b1;
-      implementations.at(i).identifier = identifiers.at(i).c_str();
-      implementations.at(i).instanceType.className = "Service";
-      implementations.at(i).factory = makeService;
-      implementations.at(i).scopeType = 0b1;
-      implementations.at(i).lifetime = i % 3 == 2 ? 1 : 0;
-      lists.at(i) = {&implementations.at(i), nullptr};
-      bindings.at(i) = {&apis.at(i), lists.at(i).data()};
-    }
-    for (std::size_t i = 0; i < 8; ++i) eight.at(i) = &implementations.at(3 * i);
-    many.isMultibound = 1;
-    bindings.at(kAPIs) = {&many, eight.data()};
-    data.bindingsBegin = bindings.data();
-    data.bindingsEnd = bindings.data() + bindings.size();
-  }
-
-  std::array<std::string, kAPIs> identifiers;
-  std::array<SRLAPIRegistrationData, kAPIs> apis;
-  std::array<SRLImplementationRegistrationData, kAPIs> implementations;
-  std::array<std::array<const SRLImplementationRegistrationData*, 2>, kAPIs> lists{};
-  SRLAPIRegistrationData many{
-      .identifier = "ServiceOfMany", .instanceType = kType, .scopeType = 0b1, .identifierLength = 13};
-  std::array<const SRLImplementationRegistrationData*, 9> eight{};
-  std::array<_SRLBindingRegistrationData, kAPIs + 1> bindings;
-  SRLBindingsModuleData data;
-};
-
-const Module& module() {
-  static const Module module;
-  return module;
-}
 const SRLAPIRegistrationData* scopedAPI() {
   return &module().apis.at(0);
 }
@@ -137,14 +84,6 @@ struct Floor {
   Ref<rt::Object> shared = rt::make<Service>();
   std::unordered_map<const void*, Ref<rt::Object>> implementations;
   std::unordered_map<const void*, Ref<rt::Object>> instances;
-  struct TagSetHash {
-    std::size_t operator()(const SRLScopeTagSet& set) const { return SRLScopeTagSetHash(set); }
-  };
-  struct TagSetEqual {
-    bool operator()(const SRLScopeTagSet& first, const SRLScopeTagSet& second) const {
-      return SRLScopeTagSetEqual(first, second);
-    }
-  };
   std::unordered_map<SRLScopeTagSet, Ref<rt::Object>, TagSetHash, TagSetEqual> scopes;
 };
 
@@ -166,57 +105,6 @@ template <class Table, class Key>
   const Ref<rt::Object> scope = lookUp(floor.lock, floor.scopes, tags);
   return lookUp(floor.scopeLock, floor.instances, &api);
 }
-
-// The container of a user: services by name, instances by name in scopes by tags.
-class Container {
- public:
-  using Service = std::shared_ptr<void>;
-  using Tags = std::vector<std::string>;
-  using Factory = std::function<Service(const Tags&)>;
-
-  void bind(const std::string& name, Factory factory, bool isFresh) {
-    const std::lock_guard lock(mutex_);
-    bindings_[name] = {std::move(factory), isFresh};
-  }
-
-  Service find(const std::string& name, const Tags& tags) {
-    Factory factory;
-    bool isFresh = false;
-    {
-      const std::lock_guard lock(mutex_);
-      const auto binding = bindings_.find(name);
-      if (binding == bindings_.end()) return nullptr;
-      factory = binding->second.factory;
-      isFresh = binding->second.isFresh;
-      if (!isFresh) {
-        auto& scope = scopes_[tags];
-        if (const auto instance = scope.find(name); instance != scope.end()) return instance->second;
-      }
-    }
-    // Factories may ask for other services, so that two threads may make the same: the first counts.
-    Service made = factory(tags);
-    if (isFresh) return made;
-    const std::lock_guard lock(mutex_);
-    return scopes_[tags].emplace(name, std::move(made)).first->second;
-  }
-
- private:
-  struct Binding {
-    Factory factory;
-    bool isFresh = false;
-  };
-  struct TagsHash {
-    std::size_t operator()(const Tags& tags) const {
-      std::size_t hash = tags.size();
-      for (const std::string& tag : tags) hash = hash * 31 + std::hash<std::string>()(tag);
-      return hash;
-    }
-  };
-
-  std::mutex mutex_;
-  std::unordered_map<std::string, Binding> bindings_;
-  std::unordered_map<Tags, std::unordered_map<std::string, Service>, TagsHash> scopes_;
-};
 
 Container& container() {
   static Container& container = []() -> Container& {
@@ -426,7 +314,7 @@ void findFirstBare(benchmark::State& state) {
     rt::UnfairLock sharedLock;
     Ref<rt::Object> shared = rt::make<Service>();
     std::unordered_map<const void*, Ref<SRLImplementation>> implementations;
-    std::unordered_map<SRLScopeTagSet, std::unique_ptr<Scope>, Floor::TagSetHash, Floor::TagSetEqual> scopes;
+    std::unordered_map<SRLScopeTagSet, std::unique_ptr<Scope>, TagSetHash, TagSetEqual> scopes;
   };
   const auto bind = [](Tables& tables, const SRLAPIRegistrationData& api) {
     const rt::LockGuard guard(tables.lock);
@@ -500,127 +388,6 @@ void findFirstInContainer(benchmark::State& state) {
   }
 }
 
-// The same thousand APIs, all in one module or each in its own.
-template <std::size_t count>
-std::span<const SRLBindingsModuleData* const> modules() {
-  static const auto data = [] {
-    std::array<SRLBindingsModuleData, count> made;
-    for (std::size_t i = 0; i < count; ++i) {
-      made.at(i).bindingsBegin = &module().bindings.at(i * kAPIs / count);
-      made.at(i).bindingsEnd = made.at(i).bindingsBegin + kAPIs / count;
-    }
-    return made;
-  }();
-  static const auto pointers = [] {
-    std::array<const SRLBindingsModuleData*, count> made{};
-    std::ranges::transform(data, made.begin(), [](const auto& each) { return &each; });
-    return made;
-  }();
-  return pointers;
-}
-// A hundred programs are loaded: their registries know the modules. None of them ends, as that of a program
-// does not while it runs.
-template <auto start>
-void startHundred(benchmark::State& state) {
-  constexpr std::size_t kStarts = 100;
-  std::vector<decltype(start())> started;
-  started.reserve(kStarts);
-  for (auto _ : state) {
-    for (std::size_t i = 0; i < kStarts; ++i) started.push_back(start());
-    state.PauseTiming();
-    started.clear();
-    state.ResumeTiming();
-  }
-}
-template <std::size_t count>
-Ref<SRLRegistry> start() {
-  Ref<SRLRegistry> made = SRLRegistry::initPrivate();
-  made->internalRegisterBindings(modules<count>());
-  return made;
-}
-// A registry and its scope of configurations are each an object and what it knows, apart from each other.
-struct BareRegistry {
-  struct Tables {
-    std::unordered_map<const void*, Ref<rt::Object>> implementations;
-    std::unordered_map<const void*, Ref<rt::Object>> implementationsOfMany;
-    std::unordered_map<SRLScopeTagSet, Ref<rt::Object>, Floor::TagSetHash, Floor::TagSetEqual> scopes;
-    std::vector<const SRLBindingsModuleData*> modules;
-    SRLConfigurationFactories configurations;
-    rt::UnfairLock lock;
-  };
-  struct Scope {
-    std::unordered_map<const void*, Ref<rt::Object>> instances;
-    std::unordered_map<const void*, Ref<rt::Object>> pending;
-    rt::UnfairLock lock;
-  };
-
-  Ref<rt::Object> object = rt::make<Service>();
-  std::unique_ptr<Tables> tables = std::make_unique<Tables>();
-  Ref<rt::Object> scopeObject = rt::make<Service>();
-  std::unique_ptr<Scope> scope = std::make_unique<Scope>();
-};
-BareRegistry startBareWith(std::span<const SRLBindingsModuleData* const> modules) {
-  BareRegistry made;
-  for (const SRLBindingsModuleData* each : modules) {
-    if (each->addConfigurationFactories != nullptr)
-      each->addConfigurationFactories(made.tables->configurations);
-  }
-  made.tables->modules.assign(modules.begin(), modules.end());
-  return made;
-}
-template <std::size_t count>
-BareRegistry startBare() {
-  return startBareWith(modules<count>());
-}
-// The container has to be told of each API.
-std::unique_ptr<Container> startContainer() {
-  auto made = std::make_unique<Container>();
-  for (std::size_t i = 0; i < kAPIs; ++i) {
-    made->bind(
-        module().identifiers.at(i), [](const Container::Tags&) { return std::make_shared<int>(1); },
-        i % 3 == 2);
-  }
-  return made;
-}
-
-// The same from the beginning: the class methods of a thousand modules are listed and called.
-const SRLBindingsModuleData* bindings() {
-  return modules<1>().front();
-}
-void discover(benchmark::State& state) {
-  SRLRegistry& before = registry();
-  for (auto _ : state) {
-    SRLRegistry::setSharedInstance(SRLRegistry::initPrivate());
-    SRLRegistry::initialize(rt::classInfo<SRLRegistry>());
-  }
-  if (rt::classMethods(rt::classInfo<SRLRegistry>()).size() != 1000)
-    state.SkipWithError("methods are missing");
-  SRLRegistry::setSharedInstance(&before);
-}
-// The methods are walked through in the order in which they are loaded (see below), put in order and called.
-void discoverBare(benchmark::State& state) {
-  const std::vector<rt::ClassMethod> methods = rt::classMethods(rt::classInfo<SRLRegistry>());
-  std::forward_list<rt::ClassMethod> listed;
-  auto last = listed.before_begin();
-  for (const std::ptrdiff_t hundred : {7, 0, 3, 1, 8, 2, 9, 4, 6, 5}) {
-    const auto first = methods.begin() + 100 * hundred;
-    last = listed.insert_after(last, first, first + 100);
-  }
-  for (auto _ : state) {
-    std::vector<rt::ClassMethod> sorted;
-    for (const rt::ClassMethod& method : listed) sorted.push_back(method);
-    std::ranges::sort(sorted, {}, &rt::ClassMethod::selector);
-    std::vector<const SRLBindingsModuleData*> found;
-    found.reserve(sorted.size());
-    for (const rt::ClassMethod& method : sorted) {
-      if (!method.selector().starts_with("srl_bindings")) continue;
-      found.push_back(method.as<const SRLBindingsModuleData*()>()());
-    }
-    const BareRegistry made = startBareWith(found);
-    benchmark::DoNotOptimize(made.tables->modules.data());
-  }
-}
-
 BENCHMARK(findScoped)->Name("Registry/scoped/ours");
 BENCHMARK(findScopedBare)->Name("Registry/scoped/bare");
 BENCHMARK(findScopedInContainer)->Name("Registry/scoped/container");
@@ -656,32 +423,5 @@ BENCHMARK(findFirst)->Name("Registry/first of 100 APIs/ours");
 BENCHMARK(findFirstBare)->Name("Registry/first of 100 APIs/bare");
 BENCHMARK(findFirstInContainer)->Name("Registry/first of 100 APIs/container");
 const Bound firstBare{"Registry/first of 100 APIs", "bare", 1.2};
-BENCHMARK(startHundred<start<1>>)->Name("Registry/100 starts with 1 module/ours");
-BENCHMARK(startHundred<startBare<1>>)->Name("Registry/100 starts with 1 module/bare");
-BENCHMARK(startHundred<startContainer>)->Name("Registry/100 starts with 1 module/container");
-const Bound startOneBare{"Registry/100 starts with 1 module", "bare", 1.2};
-const Bound startOneContainer{"Registry/100 starts with 1 module", "container", 1.0};
-BENCHMARK(startHundred<start<1000>>)->Name("Registry/100 starts with 1000 modules/ours");
-BENCHMARK(startHundred<startBare<1000>>)->Name("Registry/100 starts with 1000 modules/bare");
-BENCHMARK(startHundred<startContainer>)->Name("Registry/100 starts with 1000 modules/container");
-const Bound startManyBare{"Registry/100 starts with 1000 modules", "bare", 1.2};
-const Bound startManyContainer{"Registry/100 starts with 1000 modules", "container", 1.0};
-BENCHMARK(discover)->Name("Registry/discovery of 1000 modules/ours");
-BENCHMARK(discoverBare)->Name("Registry/discovery of 1000 modules/bare");
-const Bound discoveryBare{"Registry/discovery of 1000 modules", "bare", 1.2};
 
 }  // namespace
-
-#define METHOD(number) template struct rt::AddedClassMethod<SRLRegistry, "srl_bindings" #number, &bindings>;
-#define TEN(number) \
-  METHOD(number##0) \
-  METHOD(number##1) \
-  METHOD(number##2) \
-  METHOD(number##3) \
-  METHOD(number##4) METHOD(number##5) METHOD(number##6) METHOD(number##7) METHOD(number##8) METHOD(number##9)
-#define HUNDRED(number) \
-  TEN(number##0)        \
-  TEN(number##1)        \
-  TEN(number##2)        \
-  TEN(number##3) TEN(number##4) TEN(number##5) TEN(number##6) TEN(number##7) TEN(number##8) TEN(number##9)
-HUNDRED(7) HUNDRED(0) HUNDRED(3) HUNDRED(1) HUNDRED(8) HUNDRED(2) HUNDRED(9) HUNDRED(4) HUNDRED(6) HUNDRED(5)

@@ -13,7 +13,6 @@
 #include <cstdio>
 #include <cstdlib>
 #include <latch>
-#include <limits>
 #include <stdexcept>
 #include <string>
 #include <thread>
@@ -24,11 +23,11 @@
 #include "Runtime/AssertionHandler.h"
 #include "Runtime/Exception.h"
 #include "Shared/Logging/LUMLog.h"
-#include "Shared/Logging/LUMLogDropAllFilter.h"
 #include "Shared/Logging/LUMLogMinimumLevelFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMSystemLogger.h"
 #include "tests/AtEnd.h"
+#include "tests/PECErrorHandlerTest.h"
 #include "tests/TestLoggers.h"
 
 namespace {
@@ -38,20 +37,9 @@ using rt::Ref;
 using testing::ElementsAre;
 using testing::IsEmpty;
 
-// The face of the banner, by its characters.
-constexpr const char* kFace = "\x3c\x28\xe2\x80\xa2\xcc\x80\x5f\xe2\x80\xa2\xcc\x81\x29\x3e";
-
-std::string string(const rt::String& text) {
-  return text ? std::string(text.view()) : "(null)";
-}
-
 Ref<LUMLogMessage> errorMessage(const rt::String& file = "a/b/c.m"_s) {
   return LUMLogMessage::initWithLevel(LUMLogLevelFault, "%@ is wrong"_s, "this is wrong"_s, file, "-[A b]"_s,
                                       17, nullptr, nullptr, nullptr, nullptr, nullptr);
-}
-
-void logError(const rt::String& text = "wrong"_s) {
-  LUMLogMultiplexer::sharedInstance()->logWithMessage(messageWith(LUMLogLevelFault, text));
 }
 
 // Keeps the assertions that fail, and returns.
@@ -70,36 +58,6 @@ class Recorder final : public rt::Implements<Recorder, rt::AssertionHandler> {
   }
 
   std::vector<Failure> failures;
-};
-
-// The system's log would only repeat what is reported here.
-void silenceSystemLog() {
-  LUMLogMultiplexer::sharedInstance()->addSyncLogger(
-      LUMSystemLogger::initWithFilter(LUMLogDropAllFilter::init()));
-}
-
-class PECErrorHandlerTest : public testing::Test {
- protected:
-  static void SetUpTestSuite() { silenceSystemLog(); }
-
-  void SetUp() override {
-    PECErrorHandler::register_();
-    PECErrorHandler::resetAfterTest();
-  }
-  void TearDown() override {
-    rt::AssertionHandler::setCurrentHandler(nullptr);
-    PECErrorHandler::resetAfterTest();
-  }
-
-  // Keeps the texts of the errors that it is told of.
-  PECErrorHandlerBlock tracing(std::string name = "") {
-    return [this, name = std::move(name)](const Ref<PECErrorDescription>& error) {
-      trace_.add(name + string(error->errorMessage()));
-    };
-  }
-
-  const Ref<PECErrorHandler> handler_ = PECErrorHandler::sharedInstance();
-  Trace trace_;
 };
 
 TEST(PECErrorDescription, HasWhatIsSet) {
@@ -499,135 +457,6 @@ TEST_F(PECErrorHandlerTest, ReplacesACallbackWithoutALock) {
                                   })](const Ref<PECErrorDescription>&) {});
   handler_->setErrorHandlerBlock(next);
   EXPECT_EQ(ended, 1);
-}
-
-// Expectations.
-
-TEST_F(PECErrorHandlerTest, ForgetsCallbackAndCountAfterATest) {
-  handler_->setErrorHandlerBlock(tracing());
-  logError();
-  PECErrorHandler::resetAfterTest();
-  EXPECT_FALSE(handler_->errorHandlerBlock());
-  EXPECT_EQ(handler_->errorCount(), 0);
-  handler_->registerErrorHandlerBlock(tracing());  // As the first.
-  EXPECT_EQ(handler_->errorCount(), 0);
-}
-
-TEST_F(PECErrorHandlerTest, CountsTheErrorsOfABlock) {
-  const PECErrorHandlerBlock kept = tracing();
-  handler_->setErrorHandlerBlock(kept);
-  handler_->setErrorCount(40);
-  EXPECT_EQ(PECErrorHandler::errorCountInBlock([] {
-              logError();
-              LUMLogAt(LUMLogLevelError, "no error"_s);
-              logError();
-            }),
-            2);
-  EXPECT_EQ(handler_->errorHandlerBlock(), kept);
-  EXPECT_EQ(handler_->errorCount(), 42);
-  EXPECT_EQ(PECErrorHandler::errorCountInBlock([] {}), 0);
-  EXPECT_THAT(trace_.events(), IsEmpty());
-}
-
-TEST_F(PECErrorHandlerTest, RaisesNothingWhileItCountsAndRaisesAgainAfterwards) {
-  EXPECT_EQ(PECErrorHandler::errorCountInBlock([&] {
-              EXPECT_TRUE(handler_->errorHandlerBlock());
-              logError();
-            }),
-            1);
-  EXPECT_FALSE(handler_->errorHandlerBlock());
-  testing::internal::CaptureStderr();
-  EXPECT_THROW(logError(), rt::InternalInconsistencyException);
-  testing::internal::GetCapturedStderr();
-}
-
-TEST_F(PECErrorHandlerTest, CountsWithinWhatIsCounted) {
-  EXPECT_EQ(PECErrorHandler::errorCountInBlock([] {
-              logError();
-              EXPECT_EQ(PECErrorHandler::errorCountInBlock([] { logError(); }), 1);
-              logError();
-            }),
-            3);
-}
-
-TEST_F(PECErrorHandlerTest, CountsOverTheEndOfTheNumbers) {
-  handler_->setErrorCount(std::numeric_limits<std::int32_t>::max());
-  EXPECT_EQ(PECErrorHandler::errorCountInBlock([] {
-              logError();
-              logError();
-            }),
-            2);
-  EXPECT_EQ(PECErrorHandler::errorCountInBlock([&] { handler_->setErrorCount(0); }),
-            std::numeric_limits<std::int32_t>::max());
-}
-
-// On purpose: what a block throws leaves the callback that does nothing behind.
-TEST_F(PECErrorHandlerTest, PutsNothingBackWhereABlockThrows) {
-  struct Thrown {};
-  handler_->setErrorHandlerBlock(tracing());
-  EXPECT_THROW(PECErrorHandler::errorCountInBlock([] {
-                 logError();
-                 throw Thrown();
-               }),
-               Thrown);
-  logError();
-  EXPECT_THAT(trace_.events(), IsEmpty());
-  EXPECT_EQ(handler_->errorCount(), 2);
-  EXPECT_TRUE(handler_->errorHandlerBlock());
-}
-
-// Counting waits for nobody: a callback that is running holds up only those that report.
-TEST_F(PECErrorHandlerTest, CountsWhileACallbackRuns) {
-  std::latch isRunning(1);
-  std::latch mayReturn(1);
-  handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>&) {
-    isRunning.count_down();
-    mayReturn.wait();
-  });
-  std::thread reporter([] { logError(); });
-  isRunning.wait();
-  EXPECT_EQ(PECErrorHandler::errorCountInBlock([] {}), 0);
-  mayReturn.count_down();
-  reporter.join();
-}
-
-// The name and the reason of what `body` throws.
-template <class Body>
-std::pair<std::string, std::string> thrownBy(Body body) {
-  try {
-    body();
-  } catch (const rt::Exception& exception) {
-    return {string(exception.name()), string(exception.reason())};
-  }
-  return {"nothing", ""};
-}
-
-TEST_F(PECErrorHandlerTest, AssertsThatABlockReportsAnError) {
-  EXPECT_EQ(thrownBy([] { PECErrorHandler::assertBlockReportsError([] {}); }),
-            std::make_pair(std::string("Assertion Failed!"),
-                           std::string("\n\n     ") + kFace + "     Expected block to report an error!\n\n"));
-  EXPECT_NO_THROW(PECErrorHandler::assertBlockReportsError([] { logError(); }));
-  EXPECT_NO_THROW(PECErrorHandler::assertBlockReportsError([] {
-    logError();
-    logError();
-  }));
-  EXPECT_FALSE(handler_->errorHandlerBlock());
-}
-
-TEST_F(PECErrorHandlerTest, AssertsThatABlockReportsNoError) {
-  EXPECT_EQ(
-      thrownBy([] { PECErrorHandler::assertBlockDoesNotReportError([] { logError(); }); }),
-      std::make_pair(std::string("Assertion Failed!"),
-                     std::string("\n\n     ") + kFace + "     Expected block to report no errors!\n\n"));
-  EXPECT_NO_THROW(
-      PECErrorHandler::assertBlockDoesNotReportError([] { LUMLogAt(LUMLogLevelError, "no error"_s); }));
-  EXPECT_FALSE(handler_->errorHandlerBlock());
-}
-
-// A count that has gone down is neither no error nor some.
-TEST_F(PECErrorHandlerTest, AssertsNothingWhereABlockCountsDown) {
-  EXPECT_NO_THROW(PECErrorHandler::assertBlockReportsError([&] { handler_->setErrorCount(-1); }));
-  EXPECT_NO_THROW(PECErrorHandler::assertBlockDoesNotReportError([&] { handler_->setErrorCount(-2); }));
 }
 
 // Hostile loggers beside the handler.

@@ -1,0 +1,56 @@
+#pragma once
+
+// What the tests of the error handler share: a handler as it is at first, whose callbacks leave a trace.
+
+#include <gtest/gtest.h>
+
+#include <string>
+#include <utility>
+
+#include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
+#include "Runtime/AssertionHandler.h"
+#include "Shared/Logging/LUMLogDropAllFilter.h"
+#include "Shared/Logging/LUMLogMultiplexer.h"
+#include "Shared/Logging/LUMSystemLogger.h"
+#include "tests/TestLoggers.h"
+
+// The face of the banner, by its characters.
+inline constexpr const char* kFace = "\x3c\x28\xe2\x80\xa2\xcc\x80\x5f\xe2\x80\xa2\xcc\x81\x29\x3e";
+
+inline std::string string(const rt::String& text) {
+  return text ? std::string(text.view()) : "(null)";
+}
+
+inline void logError(const rt::String& text = rt::String::fromUTF8("wrong")) {
+  LUMLogMultiplexer::sharedInstance()->logWithMessage(messageWith(LUMLogLevelFault, text));
+}
+
+// The system's log would only repeat what is reported here.
+inline void silenceSystemLog() {
+  LUMLogMultiplexer::sharedInstance()->addSyncLogger(
+      LUMSystemLogger::initWithFilter(LUMLogDropAllFilter::init()));
+}
+
+class PECErrorHandlerTest : public testing::Test {
+ protected:
+  static void SetUpTestSuite() { silenceSystemLog(); }
+
+  void SetUp() override {
+    PECErrorHandler::register_();
+    PECErrorHandler::resetAfterTest();
+  }
+  void TearDown() override {
+    rt::AssertionHandler::setCurrentHandler(nullptr);
+    PECErrorHandler::resetAfterTest();
+  }
+
+  // Keeps the texts of the errors that it is told of.
+  PECErrorHandlerBlock tracing(std::string name = "") {
+    return [this, name = std::move(name)](const rt::Ref<PECErrorDescription>& error) {
+      trace_.add(name + string(error->errorMessage()));
+    };
+  }
+
+  const rt::Ref<PECErrorHandler> handler_ = PECErrorHandler::sharedInstance();
+  Trace trace_;
+};

@@ -21,7 +21,6 @@
 #include <cstddef>
 #include <cstdint>
 #include <functional>
-#include <limits>
 #include <memory>
 #include <new>
 #include <type_traits>
@@ -100,10 +99,11 @@ class SRLTable {
    public:
     // With room for twice as many entries as `count`.
     explicit Index(std::size_t count)
-        : places_(std::bit_ceil(std::max(4 * count, kPlacesOfSmallest))),
-          shift_(kBits - std::countr_zero(places_.size())) {}
+        : lastPlace_(std::bit_ceil(std::max(4 * count, kPlacesOfSmallest)) - 1),
+          shift_(std::countl_zero(std::uint64_t{lastPlace_})),
+          places_(std::make_unique<std::atomic<const Entry*>[]>(lastPlace_ + 1)) {}
 
-    bool isFull() const noexcept { return 2 * count_ >= places_.size(); }
+    bool isFull() const noexcept { return 2 * count_ > lastPlace_; }
 
     const Entry* find(const Key& key) const {
       for (std::size_t at = start(key);; at = next(at)) {
@@ -125,14 +125,16 @@ class SRLTable {
 
    private:
     static constexpr std::size_t kPlacesOfSmallest = 8;
-    static constexpr int kBits = std::numeric_limits<std::uint64_t>::digits;
 
     // By the upper bits of a product, which depend on all bits of the hash: that of an address ends in zeros.
     std::size_t start(const Key& key) const noexcept { return Hash()(key) * 0x9E3779B97F4A7C15U >> shift_; }
-    std::size_t next(std::size_t at) const noexcept { return (at + 1) & (places_.size() - 1); }
+    std::size_t next(std::size_t at) const noexcept { return (at + 1) & lastPlace_; }
 
-    std::vector<std::atomic<const Entry*>> places_;
+    const std::size_t lastPlace_;
     const int shift_;
+    // Not a vector, which checks the place at each step where assertions are on.
+    // NOLINTNEXTLINE(modernize-avoid-c-arrays)
+    const std::unique_ptr<std::atomic<const Entry*>[]> places_;
     std::size_t count_ = 0;
     std::unique_ptr<const Index> replaced_;
   };

@@ -25,6 +25,16 @@ inline constexpr std::string_view kKeysKey = "keys";
 inline constexpr std::string_view kRootKey = "root";
 inline constexpr std::string_view kInitializer = "initWithCoder:";
 
+/// How large an object under a key at the top of an archive of so many bytes may be. Its size is the number
+/// of objects that it is made of plus that of the bytes of their texts, each counted as often as it is
+/// referred to, and nulls not at all. Objects of a few bytes that refer to each other could make up one that
+/// nobody would live to see the hash of.
+constexpr std::size_t maximumSize(std::size_t bytes) noexcept {
+  constexpr std::size_t kFactor = 16;
+  constexpr std::size_t kSpare = std::size_t{16} << 20U;
+  return kFactor * bytes + kSpare;
+}
+
 /// `key`, which a class chose, such that it is none of the archive's own: with a "$" more if it has one.
 inline std::string escaped(std::string_view key) {
   return (key.starts_with('$') ? "$" : "") + std::string(key);

@@ -1,6 +1,7 @@
 #include "Runtime/KeyedArchiver.h"
 
 #include <algorithm>
+#include <limits>
 #include <utility>
 
 #include "Runtime/Array.h"
@@ -38,6 +39,12 @@ bool isBefore(const Ref<Object>& first, const Ref<Object>& second) {
   return String::from(first.get()) < String::from(second.get());
 }
 
+// Objects that refer to each other may be larger than any number.
+std::size_t sum(std::size_t first, std::size_t second) noexcept {
+  return second > std::numeric_limits<std::size_t>::max() - first ? std::numeric_limits<std::size_t>::max()
+                                                                  : first + second;
+}
+
 [[noreturn]] void fail(const std::string& reason) {
   throw Exception("KeyedArchiverException"_s, String::fromUTF8Repaired(reason));
 }
@@ -58,8 +65,11 @@ void KeyedArchiver::encodeObject(const Ref<Object>& object, std::string_view key
   if (std::ranges::any_of(dictionaries_.back(), isSame)) {
     fail("there is something under the key \"" + std::string(key) + "\" already");
   }
+  const bool isAtTop = dictionaries_.size() == 1;
+  if (isAtTop) size_ = 0;
   // First, since it may make the place of the dictionary another.
   const Index valueIndex = reference(object);
+  if (isAtTop) largestSize_ = std::max(largestSize_, size_);
   dictionaries_.back().emplace_back(keyIndex, valueIndex);
   --unfinished_;
 }
@@ -80,7 +90,9 @@ std::vector<std::byte> KeyedArchiver::encodedData() {
   const Index objects = list.add(PropertyList::Text(kObjectsKey));
   add(objects, places_);
   list.root = list.add(std::move(root));
-  return list.encoded();
+  std::vector<std::byte> bytes = list.encoded();
+  if (largestSize_ > maximumSize(bytes.size())) fail("objects are referred to too often");
+  return bytes;
 }
 
 std::vector<std::byte> KeyedArchiver::archivedDataWithRootObject(const Ref<Object>& object) {
@@ -96,16 +108,21 @@ KeyedArchiver::Index KeyedArchiver::reference(const Ref<Object>& object) {
     const Index content = text(string->view());
     const auto [known, isNew] = strings_.try_emplace(content, places_.size());
     if (isNew) places_.push_back(content);
+    size_ = sum(size_, 1 + string->view().size());
     return referenceTo(known->second);
   }
-  const auto [known, isNew] = known_.try_emplace(object.get(), Known{places_.size(), object, false});
+  const auto [known, isNew] = known_.try_emplace(object.get(), Known{places_.size(), object, 0});
   const std::size_t place = known->second.place;
   if (isNew) {
+    const std::size_t sizeBefore = std::exchange(size_, 1);
     places_.push_back(0);
     places_[place] = contentOf(object);
-    known_.at(object.get()).isComplete = true;
-  } else if (!known->second.isComplete) {
+    known_.at(object.get()).size = size_;
+    size_ = sum(sizeBefore, size_);
+  } else if (known->second.size == 0) {
     fail("an object of class " + std::string(object->classInfo().name) + " contains itself");
+  } else {
+    size_ = sum(size_, known->second.size);
   }
   return referenceTo(place);
 }

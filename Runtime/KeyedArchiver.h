@@ -12,6 +12,9 @@
 /// `SecureCoding` (Runtime/Coding.h) can be archived, nested in each other up to 512 deep. An object that is
 /// reached twice is archived once, and is one object again when it is read; equal strings become one.
 ///
+/// What is under a key at the top must not be larger than 16 times the archive and 16 MiB, if each object and
+/// each byte of a text is counted as often as it is reached: an archive that stands for more is not read.
+///
 /// The bytes are a binary property list (Runtime/PropertyList.h): a dictionary of "$archiver", "$version"
 /// 100000, "$top" with a reference for each key, and "$objects", to whose places references refer. Strings
 /// and numbers stand there as themselves and "$null" in the first place. All others are dictionaries, where
@@ -56,8 +59,8 @@ class KeyedArchiver final {
   /// the archiver is of no use.
   void encodeObject(const Ref<Object>& object, std::string_view key);
 
-  /// The archive. Throws std::invalid_argument when a key is not UTF-8, and rt::Exception after an earlier
-  /// exception and while an object is being encoded.
+  /// The archive. Throws std::invalid_argument when a key is not UTF-8, and rt::Exception when objects are
+  /// reached too often, after an earlier exception, and while an object is being encoded.
   std::vector<std::byte> encodedData();
 
   /// An archive with `object`, which may be null, under the key "root". Throws as the functions above.
@@ -69,7 +72,8 @@ class KeyedArchiver final {
     std::size_t place;
     // Kept, so that no other object comes to be at its address.
     Ref<Object> object;
-    bool isComplete;
+    // 0 while the object is being encoded.
+    std::size_t size;
   };
 
   // The index of a reference to `object`, which is archived if it is not yet.
@@ -93,6 +97,10 @@ class KeyedArchiver final {
   std::unordered_map<const ClassInfo*, Index> classes_;
   std::unordered_map<std::size_t, Index> references_;
   std::map<std::string, Index, std::less<>> texts_;
+  // Sizes are as detail::keyedArchive::maximumSize says: what there is so far of the object that is being
+  // encoded, and the largest at the top.
+  std::size_t size_ = 0;
+  std::size_t largestSize_ = 0;
   // How many calls of `encodeObject` have not come to their end.
   std::size_t unfinished_ = 0;
 };

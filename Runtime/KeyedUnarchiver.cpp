@@ -46,7 +46,8 @@ class KeyedUnarchiver::Level {
   const Index container_;
 };
 
-KeyedUnarchiver::KeyedUnarchiver(std::span<const std::byte> bytes) {
+KeyedUnarchiver::KeyedUnarchiver(std::span<const std::byte> bytes)
+    : maximumSize_(detail::keyedArchive::maximumSize(bytes.size())) {
   try {
     list_ = PropertyList::decoded(bytes);
   } catch (const MalformedPropertyList& error) {
@@ -87,6 +88,7 @@ Ref<Object> KeyedUnarchiver::decodeObjectOfClasses(std::span<const ClassInfo* co
   if (!error_.isNull()) return nullptr;
   const std::optional<Index> index = list_.find(container_, escaped(key));
   if (!index) return fail("there is nothing under the key " + quoted(key));
+  if (depth_ == 0) sizeLimit_ = size_ + maximumSize_;
 
   Classes allowed(classes.begin(), classes.end());
   std::ranges::sort(allowed);
@@ -117,10 +119,12 @@ Ref<Object> KeyedUnarchiver::decodeValue(Index index, Wanted wanted) {
 }
 
 Ref<Object> KeyedUnarchiver::decodePlain(Index index, Wanted wanted) {
-  Ref<Object>& object = decoded_[index];
+  auto& [object, size] = decoded_[index];
   if (object == nullptr) {
+    size = 1;
     if (const auto* text = list_.get<PropertyList::Text>(index)) {
       object = String::fromUTF8(*text);
+      size += text->size();
     } else if (const auto* boolean = list_.get<bool>(index)) {
       object = Number::of(*boolean);
     } else if (const auto* integer = list_.get<std::int64_t>(index)) {
@@ -133,7 +137,8 @@ Ref<Object> KeyedUnarchiver::decodePlain(Index index, Wanted wanted) {
       return fail("an object that is neither text nor number, and has no class");
     }
   }
-  return wanted.isElement || isAllowed(object->classInfo(), wanted) ? object : nullptr;
+  if (!wanted.isElement && !isAllowed(object->classInfo(), wanted)) return nullptr;
+  return grow(size) ? object : nullptr;
 }
 
 Ref<Object> KeyedUnarchiver::decodeInstance(Index index, Wanted wanted) {
@@ -142,18 +147,22 @@ Ref<Object> KeyedUnarchiver::decodeInstance(Index index, Wanted wanted) {
   const bool isCollection = info == &classInfo<Array>() || info == &classInfo<Dictionary>();
   // What may be in a collection depends on the classes that it was asked for with.
   const std::uint64_t key = index | (isCollection ? std::uint64_t{wanted.classes + 1} << 32U : 0);
-  if (const auto known = decoded_.find(key); known != decoded_.end()) return known->second;
+  if (const auto known = decoded_.find(key); known != decoded_.end()) {
+    return grow(known->second.size) ? known->second.object : nullptr;
+  }
   if (isDecoding_[index]) return fail("an object of class " + quoted(info->name) + " contains itself");
   if (depth_ == kMaximumDepth) return fail("objects are nested too deeply");
 
+  const std::size_t sizeBefore = size_;
+  if (!grow(1)) return nullptr;
   Ref<Object> object;
   {
     const Level level(*this, index);
     object = isCollection ? decodeCollection(index, *info, wanted) : decodeWithCoder(*info);
   }
-  // Of what stands for null, too, so that it is not tried again.
-  if (error_.isNull()) decoded_[key] = object;
-  return error_.isNull() ? object : nullptr;
+  if (!error_.isNull()) return nullptr;
+  decoded_[key] = {object, size_ - sizeBefore};
+  return object;
 }
 
 Ref<Object> KeyedUnarchiver::decodeWithCoder(const ClassInfo& info) {
@@ -180,7 +189,7 @@ Ref<Object> KeyedUnarchiver::decodeDictionary(Index index, const std::vector<Ref
   if (keys.size() != elements.size()) return fail("a Dictionary with more or fewer keys than elements");
   Dictionary::Builder builder;
   for (std::size_t i = 0; i < keys.size(); ++i) {
-    // Collections as keys could keep a hash busy for ever: few bytes can stand for any number of elements.
+    // Collections as keys would be hashed again at each level: few bytes could stand for much work.
     if (!keys[i]->isKindOf(classInfo<StringObject>()) && !keys[i]->isKindOf(classInfo<Number>())) {
       return fail("a Dictionary with a key that is neither text nor number");
     }
@@ -218,18 +227,25 @@ KeyedUnarchiver::Initializer* KeyedUnarchiver::initializerOf(const ClassInfo& in
   return known->second;
 }
 
+// Looked for once for each object, since what it has to be looked for among may be much.
 const ClassInfo* KeyedUnarchiver::classOf(Index index) {
+  const ClassInfo*& info = classesOfObjects_[index];
+  if (info != nullptr) return info;
   const std::optional<Index> reference = list_.find(index, kClassKey);
   const auto* place = reference ? list_.get<PropertyList::Reference>(*reference) : nullptr;
-  const std::optional<Index> name = place != nullptr && place->number < objects_->size()
-                                        ? list_.find((*objects_)[place->number], kClassNameKey)
-                                        : std::nullopt;
+  if (place != nullptr && place->number < objects_->size()) info = archivedClass((*objects_)[place->number]);
+  if (info == nullptr) fail("an object without a class");
+  return info;
+}
+
+// The same for each class.
+const ClassInfo* KeyedUnarchiver::archivedClass(Index index) {
+  const ClassInfo*& info = archivedClasses_[index];
+  if (info != nullptr) return info;
+  const std::optional<Index> name = list_.find(index, kClassNameKey);
   const auto* text = name ? list_.get<PropertyList::Text>(*name) : nullptr;
-  if (text == nullptr) {
-    fail("an object without a class");
-    return nullptr;
-  }
-  const ClassInfo* info = classNamed(*text);
+  if (text == nullptr) return nullptr;
+  info = classNamed(*text);
   if (info == nullptr) fail("an object of class " + quoted(*text) + ", which is not known here");
   return info;
 }
@@ -242,6 +258,12 @@ bool KeyedUnarchiver::isAllowed(const ClassInfo& info, Wanted wanted) {
   for (const ClassInfo* each : classes) names += (names.empty() ? "" : " or ") + quoted(each->name);
   fail("an object of class " + quoted(info.name) + " where one of class " + names + " was asked for");
   return false;
+}
+
+bool KeyedUnarchiver::grow(std::size_t size) {
+  size_ += size;
+  if (size_ > sizeLimit_) fail("objects are referred to too often");
+  return error_.isNull();
 }
 
 Ref<Object> KeyedUnarchiver::fail(const std::string& reason) {

@@ -15,8 +15,14 @@
 /// and strings and numbers in any case.
 ///
 /// Whatever the bytes are, the worst that they bring about is null and an error. Reading them takes time
-/// and memory in proportion to how many they are, besides what `initWithCoder` of the classes takes. Once
-/// there is an error all further decoding yields null, so that it is enough to look for one at the end.
+/// and memory in proportion to how many they are, besides what `initWithCoder` of the classes takes and
+/// unless keys of dictionaries are chosen to have the same hash. Once there is an error all further decoding
+/// yields null, so that it is enough to look for one at the end.
+///
+/// An object that is decoded is not larger than 16 times the archive and 16 MiB, if each object and each byte
+/// of a text that it is made of is counted as often as it is decoded: nobody waits for its hash for ever.
+/// (Its description may be longer, by the blanks before what is nested.) So `initWithCoder` should decode
+/// what is under a key once.
 ///
 /// An unarchiver is used by one thread at a time.
 ///
@@ -57,8 +63,9 @@ class KeyedUnarchiver final {
 
   /// What is under `key` there, if it is of one of `classes`. Null is yielded without an error where null
   /// was archived; with one, where there is nothing under the key, it is of another class, the object's
-  /// own `initWithCoder` yielded null, or the archive contradicts itself. Calls `initWithCoder` of the
-  /// object and of what that decodes in turn, once for each object; what it throws passes, and is no error.
+  /// own `initWithCoder` yielded null, or the archive contradicts itself or refers to objects too often.
+  /// Calls `initWithCoder` of the object and of what that decodes in turn, once for each object; what it
+  /// throws passes, and is no error.
   Ref<Object> decodeObjectOfClasses(std::span<const ClassInfo* const> classes, std::string_view key);
   Ref<Object> decodeObjectOfClasses(std::initializer_list<const ClassInfo*> classes, std::string_view key) {
     return decodeObjectOfClasses(std::span(classes.begin(), classes.size()), key);
@@ -101,6 +108,11 @@ class KeyedUnarchiver final {
     bool isElement;
   };
 
+  struct Decoded {
+    Ref<Object> object;
+    std::size_t size = 0;
+  };
+
   // All of these yield null where they fail.
   const PropertyList::Array* archivedObjects();
   Ref<Object> decodeReference(Index reference, Wanted wanted);
@@ -113,7 +125,9 @@ class KeyedUnarchiver final {
   bool decodeList(Index owner, std::string_view key, Wanted wanted, std::vector<Ref<Object>>& objects);
   Initializer* initializerOf(const ClassInfo& info);
   const ClassInfo* classOf(Index index);
+  const ClassInfo* archivedClass(Index index);
   bool isAllowed(const ClassInfo& info, Wanted wanted);
+  bool grow(std::size_t size);
   Ref<Object> fail(const std::string& reason);
 
   PropertyList list_;
@@ -122,9 +136,17 @@ class KeyedUnarchiver final {
   Index container_ = 0;
   std::size_t depth_ = 0;
   std::vector<Classes> classes_;
-  std::unordered_map<std::uint64_t, Ref<Object>> decoded_;
+  std::unordered_map<std::uint64_t, Decoded> decoded_;
+  // Sizes are as detail::keyedArchive::maximumSize says: that of all that has been decoded, how large it may
+  // become by the object that is being decoded, and by how much more than before.
+  std::size_t size_ = 0;
+  std::size_t sizeLimit_ = 0;
+  const std::size_t maximumSize_;
   std::vector<bool> isDecoding_;
   std::unordered_map<Index, Index> listOwners_;
+  // Of objects, and of what they refer to as their classes.
+  std::unordered_map<Index, const ClassInfo*> classesOfObjects_;
+  std::unordered_map<Index, const ClassInfo*> archivedClasses_;
   std::unordered_map<const ClassInfo*, Initializer*> initializers_;
   String error_;
 };

@@ -132,7 +132,7 @@ class SRLTable {
 
     const std::size_t lastPlace_;
     const int shift_;
-    // Not a vector, which checks the place at each step where assertions are on.
+    // Not a vector, which compares each place with its length where assertions are on.
     // NOLINTNEXTLINE(modernize-avoid-c-arrays)
     const std::unique_ptr<std::atomic<const Entry*>[]> places_;
     std::size_t count_ = 0;

@@ -10,8 +10,8 @@
 ///     if (wrapper) use(SRLScopeTagSetCreateWithTags(wrapper->tags().get()));
 ///
 /// Tags are archived if they are strings or numbers, arrays or dictionaries, or conform to rt::SecureCoding
-/// (Runtime/Coding.h); others end archiving with an rt::Exception. The archive has them in an array, under
-/// the key "kTagsID".
+/// (Runtime/Coding.h); others end archiving with an rt::Exception, as does all else that a KeyedArchiver
+/// refuses, also of what was unarchived. The archive has them in an array, under the key "kTagsID".
 ///
 /// Owns its tags. Immutable: any thread may use it if the tags bear that.
 ///

@@ -43,7 +43,8 @@ struct RT_VISIBLE LUMAsyncLogger : rt::Protocol<LUMAsyncLogger, LUMLogger> {
 
   /// How to be called with `message`; asked on the thread that logs. Must not be
   /// LUMLogDispatchModeSynchronous for what is logged on the logger's own queue, which would wait for
-  /// itself.
+  /// itself, nor where a task of that queue may wait for a lock that a thread holds while it logs, as a
+  /// service registry does.
   virtual LUMLogDispatchMode dispatchModeForMessage(const LUMLogMessage& message) const = 0;
 
  protected:

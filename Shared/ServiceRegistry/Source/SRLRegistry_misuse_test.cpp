@@ -12,6 +12,7 @@
 
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "tests/TestBindings.h"
+#include "tests/TestLoggers.h"
 #include "tests/TestReports.h"
 
 namespace {
@@ -30,6 +31,9 @@ constexpr const char* kTakenAgain =
     "rt: the lock at 0x[0-9a-f]+ is taken again by thread [0-9]+, which holds it\n";
 constexpr const char* kAsksInCallback =
     "SRLRegistry: an error callback asks a registry whose lock at 0x[0-9a-f]+ is held; callbacks must not\n";
+constexpr const char* kWaitsInCallback =
+    "SRLMemoizingScope: an error callback asks for the instance for 0x[0-9a-f]+, which is being made; "
+    "callbacks must not\n";
 constexpr const char* kNotHeld =
     "rt: the lock at 0x[0-9a-f]+ is needed by thread [0-9]+, but no thread holds it\n";
 
@@ -65,6 +69,16 @@ TEST_F(SRLRegistryDeathTest, ModulesRegisteredTwiceEndTheProgramAfterAReport) {
   EXPECT_EXIT(SRLRegistry::initialize(rt::classInfo<SRLRegistry>()), KilledBySignal(SIGABRT),
               HasSubstr(report));
   EXPECT_EXIT(SRLRegistry::load(), KilledBySignal(SIGABRT), HasSubstr(report));
+  const auto registerWithLogger = [this] {
+    LUMLogMultiplexer::sharedInstance()->addSyncLogger(
+        rt::make<TestSyncLogger>([](const Ref<LUMLogMessage>& message) {
+          std::fprintf(stderr, "level %lu, %d parameters\n", message->level(),
+                       int{countOfSafeParameters(*message)});
+        }));
+    registry_->internalRegisterBindings({});
+  };
+  EXPECT_EXIT(registerWithLogger(), KilledBySignal(SIGABRT),
+              AllOf(HasSubstr("level 4, 0 parameters\n"), HasSubstr(report)));
   // A copy is as far as the original.
   EXPECT_EXIT(registry_->mutableCopy()->internalRegisterBindings({}), KilledBySignal(SIGABRT),
               HasSubstr(report));
@@ -137,6 +151,13 @@ TEST_F(SRLRegistryDeathTest, WhatTakesTheLockEndsTheProgramWithIt) {
   }
 }
 
+// An identifier that has been found before is found without the lock.
+TEST_F(SRLRegistryDeathTest, AnIdentifierThatWasFoundBeforeMayBeAskedForWithTheLock) {
+  registry_->apiIdentifierFromString("Clock"_s);
+  const rt::LockGuard guard(*registry_->lock());
+  EXPECT_EQ(registry_->apiIdentifierFromString("Clock"_s), &testClockAPI);
+}
+
 // Of reports that are made with the lock held.
 TEST_F(SRLRegistryDeathTest, AnErrorCallbackThatUsesTheRegistryUnderItsLockEndsTheProgram) {
   setCallback([this](const Ref<PECErrorDescription>& error) {
@@ -156,6 +177,17 @@ TEST_F(SRLRegistryDeathTest, AnErrorCallbackThatUsesTheRegistryUnderItsLockEndsT
                     ContainsRegex(kAsksInCallback)));
 }
 
+// Neither may a logger, which is told on the thread that reports.
+TEST_F(SRLRegistryDeathTest, ALoggerThatUsesTheRegistryUnderItsLockEndsTheProgram) {
+  const auto report = [this] {
+    LUMLogMultiplexer::sharedInstance()->addSyncLogger(rt::make<TestSyncLogger>(
+        [this](const Ref<LUMLogMessage>&) { registry_->registeredAPIIdentifiers(); }));
+    const SRLAPIRegistrationData unknown{.identifier = "Unknown", .identifierLength = 7};
+    registry_->internalService(&unknown, {});
+  };
+  EXPECT_EXIT(report(), KilledBySignal(SIGABRT), ContainsRegex(kTakenAgain));
+}
+
 // Also where another thread holds the lock: it may wait to report, until this callback returns.
 TEST_F(SRLRegistryDeathTest, AnErrorCallbackThatWouldWaitForTheRegistryEndsTheProgram) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
@@ -173,6 +205,28 @@ TEST_F(SRLRegistryDeathTest, AnErrorCallbackThatWouldWaitForTheRegistryEndsThePr
     registry_->removeScopesWithTag(nullptr);
   };
   EXPECT_EXIT(report(), KilledBySignal(SIGABRT), ContainsRegex(kAsksInCallback));
+}
+
+// And where another thread makes an instance: both used to wait for each other.
+TEST_F(SRLRegistryDeathTest, AnErrorCallbackThatWouldWaitForAnInstanceEndsTheProgram) {
+  GTEST_FLAG_SET(death_test_style, "threadsafe");
+  const auto report = [this] {
+    setCallback([this](const Ref<PECErrorDescription>&) {
+      const Ref<SRLMemoizingScope> scope = SRLMemoizingScope::init();
+      std::latch isBeingMade(1);
+      const std::jthread other([&] {
+        scope->instanceForIdentifier(this, nullptr, [&]() -> Ref<rt::Object> {
+          isBeingMade.count_down();
+          registry_->removeScopesWithTag(nullptr);
+          return nullptr;
+        });
+      });
+      isBeingMade.wait();
+      scope->instanceForIdentifier(this, nullptr, []() -> Ref<rt::Object> { return nullptr; });
+    });
+    registry_->removeScopesWithTag(nullptr);
+  };
+  EXPECT_EXIT(report(), KilledBySignal(SIGABRT), ContainsRegex(kWaitsInCallback));
 }
 
 }  // namespace

@@ -9,7 +9,10 @@
 ///
 /// Some errors are reported while it is held, so error callbacks, log filters and loggers must not ask a
 /// registry for anything. One thread that reports and another whose callback asks would wait for each other
-/// for ever; a callback that finds the lock held ends the program instead, with a line on standard error.
+/// for ever; a callback that finds the lock held, or an instance in the making, ends the program instead,
+/// with a line on standard error. Nor must they wait for anybody who asks: not for a lock that some thread
+/// holds while it asks, and not for a queue, the main one included, whose tasks ask. That nothing can find
+/// out.
 ///
 /// Not for: anything but registries.
 

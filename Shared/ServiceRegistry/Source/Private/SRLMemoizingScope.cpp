@@ -1,8 +1,11 @@
 #include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope.h"
 
+#include <cstdio>
+#include <cstdlib>
 #include <utility>
 #include <vector>
 
+#include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
 #include "Libraries/Util/ErrorHandler/PECReport.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScopeIvars.h"
 
@@ -31,6 +34,15 @@ void endCreation(SRLMemoizingScopeIvars& ivars, const void* identifier) RT_REQUI
   if (!entry.mapped()->isAwaited()) ivars.spareCreation = std::move(entry);
 }
 
+// Who makes the instance may wait to report, until the callback returns.
+[[noreturn]] void endInCallback(const void* identifier) noexcept {
+  std::fprintf(stderr,
+               "SRLMemoizingScope: an error callback asks for the instance for %p, which is being made; "
+               "callbacks must not\n",
+               identifier);
+  std::abort();
+}
+
 }  // namespace
 
 rt::Ref<SRLMemoizingScope> SRLMemoizingScope::init() {
@@ -55,6 +67,8 @@ rt::Ref<rt::Object> SRLMemoizingScope::makeOrAwaitInstance(const void* identifie
   if (instanceCreated != nullptr) *instanceCreated = !awaited;
 
   if (awaited) {
+    if (PECErrorHandler::isCallingBack()) [[unlikely]]
+      endInCallback(identifier);
     awaited->wait();
     {
       const rt::LockGuard guard(ivars.lock);

@@ -36,6 +36,21 @@
 
 namespace rt {
 
+namespace detail {
+
+// How many locks a thread holds is counted where RT_COUNTS_HELD_LOCKS says so, as it does in the builds with
+// sanitizers: for tests of what runs without any.
+#if defined(RT_COUNTS_HELD_LOCKS)
+inline constinit thread_local int heldLocks = 0;
+inline void countHeldLocks(int change) noexcept {
+  heldLocks += change;
+}
+#else
+inline void countHeldLocks(int /*change*/) noexcept {}
+#endif
+
+}  // namespace detail
+
 class RT_CAPABILITY("lock") UnfairLock {
  public:
   /// Not held.
@@ -44,14 +59,24 @@ class RT_CAPABILITY("lock") UnfairLock {
   UnfairLock& operator=(const UnfairLock&) = delete;
 
   /// Takes the lock, after waiting until no thread holds it. Ends the program when the caller holds it.
-  void lock() noexcept RT_ACQUIRE() { lock_.lock(); }
+  void lock() noexcept RT_ACQUIRE() {
+    lock_.lock();
+    detail::countHeldLocks(1);
+  }
 
   /// Takes the lock and returns true, or returns false at once when any thread, the caller included,
   /// holds it.
-  [[nodiscard]] bool tryLock() noexcept RT_TRY_ACQUIRE(true) { return lock_.tryLock(); }
+  [[nodiscard]] bool tryLock() noexcept RT_TRY_ACQUIRE(true) {
+    const bool isTaken = lock_.tryLock();
+    if (isTaken) detail::countHeldLocks(1);
+    return isTaken;
+  }
 
   /// Lets the lock go. Ends the program when the caller does not hold it.
-  void unlock() noexcept RT_RELEASE() { lock_.unlock(); }
+  void unlock() noexcept RT_RELEASE() {
+    lock_.unlock();
+    detail::countHeldLocks(-1);
+  }
 
   /// Ends the program when the caller does not hold the lock.
   void assertOwner() const noexcept RT_ASSERT_CAPABILITY(this) { lock_.assertOwner(); }

@@ -1,0 +1,204 @@
+// What user code finds locked while it runs: nothing, but where it makes an instance that others may wait
+// for, the lock that they wait for.
+
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+
+#include <array>
+#include <iterator>
+#include <string>
+#include <thread>
+#include <utility>
+#include <vector>
+
+#include "Runtime/MainQueue.h"
+#include "Runtime/UnfairLock.h"
+#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+
+namespace {
+
+using rt::Ref;
+using testing::ElementsAre;
+using testing::IsEmpty;
+using testing::Pair;
+using testing::UnorderedElementsAre;
+
+#if defined(RT_COUNTS_HELD_LOCKS)
+constexpr bool areLocksCounted = true;
+int heldLocks() {
+  return rt::detail::heldLocks;
+}
+#else
+constexpr bool areLocksCounted = false;
+int heldLocks() {
+  return 0;
+}
+#endif
+
+// What has run, and how many locks its thread held.
+std::vector<std::pair<std::string, int>> runs;
+
+void note(const char* what) {
+  runs.emplace_back(what, heldLocks());
+}
+
+class Noted final : public rt::Implements<Noted, rt::Object> {
+ public:
+  explicit Noted(const char* end) : end_(end) {}
+  ~Noted() override { note(end_); }
+
+ private:
+  const char* const end_;
+};
+
+constexpr SRLAPIInstanceType kType{.names = {.protocolName = nullptr, .className = "Noted"}};
+constexpr SRLAPIRegistrationData innerAPI{
+    .identifier = "Inner", .instanceType = kType, .scopeType = 0b1, .identifierLength = 5};
+
+Ref<rt::Object> makeFresh(SRLScopeTagSet /*tags*/) {
+  note("fresh");
+  return rt::make<Noted>("end of fresh");
+}
+Ref<rt::Object> makeInner(SRLScopeTagSet /*tags*/) {
+  note("inner");
+  return rt::make<Noted>("end of inner");
+}
+Ref<rt::Object> makeOuter(SRLScopeTagSet tags) {
+  note("outer");
+  SRLRegistry::sharedInstance()->internalService(&innerAPI, tags);
+  note("outer again");
+  return rt::make<Noted>("end of outer");
+}
+
+constexpr SRLAPIRegistrationData freshAPI{
+    .identifier = "Fresh", .instanceType = kType, .scopeType = 0b1, .identifierLength = 5};
+constexpr SRLAPIRegistrationData outerAPI{
+    .identifier = "Outer", .instanceType = kType, .scopeType = 0b1, .identifierLength = 5};
+constexpr SRLAPIRegistrationData manyAPI{.identifier = "OfMany",
+                                         .instanceType = kType,
+                                         .scopeType = 0b1,
+                                         .identifierLength = 6,
+                                         .isMultibound = 1};
+constexpr SRLImplementationRegistrationData fresh{.identifier = "Fresh",
+                                                  .instanceType = {.className = "Noted"},
+                                                  .factory = makeFresh,
+                                                  .scopeType = 0b1,
+                                                  .lifetime = 1};
+constexpr SRLImplementationRegistrationData inner{
+    .identifier = "Inner", .instanceType = {.className = "Noted"}, .factory = makeInner, .scopeType = 0b1};
+constexpr SRLImplementationRegistrationData outer{
+    .identifier = "Outer", .instanceType = {.className = "Noted"}, .factory = makeOuter, .scopeType = 0b1};
+using Implementations = const SRLImplementationRegistrationData*;
+constexpr Implementations kFresh[] = {&fresh, nullptr};
+constexpr Implementations kInner[] = {&inner, nullptr};
+constexpr Implementations kOuter[] = {&outer, nullptr};
+constexpr Implementations kMany[] = {&fresh, &inner, nullptr};
+constexpr _SRLBindingRegistrationData kBindings[] = {
+    {&freshAPI, kFresh}, {&innerAPI, kInner}, {&outerAPI, kOuter}, {&manyAPI, kMany}};
+static_assert(SRLAreBindingsSorted(kBindings));
+const int configuration = 0;
+const SRLBindingsModuleData module{
+    .bindingsBegin = std::begin(kBindings),
+    .bindingsEnd = std::end(kBindings),
+    .addConfigurationFactories =
+        [](SRLConfigurationFactories& factories) {
+          note("configurations");
+          factories[&configuration] = [] {
+            note("configuration");
+            return rt::make<Noted>("end of configuration");
+          };
+        },
+};
+
+class Delegate final : public rt::Implements<Delegate, rt::Object, SRLScopeLifecycleDelegate> {
+ public:
+  void didRemoveScopesWithTag(const Ref<rt::Object>& /*tag*/,
+                              const std::vector<rt::Weak<rt::Object>>& /*instances*/) override {
+    note("delegate");
+  }
+};
+
+class SRLRegistryLocks : public testing::Test {
+ protected:
+  void SetUp() override {
+    if (!areLocksCounted) GTEST_SKIP() << "held locks are counted in instrumented builds only";
+    runs.clear();
+    registry_ = SRLRegistry::initPrivate();
+    registry_->internalRegisterBindings(std::array{&module});
+    EXPECT_THAT(std::exchange(runs, {}), ElementsAre(Pair("configurations", 0)));
+    before_ = SRLRegistry::setSharedInstance(registry_);
+  }
+  void TearDown() override {
+    EXPECT_EQ(heldLocks(), 0);
+    if (areLocksCounted) SRLRegistry::setSharedInstance(before_);
+  }
+
+  SRLScopeTagSet tags() const { return {{tag_.get()}}; }
+
+  Ref<SRLRegistry> registry_;
+  Ref<rt::Object> tag_ = rt::make<Noted>("end of tag");
+
+ private:
+  Ref<SRLRegistry> before_;
+};
+
+TEST_F(SRLRegistryLocks, AreNotHeldWhileInstancesAreMadeAnew) {
+  registry_->internalService(&freshAPI, tags());
+  registry_->internalOptionalService(&freshAPI, tags());
+  EXPECT_THAT(runs, ElementsAre(Pair("fresh", 0), Pair("end of fresh", 0), Pair("fresh", 0),
+                                Pair("end of fresh", 0)));
+}
+
+TEST_F(SRLRegistryLocks, AreTheirOwnWhileInstancesOfScopesAreMade) {
+  registry_->internalService(&outerAPI, tags());
+  EXPECT_THAT(std::exchange(runs, {}),
+              ElementsAre(Pair("outer", 1), Pair("inner", 2), Pair("outer again", 1)));
+  // By way of the shared registry.
+  const Ref<rt::Object> another = rt::make<Noted>("end of another tag");
+  registry_->mutableCopy()->internalOptionalService(&outerAPI, {{another.get()}});
+  EXPECT_THAT(runs, ElementsAre(Pair("outer", 1), Pair("inner", 2), Pair("outer again", 1)));
+}
+
+TEST_F(SRLRegistryLocks, AreTheirOwnWhileManyAreMade) {
+  registry_->internalMultiBoundService(&manyAPI, tags());
+  EXPECT_THAT(runs, UnorderedElementsAre(Pair("fresh", 0), Pair("inner", 1), Pair("end of fresh", 0)));
+}
+
+TEST_F(SRLRegistryLocks, AreTheirOwnWhileConfigurationsAreMade) {
+  registry_->internalImplementationConfigForIdentifier(&configuration);
+  EXPECT_THAT(runs, ElementsAre(Pair("configuration", 1)));
+}
+
+TEST_F(SRLRegistryLocks, AreNotHeldWhenScopesEnd) {
+  registry_->internalService(&outerAPI, tags());
+  registry_->internalService(&outerAPI, {{registry_.get()}});
+  const Ref<Delegate> delegate = rt::make<Delegate>();
+  registry_->setScopeLifecycleDelegate(delegate);
+  runs.clear();
+  registry_->removeScopesWithTag(std::exchange(tag_, nullptr));
+  EXPECT_THAT(runs, UnorderedElementsAre(Pair("end of inner", 0), Pair("end of outer", 0),
+                                         Pair("delegate", 0), Pair("end of tag", 0)));
+  registry_->removeScopesWithTag(registry_);
+}
+
+TEST_F(SRLRegistryLocks, AreNotHeldWhenARegistryEnds) {
+  registry_->internalService(&outerAPI, tags());
+  tag_ = nullptr;
+  SRLRegistry::setSharedInstance(nullptr);
+  runs.clear();
+  registry_ = nullptr;
+  EXPECT_THAT(runs,
+              UnorderedElementsAre(Pair("end of inner", 0), Pair("end of outer", 0), Pair("end of tag", 0)));
+}
+
+TEST_F(SRLRegistryLocks, AreNotHeldWhenARegistryEndsElsewhere) {
+  registry_->internalService(&outerAPI, tags());
+  SRLRegistry::setSharedInstance(nullptr);
+  runs.clear();
+  std::thread([this] { registry_ = nullptr; }).join();
+  EXPECT_THAT(runs, IsEmpty());
+  rt::MainQueue::drain();
+  EXPECT_THAT(runs, UnorderedElementsAre(Pair("end of inner", 0), Pair("end of outer", 0)));
+}
+
+}  // namespace

@@ -8,7 +8,7 @@
 #include <gtest/gtest.h>
 
 #include <array>
-#include <cstdint>
+#include <cstddef>
 #include <string>
 #include <vector>
 
@@ -17,6 +17,7 @@
 #include "Runtime/String.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "tests/TestReports.h"
+#include "tests/WholeReports.h"
 
 namespace TestServices {
 
@@ -142,19 +143,27 @@ class ServicesTest : public testing::Test {
   }
   ~ServicesTest() override { SRLRegistry::setSharedInstance(before_); }
 
-  /// The texts reported since the last call; each as every report of a registry's operation is made.
+  /// The texts reported since the last call; each as every report of a registry's operation is made, of its
+  /// parameters in their order.
   std::vector<std::string> reportsOf(const std::string& function) {
     std::vector<std::string> texts;
     for (const rt::Ref<LUMLogMessage>& message : reports.messages()) {
-      EXPECT_EQ(message->level(), LUMLogLevelFault);
-      EXPECT_EQ(message->file(), "Shared/ServiceRegistry/Source/SRLRegistry");
-      EXPECT_EQ(message->function(), function.c_str());
-      EXPECT_GT(message->line(), 0U);
-      std::int32_t parameters = 0;
-      for (std::size_t i = 0; (i = message->format().find("%@", i)) != rt::String::kNotFound; ++i)
-        ++parameters;
-      EXPECT_EQ(countOfSafeParameters(*message), parameters);
-      texts.push_back(text(*message));
+      const WholeReport report = wholeReport(*message);
+      EXPECT_EQ(report.level, LUMLogLevelFault);
+      EXPECT_EQ(report.file, "Shared/ServiceRegistry/Source/SRLRegistry");
+      EXPECT_EQ(report.function, function);
+      EXPECT_TRUE(report.hasLine);
+      std::string filled(message->format().view());
+      std::size_t at = 0;
+      for (const std::string& parameter : report.parameters) {
+        at = filled.find("%@", at);
+        if (at == std::string::npos) break;
+        filled.replace(at, 2, parameter);
+        at += parameter.size();
+      }
+      EXPECT_EQ(filled, report.text) << report.parameters.size() << " parameters";
+      EXPECT_NE(at, std::string::npos) << "too many parameters";
+      texts.push_back(report.text);
     }
     return texts;
   }

@@ -33,7 +33,6 @@
 #include <atomic>
 #include <cstdint>
 #include <memory>
-#include <optional>
 #include <span>
 #include <vector>
 
@@ -215,7 +214,7 @@ class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
 
   /// The API with this identifier; null where no module knows one. Null is reported. Looks at one binding
   /// after another where the API has not been asked for like that before. Not to be called with the lock
-  /// held, which then ends the program.
+  /// held, which ends the program, if it has not.
   const SRLAPIRegistrationData* apiIdentifierFromString(const rt::String& apiIdentifierString) const;
 
   /// The identifiers of all APIs that the modules know, as strings, whether they have been asked for or not.
@@ -251,9 +250,10 @@ class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
   SRLMemoizingScope& openScope(const SRLScopeTagSet& tags) RT_REQUIRES(ivars_->lock);
   SRLMemoizingScope& newScope(const SRLScopeTagSet& tags) RT_REQUIRES(ivars_->lock);
 
-  // The tags of the scope of this registry that keeps an implementation's instance for a request with `tags`.
-  std::optional<SRLScopeTagSet> scopeTagsOf(const SRLImplementation& implementation,
-                                            const SRLScopeTagSet& tags) const RT_REQUIRES(ivars_->lock);
+  // The tags of the scope of this registry that keeps an implementation's instance for a request with `tags`:
+  // these, or `masked`, which has become a part of them. Null where there is no such scope.
+  const SRLScopeTagSet* scopeTagsOf(const SRLImplementation& implementation, const SRLScopeTagSet& tags,
+                                    SRLScopeTagSet& masked) const RT_REQUIRES(ivars_->lock);
 
   // The instance that a scope of this registry has already; null where there is none, or no telling.
   rt::Ref<rt::Object> keptInstanceOf(const SRLImplementation& implementation,

@@ -1,8 +1,7 @@
 // How a registry hands out instances, and the scopes that they live in.
 
-#include <algorithm>
 #include <cstddef>
-#include <optional>
+#include <iterator>
 #include <utility>
 #include <variant>
 #include <vector>
@@ -72,23 +71,26 @@ rt::String instanceTypeOf(const SRLImplementation& implementation) {
 
 }  // namespace
 
-// Nothing where its instances are not kept by this registry, or not with these tags: what is wrong is for the
-// factory block to report.
-std::optional<SRLScopeTagSet> SRLRegistry::scopeTagsOf(const SRLImplementation& implementation,
-                                                       const SRLScopeTagSet& tags) const {
+// There is none where the tags do not fit, too: that is for the factory block to report.
+const SRLScopeTagSet* SRLRegistry::scopeTagsOf(const SRLImplementation& implementation,
+                                               const SRLScopeTagSet& tags, SRLScopeTagSet& masked) const {
   const SRLImplementationRegistrationData* record = implementation.record_;
   if (record == nullptr || record->lifetime != 0 || !isShared_.load(std::memory_order_relaxed))
-    return std::nullopt;
+    return nullptr;
   const SRLScopeType apiScope = implementation.apiScope_;
-  if ((record->scopeType & ~apiScope) != 0 || !SRLScopeTagSetDetail::hasOneTagForEachBit(tags, apiScope))
-    return std::nullopt;
-  return SRLScopeTagSetMaskingWithScopes(tags, apiScope, record->scopeType);
+  if (!SRLScopeTagSetDetail::hasOneTagForEachBit(tags, apiScope)) return nullptr;
+  if (record->scopeType == apiScope) [[likely]]
+    return &tags;
+  if ((record->scopeType & ~apiScope) != 0) return nullptr;
+  masked = SRLScopeTagSetMaskingWithScopes(tags, apiScope, record->scopeType);
+  return &masked;
 }
 
 rt::Ref<rt::Object> SRLRegistry::keptInstanceOf(const SRLImplementation& implementation,
                                                 const SRLScopeTagSet& tags) const {
   rt::Ref<rt::Object> instance;
-  if (const std::optional<SRLScopeTagSet> scopeTags = scopeTagsOf(implementation, tags)) {
+  SRLScopeTagSet masked;
+  if (const SRLScopeTagSet* scopeTags = scopeTagsOf(implementation, tags, masked)) {
     if (const SRLMemoizingScope* scope = ivars_->findScope(*scopeTags))
       scope->findInstance(implementation.record_, instance);
   }
@@ -117,7 +119,8 @@ SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SR
   Found found;
   const rt::Ref<SRLImplementation>* bound = boundTo(api);
   if (bound == nullptr || !*bound || !(*bound)->factoryBlock()) return found;
-  if (const std::optional<SRLScopeTagSet> scopeTags = scopeTagsOf(**bound, tags)) {
+  SRLScopeTagSet masked;
+  if (const SRLScopeTagSet* scopeTags = scopeTagsOf(**bound, tags, masked)) {
     SRLMemoizingScope& scope = openScope(*scopeTags);
     if (scope.findInstance((*bound)->record_, found.instance) && found.instance) return found;
     found.scope = &scope;
@@ -194,15 +197,14 @@ bool SRLRegistry::registersBindingsFor(const SRLAPIRegistrationData* api) {
   return false;
 }
 
-rt::Ref<rt::Array> SRLRegistry::internalMultiBoundService(const SRLAPIRegistrationData* api,
-                                                          const SRLScopeTagSet& scopeTags) {
+[[gnu::flatten]] rt::Ref<rt::Array> SRLRegistry::internalMultiBoundService(const SRLAPIRegistrationData* api,
+                                                                           const SRLScopeTagSet& scopeTags) {
   constexpr const char* kFunction = "-[SRLRegistry internalMultiBoundService:scopeTags:]";
   if (api == nullptr) [[unlikely]] {
     PECReport({kFile, kFunction}, "|apiIdentifier| cannot be nil!"_s);
     return nullptr;
   }
   rt::Ref<rt::Set> implementations;
-  // Of each implementation in turn; null where there is none yet.
   std::vector<rt::Ref<rt::Object>> instances;
   {
     const rt::LockGuard guard(ivars_->lock);
@@ -218,23 +220,19 @@ rt::Ref<rt::Array> SRLRegistry::internalMultiBoundService(const SRLAPIRegistrati
       return nullptr;
     }
     instances.reserve(implementations->count());
+    // Those that are there, up to the first that is to be made: its factory may do anything, such as end a
+    // scope.
     for (const rt::Ref<rt::Object>& element : *implementations) {
-      instances.push_back(keptInstanceOf(static_cast<const SRLImplementation&>(*element), scopeTags));
+      rt::Ref<rt::Object> kept = keptInstanceOf(static_cast<const SRLImplementation&>(*element), scopeTags);
+      if (!kept) break;
+      instances.push_back(std::move(kept));
     }
   }
-  std::size_t count = 0;
-  auto kept = instances.begin();
-  bool hasFactoryRun = false;
-  for (const rt::Ref<rt::Object>& element : *implementations) {
-    auto& implementation = static_cast<SRLImplementation&>(*element);
-    rt::Ref<rt::Object> instance = std::move(*kept++);
-    if (!instance) {
-      // A factory may do anything, such as end a scope: what was found before counts no more.
-      if (!std::exchange(hasFactoryRun, true)) std::fill(kept, instances.end(), nullptr);
-      instance = instanceOf(implementation, api, scopeTags, nullptr);
-    }
-    if (instance) {
-      instances[count++] = std::move(instance);
+  const auto rest = std::next(implementations->begin(), static_cast<std::ptrdiff_t>(instances.size()));
+  for (auto element = rest; element != implementations->end(); ++element) {
+    auto& implementation = static_cast<SRLImplementation&>(**element);
+    if (rt::Ref<rt::Object> instance = instanceOf(implementation, api, scopeTags, nullptr)) {
+      instances.push_back(std::move(instance));
     } else {
       PECReport(
           {kFile, kFunction},
@@ -243,7 +241,6 @@ rt::Ref<rt::Array> SRLRegistry::internalMultiBoundService(const SRLAPIRegistrati
           instanceTypeOf(implementation), SRLAPIIdentifier(api), implementation.description());
     }
   }
-  instances.resize(count);
   return rt::make<rt::Array>(std::move(instances));
 }
 

@@ -471,6 +471,40 @@ TEST_F(SRLRegistryServices, OfManyAreNotOfAScopeThatOneOfThemHasEnded) {
   ASSERT_GT(countAfterEnd, 0U) << "the one that ends the scope must not be the last; give it another name";
 }
 
+SRLRegistry* boundWhileAsked = nullptr;
+extern const SRLAPIRegistrationData growingAPI;
+
+Ref<rt::Object> makeThingAndBindAnother(SRLScopeTagSet tags) {
+  const Ref<SRLImplementation> another = SRLImplementation::initWithIdentifier(
+      "Another", nullptr, 1, 0,
+      [](const SRLScopeTagSet& given, bool*) -> Ref<rt::Object> { return rt::make<Thing>(given); }, nullptr);
+  const rt::LockGuard guard(*boundWhileAsked->lock());
+  boundWhileAsked->internalRegisterServiceAPI(&growingAPI, another);
+  return rt::make<Thing>(tags);
+}
+
+constexpr SRLImplementationRegistrationData growing{.identifier = "Growing",
+                                                    .instanceType = {.className = "Thing"},
+                                                    .factory = makeThingAndBindAnother,
+                                                    .lifetime = 1};
+constexpr SRLAPIRegistrationData growingAPI{
+    .identifier = "Growing", .instanceType = kThingType, .identifierLength = 7, .isMultibound = 1};
+
+// What a factory binds to the API counts from the next request on.
+TEST_F(SRLRegistryServices, OfManyAreThoseThatWereBoundWhenTheRequestCame) {
+  static constexpr Implementations list[] = {&growing, nullptr};
+  static constexpr _SRLBindingRegistrationData bindings[] = {{&growingAPI, list}};
+  const SRLBindingsModuleData module{.bindingsBegin = std::begin(bindings),
+                                     .bindingsEnd = std::end(bindings)};
+  const Ref<SRLRegistry> other = SRLRegistry::initPrivate();
+  other->internalRegisterBindings(std::array{&module});
+  boundWhileAsked = other.get();
+  EXPECT_EQ(other->internalMultiBoundService(&growingAPI, {})->count(), 1U);
+  EXPECT_EQ(other->internalMultiBoundService(&growingAPI, {})->count(), 2U);
+  EXPECT_EQ(other->internalMultiBoundService(&growingAPI, {})->count(), 2U);
+  EXPECT_THAT(reports.texts(), IsEmpty());
+}
+
 TEST_F(SRLRegistryServices, ThatAreScopedLiveInTheSharedRegistry) {
   const Ref<SRLRegistry> copy = registry->mutableCopy();
   const Ref<rt::Object> thing = copy->internalService(&scopedAPI, tags);

@@ -325,4 +325,28 @@ TEST_F(SRLRegistryEnd, GivesUpTheTagsOfItsScopes) {
   EXPECT_TRUE(end.hasCome);
 }
 
+// Notes when it ends whether something else has ended before.
+class Witness final : public rt::Implements<Witness, rt::Object> {
+ public:
+  Witness(const End* other, bool* isLater) : other_(other), isLater_(isLater) {}
+  ~Witness() override { *isLater_ = other_->hasCome; }
+
+ private:
+  const End* const other_;
+  bool* const isLater_;
+};
+
+TEST_F(SRLRegistryEnd, GivesUpTheTagsBeforeTheInstances) {
+  End end;
+  bool isLater = false;
+  {
+    const Ref<rt::Object> tag = rt::make<Mortal>(&end);
+    registry_->scopeWithTags({{tag.get()}})->instanceForIdentifier(&end, nullptr, [&] {
+      return rt::make<Witness>(&end, &isLater);
+    });
+  }
+  registry_ = nullptr;
+  EXPECT_TRUE(isLater);
+}
+
 }  // namespace

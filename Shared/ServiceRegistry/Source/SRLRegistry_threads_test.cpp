@@ -7,9 +7,13 @@
 #include <atomic>
 #include <cstddef>
 #include <cstdint>
+#include <latch>
+#include <map>
+#include <mutex>
 #include <random>
 #include <string>
 #include <thread>
+#include <tuple>
 #include <vector>
 
 #include "Runtime/Class.h"
@@ -116,6 +120,21 @@ Ref<rt::Object> makeInstance(SRLScopeTagSet tags) {
 constexpr std::array<Ref<rt::Object> (*)(SRLScopeTagSet), kLevels> kFactories = {
     makeInstance<0>, makeInstance<1>, makeInstance<2>, makeInstance<3>};
 
+// What the requests of all threads have got: an instance, by when it was made, of each API's implementation,
+// for an account while none of its scopes is removed.
+class Model {
+ public:
+  // What has been got first for the same.
+  std::uint64_t expect(std::size_t api, std::size_t account, std::uint64_t removals, std::uint64_t madeAt) {
+    const std::scoped_lock guard(mutex_);
+    return got_.try_emplace({api, account, removals}, madeAt).first->second;
+  }
+
+ private:
+  std::mutex mutex_;
+  std::map<std::tuple<std::size_t, std::size_t, std::uint64_t>, std::uint64_t> got_;
+} model;
+
 bool isNew(std::size_t api) {
   return api % 7 == 0;
 }
@@ -161,7 +180,7 @@ void removeScopesOf(SRLRegistry& registry, std::size_t number) {
 // - a service comes out, however it is asked for, and nothing is reported;
 // - one that is made anew each time is another each time;
 // - one that lives in an account's scope was made after every removal that was over before the request;
-// - a second request gets the same one unless a removal was under way before the first, or has begun since;
+// - requests of all threads get the same one unless a removal was under way before, or has begun since;
 // - one that lives in no account's scope is the same for ever;
 // - user code, that is factories, destructors and the delegate, finds the registry's lock free;
 // and at the end, when all scopes have ended, no tag is left that the registry had retained.
@@ -190,24 +209,34 @@ void request(SRLRegistry& registry, std::size_t api, std::size_t number) {
   if (isNew(api)) {
     EXPECT_NE(first, second);
   } else if (isOfAccount(api)) {
-    EXPECT_GT(rt::cast<Instance>(first.get())->madeAt(), lastRemoval);
-    EXPECT_TRUE(first == second || ended != begun || account.removalsBegun != begun);
+    const std::uint64_t madeAt = rt::cast<Instance>(first.get())->madeAt();
+    EXPECT_GT(madeAt, lastRemoval);
+    if (ended != begun || account.removalsBegun != begun) return;
+    EXPECT_EQ(first, second);
+    EXPECT_EQ(madeAt, model.expect(api, number, begun, madeAt));
   } else {
     EXPECT_EQ(first, second);
+    const std::uint64_t madeAt = rt::cast<Instance>(first.get())->madeAt();
+    EXPECT_EQ(madeAt, model.expect(api, kAccounts, 0, madeAt));
   }
 }
 
 // The same for an API for many: all of them come out, each as above.
 void requestMany(SRLRegistry& registry, std::size_t number) {
-  const std::uint64_t lastRemoval = accounts.at(number).lastRemoval;
+  const Account& account = accounts.at(number);
+  const std::uint64_t ended = account.removalsEnded;
+  const std::uint64_t begun = account.removalsBegun;
+  const std::uint64_t lastRemoval = account.lastRemoval;
   const Ref<Tag> tag = rt::make<Tag>(number);
   const Ref<rt::Array> instances =
       registry.internalMultiBoundService(&apiOfMany, SRLScopeTagSet{{tag.get()}});
   ASSERT_TRUE(instances);
   ASSERT_EQ(instances->count(), kMany);
   std::size_t madeSince = 0;
+  std::vector<std::uint64_t> madeAt;
   for (const Ref<rt::Object>& instance : *instances) {
-    if (rt::cast<Instance>(instance.get())->madeAt() > lastRemoval) ++madeSince;
+    madeAt.push_back(rt::cast<Instance>(instance.get())->madeAt());
+    if (madeAt.back() > lastRemoval) ++madeSince;
   }
   // All but those that live in no account's scope.
   std::size_t expected = 0;
@@ -215,6 +244,14 @@ void requestMany(SRLRegistry& registry, std::size_t number) {
     if (isNew(api) || isOfAccount(api)) ++expected;
   }
   EXPECT_GE(madeSince, expected);
+  if (ended != begun || account.removalsBegun != begun) return;
+  // Those of the APIs for one, which have the same implementations, are among them.
+  for (std::size_t api = 0; api < kMany; ++api) {
+    if (isNew(api)) continue;
+    const Ref<rt::Object> one = registry.internalService(&apis.at(api), SRLScopeTagSet{{tag.get()}});
+    if (account.removalsBegun != begun) return;
+    EXPECT_EQ(std::ranges::count(madeAt, rt::cast<Instance>(one.get())->madeAt()), 1);
+  }
 }
 
 class Delegate final : public rt::Implements<Delegate, rt::Object, SRLScopeLifecycleDelegate> {
@@ -236,14 +273,17 @@ TEST(SRLRegistryThreads, KeepEveryPromise) {
   const Ref<Delegate> delegate = rt::make<Delegate>();
   registry->setScopeLifecycleDelegate(delegate);
 
+  std::latch start(kThreads);
   std::vector<std::thread> threads;
   for (std::size_t thread = 0; thread < kThreads; ++thread) {
-    threads.emplace_back([&registry, thread] {
+    threads.emplace_back([&registry, &start, thread] {
       chance.seed(static_cast<unsigned>(thread + 1));
+      start.arrive_and_wait();
       Ref<SRLRegistry> asked = registry;
       for (std::size_t i = 0; i < kRequests; ++i) {
         askedHere = asked.get();
-        request(*asked, chance() % kAPIs, chance() % kAccounts);
+        // Most threads ask for a few at a time, so that they meet in their making.
+        request(*asked, chance() % (chance() % 2 == 0 ? kAPIs : kMany + i / 100), chance() % kAccounts);
         if (chance() % 8 == 0) requestMany(*asked, chance() % kAccounts);
         if (chance() % 50 == 0) removeScopesOf(*registry, chance() % kAccounts);
         // Copies keep what is scoped in the shared registry, too.

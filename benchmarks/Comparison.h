@@ -7,7 +7,7 @@
 /// Benchmark programs here register their cases as "Topic/case/ours" and "Topic/case/PEER", link
 /// `benchmark-comparison` (which brings `main`), and get, after Google Benchmark's own lines, one line
 /// for each peer: both medians and their ratio. The repetitions of all cases are interleaved at random,
-/// so that a busy machine slows both sides alike.
+/// so that a busy machine slows both sides alike. A second thread waits meanwhile.
 ///
 ///     BENCHMARK(copyRef)->Name("Ref/copy/ours");
 ///     BENCHMARK(copySharedPointer)->Name("Ref/copy/shared_ptr");

@@ -2,8 +2,6 @@
 
 #include <benchmark/benchmark.h>
 
-#include <thread>
-
 #include "Comparison.h"
 #include "Runtime/Class.h"
 #include "Runtime/Ref.h"
@@ -15,9 +13,6 @@
 namespace {
 
 using rt::Ref;
-
-// Other parts of a program have had threads.
-[[maybe_unused]] const bool hasHadThreads = (std::thread([] {}).join(), true);
 
 class Service final : public rt::Implements<Service, rt::Object> {};
 

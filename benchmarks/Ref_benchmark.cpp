@@ -4,7 +4,6 @@
 
 #include <functional>
 #include <memory>
-#include <thread>
 
 #include "Comparison.h"
 #include "Runtime/Block.h"
@@ -32,10 +31,6 @@ struct PlainClock {
   virtual ~PlainClock() = default;
   virtual int now() const { return 1; }
 };
-
-// Until a program has had a second thread, std::shared_ptr counts without atomic operations, as no host
-// program of these libraries would.
-[[maybe_unused]] const bool hasHadThreads = (std::thread([] {}).join(), true);
 
 void copyRef(benchmark::State& state) {
   const rt::Ref<SystemClock> ref = rt::make<SystemClock>();

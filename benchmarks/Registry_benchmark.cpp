@@ -8,7 +8,6 @@
 #include <memory>
 #include <string>
 #include <string_view>
-#include <thread>
 #include <unordered_map>
 #include <utility>
 #include <vector>
@@ -22,15 +21,13 @@
 #include "Runtime/String.h"
 #include "Runtime/UnfairLock.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLAPIIdentifier.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLTable.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 
 namespace {
 
 using namespace RegistryBenchmark;
 using rt::Ref;
-
-// Other parts of a program have threads: nothing may skip its atomic operations.
-[[maybe_unused]] const bool hasHadThreads = (std::thread([] {}).join(), true);
 
 const SRLAPIRegistrationData* scopedAPI() {
   return &module().apis.at(0);
@@ -87,6 +84,66 @@ struct Floor {
   std::unordered_map<SRLScopeTagSet, Ref<rt::Object>, TagSetHash, TagSetEqual> scopes;
 };
 
+// The least that a request can do: one lock, the same tables, the same counts, and no checks.
+struct Least {
+  Least() {
+    for (const SRLAPIRegistrationData& api : module().apis) {
+      implementations.insert(&api, rt::make<Service>());
+      instances.insert(&api, rt::make<Service>());
+    }
+  }
+
+  [[gnu::noinline]] Ref<rt::Object> keptInstance(const SRLAPIRegistrationData* api,
+                                                 const SRLScopeTagSet& tags) {
+    const rt::LockGuard guard(lock);
+    if (implementations.find(api) == nullptr || !SRLScopeTagSetEqual(scopeTags, tags)) return nullptr;
+    const auto* found = instances.find(api);
+    return found != nullptr ? found->second : nullptr;
+  }
+  [[gnu::noinline]] Ref<rt::Object> newInstance(const SRLAPIRegistrationData* api,
+                                                const SRLScopeTagSet& tags) {
+    const Ref<rt::Object> implementation = [&]() -> Ref<rt::Object> {
+      const rt::LockGuard guard(lock);
+      const auto* found = implementations.find(api);
+      return found != nullptr ? found->second : nullptr;
+    }();
+    return implementation ? module().implementations.at(2).factory(tags) : nullptr;
+  }
+  [[gnu::noinline]] Ref<rt::Array> keptInstances(const SRLAPIRegistrationData* api,
+                                                 const SRLScopeTagSet& tags) {
+    std::vector<Ref<rt::Object>> services;
+    services.reserve(8);
+    {
+      const rt::LockGuard guard(lock);
+      if (implementations.find(api) == nullptr) return nullptr;
+      const Ref<rt::Set> bound = eight;
+      std::size_t i = 0;
+      for (const Ref<rt::Object>& implementation : *bound) {
+        benchmark::DoNotOptimize(implementation.get());
+        if (!SRLScopeTagSetEqual(scopeTags, tags)) return nullptr;
+        services.push_back(instances.find(&module().apis.at(3 * i++))->second);
+      }
+    }
+    return rt::make<rt::Array>(std::move(services));
+  }
+
+  rt::UnfairLock lock;
+  const Ref<rt::Object> scopeTag = rt::String::fromUTF8("account").object();
+  const SRLScopeTagSet scopeTags{{scopeTag.get()}};
+  SRLTable<const void*, Ref<rt::Object>> implementations;
+  SRLTable<const void*, Ref<rt::Object>> instances;
+  const Ref<rt::Set> eight = [] {
+    rt::Set::Builder builder;
+    for (int i = 0; i < 8; ++i) builder.add(rt::make<Service>());
+    return std::move(builder).set();
+  }();
+};
+
+Least& least() {
+  static Least& least = *new Least();
+  return least;
+}
+
 template <class Table, class Key>
 [[gnu::always_inline]] inline Ref<rt::Object> lookUp(rt::UnfairLock& lock, const Table& table,
                                                      const Key& key) {
@@ -133,6 +190,11 @@ void findScopedBare(benchmark::State& state) {
     benchmark::DoNotOptimize(keptInstance(floor, *scopedAPI(), tags));
   }
 }
+void findScopedAtLeast(benchmark::State& state) {
+  Least& asked = least();
+  const SRLScopeTagSet tags{{account().get()}};
+  for (auto _ : state) benchmark::DoNotOptimize(asked.keptInstance(scopedAPI(), tags));
+}
 void findScopedInContainer(benchmark::State& state) {
   Container& asked = container();
   const std::string& name = module().identifiers.at(0);
@@ -178,6 +240,11 @@ void findFreshBare(benchmark::State& state) {
     benchmark::DoNotOptimize(module().implementations.at(2).factory({}));
   }
 }
+void findFreshAtLeast(benchmark::State& state) {
+  Least& asked = least();
+  const SRLScopeTagSet tags{{account().get()}};
+  for (auto _ : state) benchmark::DoNotOptimize(asked.newInstance(freshAPI(), tags));
+}
 void findFreshInContainer(benchmark::State& state) {
   Container& asked = container();
   const std::string& name = module().identifiers.at(2);
@@ -205,6 +272,10 @@ void missBare(benchmark::State& state) {
     benchmark::DoNotOptimize(isKnown || bindingOf(kUnknown) != nullptr);
   }
 }
+void missAtLeast(benchmark::State& state) {
+  Least& asked = least();
+  for (auto _ : state) benchmark::DoNotOptimize(asked.keptInstance(&kUnknown, {}));
+}
 void missInContainer(benchmark::State& state) {
   Container& asked = container();
   const std::string name = "Unknown";
@@ -228,6 +299,11 @@ void findManyBare(benchmark::State& state) {
       services.push_back(keptInstance(floor, module().apis.at(3 * i), tags));
     benchmark::DoNotOptimize(rt::make<rt::Array>(std::move(services)));
   }
+}
+void findManyAtLeast(benchmark::State& state) {
+  Least& asked = least();
+  const SRLScopeTagSet tags{{account().get()}};
+  for (auto _ : state) benchmark::DoNotOptimize(asked.keptInstances(scopedAPI(), tags));
 }
 void findManyInContainer(benchmark::State& state) {
   Container& asked = container();
@@ -284,6 +360,10 @@ void findByStringInContainer(benchmark::State& state) {
 
 // With all checks of its binding, and in a scope that is new too.
 constexpr std::size_t kFirst = 100;
+// Of all that there are.
+constexpr std::size_t nthFirst(std::size_t i) {
+  return i * (kAPIs / kFirst);
+}
 void findFirst(benchmark::State& state) {
   SRLRegistry& before = registry();
   const SRLScopeTagSet tags{{account().get()}};
@@ -293,7 +373,7 @@ void findFirst(benchmark::State& state) {
     SRLRegistry::setSharedInstance(asked);
     state.ResumeTiming();
     for (std::size_t i = 0; i < kFirst; ++i)
-      benchmark::DoNotOptimize(asked->internalService(&module().apis.at(i), tags));
+      benchmark::DoNotOptimize(asked->internalService(&module().apis.at(nthFirst(i)), tags));
     state.PauseTiming();
     SRLRegistry::setSharedInstance(&before);
     asked = nullptr;
@@ -360,8 +440,8 @@ void findFirstBare(benchmark::State& state) {
     auto tables = std::make_unique<Tables>();
     state.ResumeTiming();
     for (std::size_t i = 0; i < kFirst; ++i) {
-      const SRLImplementationRegistrationData& record = module().implementations.at(i);
-      bind(*tables, module().apis.at(i));
+      const SRLImplementationRegistrationData& record = module().implementations.at(nthFirst(i));
+      bind(*tables, module().apis.at(nthFirst(i)));
       benchmark::DoNotOptimize(record.lifetime != 0 ? record.factory(tags)
                                                     : makeInstance(*openScope(*tables, tags), record, tags));
     }
@@ -377,10 +457,10 @@ void findFirstInContainer(benchmark::State& state) {
     auto asked = std::make_unique<Container>();
     state.ResumeTiming();
     for (std::size_t i = 0; i < kFirst; ++i) {
+      const std::string& name = module().identifiers.at(nthFirst(i));
       asked->bind(
-          module().identifiers.at(i), [](const Container::Tags&) { return std::make_shared<int>(1); },
-          i % 3 == 2);
-      benchmark::DoNotOptimize(asked->find(module().identifiers.at(i), tags));
+          name, [](const Container::Tags&) { return std::make_shared<int>(1); }, nthFirst(i) % 3 == 2);
+      benchmark::DoNotOptimize(asked->find(name, tags));
     }
     state.PauseTiming();
     asked = nullptr;
@@ -388,9 +468,21 @@ void findFirstInContainer(benchmark::State& state) {
   }
 }
 
+// What a program without modules pays when it is loaded.
+void discoverNone(benchmark::State& state) {
+  const Ref<SRLRegistry> before = SRLRegistry::sharedInstance();
+  for (auto _ : state) {
+    SRLRegistry::setSharedInstance(SRLRegistry::initPrivate());
+    SRLRegistry::initialize(rt::classInfo<SRLRegistry>());
+  }
+  SRLRegistry::setSharedInstance(before);
+}
+
 BENCHMARK(findScoped)->Name("Registry/scoped/ours");
 BENCHMARK(findScopedBare)->Name("Registry/scoped/bare");
+BENCHMARK(findScopedAtLeast)->Name("Registry/scoped/least");
 BENCHMARK(findScopedInContainer)->Name("Registry/scoped/container");
+const Bound scopedLeast{"Registry/scoped", "least", 1.2};
 const Bound scopedBare{"Registry/scoped", "bare", 1.2};
 const Bound scopedContainer{"Registry/scoped", "container", 1.0};
 BENCHMARK(findByTurns)->Name("Registry/scoped, of two by turns/ours");
@@ -400,16 +492,21 @@ const Bound byTurnsBare{"Registry/scoped, of two by turns", "bare", 1.2};
 const Bound byTurnsContainer{"Registry/scoped, of two by turns", "container", 1.0};
 BENCHMARK(findFresh)->Name("Registry/fresh/ours");
 BENCHMARK(findFreshBare)->Name("Registry/fresh/bare");
+BENCHMARK(findFreshAtLeast)->Name("Registry/fresh/least");
 BENCHMARK(findFreshInContainer)->Name("Registry/fresh/container");
+const Bound freshLeast{"Registry/fresh", "least", 1.2};
 const Bound freshBare{"Registry/fresh", "bare", 1.2};
 const Bound freshContainer{"Registry/fresh", "container", 1.0};
 BENCHMARK(missOptional)->Name("Registry/miss/ours");
 BENCHMARK(missBare)->Name("Registry/miss/bare");
+BENCHMARK(missAtLeast)->Name("Registry/miss/least");
 BENCHMARK(missInContainer)->Name("Registry/miss/container");
+const Bound missLeast{"Registry/miss", "least", 1.2};
 const Bound missBound{"Registry/miss", "bare", 1.2};
 const Bound missContainer{"Registry/miss", "container", 1.0};
 BENCHMARK(findMany)->Name("Registry/eight/ours");
 BENCHMARK(findManyBare)->Name("Registry/eight/bare");
+BENCHMARK(findManyAtLeast)->Name("Registry/eight/least");
 BENCHMARK(findManyInContainer)->Name("Registry/eight/container");
 const Bound eightBare{"Registry/eight", "bare", 1.2};
 const Bound eightContainer{"Registry/eight", "container", 1.0};
@@ -423,5 +520,6 @@ BENCHMARK(findFirst)->Name("Registry/first of 100 APIs/ours");
 BENCHMARK(findFirstBare)->Name("Registry/first of 100 APIs/bare");
 BENCHMARK(findFirstInContainer)->Name("Registry/first of 100 APIs/container");
 const Bound firstBare{"Registry/first of 100 APIs", "bare", 1.2};
+BENCHMARK(discoverNone)->Name("Registry/discovery of no module/ours");
 
 }  // namespace

@@ -5,7 +5,6 @@
 #include <array>
 #include <cstddef>
 #include <cstdint>
-#include <thread>
 #include <unordered_map>
 #include <vector>
 
@@ -36,9 +35,6 @@ class Tag final : public rt::Implements<Tag, rt::Object, SRLScopeTag> {
  private:
   const std::uint64_t number_;
 };
-
-// Other parts of a program have had threads.
-[[maybe_unused]] const bool hasHadThreads = (std::thread([] {}).join(), true);
 
 Ref<rt::Array> fourTags() {
   return rt::Array::of(rt::make<Tag>(1U), rt::make<Tag>(2U), rt::make<Tag>(3U), rt::make<Tag>(4U));

@@ -32,7 +32,7 @@ inline constexpr std::string_view kInitializer = "initWithCoder:";
 constexpr std::size_t maximumSize(std::size_t bytes) noexcept {
   constexpr std::size_t kFactor = 16;
   constexpr std::size_t kSpare = std::size_t{16} << 20U;
-  return kFactor * bytes + kSpare;
+  return (kFactor * bytes) + kSpare;
 }
 
 /// `key`, which a class chose, such that it is none of the archive's own: with a "$" more if it has one.

@@ -282,7 +282,7 @@ TEST(KeyedUnarchiver, RefusesWhatIsReferredToTooOften) {
   // A tag with an array of twice the next tag, and so on.
   const auto doubled = [](std::uint64_t times) {
     Forged forged;
-    const std::uint64_t last = 2 * times + 1;
+    const std::uint64_t last = (2 * times) + 1;
     for (std::uint64_t place = 1; place <= last; ++place) {
       const std::uint64_t next = place < last ? place + 1 : 0;
       if (place % 2 == 1) {

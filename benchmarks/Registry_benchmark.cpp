@@ -338,6 +338,7 @@ void findByStringBare(benchmark::State& state) {
       const rt::LockGuard guard(floor.lock);
       return byIdentifier.find(name)->second;
     }();
+    // NOLINTNEXTLINE(performance-unnecessary-copy-initialization): user code may let go of the wrapper's
     const Ref<rt::Array> kept = tags;
     const Ref<rt::Object> implementation = lookUp(floor.lock, floor.implementations, api);
     benchmark::DoNotOptimize(keptInstance(floor, *api, {{kept->at(0)}}));

@@ -110,7 +110,7 @@ Ref<rt::Object> makeInstance(SRLScopeTagSet tags) {
   if constexpr (level > 0) {
     // The API's scope is that of the account; services without one have none to give.
     if (tags.tags[0] != nullptr) {
-      const std::size_t below = (level - 1) * kAPIsInLevel + chance() % kAPIsInLevel;
+      const std::size_t below = ((level - 1) * kAPIsInLevel) + (chance() % kAPIsInLevel);
       dependency = SRLRegistry::sharedInstance()->internalService(&apis.at(below), tags);
     }
   }
@@ -275,6 +275,7 @@ TEST(SRLRegistryThreads, KeepEveryPromise) {
 
   std::latch start(kThreads);
   std::vector<std::thread> threads;
+  threads.reserve(kThreads);
   for (std::size_t thread = 0; thread < kThreads; ++thread) {
     threads.emplace_back([&registry, &start, thread] {
       chance.seed(static_cast<unsigned>(thread + 1));
@@ -283,7 +284,7 @@ TEST(SRLRegistryThreads, KeepEveryPromise) {
       for (std::size_t i = 0; i < kRequests; ++i) {
         askedHere = asked.get();
         // Most threads ask for a few at a time, so that they meet in their making.
-        request(*asked, chance() % (chance() % 2 == 0 ? kAPIs : kMany + i / 100), chance() % kAccounts);
+        request(*asked, chance() % (chance() % 2 == 0 ? kAPIs : kMany + (i / 100)), chance() % kAccounts);
         if (chance() % 8 == 0) requestMany(*asked, chance() % kAccounts);
         if (chance() % 50 == 0) removeScopesOf(*registry, chance() % kAccounts);
         // Copies keep what is scoped in the shared registry, too.
@@ -309,6 +310,7 @@ TEST(SRLRegistryThreads, AskWhileTheSharedRegistryIsReplaced) {
   const Ref<SRLRegistry> before = SRLRegistry::setSharedInstance(asked);
   std::atomic<bool> isOver{false};
   std::vector<std::thread> threads;
+  threads.reserve(3);
   for (std::size_t thread = 0; thread < 3; ++thread) {
     threads.emplace_back([&] {
       const Ref<Tag> tag = rt::make<Tag>(std::size_t{0});

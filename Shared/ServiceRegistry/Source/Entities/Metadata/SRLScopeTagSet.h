@@ -101,7 +101,7 @@ inline SRLScopeTagSet SRLScopeTagSetCreateWithTags(const rt::Array* tags) {
     SRLScopeTagSetDetail::reportTooMany(tags->count());
     return set;
   }
-  auto next = set.tags.begin();
+  rt::Object** next = set.tags.data();
   for (const rt::Ref<rt::Object>& tag : *tags) *next++ = tag.get();
   return set;
 }

@@ -79,15 +79,15 @@ class ComparingReporter : public benchmark::ConsoleReporter {
 
 }  // namespace
 
+SecondThread::SecondThread() {
+  std::thread([] { std::latch(1).wait(); }).detach();
+}
+
 Bound::Bound(std::string caseName, std::string peer, double ratio) {
   bounds()[{std::move(caseName), std::move(peer)}] = ratio;
 }
 
 int main(int argumentCount, char** arguments) {
-  // As other parts of a program have threads: what does without atomic operations until there is a second one
-  // must not do so here.
-  std::thread([] { std::latch(1).wait(); }).detach();
-
   // What is given on the command line comes later and so has the last word.
   std::vector<std::string> defaults = {"--benchmark_repetitions=11", "--benchmark_min_time=0.05",
                                        "--benchmark_enable_random_interleaving=true"};

@@ -12,6 +12,8 @@
 
 namespace {
 
+const SecondThread secondThread;
+
 using rt::Ref;
 
 class Service final : public rt::Implements<Service, rt::Object> {};

@@ -14,6 +14,8 @@
 
 namespace {
 
+const SecondThread secondThread;
+
 struct Unused : rt::Protocol<Unused> {
  protected:
   ~Unused() = default;

@@ -23,6 +23,8 @@
 
 namespace {
 
+const SecondThread secondThread;
+
 using namespace RegistryBenchmark;
 using rt::Ref;
 

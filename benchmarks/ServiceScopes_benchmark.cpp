@@ -21,6 +21,8 @@
 
 namespace {
 
+const SecondThread secondThread;
+
 using rt::Ref;
 
 class Tag final : public rt::Implements<Tag, rt::Object, SRLScopeTag> {

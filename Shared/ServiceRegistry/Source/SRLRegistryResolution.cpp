@@ -1,7 +1,5 @@
 // How a registry hands out instances, and the scopes that they live in.
 
-#include <cstddef>
-#include <iterator>
 #include <utility>
 #include <variant>
 #include <vector>
@@ -67,6 +65,16 @@ rt::String instanceTypeOf(const SRLImplementation& implementation) {
             "Implementation of %@, bound to required service %@, returned nil.\nImplementation metadata: %@"
             "\nSee docs/registry.md#initializer-return-nil."_s,
             instanceTypeOf(implementation), SRLAPIIdentifier(api), implementation.description());
+}
+
+[[gnu::cold, gnu::noinline]] void reportNoInstanceOfMany(const char* function,
+                                                         const SRLImplementation& implementation,
+                                                         const SRLAPIRegistrationData* api) {
+  PECReport(
+      {kFile, function},
+      "Implementation of %@, bound to multi-bound service %@, returned nil.\nImplementation metadata: %@"
+      "\nSee docs/registry.md#initializer-return-nil."_s,
+      instanceTypeOf(implementation), SRLAPIIdentifier(api), implementation.description());
 }
 
 }  // namespace
@@ -206,6 +214,7 @@ bool SRLRegistry::registersBindingsFor(const SRLAPIRegistrationData* api) {
   }
   rt::Ref<rt::Set> implementations;
   std::vector<rt::Ref<rt::Object>> instances;
+  decltype(implementations->begin()) next;
   {
     const rt::LockGuard guard(ivars_->lock);
     if (const auto* known = ivars_->multiBindings.find(api)) {
@@ -222,23 +231,18 @@ bool SRLRegistry::registersBindingsFor(const SRLAPIRegistrationData* api) {
     instances.reserve(implementations->count());
     // Those that are there, up to the first that is to be made: its factory may do anything, such as end a
     // scope.
-    for (const rt::Ref<rt::Object>& element : *implementations) {
-      rt::Ref<rt::Object> kept = keptInstanceOf(static_cast<const SRLImplementation&>(*element), scopeTags);
+    for (next = implementations->begin(); next != implementations->end(); ++next) {
+      rt::Ref<rt::Object> kept = keptInstanceOf(static_cast<const SRLImplementation&>(**next), scopeTags);
       if (!kept) break;
       instances.push_back(std::move(kept));
     }
   }
-  const auto rest = std::next(implementations->begin(), static_cast<std::ptrdiff_t>(instances.size()));
-  for (auto element = rest; element != implementations->end(); ++element) {
-    auto& implementation = static_cast<SRLImplementation&>(**element);
+  for (; next != implementations->end(); ++next) {
+    auto& implementation = static_cast<SRLImplementation&>(**next);
     if (rt::Ref<rt::Object> instance = instanceOf(implementation, api, scopeTags, nullptr)) {
       instances.push_back(std::move(instance));
     } else {
-      PECReport(
-          {kFile, kFunction},
-          "Implementation of %@, bound to multi-bound service %@, returned nil.\nImplementation metadata: %@"
-          "\nSee docs/registry.md#initializer-return-nil."_s,
-          instanceTypeOf(implementation), SRLAPIIdentifier(api), implementation.description());
+      reportNoInstanceOfMany(kFunction, implementation, api);
     }
   }
   return rt::make<rt::Array>(std::move(instances));

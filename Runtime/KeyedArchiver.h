@@ -12,8 +12,8 @@
 /// `SecureCoding` (Runtime/Coding.h) can be archived, nested in each other up to 512 deep. An object that is
 /// reached twice is archived once, and is one object again when it is read; equal strings become one.
 ///
-/// What is under a key at the top must not be larger than 16 times the archive and 16 MiB, if each object and
-/// each byte of a text is counted as often as it is reached: an archive that stands for more is not read.
+/// The size of what is under a key at the top must be at most 16 MiB more than 16 times that of the archive,
+/// if each object and each byte of a text is counted as often as it is reached: what is larger is not read.
 ///
 /// The bytes are a binary property list (Runtime/PropertyList.h): a dictionary of "$archiver", "$version"
 /// 100000, "$top" with a reference for each key, and "$objects", to whose places references refer. Strings

@@ -4,14 +4,13 @@
 #include <gtest/gtest.h>
 
 #include <cmath>
+#include <exception>
 #include <functional>
 #include <limits>
 #include <random>
-#include <stdexcept>
 
 #include "Runtime/Array.h"
 #include "Runtime/Dictionary.h"
-#include "Runtime/Exception.h"
 #include "Runtime/KeyedUnarchiver.h"
 #include "Runtime/Number.h"
 #include "tests/KeyedArchiverTest.h"
@@ -189,7 +188,7 @@ Ref<rt::Object> repeated(std::size_t times) {
   return rt::make<rt::Array>(std::vector<Ref<rt::Object>>(times, text));
 }
 
-// What is archived may be 16 times as large as the archive and 16 MiB, and no larger: it used to be archived
+// What is archived may be 16 MiB larger than 16 times the archive, and no larger: it used to be archived
 // however large it was.
 TEST(KeyedArchiver, RefusesWhatIsReachedTooOften) {
   // The tag is 1, and its name 1 and 9 bytes: with the arrays, 12 times 2 to the 20th.

@@ -19,10 +19,10 @@
 /// unless keys of dictionaries are chosen to have the same hash. Once there is an error all further decoding
 /// yields null, so that it is enough to look for one at the end.
 ///
-/// An object that is decoded is not larger than 16 times the archive and 16 MiB, if each object and each byte
-/// of a text that it is made of is counted as often as it is decoded: nobody waits for its hash for ever.
-/// (Its description may be longer, by the blanks before what is nested.) So `initWithCoder` should decode
-/// what is under a key once.
+/// The size of an object that is decoded is at most 16 MiB more than 16 times that of the archive, if each
+/// object and each byte of a text that it is made of is counted as often as it is decoded: nobody waits for
+/// its hash for ever. So `initWithCoder` should decode what is under a key once. A description may be longer
+/// by far, since it indents what is nested, and should only be asked of what comes from somebody trusted.
 ///
 /// An unarchiver is used by one thread at a time.
 ///

@@ -38,8 +38,8 @@ namespace rt {
 
 namespace detail {
 
-// How many locks a thread holds is counted where RT_COUNTS_HELD_LOCKS says so, as it does in the builds with
-// sanitizers: for tests of what runs without any.
+// How many locks a thread holds is counted where RT_COUNTS_HELD_LOCKS is defined, as it is in instrumented
+// builds: for tests of what runs without any.
 #if defined(RT_COUNTS_HELD_LOCKS)
 inline constinit thread_local int heldLocks = 0;
 inline void countHeldLocks(int change) noexcept {

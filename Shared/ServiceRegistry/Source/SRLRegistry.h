@@ -212,9 +212,9 @@ class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
   const SRLAPIRegistrationData* apiIdentifierForProtocol(const rt::ProtocolInfo* protocol) const
       RT_REQUIRES(ivars_->lock);
 
-  /// The API with this identifier; null where no module knows one. Null is reported. Looks at one binding
-  /// after another where the API has not been asked for like that before. Not to be called with the lock
-  /// held, which ends the program, if it has not.
+  /// The API with this identifier; null where no module knows one. Null is reported. Where the identifier has
+  /// not been found before, it looks at one binding after another, and ends the program if the caller holds
+  /// the lock.
   const SRLAPIRegistrationData* apiIdentifierFromString(const rt::String& apiIdentifierString) const;
 
   /// The identifiers of all APIs that the modules know, as strings, whether they have been asked for or not.

@@ -1,5 +1,5 @@
-// What user code finds locked while it runs: nothing, but where it makes an instance that others may wait
-// for, the lock that they wait for.
+// What factories, destructors and the delegate find locked while they run: nothing, but where a factory makes
+// an instance that others may wait for, the lock that they wait for.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

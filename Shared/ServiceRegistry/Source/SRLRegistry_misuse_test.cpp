@@ -72,7 +72,8 @@ TEST_F(SRLRegistryDeathTest, ModulesRegisteredTwiceEndTheProgramAfterAReport) {
   const auto registerWithLogger = [this] {
     LUMLogMultiplexer::sharedInstance()->addSyncLogger(
         rt::make<TestSyncLogger>([](const Ref<LUMLogMessage>& message) {
-          std::fprintf(stderr, "level %lu, %d parameters\n", message->level(),
+          std::fprintf(stderr, "level %llu, %d parameters\n",
+                       static_cast<unsigned long long>(message->level()),
                        int{countOfSafeParameters(*message)});
         }));
     registry_->internalRegisterBindings({});

@@ -8,7 +8,7 @@
 ///
 /// Any thread may use it. No lock is held while an instance is made, so that a factory may ask the scope for
 /// what it needs. Who asks for an instance in the making waits until it is made; a factory must not ask for
-/// the one that it makes, nor an error callback for any, which ends the program.
+/// the one that it makes, nor an error callback for any of them, which ends the program.
 ///
 /// A factory that throws leaves its instance in the making for ever, as does memory that runs out while one
 /// is kept: whoever asks for it later waits for ever, too, or ends the program where the thread is the same.

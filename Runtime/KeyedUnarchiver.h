@@ -137,8 +137,8 @@ class KeyedUnarchiver final {
   std::size_t depth_ = 0;
   std::vector<Classes> classes_;
   std::unordered_map<std::uint64_t, Decoded> decoded_;
-  // Sizes are as detail::keyedArchive::maximumSize says: that of all that has been decoded, how large it may
-  // become by the object that is being decoded, and by how much more than before.
+  // Sizes are as detail::keyedArchive::maximumSize says: that of all that has been decoded; what it may
+  // become by the object at the top that is being decoded; and the most that one object may have.
   std::size_t size_ = 0;
   std::size_t sizeLimit_ = 0;
   const std::size_t maximumSize_;

@@ -4,14 +4,14 @@
 #include <sys/file.h>
 #include <unistd.h>
 
-#include <algorithm>
 #include <cerrno>
 #include <cstdio>
 #include <cstdlib>
 #include <ctime>
-#include <memory>
 #include <system_error>
 #include <utility>
+
+#include "Runtime/FilePath.h"
 
 namespace rt {
 
@@ -27,19 +27,6 @@ timespec changeTime(const struct stat& status) {
 #else
   return status.st_ctim;
 #endif
-}
-
-// The folder of `path`, without a slash at the end unless it is the root.
-std::string folderOf(const std::string& path) {
-  const std::size_t slash = path.find_last_of('/');
-  if (slash == std::string::npos) return ".";
-  return path.substr(0, std::max<std::size_t>(slash, 1));
-}
-
-// `path` without symbolic links, where it can be followed.
-std::string resolved(const std::string& path) {
-  const std::unique_ptr<char, decltype(&std::free)> real(realpath(path.c_str(), nullptr), &std::free);
-  return real != nullptr ? real.get() : path;
 }
 
 void makeFolders(const std::string& folder) {
@@ -154,13 +141,13 @@ DefaultsFile::Lock::~Lock() {
 }
 
 DefaultsFile::Lock DefaultsFile::lock() const {
-  const std::string folder = folderOf(resolved(path_));
+  const std::string folder = folderOf(resolvedPath(path_));
   makeFolders(folder);
   return Lock(FileDescriptor::open(folder, O_RDONLY | O_DIRECTORY));
 }
 
 void DefaultsFile::replace(std::string_view content) const {
-  const std::string path = resolved(path_);
+  const std::string path = resolvedPath(path_);
   try {
     struct stat status{};
     const bool exists = stat(path.c_str(), &status) == 0;

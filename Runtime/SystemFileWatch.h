@@ -15,7 +15,7 @@ namespace rt::detail {
 /// above the file's own is seen only while that is not there.
 class SystemFileWatch {
  public:
-  /// Throws std::system_error when the system refuses.
+  /// `path` begins with a slash. Throws std::system_error when the system refuses.
   explicit SystemFileWatch(const std::string& path);
   SystemFileWatch(const SystemFileWatch&) = delete;
   SystemFileWatch& operator=(const SystemFileWatch&) = delete;

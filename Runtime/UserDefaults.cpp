@@ -4,7 +4,6 @@
 #include <array>
 #include <charconv>
 #include <cmath>
-#include <filesystem>
 #include <limits>
 #include <optional>
 #include <string>
@@ -14,6 +13,7 @@
 
 #include "Runtime/Bundle.h"
 #include "Runtime/DefaultsStore.h"
+#include "Runtime/FilePath.h"
 #include "Runtime/Process.h"
 #include "Runtime/SystemDefaultsFolder.h"
 
@@ -92,7 +92,7 @@ Ref<UserDefaults> UserDefaults::standardUserDefaults() {
 Ref<UserDefaults> UserDefaults::initWithPath(const String& path) {
   if (path.isEmpty() || path.contains(std::string_view("\0", 1))) return nullptr;
   // Of one that is relative, what it means now.
-  std::string whole = std::filesystem::absolute(path.view()).string();
+  std::string whole = absolutePath(std::string(path.view()));
   return Ref<UserDefaults>::adopt(
       new UserDefaults(std::make_shared<detail::DefaultsStore>(std::move(whole), "")));
 }

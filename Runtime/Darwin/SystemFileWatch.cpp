@@ -5,15 +5,14 @@
 #include <unistd.h>
 
 #include <cerrno>
-#include <filesystem>
 #include <system_error>
 #include <utility>
+
+#include "Runtime/FilePath.h"
 
 namespace rt::detail {
 
 namespace {
-
-namespace fs = std::filesystem;
 
 constexpr unsigned kEvents = NOTE_WRITE | NOTE_EXTEND | NOTE_ATTRIB | NOTE_DELETE | NOTE_RENAME;
 
@@ -33,7 +32,7 @@ int watch(int queue, const char* path) {
 
 }  // namespace
 
-SystemFileWatch::SystemFileWatch(const std::string& path) : path_(fs::absolute(path)), events_(kqueue()) {
+SystemFileWatch::SystemFileWatch(const std::string& path) : path_(path), events_(kqueue()) {
   if (!events_) fail("kqueue");
   fcntl(events_.get(), F_SETFD, FD_CLOEXEC);
   struct kevent event;
@@ -49,10 +48,10 @@ SystemFileWatch::~SystemFileWatch() {
 void SystemFileWatch::arm() {
   // A folder tells of names that come and go in it, the file of what is written to it.
   std::vector<int> watched;
-  fs::path folder = fs::path(path_).parent_path();
+  std::string folder = folderOf(path_);
   int file = watch(events_.get(), folder.c_str());
-  while (file < 0 && folder.has_relative_path()) {
-    folder = folder.parent_path();
+  while (file < 0 && folder != "/") {
+    folder = folderOf(folder);
     file = watch(events_.get(), folder.c_str());
   }
   if (file < 0) fail("open");

@@ -10,15 +10,14 @@
 #include <cerrno>
 #include <climits>
 #include <cstdint>
-#include <filesystem>
 #include <system_error>
 #include <utility>
+
+#include "Runtime/FilePath.h"
 
 namespace rt::detail {
 
 namespace {
-
-namespace fs = std::filesystem;
 
 constexpr std::uint32_t kEvents = IN_CLOSE_WRITE | IN_CREATE | IN_DELETE | IN_MOVED_FROM | IN_MOVED_TO |
                                   IN_ATTRIB | IN_DELETE_SELF | IN_MOVE_SELF | IN_ONLYDIR;
@@ -30,9 +29,7 @@ constexpr std::uint32_t kEvents = IN_CLOSE_WRITE | IN_CREATE | IN_DELETE | IN_MO
 }  // namespace
 
 SystemFileWatch::SystemFileWatch(const std::string& path)
-    : path_(fs::absolute(path)),
-      events_(inotify_init1(IN_CLOEXEC | IN_NONBLOCK)),
-      wake_(eventfd(0, EFD_CLOEXEC)) {
+    : path_(path), events_(inotify_init1(IN_CLOEXEC | IN_NONBLOCK)), wake_(eventfd(0, EFD_CLOEXEC)) {
   if (!events_) fail("inotify_init1");
   if (!wake_) fail("eventfd");
   arm();
@@ -41,29 +38,25 @@ SystemFileWatch::SystemFileWatch(const std::string& path)
 SystemFileWatch::~SystemFileWatch() = default;
 
 void SystemFileWatch::arm() {
-  const fs::path whole = fs::path(path_).parent_path();
+  const std::string whole = folderOf(path_);
   std::vector<int> watched;
   // The file's folder or, while that cannot be watched, the nearest above it that can. One below that may
   // come to be while this looks, so it looks until it finds the same one twice.
-  fs::path found;
-  for (fs::path folder = whole;;) {
+  std::string found;
+  for (std::string folder = whole;;) {
     const int watch = inotify_add_watch(events_.get(), folder.c_str(), kEvents);
     if (watch >= 0) {
       watched.push_back(watch);
       if (folder == whole || folder == found) break;
       found = std::exchange(folder, whole);
-    } else if ((errno == ENOENT || errno == ENOTDIR || errno == EACCES) && folder.has_relative_path()) {
-      folder = folder.parent_path();
+    } else if ((errno == ENOENT || errno == ENOTDIR || errno == EACCES) && folder != "/") {
+      folder = folderOf(folder);
     } else {
       fail("inotify_add_watch");
     }
   }
-  std::error_code error;
-  const fs::path target = fs::canonical(path_, error);
-  if (!error) {
-    const int watch = inotify_add_watch(events_.get(), target.parent_path().c_str(), kEvents);
-    if (watch >= 0) watched.push_back(watch);
-  }
+  const int target = inotify_add_watch(events_.get(), folderOf(resolvedPath(path_)).c_str(), kEvents);
+  if (target >= 0) watched.push_back(target);
   for (const int watch : watched_) {
     if (std::ranges::find(watched, watch) == watched.end()) inotify_rm_watch(events_.get(), watch);
   }

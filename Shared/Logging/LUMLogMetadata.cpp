@@ -2,10 +2,11 @@
 
 using namespace rt::literals;
 
-constinit const rt::String LUMLogMetadata::kObfuscatedKiriIDKey = "LUMLogMetadataObfuscatedKiriID"_s;
-constinit const rt::String LUMLogMetadata::kComponentKey = "LUMLogMetadataComponent"_s;
-constinit const rt::String LUMLogMetadata::kCategoryKey = "LUMLogMetadataCategory"_s;
-constinit const rt::String LUMLogMetadata::kCauseKey = "LUMLogMetadataCause"_s;
+// Constants, not just initialised like constants: nothing runs for them at exit.
+constexpr rt::String LUMLogMetadata::kObfuscatedKiriIDKey = "LUMLogMetadataObfuscatedKiriID"_s;
+constexpr rt::String LUMLogMetadata::kComponentKey = "LUMLogMetadataComponent"_s;
+constexpr rt::String LUMLogMetadata::kCategoryKey = "LUMLogMetadataCategory"_s;
+constexpr rt::String LUMLogMetadata::kCauseKey = "LUMLogMetadataCause"_s;
 
 rt::Ref<LUMLogMetadata> LUMLogMetadata::initWithProperties(const rt::Ref<rt::Dictionary>& properties) {
   rt::Dictionary::Builder copies;

@@ -66,11 +66,10 @@ constinit NameTable<ProtocolInfo> protocols("protocols");
 
 constinit detail::NamedEntry<ClassInfo> objectEntry{&classInfo<Object>()};
 
-[[gnu::constructor(101)]] void announceObject() {
-  classes.add(objectEntry);
-}
-
 }  // namespace
+
+// Object's record is no template's, so that nothing else mentions it.
+template struct detail::AnnouncedOnLoading<objectEntry>;
 
 namespace detail {
 

@@ -4,15 +4,14 @@
 /// the runtime; nothing here is for its users.
 ///
 /// The system loads all images of a program, then calls the functions that each has for that, libraries
-/// before those that use them. Two rounds of such functions matter here: in the first an image announces
-/// its classes, protocols, class methods and load hooks; in the second it says that it has done so, by
-/// `announceImage`, of which each image that announces anything has a copy. An image bears a mark that
-/// shows, before any of its functions has been called, that it will announce something.
+/// before those that use them. Each image that has anything to announce bears a mark, which shows before any
+/// of its functions has been called. By such a function it announces its classes, protocols, class methods
+/// and load hooks, and then says that it has done so. Load hooks run once all images have.
 
 namespace rt::detail {
 
-// The rounds are priorities of [[gnu::constructor]]: 101, the first that is free to use, and 102. What the
-// compiler arranges for static objects comes after both.
+// This happens at priority 102 of such functions, on macOS also at 101, the first that is free to use. What
+// the compiler arranges for static objects without a priority comes after both.
 
 /// Whether every image that bears a mark has announced what it has. Called while images are loaded, so
 /// that none comes or goes meanwhile.

@@ -63,7 +63,7 @@ BENCHMARK_CAPTURE(create, theirs, kCreateTheirs)->Name("StartUp/create/mkdir")->
 BENCHMARK_CAPTURE(remove, ours, kRemoveOurs)->Name("StartUp/remove/ours")->UseManualTime();
 BENCHMARK_CAPTURE(remove, theirs, kRemoveTheirs)->Name("StartUp/remove/rmdir")->UseManualTime();
 
-const Bound kCreateBound{"StartUp/create", "mkdir", 1.0};
-const Bound kRemoveBound{"StartUp/remove", "rmdir", 1.0};
+const Bound kCreateBound{"StartUp/create", "mkdir", 0.8};
+const Bound kRemoveBound{"StartUp/remove", "rmdir", 0.8};
 
 }  // namespace

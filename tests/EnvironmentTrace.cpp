@@ -28,8 +28,8 @@ void require(bool succeeded, const char* what) {
 }
 
 // Where the look-ups of the C library are, counted from where the program is loaded.
-std::set<Address> lookUps(const std::string& path) {
-  std::istringstream symbols(runProcess({"nm", path}).standardOutput);
+std::set<Address> lookUps(const std::string& symbolsPath) {
+  std::istringstream symbols(runProcess({"nm", symbolsPath}).standardOutput);
   std::set<Address> addresses;
   Address address = 0;
   std::string kind;
@@ -39,7 +39,7 @@ std::set<Address> lookUps(const std::string& path) {
     if (!(words >> std::hex >> address >> kind >> name)) continue;
     if (name == "getenv" || name == "secure_getenv") addresses.insert(address);
   }
-  require(!addresses.empty(), "the program has no symbol of the environment's look-up");
+  require(!addresses.empty(), "there is no symbol of the environment's look-up");
   return addresses;
 }
 
@@ -79,9 +79,10 @@ bool waitForStop(pid_t process) {
 
 }  // namespace
 
-std::set<std::string> environmentVariablesReadBy(const std::vector<std::string>& arguments) {
+std::set<std::string> environmentVariablesReadBy(const std::vector<std::string>& arguments,
+                                                 const std::string& symbols) {
   const std::string path = std::filesystem::canonical(arguments.at(0));
-  const std::set<Address> offsets = lookUps(path);
+  const std::set<Address> offsets = lookUps(symbols);
   std::vector<char*> argumentVector;
   argumentVector.reserve(arguments.size() + 1);
   for (const std::string& argument : arguments) argumentVector.push_back(const_cast<char*>(argument.c_str()));

@@ -69,7 +69,7 @@ TEST_F(MountPointBinaryTest, LoadsNothing) {
 
 // The libraries are there, with what sets the registry up when the program is loaded.
 TEST_F(MountPointBinaryTest, CarriesTheLibraries) {
-  const std::string symbols = outputOf({"nm", "--demangle", "--defined-only", MOUNT_POINT});
+  const std::string symbols = outputOf({"nm", "--demangle", "--defined-only", MOUNT_POINT_SYMBOLS});
   for (const char* const name :
        {"SRLRegistry::load()", "LUMLogMultiplexer::logWithMessage(", "PECErrorHandler::register_()",
         "ZEBLogger::sharedLogger()", "LUMLoggingReroutingZEBLogger::", "AVOProvider::get() const"}) {
@@ -111,6 +111,39 @@ TEST_F(MountPointBinaryTest, ProtectsItsStackAndChecksItsCallsOfTheStandardLibra
 #endif
 }
 
+// A debugger that is given the executable finds its symbols in the file beside it.
+TEST_F(MountPointBinaryTest, IsStrippedAndLeadsToItsSymbols) {
+  const std::string sections = outputOf({"readelf", "--wide", "--sections", MOUNT_POINT});
+  EXPECT_THAT(sections, HasSubstr(".gnu_debuglink"));
+  EXPECT_THAT(sections, Not(HasSubstr(".symtab")));
+  EXPECT_THAT(sections, Not(HasSubstr(".debug_")));
+  EXPECT_THAT(outputOf({"readelf", "--wide", "--sections", MOUNT_POINT_SYMBOLS}), HasSubstr(".debug_info"));
+}
+
+// Of the two marks of control-flow enforcement, one needs nothing but calls that return. The other needs
+// every object to be compiled for it; ours are, the C library is not.
+TEST_F(MountPointBinaryTest, BearsTheMarkOfShadowStacks) {
+  EXPECT_THAT(outputOf({"readelf", "--notes", MOUNT_POINT}), HasSubstr("SHSTK"));
+  for (const std::string object : {COMMAND_OBJECT, MAIN_OBJECT}) {
+    EXPECT_THAT(outputOf({"readelf", "--notes", object}), HasSubstr("IBT, SHSTK")) << object;
+  }
+}
+
+// They run before the command. One is the profiling's, one announces all classes of the libraries, and the
+// others are those of the C and C++ libraries. There used to be one for each class in each source file, 487
+// in all.
+TEST_F(MountPointBinaryTest, HasFewInitialisers) {
+  const std::string sections = outputOf({"readelf", "--wide", "--sections", MOUNT_POINT});
+  std::istringstream words(sections.substr(sections.find(".init_array")));
+  std::string name;
+  std::string type;
+  std::string address;
+  std::string offset;
+  std::string size;
+  ASSERT_TRUE(words >> name >> type >> address >> offset >> size);
+  EXPECT_LE(std::stoul(size, nullptr, 16) / sizeof(void*), 10U);
+}
+
 TEST_F(MountPointBinaryTest, CarriesNoPrivilegeByItself) {
   struct stat status{};
   ASSERT_EQ(stat(MOUNT_POINT, &status), 0);
@@ -146,7 +179,7 @@ TEST_F(MountPointTracedTest, ReadsNoEnvironmentVariableThatIsNotAccountedFor) {
                                            "LD_BIND_NOT",     "LD_DYNAMIC_WEAK", "LD_PROFILE_OUTPUT"};
   for (const std::vector<std::string>& arguments :
        {std::vector<std::string>{MOUNT_POINT}, {MOUNT_POINT, "a/b"}}) {
-    const std::set<std::string> names = environmentVariablesReadBy(arguments);
+    const std::set<std::string> names = environmentVariablesReadBy(arguments, MOUNT_POINT_SYMBOLS);
     EXPECT_THAT(names, testing::Contains("LD_LIBRARY_PATH")) << "the trace is blind";
     EXPECT_THAT(names, IsSubsetOf(accounted));
   }

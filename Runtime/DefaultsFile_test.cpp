@@ -1,17 +1,58 @@
 // What the tests of Runtime/UserDefaults.h do not reach.
 #include "Runtime/DefaultsFile.h"
 
+#include <dlfcn.h>
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <sys/stat.h>
 
+#include <cerrno>
+#include <cstdio>
 #include <ctime>
 #include <filesystem>
 #include <fstream>
 #include <stdexcept>
+#include <string>
 #include <system_error>
+#include <vector>
+
+#include "tests/ClockHook.h"
 
 namespace {
 
 namespace fs = std::filesystem;
+
+// The calls that decide what is there after a loss of power, in their order.
+std::vector<std::string> calls;
+// Of the calls of fsync to come, the one that fails, from 1 on; 0 for none.
+int failingSync = 0;
+
+template <class Function>
+Function* systems(const char* name) {
+  return reinterpret_cast<Function*>(dlsym(RTLD_NEXT, name));
+}
+
+}  // namespace
+
+// A program's own functions go before those of the C library.
+
+extern "C" int fsync(int descriptor) {
+  struct stat status{};
+  fstat(descriptor, &status);
+  calls.emplace_back(S_ISDIR(status.st_mode) ? "fsync of a folder" : "fsync of a file");
+  if (failingSync > 0 && --failingSync == 0) {
+    errno = EIO;
+    return -1;
+  }
+  return systems<int(int)>("fsync")(descriptor);
+}
+
+extern "C" int rename(const char* from, const char* to) noexcept {
+  calls.emplace_back("rename");
+  return systems<int(const char*, const char*)>("rename")(from, to);
+}
+
+namespace {
 
 class DefaultsFile : public testing::Test {
  protected:
@@ -53,6 +94,26 @@ TEST_F(DefaultsFile, ThatIsFreshIsReadAgain) {
   EXPECT_FALSE(file.isStill(file.version()));
 }
 
+// File systems may count in steps of two seconds: what changes within one step has the same time twice.
+TEST_F(DefaultsFile, IsFreshForTwoSeconds) {
+  static time_t now;
+  const rt::DefaultsFile file((folder_ / "file").string());
+  std::ofstream(file.path()) << "a";
+  struct stat status{};
+  ASSERT_EQ(stat(file.path().c_str(), &status), 0);
+  clockHook = [](clockid_t clock, timespec& time) {
+    if (clock == CLOCK_REALTIME) time.tv_sec = now;
+  };
+  for (const int age : {0, 1, 2}) {
+    now = status.st_ctime + age;
+    EXPECT_FALSE(file.isStill(file.version())) << age;
+  }
+  now = status.st_ctime + 3;
+  const rt::DefaultsFile::Version settled = file.version();
+  clockHook = nullptr;
+  EXPECT_TRUE(file.isStill(settled));
+}
+
 TEST_F(DefaultsFile, ThatIsMissingHasAVersion) {
   const rt::DefaultsFile file((folder_ / "file").string());
   EXPECT_FALSE(file.isStill(rt::DefaultsFile::Version()));
@@ -73,6 +134,51 @@ TEST_F(DefaultsFile, IsReadAndReplacedWhole) {
     EXPECT_EQ(file.content(100000), content);
   }
   EXPECT_EQ(std::distance(fs::directory_iterator(folder_), {}), 1);
+}
+
+// After a loss of power the new name would stand for a file whose content had not been written, or the old
+// one would still be there.
+TEST_F(DefaultsFile, IsOnTheDiskBeforeItTakesItsNameAndSoIsTheName) {
+  calls.clear();
+  rt::DefaultsFile((folder_ / "file").string()).replace("content");
+  EXPECT_THAT(calls, testing::ElementsAre("fsync of a file", "rename", "fsync of a folder"));
+}
+
+TEST_F(DefaultsFile, StaysWhereTheNewOneDoesNotReachTheDisk) {
+  const rt::DefaultsFile file((folder_ / "file").string());
+  file.replace("old");
+  failingSync = 1;
+  try {
+    file.replace("new");
+    FAIL() << "nobody was told";
+  } catch (const std::system_error& error) {
+    EXPECT_EQ(error.code().value(), EIO);
+    EXPECT_THAT(error.what(), testing::HasSubstr(file.path()));
+  }
+  EXPECT_EQ(file.content(100), "old");
+  EXPECT_EQ(std::distance(fs::directory_iterator(folder_), {}), 1) << "nothing is left of the new one";
+}
+
+// It has been replaced by then.
+TEST_F(DefaultsFile, IsReplacedWhereItsFolderDoesNotReachTheDisk) {
+  const rt::DefaultsFile file((folder_ / "file").string());
+  file.replace("old");
+  failingSync = 2;
+  EXPECT_NO_THROW(file.replace("new"));
+  EXPECT_EQ(failingSync, 0);
+  EXPECT_EQ(file.content(100), "new");
+}
+
+TEST_F(DefaultsFile, KeepsAllBitsOfItsMode) {
+  const rt::DefaultsFile file((folder_ / "file").string());
+  file.replace("old");
+  for (const mode_t mode : {04640U, 02604U, 01600U, 0600U}) {
+    ASSERT_EQ(chmod(file.path().c_str(), mode), 0);
+    file.replace("new");
+    struct stat status{};
+    ASSERT_EQ(stat(file.path().c_str(), &status), 0);
+    EXPECT_EQ(status.st_mode & 07777U, mode);
+  }
 }
 
 }  // namespace

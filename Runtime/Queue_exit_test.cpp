@@ -1,5 +1,6 @@
 // What becomes of queued tasks when the process exits, and in the child of a fork.
 
+#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -247,6 +248,59 @@ TEST_F(QueueTest, ATaskMayFork) {
   hasForked.wait();
   queue_->barrierSync();
   EXPECT_EQ(statusOf(child), 0);
+}
+
+// In the child of a fork, what the parent had queued was waited for at exit, until patience ended.
+TEST_F(QueueDeathTest, AChildDoesNotWaitAtExitForWhatItsParentHasQueued) {
+  const auto exitOfTheChild = [&] {
+    std::atomic<bool> never = false;
+    holdUntilExit(*queue_, never);
+    queue_->async([] {});
+    const pid_t child = fork();
+    if (child != 0) _exit(statusOf(child));
+    rt::detail::QueueRegistry::exitPatience = 1;
+    std::exit(3);
+  };
+  EXPECT_EXIT(exitOfTheChild(), testing::ExitedWithCode(3),
+              testing::Not(testing::HasSubstr("still runs a task")));
+}
+
+/// Exits with a task of `queue` that does not end, and names it if the task is waited for.
+[[noreturn]] void exitWhileBusy(Queue& queue) {
+  static std::atomic<bool> never = false;
+  holdUntilExit(queue, never);
+  rt::detail::QueueRegistry::exitPatience = 1;
+  std::exit(3);
+}
+
+// Had the parent run a task before, the child left one of its own behind at exit.
+TEST_F(QueueDeathTest, AChildWaitsAtExitForEveryTaskOfItsOwn) {
+  if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << kNoThreadsAfterFork;
+  const auto exitOfTheChild = [&] {
+    queue_->async([] {});
+    queue_->barrierSync();
+    const pid_t child = fork();
+    if (child != 0) _exit(statusOf(child));
+    exitWhileBusy(*queue_);
+  };
+  EXPECT_EXIT(exitOfTheChild(), testing::ExitedWithCode(3),
+              "rt: the queue \"test\" still runs a task at exit");
+}
+
+// The task that forks is the parent's too, and counted there.
+TEST_F(QueueDeathTest, AChildOfATaskWaitsAtExitForEveryTaskOfItsOwn) {
+  if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << kNoThreadsAfterFork;
+  const auto exitOfTheChild = [&] {
+    const Ref<Queue> other = rt::make<Queue>("other"_s);
+    queue_->async([&] {
+      const pid_t child = fork();
+      if (child != 0) _exit(statusOf(child));
+      other->async([&] { exitWhileBusy(*queue_); });
+    });
+    for (;;) pause();
+  };
+  EXPECT_EXIT(exitOfTheChild(), testing::ExitedWithCode(3),
+              "rt: the queue \"test\" still runs a task at exit");
 }
 
 }  // namespace

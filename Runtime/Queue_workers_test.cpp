@@ -18,11 +18,13 @@
 #include <latch>
 #include <string>
 #include <thread>
+#include <utility>
 #include <vector>
 
 #include "Runtime/Thread.h"
 #include "Runtime/ThreadIdentifier.h"
 #include "Runtime/WorkerPool.h"
+#include "tests/ClockHook.h"
 #include "tests/QueueTest.h"
 #include "tests/Sanitizers.h"
 
@@ -38,23 +40,19 @@ std::ptrdiff_t threadCount() {
                        std::filesystem::directory_iterator());
 }
 
-/// Lets idle workers end at once, and waits until they have.
-std::ptrdiff_t threadCountWithoutWorkers() {
+/// Lets idle workers end at once, and returns when there are none.
+void waitUntilWorkersHaveEnded() {
   // Those that are asleep already have to be woken to see it.
   rt::detail::WorkerPool::idleTimeout = 1;
-  const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(30);
-  std::ptrdiff_t least = threadCount();
-  while (std::chrono::steady_clock::now() < deadline && least > 1) {
+  while (threadCount() > 1) {
     for (const auto qualityOfService : {QualityOfService::kDefault, QualityOfService::kUtility}) {
       std::latch hasRun(1);
       rt::make<Queue>("wake"_s, qualityOfService)->async([&] { hasRun.count_down(); });
       hasRun.wait();
     }
-    std::this_thread::sleep_for(std::chrono::milliseconds(1));
-    least = std::min(least, threadCount());
+    std::this_thread::yield();
   }
   rt::detail::WorkerPool::idleTimeout = std::chrono::nanoseconds(std::chrono::seconds(5)).count();
-  return least;
 }
 
 // More queues than there may be threads, all waiting for one queue that is busy. The thread that has kept
@@ -84,11 +82,35 @@ TEST_F(QueueTest, ThreadsEndWhenTheyHaveBeenIdle) {
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer has a thread of its own";
   queue_->async([] {});
   queue_->barrierSync();
-  EXPECT_EQ(threadCountWithoutWorkers(), 1);
+  waitUntilWorkersHaveEnded();
   int runs = 0;
   for (int i = 0; i < 10; ++i) queue_->async([&] { ++runs; });
   queue_->barrierSync();
   EXPECT_EQ(runs, 10) << "there are new threads when they are needed";
+}
+
+/// What a worker queues at its next look at the clock, which is how it finds that it has been idle for too
+/// long.
+constinit thread_local Queue* queuedWhenIdle = nullptr;
+constinit std::atomic<bool> hasRunAfterwards = false;
+
+// Work that is given to a worker between the end of its wait and its leaving was lost with it. Here the
+// worker itself gives it, as it reads in the clock that its time is over.
+TEST_F(QueueDeathTest, AWorkerThatGetsWorkAsItsTimeEndsDoesIt) {
+  EXPECT_EXIT(
+      {
+        alarm(30);  // Instead of a hang.
+        rt::detail::WorkerPool::idleTimeout = 0;
+        clockHook = [](clockid_t /*clock*/, timespec& /*time*/) {
+          if (Queue* queue = std::exchange(queuedWhenIdle, nullptr))
+            queue->async([] { hasRunAfterwards = true; });
+        };
+        const Ref<Queue> other = rt::make<Queue>("other"_s);
+        queue_->async([&] { queuedWhenIdle = other.get(); });
+        while (!hasRunAfterwards) std::this_thread::yield();
+        _exit(0);
+      },
+      testing::ExitedWithCode(0), "");
 }
 
 TEST_F(QueueDeathTest, NoThreadStartsBeforeTheFirstAsync) {
@@ -180,6 +202,7 @@ TEST_F(QueueDeathTest, NicenessDoesNotSpreadFromTheBackground) {
   EXPECT_EXIT(
       {
         if (geteuid() == 0 && setresuid(65534, 65534, 65534) != 0) _exit(1);
+        alarm(30);  // Instead of a hang.
         const rlimit none{};
         setrlimit(RLIMIT_NICE, &none);
         rt::detail::WorkerPool::idleTimeout = std::chrono::nanoseconds(std::chrono::hours(1)).count();
@@ -195,11 +218,7 @@ TEST_F(QueueDeathTest, NicenessDoesNotSpreadFromTheBackground) {
         });
         hasRun.wait();
         const std::string path = "/proc/self/task/" + std::to_string(worker);
-        const auto deadline = std::chrono::steady_clock::now() + std::chrono::seconds(30);
-        while (std::filesystem::exists(path)) {
-          if (std::chrono::steady_clock::now() > deadline) _exit(2);
-          std::this_thread::yield();
-        }
+        while (std::filesystem::exists(path)) std::this_thread::yield();
         queue_->async(
             [&] { _exit(getpriority(PRIO_PROCESS, rt::currentThreadIdentifier()) == ofProcess ? 0 : 3); });
         for (;;) pause();

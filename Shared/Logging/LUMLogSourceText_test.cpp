@@ -44,6 +44,14 @@ TEST(LUMLogSourceText, NoticesThatATextHasChanged) {
   EXPECT_EQ(LUMLogSourceText(text), "first text");
 }
 
+// It was taken for the text that it begins with.
+TEST(LUMLogSourceText, NoticesThatATextHasGrown) {
+  static char text[] = "first\0text";
+  EXPECT_EQ(LUMLogSourceText(text), "first");
+  text[5] = ' ';
+  EXPECT_EQ(LUMLogSourceText(text), "first text");
+}
+
 TEST(LUMLogSourceText, RemembersNoLongTexts) {
   const std::string longest(kLUMLogSourceTextLength, 'x');
   const std::string longer(kLUMLogSourceTextLength + 1, 'x');

@@ -6,8 +6,9 @@
 ///     if (info != nullptr && info->conformsTo(rt::protocolInfo<Clock>())) ...
 ///     info == &rt::classInfo<SystemClock>();                           // identity is the address
 ///
-/// There is one constant record for each class and each protocol. It lives as long as the part of the
-/// program that it is in, and so an executable or library that defines classes is never unloaded.
+/// There is one constant record for each class and each protocol, which is there as long as the program is. A
+/// library that defines or uses classes is never unloaded, however it was compiled: `dlclose` leaves it
+/// where it is.
 ///
 /// Not for: making records. Classes get theirs from `rt::Implements`, protocols from `rt::Protocol`
 /// (Runtime/Class.h).

@@ -6,12 +6,23 @@
 /// The system loads all images of a program, then calls the functions that each has for that, libraries
 /// before those that use them. Each image that has anything to announce bears a mark, which shows before any
 /// of its functions has been called. By such a function it announces its classes, protocols, class methods
-/// and load hooks, and then says that it has done so. Load hooks run once all images have.
+/// and load hooks, and then says that it has done so. Load hooks run once all images have. Whoever uses a
+/// class announces it too, since each image may have a record of its own; so an image with a literal, which
+/// is an object, is one of them.
 
 namespace rt::detail {
 
+/// What a mark leads to. Defined by system.
+struct ImageState;
+
 // This happens at priority 102 of such functions, on macOS also at 101, the first that is free to use. What
 // the compiler arranges for static objects without a priority comes after both.
+
+/// Keeps the image that has `state`, its mark, from being unloaded as long as the process lives: what it has
+/// announced is referred to for ever, and so may be its literals. Takes one look at the images that are
+/// loaded; opens no file and allocates nothing. Does nothing for the program itself. Where the system
+/// refuses, a line on standard error says so. Called once for an image, while it is loaded.
+void keepImage(const ImageState& state) noexcept;
 
 /// Whether every image that bears a mark has announced what it has. Called while images are loaded, so
 /// that none comes or goes meanwhile.

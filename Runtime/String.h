@@ -58,7 +58,8 @@ class String;
 inline namespace literals {
 
 /// The string of a literal, which is valid UTF-8. Neither allocates nor counts, also when it is copied; it
-/// can be a constant, and then nothing runs for it at start-up or at exit.
+/// can be a constant, and then nothing runs for it at start-up or at exit. It is there as long as the program
+/// is: a library with literals is never unloaded (Runtime/ClassInfo.h).
 template <detail::StringLiteral literal>
 constexpr String operator""_s() noexcept;
 
@@ -93,8 +94,9 @@ class String {
   /// have become one character. Never null. Throws std::bad_alloc.
   static String fromUTF8Repaired(std::string_view bytes);
 
-  /// A string over `bytes`, which must never change nor go away: they are not copied. Null where they are
-  /// not valid UTF-8. Throws std::bad_alloc.
+  /// A string over `bytes`, which must never change nor go away: they are not copied. Constants of a library
+  /// that calls this, or uses classes, will do, since it is never unloaded. Null where they are not valid
+  /// UTF-8. Throws std::bad_alloc.
   static String overStatic(std::string_view bytes);
 
   /// `object` as a string; null where it is none, and for null.

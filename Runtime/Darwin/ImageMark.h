@@ -13,6 +13,7 @@ struct ImageState {
 
 [[gnu::used, gnu::constructor(102)]] static void announceSourceFile() {
   imageState.isAnnounced = true;
+  keepImage(imageState);
   runLoadHooksWhenComplete();
 }
 

@@ -1,14 +1,40 @@
 #include "Runtime/LoadedImages.h"
 
+#include <dlfcn.h>
 #include <link.h>
 
+#include <bit>
 #include <cstddef>
 #include <cstdint>
+#include <cstdio>
 #include <cstring>
+
+// A program that was linked statically need have none. Neither is `dlopen` named below: the linker warns of
+// that in such a program.
+#pragma weak dlsym
 
 namespace rt::detail {
 
 namespace {
+
+/// An image by an address that is in it. Its name stays where it is as long as the image is loaded.
+struct NamedImage {
+  std::uintptr_t address;
+  const char* name = nullptr;
+};
+
+/// 0 to go on with the next image, another value to end.
+int findImage(dl_phdr_info* image, std::size_t /*size*/, void* context) {
+  NamedImage& wanted = *static_cast<NamedImage*>(context);
+  for (std::size_t i = 0; i < image->dlpi_phnum; ++i) {
+    const ElfW(Phdr)& segment = image->dlpi_phdr[i];
+    if (segment.p_type != PT_LOAD) continue;
+    if (wanted.address - image->dlpi_addr - segment.p_vaddr >= segment.p_memsz) continue;
+    wanted.name = image->dlpi_name;
+    return 1;
+  }
+  return 0;
+}
 
 constexpr std::size_t aligned(std::size_t size, std::size_t alignment) {
   return (size + alignment - 1) / alignment * alignment;
@@ -53,7 +79,21 @@ void announce(ImageState& state, const std::int32_t* begin, const std::int32_t* 
     reinterpret_cast<void (*)()>(address)();  // NOLINT(performance-no-int-to-ptr): the linker says so
   }
   state.isAnnounced = true;
+  keepImage(state);
   runLoadHooksWhenComplete();
+}
+
+void keepImage(const ImageState& state) noexcept {
+  if (dlsym == nullptr) return;
+  NamedImage image{.address = std::bit_cast<std::uintptr_t>(&state)};
+  dl_iterate_phdr(&findImage, &image);
+  // The program itself has no name.
+  if (image.name == nullptr || *image.name == '\0') return;
+  using Open = void*(const char*, int);
+  auto* const open = reinterpret_cast<Open*>(dlsym(RTLD_DEFAULT, "dlopen"));
+  // The handle is kept, so that nobody's is the last one.
+  if (open != nullptr && open(image.name, RTLD_LAZY | RTLD_NOLOAD | RTLD_NODELETE) != nullptr) return;
+  std::fprintf(stderr, "rt: \"%s\" cannot be kept from being unloaded; it must not be closed\n", image.name);
 }
 
 bool areAllImagesAnnounced() noexcept {

@@ -1,0 +1,19 @@
+// Adds a class method, and gives an object of a class of the program's.
+#include "Registry.h"
+#include "Runtime/ClassMethod.h"
+#include "Runtime/String.h"
+#include "guest.h"
+
+namespace {
+
+int method() {
+  return 5;
+}
+
+}  // namespace
+
+template struct rt::AddedClassMethod<Registry, "add_E", &method>;
+
+extern "C" [[gnu::visibility("default")]] void give(rt::Ref<rt::Object>& gift) {
+  gift = rt::String::fromUTF8("a copy");
+}

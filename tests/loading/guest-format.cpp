@@ -1,0 +1,8 @@
+// Gives a format that was a plain literal.
+#include "Runtime/FormatString.h"
+#include "guest.h"
+
+extern "C" [[gnu::visibility("default")]] void give(rt::Ref<rt::Object>& gift) {
+  static constexpr rt::FormatString<int> kFormat("%d formats");
+  gift = kFormat.string();
+}

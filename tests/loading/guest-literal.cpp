@@ -1,0 +1,9 @@
+// Gives a literal.
+#include "Runtime/String.h"
+#include "guest.h"
+
+using namespace rt::literals;
+
+extern "C" [[gnu::visibility("default")]] void give(rt::Ref<rt::Object>& gift) {
+  gift = "a literal"_s;
+}

@@ -1,0 +1,8 @@
+#pragma once
+
+#include "Runtime/Object.h"
+#include "Runtime/Ref.h"
+
+/// What a library that is opened and closed again exports as "give": sets `gift` to an object that the
+/// program keeps.
+using Give = void(rt::Ref<rt::Object>& gift);

@@ -2,13 +2,17 @@
 
 #include <fcntl.h>
 #include <poll.h>
+#include <sys/ptrace.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <array>
 #include <cerrno>
+#include <csignal>
+#include <cstdint>
 #include <cstdio>
 #include <cstdlib>
+#include <stdexcept>
 #include <system_error>
 
 namespace {
@@ -67,29 +71,88 @@ void drain(int& descriptor, std::string& text) {
 
 }  // namespace
 
-ProcessResult runProcess(const std::vector<std::string>& arguments, const std::function<void()>& beforeExec,
-                         const std::string& program) {
-  Pipe output;
-  Pipe error;
-  const pid_t child = fork();
-  require(child >= 0, "fork");
-  if (child == 0) becomeProgram(arguments, beforeExec, program, output, error);
+RunningProcess::RunningProcess(const std::vector<std::string>& arguments,
+                               const std::function<void()>& beforeExec, const std::string& program) {
+  const Pipe output;
+  const Pipe error;
+  child_ = fork();
+  require(child_ >= 0, "fork");
+  if (child_ == 0) becomeProgram(arguments, beforeExec, program, output, error);
   close(output.writeEnd);
   close(error.writeEnd);
+  output_ = output.readEnd;
+  error_ = error.readEnd;
+}
 
+RunningProcess::~RunningProcess() {
+  if (output_ >= 0) close(output_);
+  if (error_ >= 0) close(error_);
+  if (child_ < 0) return;
+  int status = 0;
+  kill(child_, SIGKILL);
+  reap(status, 0);
+}
+
+bool RunningProcess::reap(int& status, int options) {
+  while (waitpid(child_, &status, options) < 0) {
+    if (errno != EINTR) return false;
+  }
+  return true;
+}
+
+// Each stop is the program's start, a signal, or one side of a system call, which has the bit 0x80.
+StoppedProcess::StoppedProcess(long systemCall, const std::vector<std::string>& arguments,
+                               const std::function<void()>& beforeExec)
+    : RunningProcess(arguments, [&] {
+        // While it is still who its tracer is: the kernel asks at the program's start whether that one may
+        // trace it.
+        require(ptrace(PTRACE_TRACEME, 0, nullptr, nullptr) == 0, "ptrace");
+        if (beforeExec) beforeExec();
+      }) {
+  constexpr int kCallStop = SIGTRAP | 0x80;
+  int status = 0;
+  const auto isStopped = [&] { return reap(status, 0) && WIFSTOPPED(status); };
+  bool isSet = isStopped() && ptrace(PTRACE_SETOPTIONS, child_, nullptr, PTRACE_O_TRACESYSGOOD) == 0;
+  for (bool isInside = false; isSet;) {
+    const int signal = WSTOPSIG(status);
+    if (signal == kCallStop) {
+      __ptrace_syscall_info call{};
+      require(ptrace(PTRACE_GET_SYSCALL_INFO, child_, sizeof call, &call) > 0, "ptrace");
+      if (call.op == PTRACE_SYSCALL_INFO_EXIT && isInside) break;
+      isInside =
+          call.op == PTRACE_SYSCALL_INFO_ENTRY && call.entry.nr == static_cast<std::uint64_t>(systemCall);
+    }
+    const int passedOn = signal == kCallStop || signal == SIGTRAP ? 0 : signal;
+    require(ptrace(PTRACE_SYSCALL, child_, nullptr, passedOn) == 0, "ptrace");
+    isSet = isStopped();
+  }
+  if (!isSet) {
+    child_ = -1;
+    throw std::runtime_error("the program ended before it could be stopped");
+  }
+  require(ptrace(PTRACE_DETACH, child_, nullptr, SIGSTOP) == 0, "ptrace");
+  require(reap(status, WUNTRACED) && WIFSTOPPED(status), "waitpid");
+}
+
+ProcessResult RunningProcess::wait() {
   ProcessResult result;
-  while (output.readEnd >= 0 || error.readEnd >= 0) {
-    std::array<pollfd, 2> streams{{{output.readEnd, POLLIN, 0}, {error.readEnd, POLLIN, 0}}};
+  while (output_ >= 0 || error_ >= 0) {
+    std::array<pollfd, 2> streams{{{output_, POLLIN, 0}, {error_, POLLIN, 0}}};
     if (poll(streams.data(), streams.size(), -1) < 0) continue;
-    if (streams[0].revents != 0) drain(output.readEnd, result.standardOutput);
-    if (streams[1].revents != 0) drain(error.readEnd, result.standardError);
+    if (streams[0].revents != 0) drain(output_, result.standardOutput);
+    if (streams[1].revents != 0) drain(error_, result.standardError);
   }
   int status = 0;
-  while (waitpid(child, &status, 0) < 0 && errno == EINTR) {
-  }
+  reap(status, 0);
+  child_ = -1;
   if (WIFEXITED(status)) result.exitStatus = WEXITSTATUS(status);
   if (WIFSIGNALED(status)) result.signal = WTERMSIG(status);
   return result;
+}
+
+ProcessResult runProcess(const std::vector<std::string>& arguments, const std::function<void()>& beforeExec,
+                         const std::string& program) {
+  return RunningProcess(arguments, beforeExec, program).wait();
 }
 
 std::string tracingRefusal() {

@@ -1,149 +1,26 @@
 // The mount-point command as its callers meet it: the built program, run in a private root on a real
-// /Volumes. The suite runs as root and as an ordinary user; what one of them cannot do is skipped.
+// /Volumes.
 
-#include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/mount.h>
 #include <sys/stat.h>
-#include <sys/wait.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <array>
-#include <csignal>
-#include <cstring>
-#include <exception>
 #include <filesystem>
 #include <fstream>
-#include <iostream>
-#include <regex>
 #include <sstream>
-#include <system_error>
 
-#include "PrivateRoot.h"
-#include "Process.h"
+#include "MountPointTest.h"
 
 namespace {
 
 namespace fs = std::filesystem;
 using testing::IsEmpty;
 
-// What the compiler added to the command under test: nothing, or the name of a sanitizer or "coverage".
-constexpr std::string_view kInstrumentation = INSTRUMENTATION;
-
 using PrivateRoot::kOrdinaryGroup;
-using PrivateRoot::kOrdinaryUser;
-
-// The command under test: a copy in the private root, where an ordinary user may run it whoever built it.
-constexpr const char* kCommand = "/mount-point";
-// Where a trace of it goes.
-constexpr const char* kTrace = "/trace";
-
-// Why no private root could be made; empty when there is one.
-std::string refusal;
-// Whether the suite runs as the machine's root, with all identifiers at hand, and not as the root of
-// a user namespace in which only one is mapped.
-bool isMachineRoot = false;
-
-void require(bool succeeded) {
-  if (!succeeded) throw std::system_error(errno, std::generic_category());
-}
-
-class MountPointTest : public testing::Test {
- protected:
-  void SetUp() override {
-    if (!PrivateRoot::entered()) GTEST_SKIP() << refusal;
-    PrivateRoot::removeVolumes();
-    PrivateRoot::mountVolumes();
-  }
-
-  static ProcessResult run(std::vector<std::string> arguments, const std::function<void()>& beforeExec = {}) {
-    arguments.insert(arguments.begin(), kCommand);
-    return runProcess(arguments, beforeExec);
-  }
-
-  // Runs the command with the system calls of `calls` (comma-separated) failing with `error`. strace says
-  // more of `error`, as in "EINTR:when=1".
-  static ProcessResult runInjected(const std::string& calls, const std::string& error,
-                                   std::vector<std::string> arguments,
-                                   const std::function<void()>& beforeExec = {}) {
-    std::vector<std::string> whole = {"strace",
-                                      "-f",
-                                      "-qq",
-                                      "-o",
-                                      "/dev/null",
-                                      "-e",
-                                      "trace=" + calls,
-                                      "-e",
-                                      "inject=" + calls + ":error=" + error,
-                                      kCommand};
-    whole.insert(whole.end(), arguments.begin(), arguments.end());
-    return runProcess(whole, [&] {
-      leaveLeaksAlone();
-      if (beforeExec) beforeExec();
-    });
-  }
-
-  // The leak checker of an instrumented build cannot work below a tracer.
-  static void leaveLeaksAlone() { setenv("ASAN_OPTIONS", "detect_leaks=0", 1); }
-
-  // What the command, once it has started, asks the system for, a line each as strace writes it.
-  static std::vector<std::string> systemCalls(const std::vector<std::string>& arguments) {
-    std::vector<std::string> whole = {"strace", "-f", "-qq", "-s", "200", "-o", kTrace, kCommand};
-    whole.insert(whole.end(), arguments.begin(), arguments.end());
-    runProcess(whole, leaveLeaksAlone);
-    std::ifstream file(kTrace);
-    std::vector<std::string> calls;
-    for (std::string line; std::getline(file, line);) {
-      line.erase(0, line.find_first_not_of("0123456789 "));
-      // The C library's start ends with making the relocations read-only, that of the libraries with asking
-      // which thread this is.
-      if (line.starts_with("mprotect(") || line.starts_with("gettid(") || line.starts_with("getpid(")) {
-        calls.clear();
-      } else if (line.find('(') != std::string::npos) {
-        calls.push_back(std::regex_replace(line, std::regex(R"( +=)"), " ="));
-      }
-    }
-    return calls;
-  }
-
-  // Runs the command with none of root's capabilities.
-  static ProcessResult runPowerless(std::vector<std::string> arguments) {
-    std::vector<std::string> whole = {"setpriv", "--bounding-set", "-all", "--inh-caps", "-all", kCommand};
-    whole.insert(whole.end(), arguments.begin(), arguments.end());
-    return runProcess(whole);
-  }
-
-  static void expectResult(const ProcessResult& result, int exitStatus, const std::string& standardError,
-                           const std::string& standardOutput = "") {
-    EXPECT_EQ(result.signal, 0);
-    EXPECT_EQ(result.exitStatus, exitStatus);
-    EXPECT_EQ(result.standardError, standardError);
-    EXPECT_EQ(result.standardOutput, standardOutput);
-  }
-
-  static void expectSuccess(const ProcessResult& result) { expectResult(result, 0, ""); }
-
-  static void makeFile(const fs::path& path) {
-    const std::ofstream file(path);
-    EXPECT_TRUE(file.is_open()) << path;
-  }
-
-  static struct stat statusOf(const fs::path& path) {
-    struct stat status{};
-    EXPECT_EQ(lstat(path.c_str(), &status), 0) << path << ": " << std::strerror(errno);
-    return status;
-  }
-
-  static std::vector<std::string> volumes() {
-    std::vector<std::string> names;
-    for (const fs::directory_entry& entry : fs::directory_iterator("/Volumes")) {
-      names.push_back(entry.path().filename());
-    }
-    return names;
-  }
-};
 
 // ---- Arguments ----
 
@@ -206,7 +83,7 @@ TEST_F(MountPointTest, MakesADirectoryThatOnlyItsOwnerMayUse) {
 }
 
 TEST_F(MountPointTest, HandsTheDirectoryOverWhereItsGroupWouldBeInherited) {
-  if (!isMachineRoot) GTEST_SKIP() << "another group than one's own needs root: only one is mapped here";
+  if (!isMachineRoot()) GTEST_SKIP() << "another group than one's own needs root: only one is mapped here";
   ASSERT_EQ(chmod("/Volumes", 02755), 0);
   ASSERT_EQ(chown("/Volumes", 0, kOrdinaryGroup), 0);
   expectSuccess(run({"a"}));
@@ -331,72 +208,46 @@ TEST_F(MountPointTest, LeavesTheDirectoryWhereItCouldNotBeHandedOver) {
   }
 }
 
-// ---- Raised privileges ----
-
-TEST_F(MountPointTest, HandsTheDirectoryToTheRealUserAndGroup) {
-  if (!isMachineRoot)
-    GTEST_SKIP() << "a real user other than the effective one needs root: only one is mapped here";
-  expectSuccess(runProcess({"setpriv", "--ruid", std::to_string(kOrdinaryUser), "--euid", "0", "--rgid",
-                            std::to_string(kOrdinaryGroup), "--egid", "0", "--clear-groups", kCommand, "a"}));
-  EXPECT_EQ(statusOf("/Volumes/a").st_uid, kOrdinaryUser);
-  EXPECT_EQ(statusOf("/Volumes/a").st_gid, kOrdinaryGroup);
-  EXPECT_EQ(statusOf("/Volumes/a").st_mode & 07777U, 0700U);
-}
-
-TEST_F(MountPointTest, WorksForAnOrdinaryUserWhenInstalledSetUserIdentifier) {
-  if (!isMachineRoot) GTEST_SKIP() << "a program owned by another user needs root: only one is mapped here";
-  ASSERT_EQ(chmod(kCommand, 04755), 0);
-  const auto runAsOrdinaryUser = [&](std::vector<std::string> arguments) {
-    std::vector<std::string> whole = {
-        "setpriv",        "--reuid", std::to_string(kOrdinaryUser), "--regid", std::to_string(kOrdinaryGroup),
-        "--clear-groups", kCommand};
-    whole.insert(whole.end(), arguments.begin(), arguments.end());
-    return runProcess(whole);
-  };
-  expectSuccess(runAsOrdinaryUser({"a"}));
-  EXPECT_EQ(statusOf("/Volumes/a").st_uid, kOrdinaryUser);
-  EXPECT_EQ(statusOf("/Volumes/a").st_gid, kOrdinaryGroup);
-  expectSuccess(runAsOrdinaryUser({"a", "--remove"}));
-  EXPECT_THAT(volumes(), IsEmpty());
-
-  // As the manual asks of whoever installs it so: an entry of root's keeps /Volumes in its place.
-  PrivateRoot::removeVolumes();
-  fs::create_directories("/Volumes/.keep");
-  expectResult(runAsOrdinaryUser({"", "--remove"}), 39, "Failed to remove [/Volumes/], errno: 39\n");
-  expectResult(runAsOrdinaryUser({""}), 17, "Failed to create [/Volumes/], errno: 17\n");
-  ASSERT_EQ(chmod(kCommand, 0755), 0);
-}
-
-TEST_F(MountPointTest, FailsToHandTheDirectoryOverWithoutTheRight) {
-  if (!isMachineRoot)
-    GTEST_SKIP() << "a real user other than the effective one needs root: only one is mapped here";
-  expectResult(runProcess({"setpriv", "--ruid", std::to_string(kOrdinaryUser), "--euid", "0",
-                           "--bounding-set", "-chown", "--inh-caps", "-chown", kCommand, "a"}),
-               1, "Failed to chown [/Volumes/a], errno: 1\n");
-  EXPECT_EQ(statusOf("/Volumes/a").st_uid, 0U);
-}
-
 // ---- What it asks of the system, and nothing else ----
 
-// Expects the calls that `arguments` lead to, in their order; the identifiers may be asked for in any.
-void expectSystemCalls(std::vector<std::string> calls, const std::vector<std::string>& expected) {
-  const auto identifiers = std::ranges::find_if(calls, [](const std::string& call) {
-    return call.starts_with("getuid") || call.starts_with("getgid");
-  });
-  if (calls.end() - identifiers >= 2) std::sort(identifiers, identifiers + 2);
-  EXPECT_EQ(calls, expected);
+// What taking on the caller's identity asks, whatever it is about to do.
+const std::vector<std::string> kIdentity = {"capget",   "getgid",   "getuid",   "setfsgid",
+                                            "setfsuid", "setfsgid", "setfsuid", "capset"};
+
+// The calls that `arguments` lead to, in their order, once the signal of a limit on the size of files is
+// ignored and, where `asCaller` is, the identity is taken on. Of the latter the names stand in `kIdentity`.
+std::vector<std::string> withoutPreparation(std::vector<std::string> calls, bool asCaller) {
+  std::vector<std::string> expected = {"rt_sigaction"};
+  if (asCaller) expected.insert(expected.end(), kIdentity.begin(), kIdentity.end());
+  std::vector<std::string> names;
+  for (std::size_t index = 0; index < std::min(expected.size(), calls.size()); ++index) {
+    names.push_back(calls[index].substr(0, calls[index].find('(')));
+  }
+  EXPECT_EQ(names, expected);
+  calls.erase(calls.begin(), calls.begin() + static_cast<std::ptrdiff_t>(names.size()));
+  return calls;
 }
 
 TEST_F(MountPointTest, AsksTheSystemForItsWorkAndNothingElse) {
   if (!kInstrumentation.empty()) GTEST_SKIP() << "built with instrumentation, which asks for more";
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
-  expectSystemCalls(systemCalls({"a"}), {"mkdir(\"/Volumes/a\", 0700) = 0", "getgid() = 0", "getuid() = 0",
-                                         "chown(\"/Volumes/a\", 0, 0) = 0", "exit_group(0) = ?"});
-  expectSystemCalls(systemCalls({"a"}), {"mkdir(\"/Volumes/a\", 0700) = -1 EEXIST (File exists)",
-                                         "write(2, \"Failed to create [/Volumes/a], errno: 17\\n\", 41) = 41",
-                                         "exit_group(17) = ?"});
-  expectSystemCalls(systemCalls({"a", "--remove"}), {"rmdir(\"/Volumes/a\") = 0", "exit_group(0) = ?"});
-  const std::vector<std::string> missing = systemCalls({"a", "--remove"});
+  const auto callsOf = [](const std::vector<std::string>& arguments) {
+    return withoutPreparation(systemCalls(arguments), true);
+  };
+  using Calls = std::vector<std::string>;
+  // The identifiers may be asked for in any order.
+  Calls making = callsOf({"a"});
+  ASSERT_EQ(making.size(), 5U) << testing::PrintToString(making);
+  std::sort(making.begin() + 1, making.begin() + 3);
+  EXPECT_EQ(making, (Calls{"mkdir(\"/Volumes/a\", 0700) = 0", "getgid() = 0", "getuid() = 0",
+                           "chown(\"/Volumes/a\", 0, 0) = 0", "exit_group(0) = ?"}));
+  EXPECT_EQ(callsOf({"a"}), (Calls{"mkdir(\"/Volumes/a\", 0700) = -1 EEXIST (File exists)",
+                                   "write(2, \"Failed to create [/Volumes/a], errno: 17\\n\", 41) = 41",
+                                   "exit_group(17) = ?"}));
+  EXPECT_EQ(callsOf({"a", "--remove"}), (Calls{"rmdir(\"/Volumes/a\") = 0", "exit_group(0) = ?"}));
+  EXPECT_EQ(withoutPreparation(systemCalls({}), false),
+            (Calls{"write(2, \"No subdirectory specified.\\n\", 27) = 27", "exit_group(22) = ?"}));
+  const std::vector<std::string> missing = callsOf({"a", "--remove"});
   ASSERT_EQ(missing.size(), 4U) << testing::PrintToString(missing);
   EXPECT_EQ(missing[0], "rmdir(\"/Volumes/a\") = -1 ENOENT (No such file or directory)");
   // Standard output is buffered; the C library looks at what it is first.
@@ -478,125 +329,6 @@ TEST_F(MountPointTest, ReportsWhateverTheSystemSaysToRemovingADirectory) {
   EXPECT_EQ(volumes(), std::vector<std::string>{"a"});
 }
 
-// ---- Standard streams ----
-
-void replaceStream(int stream, const char* path) {
-  const int file = open(path, O_WRONLY);
-  require(file >= 0);
-  require(dup2(file, stream) == stream);
-}
-
-TEST_F(MountPointTest, WorksWithoutStandardStreams) {
-  const auto closeAll = [] {
-    for (const int stream : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO}) close(stream);
-  };
-  expectSuccess(run({"a"}, closeAll));
-  EXPECT_EQ(volumes(), std::vector<std::string>{"a"});
-  expectSuccess(run({"a", "--remove"}, closeAll));
-  expectSuccess(run({"a", "--remove"}, closeAll));
-  expectResult(run({}, closeAll), 22, "");
-  expectResult(run({"a/b"}, closeAll), 22, "");
-}
-
-// The status is errno as it stands after the message was written: where the message itself fails, the
-// status tells that failure and not the one of the directory.
-TEST_F(MountPointTest, TellsTheFailureOfItsMessageWhereThatFails) {
-  expectSuccess(run({"a"}));
-  expectResult(run({"a"}, [] { close(STDERR_FILENO); }), EBADF, "");
-  expectResult(run({"a"}, [] { replaceStream(STDERR_FILENO, "/dev/full"); }), ENOSPC, "");
-  expectResult(run({"a", "--remove", "x"}, [] { replaceStream(STDERR_FILENO, "/dev/full"); }), ENOSPC, "");
-  fs::create_directory("/Volumes/a/b");
-  expectResult(run({"a", "--remove"}, [] { replaceStream(STDERR_FILENO, "/dev/full"); }), ENOSPC, "");
-}
-
-TEST_F(MountPointTest, TellsTheFailureOfItsMessageWhereThatFailsAfterChown) {
-  if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
-  expectResult(runInjected("chown", "EPERM", {"a"}, [] { replaceStream(STDERR_FILENO, "/dev/full"); }),
-               ENOSPC, "");
-  expectResult(runInjected("chown", "EPERM", {"b"}, [] { close(STDERR_FILENO); }), EBADF, "");
-}
-
-// A pipe that holds all it can.
-struct FullPipe {
-  std::array<int, 2> ends{};
-  std::size_t size = 0;
-
-  FullPipe() {
-    require(pipe2(ends.data(), O_CLOEXEC | O_NONBLOCK) == 0);
-    const std::string block(4096, '.');
-    for (ssize_t count = 1; count > 0;) {
-      count = write(ends[1], block.data(), block.size());
-      if (count > 0) size += static_cast<std::size_t>(count);
-    }
-    require(errno == EAGAIN);
-  }
-};
-
-TEST_F(MountPointTest, TakesAMissingDirectoryForRemovedEvenWhereTheNoticeIsLost) {
-  expectSuccess(run({"a", "--remove"}, [] { close(STDOUT_FILENO); }));
-  expectSuccess(run({"a", "--remove"}, [] { replaceStream(STDOUT_FILENO, "/dev/full"); }));
-  const FullPipe pipe;
-  expectSuccess(run({"a", "--remove"}, [&] { dup2(pipe.ends[1], STDOUT_FILENO); }));
-}
-
-TEST_F(MountPointTest, DoesItsWorkBeforeAReaderThatIsGoneEndsIt) {
-  const auto withoutReader = [](int stream, bool ignored) {
-    return [stream, ignored] {
-      std::array<int, 2> ends{};
-      require(pipe(ends.data()) == 0 && close(ends[0]) == 0 && dup2(ends[1], stream) == stream);
-      close(ends[1]);
-      require(std::signal(SIGPIPE, ignored ? SIG_IGN : SIG_DFL) != SIG_ERR);
-    };
-  };
-  expectSuccess(run({"a"}, withoutReader(STDERR_FILENO, false)));
-  EXPECT_EQ(run({"a"}, withoutReader(STDERR_FILENO, false)).signal, SIGPIPE);
-  expectResult(run({"a"}, withoutReader(STDERR_FILENO, true)), EPIPE, "");
-  EXPECT_EQ(run({"b", "--remove"}, withoutReader(STDOUT_FILENO, false)).signal, SIGPIPE);
-  expectSuccess(run({"b", "--remove"}, withoutReader(STDOUT_FILENO, true)));
-}
-
-TEST_F(MountPointTest, DoesNotWaitForAFullPipeThatDoesNotBlock) {
-  FullPipe pipe;
-  expectSuccess(run({"a"}));
-  expectResult(run({"a"}, [&] { dup2(pipe.ends[1], STDERR_FILENO); }), EAGAIN, "");
-}
-
-TEST_F(MountPointTest, WaitsForAFullPipeWithOneThreadAndLosesNothing) {
-  FullPipe pipe;
-  ASSERT_EQ(fcntl(pipe.ends[1], F_SETFL, 0), 0);
-  ASSERT_EQ(fcntl(pipe.ends[0], F_SETFL, 0), 0);
-  expectSuccess(run({"a"}));
-  const pid_t child = fork();
-  if (child == 0) {
-    dup2(pipe.ends[1], STDERR_FILENO);
-    execl(kCommand, kCommand, "a", nullptr);
-    _exit(127);
-  }
-  close(pipe.ends[1]);
-
-  // It sleeps in its write: system call 1 with descriptor 2 as its first argument.
-  const std::string process = "/proc/" + std::to_string(child);
-  int status = 0;
-  for (std::string call; !call.starts_with("1 0x2 ");) {
-    ASSERT_EQ(waitpid(child, &status, WNOHANG), 0) << "it ended without waiting";
-    std::ifstream file(process + "/syscall");
-    if (!file.is_open()) break;  // kernels may be built without it; the thread count stands all the same
-    std::getline(file, call);
-    usleep(1000);
-  }
-  const auto threads = std::distance(fs::directory_iterator(process + "/task"), fs::directory_iterator());
-  EXPECT_TRUE(threads == 1 || kInstrumentation == "thread") << threads;  // which may start one of its own
-
-  std::string text;
-  std::array<char, 65536> buffer{};
-  for (ssize_t count; (count = read(pipe.ends[0], buffer.data(), buffer.size())) > 0;) {
-    text.append(buffer.data(), static_cast<std::size_t>(count));
-  }
-  EXPECT_EQ(text.substr(pipe.size), "Failed to create [/Volumes/a], errno: 17\n");
-  ASSERT_EQ(waitpid(child, &status, 0), child);
-  EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 17);
-}
-
 // Lines of commands that run at once do not mix: each line of up to 8 KiB is handed to the kernel in one
 // piece.
 TEST_F(MountPointTest, WritesEachLineInOnePiece) {
@@ -621,32 +353,4 @@ TEST_F(MountPointTest, DoesWhatTheReadmeShows) {
   EXPECT_THAT(readme.str(), testing::HasSubstr("```\n" + result.standardOutput + "```\n"));
 }
 
-// Enters a private root, as an ordinary user if asked, and puts the command there. Throws where the
-// machine does not allow it.
-void enterPrivateRoot(bool asOrdinaryUser) {
-  if (asOrdinaryUser && kInstrumentation == "coverage") {
-    throw std::runtime_error("a coverage build writes its counts where only its builder may");
-  }
-  std::ifstream built(MOUNT_POINT, std::ios::binary);
-  if (asOrdinaryUser) PrivateRoot::becomeOrdinaryUser();
-  isMachineRoot = geteuid() == 0;
-  PrivateRoot::enter();
-  std::ofstream copy(kCommand, std::ios::binary);
-  copy << built.rdbuf() << std::flush;
-  require(copy.good() && chmod(kCommand, 0755) == 0);
-}
-
 }  // namespace
-
-int main(int argumentCount, char** arguments) {
-  testing::InitGoogleTest(&argumentCount, arguments);
-  if (testing::GTEST_FLAG(list_tests)) return RUN_ALL_TESTS();
-
-  const bool asOrdinaryUser = argumentCount > 1 && std::string(arguments[1]) == "--as-ordinary-user";
-  try {
-    enterPrivateRoot(asOrdinaryUser);
-  } catch (const std::exception& problem) {
-    refusal = problem.what();
-  }
-  return RUN_ALL_TESTS();
-}

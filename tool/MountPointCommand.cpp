@@ -1,17 +1,14 @@
 #include "MountPointCommand.h"
 
-#include <sys/stat.h>
-#include <unistd.h>
-
 #include <cerrno>
+#include <csignal>
 #include <cstdio>
 #include <string>
 #include <string_view>
 
-namespace {
+#include "tool/CallersDirectory.h"
 
-// Only the caller may look into, or put anything into, what will be covered by a volume.
-constexpr mode_t kDirectoryMode = S_IRWXU;
+namespace {
 
 // Writes "Failed to `action` [`path`], errno: `errno`" and gives the exit status: `errno` as it is
 // after the message.
@@ -22,17 +19,19 @@ int reportFailure(const char* action, const std::string& path) {
 }
 
 int createDirectory(const std::string& path) {
-  if (mkdir(path.c_str(), kDirectoryMode) != 0) {
-    return reportFailure("create", path);
+  switch (makeCallersDirectory(path)) {
+    case Making::done:
+      return 0;
+    case Making::notMade:
+      return reportFailure("create", path);
+    case Making::notHandedOver:
+      break;
   }
-  if (chown(path.c_str(), getuid(), getgid()) != 0) {
-    return reportFailure("chown", path);
-  }
-  return 0;
+  return reportFailure("chown", path);
 }
 
 int removeDirectory(const std::string& path) {
-  if (rmdir(path.c_str()) == 0) {
+  if (removeCallersDirectory(path)) {
     return 0;
   }
   if (errno != ENOENT) {
@@ -46,20 +45,24 @@ int removeDirectory(const std::string& path) {
 }  // namespace
 
 int runMountPointCommand(int argumentCount, const char* const* arguments) {
+  // A message that the caller's limit on the size of files cuts short shows in the status, as EFBIG. By
+  // default the signal would end the process and leave no status at all.
+  std::signal(SIGXFSZ, SIG_IGN);
+
   if (argumentCount <= 1) {
     std::fprintf(stderr, "No subdirectory specified.\n");
     std::fflush(stderr);
     return EINVAL;
   }
 
-  const std::string subdirectory = arguments[1];
-  if (subdirectory.find('/') != std::string::npos) {
+  const char* const subdirectory = arguments[1];
+  if (std::string_view(subdirectory).find('/') != std::string_view::npos) {
     // Unlike every other message this one ends without a newline; callers compare it as it stands.
-    std::fprintf(stderr, "The specified subdirectory is not valid: %s", subdirectory.c_str());
+    std::fprintf(stderr, "The specified subdirectory is not valid: %s", subdirectory);
     return EINVAL;
   }
 
   const bool remove = argumentCount == 3 && std::string_view(arguments[2]) == "--remove";
-  const std::string path = "/Volumes/" + subdirectory;
+  const std::string path = std::string("/Volumes/") + subdirectory;
   return remove ? removeDirectory(path) : createDirectory(path);
 }

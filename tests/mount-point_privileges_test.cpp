@@ -1,0 +1,452 @@
+// The mount-point command with more rights than its caller has, as it is installed set-user-ID root; and what
+// a hostile caller makes of it. docs/security.md names these cases.
+
+#include <fcntl.h>
+#include <gmock/gmock.h>
+#include <grp.h>
+#include <gtest/gtest.h>
+#include <linux/capability.h>
+#include <sys/mount.h>
+#include <sys/ptrace.h>
+#include <sys/stat.h>
+#include <sys/syscall.h>
+#include <sys/uio.h>
+#include <sys/wait.h>
+#include <sys/xattr.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <csignal>
+#include <cstdint>
+#include <cstring>
+#include <filesystem>
+#include <fstream>
+#include <sstream>
+
+#include "MountPointTest.h"
+
+namespace {
+
+namespace fs = std::filesystem;
+
+struct User {
+  uid_t user;
+  gid_t group;
+};
+constexpr User kCaller = {PrivateRoot::kOrdinaryUser, PrivateRoot::kOrdinaryGroup};
+constexpr User kOther = {1002, 1003};
+
+// The command set-user-ID root, and /Volumes as the manual asks for it.
+class MountPointPrivilegesTest : public MountPointTest {
+ protected:
+  // The command without the bit, for whoever may start it.
+  static constexpr const char* kPlainCommand = "/mount-point.plain";
+
+  void SetUp() override {
+    MountPointTest::SetUp();
+    if (IsSkipped()) return;
+    if (!isMachineRoot()) GTEST_SKIP() << "more than one user needs root: only one is mapped here";
+    fs::copy_file(kCommand, kPlainCommand, fs::copy_options::overwrite_existing);
+    ASSERT_EQ(chmod(kCommand, 04755), 0);
+    makeFile("/Volumes/.keep");
+  }
+  void TearDown() override { chmod(kCommand, 0755); }
+
+  static std::function<void()> as(User user) {
+    return [user] {
+      leaveLeaksAlone();
+      require(setgroups(0, nullptr) == 0 && setresgid(user.group, user.group, user.group) == 0 &&
+              setresuid(user.user, user.user, user.user) == 0);
+    };
+  }
+  static ProcessResult runAs(User user, std::vector<std::string> arguments) {
+    return run(std::move(arguments), as(user));
+  }
+
+  // Root's effective identity and `caller`'s real one, without the bit.
+  static std::function<void()> onBehalfOf(User caller) {
+    return [caller] {
+      leaveLeaksAlone();
+      require(chmod(kCommand, 0755) == 0 && setgroups(0, nullptr) == 0 &&
+              setresgid(caller.group, 0, 0) == 0 && setresuid(caller.user, 0, 0) == 0);
+    };
+  }
+  // The same without the right `capability`, as setpriv names it.
+  static ProcessResult runWithout(const std::string& capability, const std::vector<std::string>& arguments) {
+    std::vector<std::string> whole = {"setpriv",    "--bounding-set", "-" + capability,
+                                      "--inh-caps", "-" + capability, kCommand};
+    whole.insert(whole.end(), arguments.begin(), arguments.end());
+    return runProcess(whole, onBehalfOf(kCaller));
+  }
+
+  static void expectOwner(const fs::path& path, User owner) {
+    EXPECT_EQ(statusOf(path).st_uid, owner.user) << path;
+    EXPECT_EQ(statusOf(path).st_gid, owner.group) << path;
+  }
+
+  // What `action` returns in a process of `user`'s: 0 to 255.
+  static int inProcessOf(User user, const std::function<int()>& action) {
+    const pid_t child = fork();
+    if (child == 0) {
+      as(user)();
+      _exit(action());
+    }
+    int status = 0;
+    EXPECT_EQ(waitpid(child, &status, 0), child);
+    EXPECT_TRUE(WIFEXITED(status));
+    return WEXITSTATUS(status);
+  }
+
+  // The number with which `user` fails to open `path`; 0 where that works.
+  static int openingFailure(User user, const std::string& path) {
+    return inProcessOf(user, [&] { return open(path.c_str(), O_RDONLY) >= 0 ? 0 : errno; });
+  }
+};
+
+// ---- Ordinary use ----
+
+TEST_F(MountPointPrivilegesTest, HandsTheDirectoryToTheRealUserAndGroup) {
+  expectSuccess(run({"a"}, onBehalfOf(kCaller)));
+  expectOwner("/Volumes/a", kCaller);
+  EXPECT_EQ(statusOf("/Volumes/a").st_mode & 07777U, 0700U);
+}
+
+TEST_F(MountPointPrivilegesTest, WorksForAnOrdinaryUserWhenInstalledSetUserIdentifier) {
+  expectSuccess(runAs(kCaller, {"a"}));
+  expectOwner("/Volumes/a", kCaller);
+  EXPECT_EQ(statusOf("/Volumes/a").st_mode & 07777U, 0700U);
+  expectResult(runAs(kCaller, {"a"}), 17, "Failed to create [/Volumes/a], errno: 17\n");
+  expectSuccess(runAs(kCaller, {"a", "--remove"}));
+  expectResult(runAs(kCaller, {"a", "--remove"}), 0, "", "Path already does not exist: [/Volumes/a]\n");
+  expectResult(runAs(kCaller, {".keep", "--remove"}), 20, "Failed to remove [/Volumes/.keep], errno: 20\n");
+  EXPECT_EQ(volumes(), std::vector<std::string>{".keep"});
+}
+
+TEST_F(MountPointPrivilegesTest, WorksWhereTheGroupIsRaisedToo) {
+  ASSERT_EQ(chmod(kCommand, 06755), 0);
+  expectSuccess(runAs(kCaller, {"a"}));
+  expectOwner("/Volumes/a", kCaller);
+  expectSuccess(runAs(kCaller, {"a", "--remove"}));
+}
+
+TEST_F(MountPointPrivilegesTest, HandsTheDirectoryOverWhereItsGroupWouldBeInherited) {
+  ASSERT_EQ(chown("/Volumes", 0, kOther.group), 0);
+  ASSERT_EQ(chmod("/Volumes", 02755), 0);
+  expectSuccess(runAs(kCaller, {"a"}));
+  expectOwner("/Volumes/a", kCaller);
+  EXPECT_EQ(statusOf("/Volumes/a").st_mode & 07777U, 02700U);
+}
+
+TEST_F(MountPointPrivilegesTest, WorksWhereOnlyRootMayLookIntoVolumes) {
+  ASSERT_EQ(chmod("/Volumes", 0700), 0);
+  expectSuccess(runAs(kCaller, {"a"}));
+  expectOwner("/Volumes/a", kCaller);
+  expectSuccess(runAs(kCaller, {"a", "--remove"}));
+}
+
+TEST_F(MountPointPrivilegesTest, WorksWhereVolumesIsALinkOfRoots) {
+  PrivateRoot::removeVolumes();
+  fs::create_directory("/elsewhere");
+  fs::create_directory_symlink("/elsewhere", "/Volumes");
+  expectSuccess(runAs(kCaller, {"a"}));
+  expectOwner("/elsewhere/a", kCaller);
+  expectSuccess(runAs(kCaller, {"a", "--remove"}));
+  expectResult(runAs(kCaller, {"", "--remove"}), 20, "Failed to remove [/Volumes/], errno: 20\n");
+  expectResult(runAs(kCaller, {""}), 17, "Failed to create [/Volumes/], errno: 17\n");
+  EXPECT_TRUE(fs::remove("/Volumes") && fs::remove("/elsewhere"));
+}
+
+TEST_F(MountPointPrivilegesTest, NarrowsTheModeByTheCallersUmask) {
+  expectSuccess(run({"a"}, [] {
+    umask(0777);
+    as(kCaller)();
+  }));
+  expectOwner("/Volumes/a", kCaller);
+  EXPECT_EQ(statusOf("/Volumes/a").st_mode & 07777U, 0U);
+  expectSuccess(runAs(kCaller, {"a", "--remove"}));
+}
+
+// The C library fills what its caller has closed with streams that take nothing, lest another file stand for
+// one.
+TEST_F(MountPointPrivilegesTest, TellsTheFailureOfItsMessageWhereItsStreamsAreClosed) {
+  const auto closed = [] {
+    as(kCaller)();
+    for (const int stream : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO}) close(stream);
+  };
+  expectSuccess(run({"a"}, closed));
+  expectResult(run({"a"}, closed), EBADF, "");
+  expectSuccess(run({"a", "--remove"}, closed));
+  expectSuccess(run({"a", "--remove"}, closed));
+}
+
+TEST_F(MountPointPrivilegesTest, RemovesAnothersEmptyDirectory) {
+  expectSuccess(runAs(kOther, {"a"}));
+  expectSuccess(runAs(kCaller, {"a", "--remove"}));
+}
+
+TEST_F(MountPointPrivilegesTest, RemovesOnlyTheCallersOwnDirectoriesWhereVolumesIsSticky) {
+  ASSERT_EQ(chmod("/Volumes", 01755), 0);
+  expectSuccess(runAs(kOther, {"a"}));
+  expectResult(runAs(kCaller, {"a", "--remove"}), 1, "Failed to remove [/Volumes/a], errno: 1\n");
+  expectOwner("/Volumes/a", kOther);
+  expectSuccess(runAs(kOther, {"a", "--remove"}));
+  expectSuccess(runAs(kCaller, {"a"}));
+  expectSuccess(run({"a", "--remove"}));
+}
+
+// ---- The caller's identity ----
+
+// The line of a process's /proc/…/status that begins with `name`, without tabs.
+std::string statusLine(pid_t process, const std::string& name) {
+  std::ifstream file("/proc/" + std::to_string(process) + "/status");
+  for (std::string line; std::getline(file, line);) {
+    if (!line.starts_with(name + ":")) continue;
+    std::ranges::replace(line, '\t', ' ');
+    return line.substr(name.size() + 2);
+  }
+  return "";
+}
+
+std::string hexadecimal(unsigned long number) {
+  std::ostringstream text;
+  text.fill('0');
+  text.width(16);
+  text << std::hex << number;
+  return text.str();
+}
+
+class MountPointStoppedTest : public MountPointPrivilegesTest {
+ protected:
+  void SetUp() override {
+    MountPointPrivilegesTest::SetUp();
+    if (IsSkipped()) return;
+    if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
+  }
+};
+
+TEST_F(MountPointStoppedTest, IsItsCallerToTheFileSystemAndKeepsTheRightToWriteAnywhere) {
+  const StoppedProcess stopped(SYS_mkdir, {kCommand, "a"}, as(kCaller));
+  expectOwner("/Volumes/a", kCaller);
+  EXPECT_EQ(statusLine(stopped.identifier(), "Uid"), "1000 0 0 1000");
+  EXPECT_EQ(statusLine(stopped.identifier(), "Gid"), "1001 1001 1001 1001");
+  const std::string all = hexadecimal(1UL << CAP_DAC_OVERRIDE);
+  EXPECT_EQ(statusLine(stopped.identifier(), "CapEff"), all);
+  EXPECT_EQ(statusLine(stopped.identifier(), "CapPrm"), all);
+  EXPECT_EQ(statusLine(stopped.identifier(), "CapInh"), hexadecimal(0));
+  EXPECT_EQ(statusLine(stopped.identifier(), "CapAmb"), hexadecimal(0));
+}
+
+TEST_F(MountPointStoppedTest, IsItsCallerToTheFileSystemWhereTheGroupIsRaisedToo) {
+  ASSERT_EQ(chmod(kCommand, 06755), 0);
+  const StoppedProcess stopped(SYS_mkdir, {kCommand, "a"}, as(kCaller));
+  EXPECT_EQ(statusLine(stopped.identifier(), "Gid"), "1001 0 0 1001");
+}
+
+// So that no directory of root's is left where a limit or a signal of the caller's ends the command half-way.
+TEST_F(MountPointStoppedTest, LeavesTheCallersDirectoryWhereItIsKilled) {
+  {
+    const StoppedProcess killed(SYS_mkdir, {kCommand, "a"}, as(kCaller));
+  }
+  expectOwner("/Volumes/a", kCaller);
+}
+
+TEST_F(MountPointStoppedTest, IsItsCallerToTheFileSystemWhenItRemovesToo) {
+  expectSuccess(runAs(kCaller, {"a"}));
+  const StoppedProcess stopped(SYS_rmdir, {kCommand, "a", "--remove"}, as(kCaller));
+  EXPECT_EQ(statusLine(stopped.identifier(), "CapEff"), hexadecimal(1UL << CAP_DAC_OVERRIDE));
+}
+
+// How a process of the caller's fares that would read and change the memory of another.
+enum Access : std::uint8_t { attached = 1, readMemory = 2, openedMemory = 4, sawProgram = 8 };
+int accessTo(pid_t process) {
+  int access = 0;
+  const std::string folder = "/proc/" + std::to_string(process);
+  if (open((folder + "/mem").c_str(), O_RDWR) >= 0) access |= openedMemory;
+  std::array<char, 64> text{};
+  if (readlink((folder + "/exe").c_str(), text.data(), text.size()) > 0) access |= sawProgram;
+  // An address that nothing has: the right is looked at first.
+  iovec local{text.data(), 1};
+  iovec remote{text.data(), 1};
+  if (process_vm_readv(process, &local, 1, &remote, 1, 0) >= 0 || errno == EFAULT) access |= readMemory;
+  if (ptrace(PTRACE_SEIZE, process, nullptr, nullptr) == 0) access |= attached;
+  return access;
+}
+
+TEST_F(MountPointStoppedTest, LetsItsCallerStopItButNotTraceIt) {
+  const StoppedProcess plain(SYS_mkdir, {kPlainCommand, "a"}, as(kCaller));
+  ASSERT_EQ(inProcessOf(kCaller, [&] { return accessTo(plain.identifier()); }),
+            attached | readMemory | openedMemory | sawProgram)
+      << "the caller's own program";
+
+  const StoppedProcess stopped(SYS_mkdir, {kCommand, "a"}, as(kCaller));
+  EXPECT_EQ(inProcessOf(kCaller, [&] { return accessTo(stopped.identifier()); }), 0);
+  EXPECT_EQ(inProcessOf(kCaller, [&] { return kill(stopped.identifier(), SIGSTOP); }), 0);
+}
+
+// ---- A name that becomes another's while the command stands still ----
+
+// The attack: the caller stops the command as soon as it has made "a", removes "a" through the command, waits
+// until `another` has put something else there, and lets the command go on. `start` is how the command is
+// begun.
+class MountPointAttackTest : public MountPointStoppedTest {
+ protected:
+  static void attack(const std::function<void()>& another, const char* command = kCommand) {
+    StoppedProcess stopped(SYS_mkdir, {command, "a"}, as(kCaller));
+    expectSuccess(runAs(kCaller, {"a", "--remove"}));
+    another();
+    ASSERT_EQ(inProcessOf(kCaller, [&] { return kill(stopped.identifier(), SIGCONT); }), 0);
+    expectResult(stopped.wait(), 1, "Failed to chown [/Volumes/a], errno: 1\n");
+  }
+};
+
+TEST_F(MountPointAttackTest, DoesNotGetAnothersDirectory) {
+  attack([] {
+    expectSuccess(runAs(kOther, {"a"}));
+    makeFile("/Volumes/a/secret");
+  });
+  expectOwner("/Volumes/a", kOther);
+  EXPECT_EQ(openingFailure(kCaller, "/Volumes/a/secret"), EACCES);
+}
+
+TEST_F(MountPointAttackTest, DoesNotGetTheRootOfAMountedFileSystem) {
+  attack([] {
+    fs::create_directory("/Volumes/a");
+    ASSERT_EQ(mount("tmpfs", "/Volumes/a", "tmpfs", 0, "mode=0755"), 0);
+    makeFile("/Volumes/a/file");
+  });
+  expectOwner("/Volumes/a", {0, 0});
+  EXPECT_EQ(inProcessOf(kCaller, [] { return rename("/Volumes/a/file", "/Volumes/a/b") == 0 ? 0 : errno; }),
+            EACCES);
+}
+
+TEST_F(MountPointAttackTest, DoesNotGetWhatALinkOfRootsLeadsTo) {
+  fs::create_directory("/root-only");
+  ASSERT_EQ(chmod("/root-only", 0700), 0);
+  attack([] { fs::create_directory_symlink("/root-only", "/Volumes/a"); });
+  expectOwner("/Volumes/a", {0, 0});
+  expectOwner("/root-only", {0, 0});
+  EXPECT_EQ(openingFailure(kCaller, "/root-only"), EACCES);
+  fs::remove("/root-only");
+}
+
+TEST_F(MountPointAttackTest, DoesNotGetAnothersDirectoryByRightsThatComeWithTheFile) {
+  vfs_cap_data capabilities{};
+  capabilities.magic_etc = VFS_CAP_REVISION_2 | VFS_CAP_FLAGS_EFFECTIVE;
+  capabilities.data[0].permitted = 1U << CAP_CHOWN | 1U << CAP_DAC_OVERRIDE;
+  if (setxattr(kPlainCommand, "security.capability", &capabilities, XATTR_CAPS_SZ_2, 0) != 0) {
+    GTEST_SKIP() << "no file has capabilities here: " << std::strerror(errno);
+  }
+  attack(
+      [] {
+        expectSuccess(runAs(kOther, {"a"}));
+        makeFile("/Volumes/a/secret");
+      },
+      kPlainCommand);
+  expectOwner("/Volumes/a", kOther);
+}
+
+// Who may write in /Volumes may also make root, when it calls the command, hand something else to itself.
+TEST_F(MountPointAttackTest, DoesNotMakeRootTakeWhatIsAnothers) {
+  fs::create_directory("/others");
+  ASSERT_EQ(chown("/others", kOther.user, kOther.group), 0);
+  StoppedProcess stopped(SYS_mkdir, {kPlainCommand, "a"}, leaveLeaksAlone);
+  ASSERT_TRUE(fs::remove("/Volumes/a"));
+  fs::create_directory_symlink("/others", "/Volumes/a");
+  kill(stopped.identifier(), SIGCONT);
+  expectResult(stopped.wait(), 1, "Failed to chown [/Volumes/a], errno: 1\n");
+  expectOwner("/others", kOther);
+  fs::remove("/others");
+}
+
+// ---- /Volumes not as the manual asks for it ----
+
+TEST_F(MountPointPrivilegesTest, KeepsVolumesInItsPlaceWhereAnEntryOfRootsIsInIt) {
+  PrivateRoot::removeVolumes();
+  fs::create_directories("/Volumes/.keep");
+  makeFile("/Volumes/.keep/file");
+  expectResult(runAs(kCaller, {"", "--remove"}), 39, "Failed to remove [/Volumes/], errno: 39\n");
+  expectResult(runAs(kCaller, {""}), 17, "Failed to create [/Volumes/], errno: 17\n");
+  expectResult(runAs(kCaller, {".", "--remove"}), 22, "Failed to remove [/Volumes/.], errno: 22\n");
+  expectResult(runAs(kCaller, {"..", "--remove"}), 39, "Failed to remove [/Volumes/..], errno: 39\n");
+}
+
+// An empty /Volumes can be made its caller's own, who can then put a link in the place of what the command
+// has made. It used to hand over what the link led to.
+TEST_F(MountPointStoppedTest, GivesNothingElseAwayWhereItsCallerHasVolumes) {
+  PrivateRoot::removeVolumes();
+  fs::create_directory("/Volumes");
+  expectSuccess(runAs(kCaller, {"", "--remove"}));
+  expectSuccess(runAs(kCaller, {""}));
+  expectOwner("/Volumes", kCaller);
+  for (const std::string target : {"/etc/passwd", "/etc"}) {
+    const struct stat before = statusOf(target);
+    StoppedProcess stopped(SYS_mkdir, {kCommand, "a"}, as(kCaller));
+    ASSERT_EQ(inProcessOf(kCaller,
+                          [&] {
+                            return rmdir("/Volumes/a") == 0 && symlink(target.c_str(), "/Volumes/a") == 0 &&
+                                           kill(stopped.identifier(), SIGCONT) == 0
+                                       ? 0
+                                       : errno;
+                          }),
+              0);
+    expectResult(stopped.wait(), 1, "Failed to chown [/Volumes/a], errno: 1\n");
+    expectOwner(target, {before.st_uid, before.st_gid});
+    EXPECT_TRUE(fs::remove("/Volumes/a"));
+  }
+}
+
+// ---- Where the identity cannot be taken on ----
+
+TEST_F(MountPointPrivilegesTest, WorksAsEverWhereTheSystemRefusesAPartOfTheIdentity) {
+  if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
+  // Half an identity would show: only root may write here.
+  ASSERT_EQ(chmod("/Volumes", 0700), 0);
+  for (const std::string call : {"capget", "capset", "setfsuid", "setfsgid"}) {
+    for (const std::string error : {"EPERM", "ENOSYS"}) {
+      SCOPED_TRACE(call + ": " + error);
+      expectSuccess(runInjected(call, error, {"a"}, onBehalfOf(kCaller)));
+      expectOwner("/Volumes/a", kCaller);
+      expectSuccess(runInjected(call, error, {"a", "--remove"}, onBehalfOf(kCaller)));
+      EXPECT_FALSE(fs::exists("/Volumes/a"));
+    }
+  }
+}
+
+TEST_F(MountPointPrivilegesTest, WorksAsEverWithoutTheRightToWriteAnywhere) {
+  expectSuccess(runWithout("dac_override", {"a"}));
+  expectOwner("/Volumes/a", kCaller);
+}
+
+TEST_F(MountPointPrivilegesTest, FailsToHandTheDirectoryOverWithoutTheRight) {
+  expectResult(runWithout("chown", {"a"}), 1, "Failed to chown [/Volumes/a], errno: 1\n");
+  EXPECT_EQ(statusOf("/Volumes/a").st_uid, 0U);
+}
+
+// ---- What is root's share of a file system ----
+
+TEST_F(MountPointPrivilegesTest, GetsNoBlockThatIsReservedForRoot) {
+  const ProcessResult made =
+      runProcess({"bash", "-c",
+                  "truncate -s 4M /image && mkfs.ext4 -q -b 1024 -m 40 -O ^has_journal /image"
+                  " && mount -o loop /image /Volumes"});
+  if (made.exitStatus != 0) GTEST_SKIP() << "no image can be mounted here: " << made.standardError;
+  fs::create_directory("/Volumes/full");
+  ASSERT_EQ(chown("/Volumes/full", kCaller.user, kCaller.group), 0);
+  EXPECT_EQ(inProcessOf(kCaller,
+                        [] {
+                          const int file = open("/Volumes/full/file", O_WRONLY | O_CREAT, 0600);
+                          const std::string block(1024, '.');
+                          while (write(file, block.data(), block.size()) > 0) {
+                          }
+                          return errno;
+                        }),
+            ENOSPC);
+  expectResult(runAs(kCaller, {"a"}), 28, "Failed to create [/Volumes/a], errno: 28\n");
+  expectSuccess(run({"roots"}));
+  umount("/Volumes");
+  fs::remove("/image");
+}
+
+}  // namespace

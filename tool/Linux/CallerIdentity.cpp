@@ -1,0 +1,46 @@
+#include "tool/Linux/CallerIdentity.h"
+
+#include <linux/capability.h>
+#include <sys/fsuid.h>
+#include <sys/syscall.h>
+#include <unistd.h>
+
+#include <array>
+
+namespace {
+
+// A capability takes a bit of one of two words; both of these are in the first.
+using Capabilities = std::array<__user_cap_data_struct, _LINUX_CAPABILITY_U32S_3>;
+constexpr __u32 kOverride = 1U << CAP_DAC_OVERRIDE;
+constexpr __u32 kGiveAway = 1U << CAP_CHOWN;
+
+// SYS_capget or SYS_capset, for this thread. The C library has functions for neither.
+bool callWith(long call, Capabilities& capabilities) {
+  __user_cap_header_struct header{_LINUX_CAPABILITY_VERSION_3, 0};
+  return syscall(call, &header, capabilities.data()) == 0;
+}
+
+}  // namespace
+
+void takeOnCallersIdentity() {
+  constexpr __u32 needed = kOverride | kGiveAway;
+  Capabilities capabilities{};
+  if (!callWith(SYS_capget, capabilities) || (capabilities[0].effective & needed) != needed) return;
+
+  const gid_t group = getgid();
+  const uid_t user = getuid();
+  const auto formerGroup = static_cast<gid_t>(setfsgid(group));
+  const auto formerUser = static_cast<uid_t>(setfsuid(user));
+  // They answer with what was in force before, so that only a second call shows whether the first has worked.
+  const bool isCaller =
+      static_cast<gid_t>(setfsgid(group)) == group && static_cast<uid_t>(setfsuid(user)) == user;
+  // Leaving the user root took CAP_DAC_OVERRIDE out of the effective set; this puts it back.
+  capabilities = {};
+  capabilities[0].effective = capabilities[0].permitted = kOverride;
+  if (isCaller && callWith(SYS_capset, capabilities)) return;
+
+  // Half an identity would be refused what the whole one, or none, is granted. Going back to root brings the
+  // capabilities back.
+  setfsuid(formerUser);
+  setfsgid(formerGroup);
+}

@@ -419,6 +419,11 @@ TEST_F(MountPointPrivilegesTest, WorksAsEverWhereTheSystemRefusesAPartOfTheIdent
 TEST_F(MountPointPrivilegesTest, WorksAsEverWithoutTheRightToWriteAnywhere) {
   expectSuccess(runWithout("dac_override", {"a"}));
   expectOwner("/Volumes/a", kCaller);
+  // Where only root's group may write.
+  ASSERT_EQ(chown("/Volumes", kOther.user, 0), 0);
+  ASSERT_EQ(chmod("/Volumes", 0770), 0);
+  expectSuccess(runWithout("dac_override", {"b"}));
+  expectOwner("/Volumes/b", kCaller);
 }
 
 TEST_F(MountPointPrivilegesTest, FailsToHandTheDirectoryOverWithoutTheRight) {

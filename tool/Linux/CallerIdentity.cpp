@@ -23,9 +23,8 @@ bool callWith(long call, Capabilities& capabilities) {
 }  // namespace
 
 void takeOnCallersIdentity() {
-  constexpr __u32 needed = kOverride | kGiveAway;
   Capabilities capabilities{};
-  if (!callWith(SYS_capget, capabilities) || (capabilities[0].effective & needed) != needed) return;
+  if (!callWith(SYS_capget, capabilities) || (capabilities[0].effective & kGiveAway) == 0) return;
 
   const gid_t group = getgid();
   const uid_t user = getuid();
@@ -34,7 +33,8 @@ void takeOnCallersIdentity() {
   // They answer with what was in force before, so that only a second call shows whether the first has worked.
   const bool isCaller =
       static_cast<gid_t>(setfsgid(group)) == group && static_cast<uid_t>(setfsuid(user)) == user;
-  // Leaving the user root took CAP_DAC_OVERRIDE out of the effective set; this puts it back.
+  // Leaving the user root took CAP_DAC_OVERRIDE out of the effective set; this puts it back, or is refused
+  // where it is not permitted.
   capabilities = {};
   capabilities[0].effective = capabilities[0].permitted = kOverride;
   if (isCaller && callWith(SYS_capset, capabilities)) return;

@@ -7,6 +7,7 @@
 #include <gtest/gtest.h>
 #include <linux/capability.h>
 #include <sys/mount.h>
+#include <sys/prctl.h>
 #include <sys/ptrace.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
@@ -429,6 +430,15 @@ TEST_F(MountPointPrivilegesTest, WorksAsEverWithoutTheRightToWriteAnywhere) {
 TEST_F(MountPointPrivilegesTest, FailsToHandTheDirectoryOverWithoutTheRight) {
   expectResult(runWithout("chown", {"a"}), 1, "Failed to chown [/Volumes/a], errno: 1\n");
   EXPECT_EQ(statusOf("/Volumes/a").st_uid, 0U);
+}
+
+// An ordinary user must set this to filter system calls.
+TEST_F(MountPointPrivilegesTest, HasNoRightsWhereItsCallerMayFilterItsCalls) {
+  const ProcessResult result = run({"a"}, [] {
+    as(kCaller)();
+    require(prctl(PR_SET_NO_NEW_PRIVS, 1, 0, 0, 0) == 0);
+  });
+  expectResult(result, 13, "Failed to create [/Volumes/a], errno: 13\n");
 }
 
 // ---- What is root's share of a file system ----

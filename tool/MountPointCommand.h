@@ -20,7 +20,9 @@
 /// remove is a notice on standard output, and a success. A directory that was made but could not be
 /// handed over stays.
 ///
-/// Calls the operating system directly, keeps no state, starts no thread, reads no environment
-/// variable. With raised privileges it is safe only where its callers can neither write in "/Volumes" nor
-/// remove it: the new directory is handed over by its path.
+/// Calls the operating system directly, starts no thread, reads no environment variable. Not thread-safe, and
+/// changes its process for good: SIGXFSZ is ignored from then on, and on Linux the calling thread becomes its
+/// caller to the file system, with CAP_DAC_OVERRIDE alone, before a name is touched. So with raised
+/// privileges it hands over no other directory than the one it has made; docs/security.md tells what else
+/// holds.
 int runMountPointCommand(int argumentCount, const char* const* arguments);

@@ -23,10 +23,11 @@ int makeOpened(const std::string& path) {
   if (lstat(path.c_str(), &status) == 0) errno = EEXIST;
   if (errno != ENOENT) return -1;
 
-  std::string own = path.substr(0, path.rfind('/')) + "/.mount-point.XXXXXX";
+  const std::string place = path.substr(0, path.find_last_not_of('/') + 1);
+  std::string own = place.substr(0, place.rfind('/') + 1) + ".mount-point.XXXXXX";
   if (mkdtemp(own.data()) == nullptr) return -1;
   const int directory = open(own.c_str(), O_RDONLY | O_DIRECTORY | O_NOFOLLOW | O_CLOEXEC);
-  if (directory >= 0 && renamex_np(own.c_str(), path.c_str(), RENAME_EXCL) == 0) return directory;
+  if (directory >= 0 && renamex_np(own.c_str(), place.c_str(), RENAME_EXCL) == 0) return directory;
   const int error = errno;
   if (directory >= 0) close(directory);
   rmdir(own.c_str());

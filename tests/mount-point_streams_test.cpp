@@ -50,9 +50,11 @@ TEST_F(MountPointTest, TellsTheFailureOfItsMessageWhereThatFails) {
 
 TEST_F(MountPointTest, TellsTheFailureOfItsMessageWhereThatFailsAfterChown) {
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
-  expectResult(runInjected("chown", "EPERM", {"a"}, [] { replaceStream(STDERR_FILENO, "/dev/full"); }),
+  expectResult(runInjected("chown,fchown,lchown,fchownat", "EPERM", {"a"},
+                           [] { replaceStream(STDERR_FILENO, "/dev/full"); }),
                ENOSPC, "");
-  expectResult(runInjected("chown", "EPERM", {"b"}, [] { close(STDERR_FILENO); }), EBADF, "");
+  expectResult(runInjected("chown,fchown,lchown,fchownat", "EPERM", {"b"}, [] { close(STDERR_FILENO); }),
+               EBADF, "");
 }
 
 // A pipe that holds all it can.

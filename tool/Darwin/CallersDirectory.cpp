@@ -16,8 +16,8 @@ Making makeAndHandOver(const std::string& path) {
   return Making::done;
 }
 
-// `mkdir` at `path`, by a detour: under a name that nobody else uses the directory can be opened before
-// anybody could exchange it, and it gets `path` only where nothing is. Returns its descriptor, or -1.
+// `mkdir` at `path`, by a detour: under a name that nobody else uses, nobody else's directory can be opened
+// by mistake, and the directory gets `path` only where nothing is. Returns its descriptor, or -1.
 int makeOpened(const std::string& path) {
   struct stat status{};
   if (lstat(path.c_str(), &status) == 0) errno = EEXIST;

@@ -9,6 +9,7 @@
 #include <sys/mount.h>
 #include <sys/prctl.h>
 #include <sys/ptrace.h>
+#include <sys/resource.h>
 #include <sys/stat.h>
 #include <sys/syscall.h>
 #include <sys/uio.h>
@@ -180,6 +181,18 @@ TEST_F(MountPointPrivilegesTest, TellsTheFailureOfItsMessageWhereItsStreamsAreCl
   expectResult(run({"a"}, closed), EBADF, "");
   expectSuccess(run({"a", "--remove"}, closed));
   expectSuccess(run({"a", "--remove"}, closed));
+}
+
+TEST_F(MountPointPrivilegesTest, DoesNothingWhereAClosedStreamCannotBeFilled) {
+  if (!kInstrumentation.empty()) GTEST_SKIP() << "built with instrumentation, which opens files";
+  const ProcessResult result = run({"a"}, [] {
+    as(kCaller)();
+    const rlimit none{0, 0};
+    require(setrlimit(RLIMIT_NOFILE, &none) == 0);
+    close(STDERR_FILENO);
+  });
+  EXPECT_NE(result.signal, 0);
+  EXPECT_FALSE(fs::exists("/Volumes/a"));
 }
 
 TEST_F(MountPointPrivilegesTest, RemovesAnothersEmptyDirectory) {

@@ -25,8 +25,8 @@
 /// address of its record, and what is thrown is what the error callback, the factories, the generated
 /// functions, the delegate, tags and instance types throw, and std::bad_alloc. The registry is usable then;
 /// but of an API whose bindings were being looked at, some may be bound and the others not, and the instance
-/// for a scope whose factory has thrown stays in the making as long as the scope is there: whoever asks for
-/// it waits for ever, or, on the same thread, ends the program.
+/// for a scope whose factory has thrown stays pending as long as the scope is there: whoever waits for it, or
+/// asks for it later, gets a report and null.
 ///
 /// Not for: what a constructor's argument can do.
 

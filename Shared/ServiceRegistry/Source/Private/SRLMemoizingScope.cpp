@@ -15,7 +15,8 @@ namespace {
 
 constexpr const char* kFile = "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope";
 
-void beginCreation(SRLMemoizingScopeIvars& ivars, const void* identifier) RT_REQUIRES(ivars.lock) {
+SRLPendingCreation* beginCreation(SRLMemoizingScopeIvars& ivars, const void* identifier)
+    RT_REQUIRES(ivars.lock) {
   SRLPendingCreation* creation = nullptr;
   if (auto entry = std::move(ivars.spareCreation)) {
     entry.key() = identifier;
@@ -25,6 +26,7 @@ void beginCreation(SRLMemoizingScopeIvars& ivars, const void* identifier) RT_REQ
     creation = ivars.pendingCreations.emplace(identifier, rt::make<SRLPendingCreation>()).first->second.get();
   }
   creation->begin();
+  return creation;
 }
 
 void endCreation(SRLMemoizingScopeIvars& ivars, const void* identifier) RT_REQUIRES(ivars.lock) {
@@ -53,6 +55,8 @@ rt::Ref<rt::Object> SRLMemoizingScope::makeOrAwaitInstance(const void* identifie
                                                            const FactoryReference& factory) {
   SRLMemoizingScopeIvars& ivars = *ivars_;
   rt::Ref<SRLPendingCreation> awaited;
+  SRLPendingCreation* begun = nullptr;
+  decltype(ivars.instances)::Node entry;
   {
     const rt::LockGuard guard(ivars.lock);
     // It may have been made since.
@@ -61,7 +65,9 @@ rt::Ref<rt::Object> SRLMemoizingScope::makeOrAwaitInstance(const void* identifie
       awaited = found->second;
       awaited->expectWaiter();
     } else {
-      beginCreation(ivars, identifier);
+      // First what may fail, so that an instance that has been made can always be kept.
+      entry = ivars.instances.prepare(identifier, ivars.pendingCreations.size() + 1);
+      begun = beginCreation(ivars, identifier);
     }
   }
   if (instanceCreated != nullptr) *instanceCreated = !awaited;
@@ -79,10 +85,18 @@ rt::Ref<rt::Object> SRLMemoizingScope::makeOrAwaitInstance(const void* identifie
     return nullptr;
   }
 
-  rt::Ref<rt::Object> instance = factory.call(factory.factory);
+  rt::Ref<rt::Object> instance;
+  try {
+    instance = factory.call(factory.factory);
+  } catch (...) {
+    // It stays pending, but nobody has to wait for it any more.
+    begun->end();
+    throw;
+  }
+  entry.mapped() = instance;
   const rt::LockGuard guard(ivars.lock);
   // Nobody else has made one: they would have waited.
-  ivars.instances.insert(identifier, instance);
+  ivars.instances.insert(std::move(entry));
   endCreation(ivars, identifier);
   return instance;
 }

@@ -10,9 +10,10 @@
 /// what it needs. Who asks for an instance in the making waits until it is made; a factory must not ask for
 /// the one that it makes, nor an error callback for any of them, which ends the program.
 ///
-/// A factory that throws leaves its instance in the making for ever, as does memory that runs out while one
-/// is kept: whoever asks for it later waits for ever, too, or ends the program where the thread is the same.
-/// What the factory threw comes out of the request that called it.
+/// What a factory throws comes out of the request that called it. Its instance stays pending, since nobody
+/// can tell whether the factory may be called again: whoever waits for the instance, or asks for it later,
+/// gets a report and null. Memory for an instance is there before its factory runs: without it, nothing has
+/// begun.
 ///
 /// Not for: hosts. They ask SRLRegistry, which has a scope for each set of tags.
 
@@ -37,8 +38,9 @@ class RT_VISIBLE SRLMemoizingScope final : public rt::Implements<SRLMemoizingSco
   /// The instance for `identifier`, an address that is only compared; null where the factory gave none. If
   /// there is none yet, `factoryBlock` is called, or, if another thread calls its own for the same
   /// identifier, that one is waited for. Where there was none, `instanceCreated`, unless it is null, then
-  /// points to whether this call has called the factory; else it is left as it is. Throws what the factory
-  /// throws, and std::bad_alloc.
+  /// points to whether this call has called the factory; else it is left as it is. Where the factory has
+  /// thrown before, that is reported, and yields null. Throws what the factory and the error callback throw,
+  /// and std::bad_alloc; nothing once the factory has returned.
   ///
   /// The factory is a block or any other callable object, not null, that returns a reference.
   template <class Factory>

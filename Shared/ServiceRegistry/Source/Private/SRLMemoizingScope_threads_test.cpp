@@ -1,27 +1,21 @@
 // Many threads that ask for the same instances, or for others, at the same time.
 
 #include <gtest/gtest.h>
-#include <unistd.h>
 
 #include <algorithm>
 #include <array>
 #include <atomic>
 #include <cstddef>
 #include <cstdint>
-#include <fstream>
-#include <iterator>
 #include <latch>
 #include <memory>
 #include <numeric>
 #include <random>
-#include <stdexcept>
-#include <string>
 #include <thread>
 #include <vector>
 
 #include "Runtime/Block.h"
 #include "Runtime/Class.h"
-#include "Runtime/ThreadIdentifier.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope.h"
 #include "tests/TestFactories.h"
 
@@ -75,46 +69,6 @@ TEST(SRLMemoizingScopeThreads, WaitForTheInstance) {
   }
   EXPECT_TRUE(hasWaited);
 }
-
-#if defined(__linux__)
-
-// Whether a thread of this process sleeps, as the system sees it.
-bool isAsleep(rt::ThreadIdentifier thread) {
-  std::ifstream stream("/proc/self/task/" + std::to_string(thread) + "/stat");
-  const std::string content{std::istreambuf_iterator<char>(stream), {}};
-  // The state follows the name, which is in parentheses.
-  const std::size_t end = content.rfind(") ");
-  return end != std::string::npos && content[end + 2] == 'S';
-}
-
-// Exits with 0 if a thread waits for what another failed to make. That it falls asleep tells that it waits,
-// since nobody is left to wake it: it comes back only where it should not.
-[[noreturn]] void waitForWhatIsNeverMade() {
-  const Ref<SRLMemoizingScope> scope = SRLMemoizingScope::init();
-  const std::array<char, 2> places{};
-  const Factory fail = []() -> Ref<rt::Object> { throw std::out_of_range("no instance"); };
-  EXPECT_THROW(scope->instanceForIdentifier(&places[0], nullptr, fail), std::out_of_range);
-  std::atomic<rt::ThreadIdentifier> waiter = 0;
-  std::thread([&] {
-    waiter = rt::currentThreadIdentifier();
-    waiter.notify_one();
-    scope->instanceForIdentifier(&places[0], nullptr, makeInstance);
-    _exit(1);
-  }).detach();
-  waiter.wait(0);
-  while (!isAsleep(waiter)) std::this_thread::yield();
-  // Meanwhile the scope is of use for all the rest.
-  EXPECT_TRUE(scope->instanceForIdentifier(&places[1], nullptr, makeInstance));
-  EXPECT_EQ(scope->instances()->count(), 1U);
-  _exit(testing::Test::HasFailure() ? 2 : 0);
-}
-
-TEST(SRLMemoizingScopeThreadsDeathTest, WaitForEverForWhatAnotherFailedToMake) {
-  GTEST_FLAG_SET(death_test_style, "threadsafe");
-  EXPECT_EXIT(waitForWhatIsNeverMade(), testing::ExitedWithCode(0), "");
-}
-
-#endif
 
 // Two scopes and the same identifiers in both, with factories of all kinds. Which ask for others ask only
 // for later ones, of either scope.

@@ -35,9 +35,10 @@ class SRLTable {
  public:
   using Entries = std::unordered_map<Key, Value, Hash, Equal>;
   using Entry = typename Entries::value_type;
+  using Node = typename Entries::node_type;
 
   SRLTable() = default;
-  SRLTable(const SRLTable& other) : entries_(other.entries_), index_(makeIndex().release()) {}
+  SRLTable(const SRLTable& other) : entries_(other.entries_), index_(makeIndex(1).release()) {}
   SRLTable& operator=(const SRLTable&) = delete;
   ~SRLTable() { delete index(); }
 
@@ -53,14 +54,25 @@ class SRLTable {
   /// what comparing keys throws; then nothing has changed.
   template <class Given>
   Entry& insert(const Key& key, Given&& value) {
-    if (index() == nullptr || index()->isFull()) {
-      std::unique_ptr<Index> larger = makeIndex();
-      larger->keep(index());
-      index_.store(larger.release(), std::memory_order_release);
-    }
+    makeRoom(1);
     const auto [entry, isNew] = entries_.try_emplace(key, std::forward<Given>(value));
     if (isNew) index()->insert(*entry);
     return *entry;
+  }
+
+  /// An entry for `key` that is not in the table yet, to be given a value and inserted later. There is room
+  /// for `count` more entries from now on, so that inserting as many prepared ones cannot fail. Throws
+  /// std::bad_alloc; then nothing has changed.
+  Node prepare(const Key& key, std::size_t count) {
+    makeRoom(count);
+    return entries_.extract(entries_.try_emplace(key).first);
+  }
+
+  /// Inserts an entry that `prepare` has made, for whose key there is none yet. Does not allocate.
+  Entry& insert(Node&& prepared) noexcept {
+    Entry& entry = *entries_.insert(std::move(prepared)).position;
+    index()->insert(entry);
+    return entry;
   }
 
   /// The same where nobody minds if there is no entry: without memory there is none.
@@ -79,9 +91,8 @@ class SRLTable {
   }
 
   /// Takes entries of the table out of it. Throws std::bad_alloc; then nothing has changed.
-  std::vector<typename Entries::node_type> extract(
-      const std::vector<typename Entries::const_iterator>& entries) {
-    std::vector<typename Entries::node_type> nodes;
+  std::vector<Node> extract(const std::vector<typename Entries::const_iterator>& entries) {
+    std::vector<Node> nodes;
     if (entries.empty()) return nodes;
     nodes.reserve(entries.size());
     auto rest = std::make_unique<Index>(entries_.size());
@@ -103,7 +114,7 @@ class SRLTable {
           shift_(std::countl_zero(std::uint64_t{lastPlace_})),
           places_(std::make_unique<std::atomic<const Entry*>[]>(lastPlace_ + 1)) {}
 
-    bool isFull() const noexcept { return 2 * count_ > lastPlace_; }
+    bool hasRoomFor(std::size_t count) const noexcept { return 2 * (count_ + count) <= lastPlace_ + 1; }
 
     const Entry* find(const Key& key) const {
       for (std::size_t at = start(key);; at = next(at)) {
@@ -139,9 +150,19 @@ class SRLTable {
     std::unique_ptr<const Index> replaced_;
   };
 
-  // One with room for another entry.
-  std::unique_ptr<Index> makeIndex() const {
-    auto made = std::make_unique<Index>(entries_.size() + 1);
+  void makeRoom(std::size_t count) {
+    constexpr std::size_t kSmallest = 8;
+    const std::size_t needed = entries_.size() + count;
+    if (needed >= entries_.bucket_count()) entries_.reserve(std::max(2 * needed, kSmallest));
+    if (index() != nullptr && index()->hasRoomFor(count)) return;
+    std::unique_ptr<Index> larger = makeIndex(count);
+    larger->keep(index());
+    index_.store(larger.release(), std::memory_order_release);
+  }
+
+  // One with room for `count` more entries.
+  std::unique_ptr<Index> makeIndex(std::size_t count) const {
+    auto made = std::make_unique<Index>(entries_.size() + count);
     for (const Entry& entry : entries_) made->insert(entry);
     return made;
   }

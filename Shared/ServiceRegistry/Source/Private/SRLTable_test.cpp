@@ -111,6 +111,37 @@ TEST(SRLTable, TellsKeysOfOneHashApart) {
   EXPECT_EQ(table.find(300), nullptr);
 }
 
+TEST(SRLTable, DoesNotFindWhatIsOnlyPrepared) {
+  Table table;
+  Table::Node node = table.prepare(1, 1);
+  EXPECT_EQ(table.find(1), nullptr);
+  EXPECT_THAT(table.entries(), IsEmpty());
+  node.mapped() = "one";
+  const Table::Entry& entry = table.insert(std::move(node));
+  EXPECT_EQ(table.find(1), &entry);
+  EXPECT_EQ(entry.second, "one");
+  static_cast<void>(table.prepare(2, 1));
+  EXPECT_EQ(table.find(2), nullptr);
+  EXPECT_THAT(table.entries(), UnorderedElementsAre(std::pair(1, "one")));
+}
+
+// However many are prepared before the first comes in.
+TEST(SRLTable, HasRoomForWhatIsPrepared) {
+  if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
+  for (std::size_t known = 0; known < 40; ++known) {
+    for (std::size_t prepared = 1; prepared < 40; ++prepared) {
+      SRLTable<std::size_t, int> table;
+      for (std::size_t key = 0; key < known; ++key) table[key] = 1;
+      std::vector<SRLTable<std::size_t, int>::Node> nodes;
+      while (nodes.size() < prepared) nodes.push_back(table.prepare(known + nodes.size(), nodes.size() + 1));
+      const AllocationCount count;
+      for (auto& node : nodes) table.insert(std::move(node));
+      ASSERT_EQ(count.allocations(), 0) << known << " and " << prepared;
+      for (std::size_t key = 0; key < known + prepared; ++key) ASSERT_NE(table.find(key), nullptr);
+    }
+  }
+}
+
 // Whatever is done to both, a table and a map have the same entries, and the table finds them where they
 // were.
 TEST(SRLTable, DoesWhatAMapDoes) {

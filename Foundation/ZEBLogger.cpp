@@ -20,11 +20,8 @@ namespace {
 // to a handler of the host's, which may log.
 constinit rt::RecursiveLock sharedLock;
 
-// Never destroyed: programs log until the process is gone.
-rt::Ref<ZEBLogger>& shared() RT_REQUIRES(sharedLock) {
-  static auto& logger = *new rt::Ref<ZEBLogger>();
-  return logger;
-}
+// Owned. Never destroyed: programs log until the process is gone.
+constinit ZEBLogger* shared RT_GUARDED_BY(sharedLock) = nullptr;
 
 rt::Ref<ZEBLogWriter> standardOutput() {
   return ZEBFileHandleLogWriter::initWithFileHandle(rt::FileHandle::standardOutput());
@@ -51,17 +48,17 @@ rt::Ref<ZEBLogger> buildStandardLogger(rt::Ref<ZEBLogWriter> writer) {
 
 rt::Ref<ZEBLogger> ZEBLogger::sharedLogger() {
   const rt::LockGuard guard(sharedLock);
-  if (shared() == nullptr) {
+  if (shared == nullptr) {
     rt::Ref<ZEBLogger> logger = standardLogger();
-    if (shared() == nullptr) shared() = std::move(logger);
+    if (shared == nullptr) shared = logger.detach();
   }
-  return shared();
+  return shared;
 }
 
 void ZEBLogger::setSharedLogger(rt::Ref<ZEBLogger> logger) {
   const rt::LockGuard guard(sharedLock);
   // `logger` lets the old one go, after the lock.
-  shared().swap(logger);
+  logger = rt::Ref<ZEBLogger>::adopt(std::exchange(shared, logger.detach()));
 }
 
 rt::Ref<ZEBLogger> ZEBLogger::standardLogger() {

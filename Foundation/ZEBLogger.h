@@ -37,7 +37,7 @@
 class RT_VISIBLE ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLogWriter> {
  public:
   /// The process's logger: what `setSharedLogger` has set or, before that and after it has set null, a
-  /// `standardLogger`, which is made by the first call. Null only where that is.
+  /// `standardLogger`, which is made by the first call. Null only where that is; the next call tries again.
   static rt::Ref<ZEBLogger> sharedLogger();
 
   /// Makes `logger`, which may be null, the process's. Who has the one before it from `sharedLogger` may go

@@ -37,6 +37,8 @@ class FileDescriptor {
 
   /// The descriptor, or -1.
   int get() const noexcept { return descriptor_; }
+  /// Gives up the descriptor, which is the caller's to close from now on.
+  int release() noexcept { return std::exchange(descriptor_, -1); }
   explicit operator bool() const noexcept { return descriptor_ >= 0; }
 
   /// Writes all of `bytes`. A descriptor that does not block is waited for. Throws std::system_error; some

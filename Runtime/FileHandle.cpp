@@ -11,6 +11,8 @@
 #include <string>
 #include <system_error>
 
+#include "Runtime/FileDescriptor.h"
+
 namespace rt {
 
 namespace {
@@ -96,12 +98,14 @@ Ref<FileHandle> FileHandle::openForAppending(const String& path, std::uint16_t m
     return nullptr;
   }
   const std::string terminated(path.view());
-  int descriptor = -1;
+  FileDescriptor descriptor;
   do {
-    descriptor = open(terminated.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC, mode);
-  } while (descriptor < 0 && errno == EINTR);
-  if (descriptor < 0) return nullptr;
-  return make<FileHandle>(descriptor, Closing::closes);
+    descriptor = FileDescriptor(open(terminated.c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC, mode));
+  } while (!descriptor && errno == EINTR);
+  if (!descriptor) return nullptr;
+  Ref<FileHandle> handle = make<FileHandle>(descriptor.get(), Closing::closes);
+  descriptor.release();
+  return handle;
 }
 
 void FileHandle::writeLine(std::string_view line) {

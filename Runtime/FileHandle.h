@@ -36,12 +36,14 @@ class RT_VISIBLE FileHandle final : public Implements<FileHandle, Object> {
   ~FileHandle() override;
 
   /// The process's standard output, and its standard error: one handle each, never closed. Never null.
+  /// Throws std::bad_alloc at the first call, and nothing after that.
   static Ref<FileHandle> standardOutput();
   static Ref<FileHandle> standardError();
 
   /// Opens the file at `path` for writing at its end, and makes it with `mode`, less the umask's bits,
   /// where there is none. Programs that this one starts do not inherit it. Null, with `errno` set, where
-  /// it cannot be opened, and EINVAL where `path` is null or contains NUL.
+  /// it cannot be opened, and EINVAL where `path` is null or contains NUL. Throws std::bad_alloc, with
+  /// nothing left open.
   static Ref<FileHandle> openForAppending(const String& path, std::uint16_t mode);
 
   int descriptor() const noexcept { return descriptor_; }

@@ -29,6 +29,16 @@ timespec changeTime(const struct stat& status) {
 #endif
 }
 
+// What `call` gives, which is called again as long as it is interrupted.
+template <class Call>
+int untilNotInterrupted(Call call) {
+  int result = -1;
+  do {
+    result = call();
+  } while (result == -1 && errno == EINTR);
+  return result;
+}
+
 void makeFolders(const std::string& folder) {
   if (mkdir(folder.c_str(), 0700) == 0 || errno == EEXIST) return;
   if (errno == ENOENT) {
@@ -45,7 +55,10 @@ void makeFolders(const std::string& folder) {
 class TemporaryFile {
  public:
   explicit TemporaryFile(const std::string& path)
-      : path_(path + ".XXXXXX"), file_(mkostemp(path_.data(), O_CLOEXEC)) {
+      : file_(untilNotInterrupted([&] {
+          path_ = path + ".XXXXXX";
+          return mkostemp(path_.data(), O_CLOEXEC);
+        })) {
     if (!file_) fail(errno, "cannot make " + path_);
   }
   TemporaryFile(const TemporaryFile&) = delete;
@@ -57,13 +70,13 @@ class TemporaryFile {
   void takeOver(const struct stat& status) const {
     // The owner first, as a change of it may take bits of the mode away. Who may not give a file away
     // keeps it.
-    [[maybe_unused]] const int ignored = fchown(file_.get(), status.st_uid, status.st_gid);
-    fchmod(file_.get(), status.st_mode & 07777U);
+    untilNotInterrupted([&] { return fchown(file_.get(), status.st_uid, status.st_gid); });
+    untilNotInterrupted([&] { return fchmod(file_.get(), status.st_mode & 07777U); });
   }
 
   void write(std::string_view content) const {
     file_.write(content);
-    if (fsync(file_.get()) != 0) fail(errno, "cannot write");
+    if (untilNotInterrupted([&] { return fsync(file_.get()); }) != 0) fail(errno, "cannot write");
   }
 
   void become(const std::string& path) {
@@ -148,6 +161,7 @@ DefaultsFile::Lock DefaultsFile::lock() const {
 
 void DefaultsFile::replace(std::string_view content) const {
   const std::string path = resolvedPath(path_);
+  const std::string folder = folderOf(path);
   try {
     struct stat status{};
     const bool exists = stat(path.c_str(), &status) == 0;
@@ -158,7 +172,9 @@ void DefaultsFile::replace(std::string_view content) const {
     file.become(path);
     // So that the new name, too, is there after a loss of power. The file has been replaced by now, so
     // that to report a failure would mislead.
-    fsync(FileDescriptor(::open(folderOf(path).c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC)).get());
+    const FileDescriptor opened(
+        untilNotInterrupted([&] { return ::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC); }));
+    if (opened) untilNotInterrupted([&] { return fsync(opened.get()); });
   } catch (const std::system_error& error) {
     fail(error.code().value(), "cannot write " + path);
   }

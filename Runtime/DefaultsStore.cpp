@@ -62,17 +62,23 @@ void setDefaultsReportHandler(Block<void(const String&)> handler) {
   std::swap(reportHandler(), handler);
 }
 
-void reportDefaults(const std::string& line) noexcept {
-  if (line.empty()) return;
-  Block<void(const String&)> handler;
-  {
-    const LockGuard guard(reportLock);
-    handler = reportHandler();
-  }
-  if (handler) {
-    handler(String::fromUTF8Repaired(line));
-  } else {
-    StandardError::write("rt: " + line + "\n", std::chrono::seconds(1));
+void reportDefaults(std::initializer_list<std::string_view> parts) noexcept {
+  try {
+    std::string line = "rt: ";
+    const std::size_t start = line.size();
+    for (const std::string_view part : parts) line.append(part);
+    if (line.size() == start) return;
+    Block<void(const String&)> handler;
+    {
+      const LockGuard guard(reportLock);
+      handler = reportHandler();
+    }
+    if (handler) {
+      handler(String::fromUTF8Repaired(std::string_view(line).substr(start)));
+    } else {
+      StandardError::write(line.append("\n"), std::chrono::seconds(1));
+    }
+  } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): it goes unsaid
   }
 }
 
@@ -89,7 +95,7 @@ std::optional<std::string> DefaultsStore::value(std::string_view key) {
     problem = refresh();
     value = find(key);
   }
-  reportDefaults(problem);
+  reportDefaults({problem});
   return value;
 }
 
@@ -131,13 +137,14 @@ void DefaultsStore::change(std::string_view key, std::optional<std::string_view>
     }
     observers = claim(problem);
   }
-  reportDefaults(problem);
+  reportDefaults({problem});
   if (const std::exception_ptr exception = call(observers)) std::rethrow_exception(exception);
 }
 
 std::shared_ptr<DefaultsObserver> DefaultsStore::observe(std::string_view key, bool alsoNow,
                                                          Block<void()> block) {
   auto observer = std::make_shared<DefaultsObserver>(std::string(key), std::move(block));
+  const Observers itself{observer};
   std::string watchProblem;
   std::string readProblem;
   {
@@ -153,10 +160,10 @@ std::shared_ptr<DefaultsObserver> DefaultsStore::observe(std::string_view key, b
     }
     observers_.push_back(observer);
   }
-  reportDefaults(watchProblem);
-  reportDefaults(readProblem);
+  reportDefaults({watchProblem});
+  reportDefaults({readProblem});
   if (alsoNow) {
-    if (const std::exception_ptr exception = call({observer})) {
+    if (const std::exception_ptr exception = call(itself)) {
       remove(*observer);
       std::rethrow_exception(exception);
     }
@@ -232,6 +239,11 @@ std::optional<std::string> DefaultsStore::find(std::string_view key) const {
   return value != nullptr ? std::optional(*value) : std::nullopt;
 }
 
+bool DefaultsStore::hasSeen(const DefaultsObserver& observer) const {
+  const std::string* const value = text_.find(observer.key);
+  return value != nullptr ? observer.seen == *value : !observer.seen;
+}
+
 std::string DefaultsStore::startWatching() {
   if (file_.path().empty() || watch_ != nullptr) return {};
   try {
@@ -246,16 +258,16 @@ std::string DefaultsStore::startWatching() {
 }
 
 void DefaultsStore::watch(std::shared_ptr<SystemFileWatch> watch) noexcept {
-  Thread::setCurrentName("user defaults"_s);
   while (watch != nullptr) {
     try {
+      Thread::setCurrentName("user defaults"_s);
       // First, what has happened before it was watched.
       do tellOfChange();
       while (watch->wait());
       return;
     } catch (const std::exception& error) {
-      reportDefaults("user defaults are not watched for changes until the system allows it again: " +
-                     file_.path() + ", " + error.what());
+      reportDefaults({"user defaults are not watched for changes until the system allows it again: ",
+                      file_.path(), ", ", error.what()});
     }
     watch = renewedWatch();
   }
@@ -268,9 +280,9 @@ void DefaultsStore::tellOfChange() {
     const LockGuard guard(changeLock_);
     observers = claim(problem);
   }
-  reportDefaults(problem);
+  reportDefaults({problem});
   if (const std::exception_ptr exception = call(observers)) {
-    reportDefaults("an observer of user defaults threw: " + textOf(exception));
+    reportDefaults({"an observer of user defaults threw: ", textOf(exception)});
   }
 }
 
@@ -294,19 +306,21 @@ DefaultsStore::Observers DefaultsStore::claim(std::string& problem) {
   Observers claimed;
   claimed.reserve(observers_.size());
   for (const auto& observer : observers_) {
-    if (observer->caller != 0 || observer->seen == find(observer->key)) continue;
+    if (observer->caller != 0 || hasSeen(*observer)) continue;
     observer->caller = currentThreadIdentifier();
     claimed.push_back(observer);
   }
   return claimed;
 }
 
-std::exception_ptr DefaultsStore::call(const Observers& observers) {
+std::exception_ptr DefaultsStore::call(const Observers& observers) noexcept {
   std::exception_ptr first;
   for (const auto& observer : observers) {
-    while (isDue(*observer)) {
+    for (bool goesOn = true; goesOn;) {
+      goesOn = false;
       try {
-        observer->block();
+        goesOn = isDue(*observer);
+        if (goesOn) observer->block();
       } catch (...) {
         if (first == nullptr) first = std::current_exception();
       }
@@ -316,19 +330,27 @@ std::exception_ptr DefaultsStore::call(const Observers& observers) {
 }
 
 bool DefaultsStore::isDue(DefaultsObserver& observer) {
+  // Whatever leaves this, but that it is due, ends this thread's turn with the observer.
+  struct End {
+    ~End() RT_NO_THREAD_SAFETY_ANALYSIS {
+      if (isDue) return;
+      observer.caller = 0;
+      observer.isRunning = false;
+      ++store.endedCalls_;
+      store.endedCalls_.notify_all();
+    }
+    DefaultsStore& store;
+    DefaultsObserver& observer;
+    bool isDue = false;
+  };
   const LockGuard guard(lock_);
-  std::optional<std::string> value = find(observer.key);
+  End end{.store = *this, .observer = observer};
   // What has come to be meanwhile is this thread's, too: others have left it the observer.
-  if (!observer.isRemoved && (!observer.isRunning || value != observer.seen)) {
-    observer.seen = std::move(value);
-    observer.isRunning = true;
-    return true;
-  }
-  observer.caller = 0;
-  observer.isRunning = false;
-  ++endedCalls_;
-  endedCalls_.notify_all();
-  return false;
+  if (observer.isRemoved || (observer.isRunning && hasSeen(observer))) return false;
+  observer.seen = find(observer.key);
+  observer.isRunning = true;
+  end.isDue = true;
+  return true;
 }
 
 }  // namespace rt::detail

@@ -7,6 +7,7 @@
 #include <atomic>
 #include <cstdint>
 #include <exception>
+#include <initializer_list>
 #include <memory>
 #include <optional>
 #include <string>
@@ -27,8 +28,9 @@ namespace rt::detail {
 /// Where reports of user defaults go; null is standard error.
 void setDefaultsReportHandler(Block<void(const String&)> handler);
 
-/// Says `line` there. No lock is held then.
-void reportDefaults(const std::string& line) noexcept;
+/// Says the line that `parts` make up there, if they are not empty. Without memory for it, nothing is said.
+/// No lock is held then.
+void reportDefaults(std::initializer_list<std::string_view> parts) noexcept;
 
 /// One who wants to know of changes. All but the key is the store's, under its lock.
 struct DefaultsObserver {
@@ -67,6 +69,8 @@ class DefaultsStore : public std::enable_shared_from_this<DefaultsStore> {
   // Reads the file if it has changed. Returns what is to be reported, without the lock; "" for nothing.
   [[nodiscard]] std::string refresh() RT_REQUIRES(lock_);
   std::optional<std::string> find(std::string_view key) const RT_REQUIRES(lock_);
+  // Whether the observer has been called for the value that there is. Allocates nothing.
+  bool hasSeen(const DefaultsObserver& observer) const RT_REQUIRES(lock_);
 
   // Starts the thread if this process has none. Returns what is to be reported.
   [[nodiscard]] std::string startWatching() RT_REQUIRES(lock_);
@@ -80,9 +84,10 @@ class DefaultsStore : public std::enable_shared_from_this<DefaultsStore> {
   // thread is. Held `changeLock_` keeps the thread that waits for changes from claiming those of another.
   // `problem` becomes what is to be reported.
   [[nodiscard]] Observers claim(std::string& problem) RT_REQUIRES(changeLock_) RT_EXCLUDES(lock_);
-  // Calls what has been claimed. Returns the first exception of theirs.
-  [[nodiscard]] std::exception_ptr call(const Observers& observers);
+  // Calls what has been claimed. Returns the first exception of theirs, or std::bad_alloc.
+  [[nodiscard]] std::exception_ptr call(const Observers& observers) noexcept;
   // Whether `observer`, which this thread has claimed, is to be called now, for the first time or again.
+  // Throws std::bad_alloc; then it is not, and counts as not having seen the value.
   [[nodiscard]] bool isDue(DefaultsObserver& observer);
 
   const DefaultsFile file_;

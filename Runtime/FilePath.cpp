@@ -6,6 +6,7 @@
 #include <cerrno>
 #include <cstdlib>
 #include <memory>
+#include <new>
 #include <system_error>
 
 // Not std::filesystem: it brings the standard library's streams and locales into every program, with two
@@ -37,6 +38,7 @@ std::string folderOf(const std::string& path) {
 
 std::string resolvedPath(const std::string& path) {
   const SystemText real(realpath(path.c_str(), nullptr), &std::free);
+  if (real == nullptr && errno == ENOMEM) throw std::bad_alloc();
   return real != nullptr ? real.get() : path;
 }
 

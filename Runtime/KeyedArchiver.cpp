@@ -76,7 +76,14 @@ void KeyedArchiver::encodeObject(const Ref<Object>& object, std::string_view key
 
 std::vector<std::byte> KeyedArchiver::encodedData() {
   if (unfinished_ != 0) fail("an object is being encoded, or could not be");
-  PropertyList list = list_;
+  // What is around the objects is in the list for the time of this call: more may be encoded afterwards.
+  struct Around {
+    ~Around() { values.resize(count); }
+    std::vector<PropertyList::Value>& values;
+    const std::size_t count = values.size();
+  };
+  const Around around{.values = list_.values};
+  PropertyList& list = list_;
   PropertyList::Dictionary root;
   const auto add = [&](Index key, PropertyList::Value value) {
     root.emplace_back(key, list.add(std::move(value)));

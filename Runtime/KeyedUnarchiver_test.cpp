@@ -65,10 +65,9 @@ class Forged {
   }
 
   Bytes bytes(std::int64_t version = 100000) {
-    PropertyList whole = list;
     const auto add = [&](PropertyList::Dictionary& dictionary, const char* key, PropertyList::Value value) {
-      const Index keyIndex = whole.add(key);
-      dictionary.emplace_back(keyIndex, whole.add(std::move(value)));
+      const Index keyIndex = list.add(key);
+      dictionary.emplace_back(keyIndex, list.add(std::move(value)));
     };
     PropertyList::Dictionary top;
     add(top, "root", PropertyList::Reference{1});
@@ -77,8 +76,8 @@ class Forged {
     add(root, "$archiver", "Forger");
     add(root, "$top", top);
     add(root, "$objects", places);
-    whole.root = whole.add(root);
-    return whole.encoded();
+    list.root = list.add(root);
+    return list.encoded();
   }
 
   PropertyList list;
@@ -136,12 +135,11 @@ TEST(KeyedUnarchiver, AsksAgainForOtherClasses) {
 }
 
 TEST(KeyedUnarchiver, RefusesClassesThatCannotBeUnarchived) {
-  Forged forged;
-  forged.add(forged.dictionary({{"$class", forged.reference(2)}}));
-  const auto errorOfClass = [&forged](const char* name) {
-    Forged copy = forged;
-    copy.add(copy.classNamed(name));
-    return errorOf(copy.bytes());
+  const auto errorOfClass = [](const char* name) {
+    Forged forged;
+    forged.add(forged.dictionary({{"$class", forged.reference(2)}}));
+    forged.add(forged.classNamed(name));
+    return errorOf(forged.bytes());
   };
   EXPECT_EQ(errorOfClass("NoSuchClass"), "an object of class \"NoSuchClass\", which is not known here");
   EXPECT_EQ(errorOfClass("OnlyCoding"), "the class \"OnlyCoding\" cannot be unarchived");

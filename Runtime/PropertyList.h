@@ -37,7 +37,7 @@ class MalformedPropertyList final : public std::runtime_error {
   using std::runtime_error::runtime_error;
 };
 
-/// A plain value: as safe as a vector.
+/// As safe as a vector. Moved, and never copied: what refers to a value has its index.
 class PropertyList {
  public:
   /// The place of a value in `values`.
@@ -64,11 +64,20 @@ class PropertyList {
   using Dictionary = std::vector<std::pair<Index, Index>>;
 
   /// An integer is a std::uint64_t only where it is too large for std::int64_t.
-  using Value =
-      std::variant<bool, std::int64_t, std::uint64_t, double, Date, Data, Text, Reference, Array, Dictionary>;
+  struct Value : std::variant<bool, std::int64_t, std::uint64_t, double, Date, Data, Text, Reference, Array,
+                              Dictionary> {
+    using variant::variant;
+    Value() = default;
+    Value(Value&&) noexcept = default;
+    Value& operator=(Value&&) noexcept = default;
+  };
 
   std::vector<Value> values;
   Index root = 0;
+
+  PropertyList() = default;
+  PropertyList(PropertyList&&) noexcept = default;
+  PropertyList& operator=(PropertyList&&) noexcept = default;
 
   /// Appends `value`; returns its index.
   Index add(Value value);

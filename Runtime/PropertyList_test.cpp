@@ -60,8 +60,18 @@ std::string errorOfDecoding(const Bytes& bytes) {
   return errorOf([&] { PropertyList::decoded(bytes); });
 }
 
-PropertyList::Value readBack(const PropertyList::Value& value) {
-  return PropertyList::decoded(single(value).encoded()).values.at(0);
+PropertyList::Value readBack(PropertyList::Value value) {
+  return std::move(PropertyList::decoded(single(std::move(value)).encoded()).values.at(0));
+}
+
+// Used to be copied where an archive is made; g++'s variant jumps into garbage when it has no memory for
+// that.
+TEST(PropertyList, IsNeverCopied) {
+  static_assert(!std::is_copy_constructible_v<PropertyList> && !std::is_copy_assignable_v<PropertyList>);
+  static_assert(!std::is_copy_constructible_v<PropertyList::Value>);
+  static_assert(!std::is_copy_assignable_v<PropertyList::Value>);
+  static_assert(std::is_nothrow_move_constructible_v<PropertyList>);
+  static_assert(std::is_nothrow_move_constructible_v<PropertyList::Value>);
 }
 
 TEST(PropertyList, NothingIsNoPropertyList) {
@@ -348,7 +358,9 @@ plistlib.dump({'yes': True, 'int': -1, 'large': 2**64 - 1, 'real': 0.5, 'date': 
     'array': list(range(500))}, open(path, 'wb'), fmt=plistlib.FMT_BINARY))");
   const PropertyList list = PropertyList::decoded(readFile());
 
-  const auto at = [&list](std::string_view key) { return list.values.at(list.find(list.root, key).value()); };
+  const auto at = [&list](std::string_view key) -> const PropertyList::Value& {
+    return list.values.at(list.find(list.root, key).value());
+  };
   EXPECT_EQ(at("yes"), PropertyList::Value(true));
   EXPECT_EQ(at("int"), PropertyList::Value(std::int64_t{-1}));
   EXPECT_EQ(at("large"), PropertyList::Value(std::numeric_limits<std::uint64_t>::max()));

@@ -25,9 +25,9 @@ String currentName() {
 }
 
 void setCurrentName(const String& name) {
-  detail::setSystemThreadName(name);
   Name::set(Ref<StringObject>(name.object()));
   isKnown = true;
+  detail::setSystemThreadName(name);
 }
 
 const void* currentHandle() noexcept {

@@ -129,7 +129,8 @@ class RT_VISIBLE UserDefaults final : public Implements<UserDefaults, Object> {
   ///
   /// Throws, with nothing changed: std::system_error that names the path when the file cannot be read or
   /// written, rt::Exception when it is malformed or there is no place for one, std::invalid_argument when
-  /// the key is not UTF-8, std::length_error when the file would be larger than 1 MiB.
+  /// the key is not UTF-8, std::length_error when the file would be larger than 1 MiB. Throws std::bad_alloc,
+  /// when the value may be set already and observers may not have been called: they are by the next change.
   void setBool(bool value, std::string_view key);
   void setInteger(std::int64_t value, std::string_view key);
   void setReal(double value, std::string_view key);

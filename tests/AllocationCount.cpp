@@ -1,25 +1,31 @@
 #include "AllocationCount.h"
 
+#include <atomic>
 #include <cerrno>
 #include <cstddef>
 #include <cstdlib>
 
-#if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
-#define SANITIZED 1
-#elif defined(__has_feature)
-#if __has_feature(address_sanitizer) || __has_feature(thread_sanitizer)
-#define SANITIZED 1
-#endif
-#endif
+#include "AllocationFailure.h"
 
 namespace {
 
 constinit thread_local std::int64_t allocated = 0;
 constinit thread_local std::int64_t freed = 0;
+constinit std::atomic<std::int64_t> live = 0;
+
+void countAllocation() noexcept {
+  ++allocated;
+  live.fetch_add(1, std::memory_order_relaxed);
+}
+
+void countFree() noexcept {
+  ++freed;
+  live.fetch_sub(1, std::memory_order_relaxed);
+}
 
 }  // namespace
 
-#ifdef SANITIZED
+#ifdef SANITIZES_ALLOCATIONS
 
 // The sanitizer owns malloc and calls these at each allocation.
 extern "C" int __sanitizer_install_malloc_and_free_hooks(void (*onMalloc)(const volatile void*, std::size_t),
@@ -28,8 +34,8 @@ extern "C" int __sanitizer_install_malloc_and_free_hooks(void (*onMalloc)(const 
 namespace {
 
 const bool isInstalled =
-    __sanitizer_install_malloc_and_free_hooks([](const volatile void*, std::size_t) { ++allocated; },
-                                              [](const volatile void*) { ++freed; }) != 0;
+    __sanitizer_install_malloc_and_free_hooks([](const volatile void*, std::size_t) { countAllocation(); },
+                                              [](const volatile void*) { countFree(); }) != 0;
 
 }  // namespace
 
@@ -50,23 +56,27 @@ void* __libc_memalign(std::size_t alignment, std::size_t size);
 void __libc_free(void* block);
 
 void* malloc(std::size_t size) {
-  ++allocated;
+  if (AllocationFailure::happensNow()) return nullptr;
+  countAllocation();
   return __libc_malloc(size);
 }
 
 void* calloc(std::size_t nmemb, std::size_t size) {
-  ++allocated;
+  if (AllocationFailure::happensNow()) return nullptr;
+  countAllocation();
   return __libc_calloc(nmemb, size);
 }
 
 void* realloc(void* ptr, std::size_t size) {
-  ++allocated;
-  if (ptr != nullptr) ++freed;
+  if (AllocationFailure::happensNow()) return nullptr;
+  countAllocation();
+  if (ptr != nullptr) countFree();
   return __libc_realloc(ptr, size);
 }
 
 void* memalign(std::size_t alignment, std::size_t size) {
-  ++allocated;
+  if (AllocationFailure::happensNow()) return nullptr;
+  countAllocation();
   return __libc_memalign(alignment, size);
 }
 
@@ -82,7 +92,7 @@ int posix_memalign(void** memptr, std::size_t alignment, std::size_t size) {
 }
 
 void free(void* block) {
-  if (block != nullptr) ++freed;
+  if (block != nullptr) countFree();
   __libc_free(block);
 }
 
@@ -109,4 +119,8 @@ std::int64_t AllocationCount::allocations() const noexcept {
 
 std::int64_t AllocationCount::balance() const noexcept {
   return (allocated - allocatedBefore_) - (freed - freedBefore_);
+}
+
+std::int64_t AllocationCount::liveInProcess() noexcept {
+  return live.load(std::memory_order_relaxed);
 }

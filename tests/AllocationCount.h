@@ -25,6 +25,9 @@ class AllocationCount {
   /// How many of these are left, that is less what the thread has freed since. May be negative.
   std::int64_t balance() const noexcept;
 
+  /// How many blocks the whole process has, since some moment of its start: for comparing with later.
+  static std::int64_t liveInProcess() noexcept;
+
  private:
   std::int64_t allocatedBefore_;
   std::int64_t freedBefore_;

@@ -80,7 +80,8 @@ bool SystemFileWatch::wait() {
 void SystemFileWatch::stop() noexcept {
   isStopped_.store(true, std::memory_order_relaxed);
   const std::uint64_t one = 1;
-  [[maybe_unused]] const ssize_t ignored = ::write(wake_.get(), &one, sizeof one);
+  while (::write(wake_.get(), &one, sizeof one) < 0 && errno == EINTR) {
+  }
 }
 
 }  // namespace rt::detail

@@ -1,6 +1,7 @@
 #include "Shared/Logging/LUMLogMultiplexer.h"
 
 #include <algorithm>
+#include <new>
 #include <string_view>
 #include <utility>
 #include <vector>
@@ -119,7 +120,10 @@ std::vector<rt::Ref<LUMAsyncLogger>> LUMLogMultiplexer::deliverLater(
   loggingQueue_->async([loggers = std::move(laterLoggers), message] {
     for (const rt::Ref<LUMAsyncLogger>& logger : loggers) {
       if (const rt::Ref<rt::Queue> queue = logger->operationQueue()) {
-        queue->async([logger, message] { deliver(*logger, message); });
+        try {
+          queue->async([logger, message] { deliver(*logger, message); });
+        } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): nobody could do better here
+        }
       }
     }
   });

@@ -22,7 +22,9 @@
 /// message passes through, and those after it do not get the message. What an asynchronous logger throws
 /// later has no caller: it ends the program, or goes to the handler that rt::Queue has for that
 /// (LUMAsyncLogger.h). If then it was `operationQueue` that threw, the asynchronous loggers after it do not
-/// get the message either; later messages go their way.
+/// get the message either; later messages go their way. Without memory to queue a message, LUMLog throws
+/// std::bad_alloc before any logger has it; an asynchronous logger for whose own queue there is none does not
+/// get the message.
 ///
 /// In the child of a fork it may be used at once, whatever other threads were doing, given that it had been
 /// used before the fork, and that filters and loggers bear it. The messages that were queued are the

@@ -1,0 +1,185 @@
+#include "WithoutMemory.h"
+
+#include <gtest/gtest.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <chrono>
+#include <cstdint>
+#include <cstdio>
+#include <exception>
+#include <new>
+#include <thread>
+
+#include "AllocationCount.h"
+#include "AllocationFailure.h"
+#include "Runtime/UnfairLock.h"
+#include "Runtime/WorkerPool.h"
+#include "Sanitizers.h"
+
+#if RT_TEST_ADDRESS_SANITIZER
+#include <sanitizer/lsan_interface.h>
+#endif
+
+namespace WithoutMemory {
+
+namespace {
+
+using Extent = AllocationFailure::Extent;
+
+// What a child of the process found.
+enum Result : int { kSurvived = 0, kHasNoSuchAllocation = 1, kFailed = 2 };
+
+// Long enough for any machine: only what hangs takes longer.
+constexpr unsigned kPatience = 120;
+
+// As often as that, something is lost only by a leak.
+constexpr int kRunsWithLeak = 20;
+constexpr int kLooks = 100;
+
+bool fail(std::int64_t number, Extent extent, const char* what) {
+  std::fprintf(stderr, "allocation %lld fails%s: %s\n", static_cast<long long>(number),
+               extent == Extent::kOnce ? "" : ", and all after it", what);
+  return false;
+}
+
+bool holdsNoLock() {
+#if defined(RT_COUNTS_HELD_LOCKS)
+  return rt::detail::heldLocks == 0;
+#else
+  return true;
+#endif
+}
+
+// Whether no more is allocated than that, once the threads of queues have let go of what they have done.
+bool settlesAt(std::int64_t live) {
+  for (int i = 0; i < kLooks; ++i) {
+    if (AllocationCount::liveInProcess() <= live) return true;
+    std::this_thread::sleep_for(std::chrono::milliseconds(1));
+  }
+  return false;
+}
+
+// Has the allocation fail, and then runs the program with memory. False where something is wrong.
+bool survives(const Program& program, std::int64_t number, Extent extent, bool& hasHappened) {
+  {
+    const AllocationFailure failure(number, extent);
+    try {
+      program();
+    } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): so be it
+    } catch (const std::exception& exception) {
+      const AllocationFailure::Pause pause;
+      return fail(number, extent, exception.what());
+    } catch (...) {
+      const AllocationFailure::Pause pause;
+      return fail(number, extent, "something else was thrown");
+    }
+    hasHappened = failure.hasHappened();
+  }
+  if (!holdsNoLock()) return fail(number, extent, "a lock is held");
+  program();
+  if (!holdsNoLock()) return fail(number, extent, "a lock is held afterwards");
+  if (testing::Test::HasFailure()) return fail(number, extent, "something is not as documented");
+  return true;
+}
+
+int resultOfChild(const std::function<Result()>& body) {
+  std::fflush(nullptr);
+  const pid_t child = fork();
+  if (child == 0) {
+    alarm(kPatience);
+    // Threads that end while allocations are counted would change the count.
+    rt::detail::WorkerPool::idleTimeout = std::chrono::nanoseconds(std::chrono::hours(1)).count();
+    const int result = body();
+    std::fflush(nullptr);
+    _exit(result);
+  }
+  int status = 0;
+  if (child < 0 || waitpid(child, &status, 0) != child) return kFailed;
+  if (WIFEXITED(status)) return WEXITSTATUS(status);
+  std::fprintf(stderr, "ended by signal %d\n", WTERMSIG(status));
+  return kFailed;
+}
+
+bool leaksNothing() {
+#if RT_TEST_ADDRESS_SANITIZER
+  return __lsan_do_recoverable_leak_check() == 0;
+#else
+  return true;
+#endif
+}
+
+// Each allocation of a first run, in a child of its own.
+std::int64_t tryFirstRuns(const Program& program, Extent extent) {
+  for (std::int64_t number = 1;; ++number) {
+    const int result = resultOfChild([&] {
+      bool hasHappened = false;
+      if (!survives(program, number, extent, hasHappened)) return kFailed;
+      if (hasHappened) return kSurvived;
+      return leaksNothing() ? kHasNoSuchAllocation : kFailed;
+    });
+    if (result == kHasNoSuchAllocation) return number - 1;
+    if (result != kSurvived) {
+      ADD_FAILURE() << "the first run does not survive that allocation " << number << " fails"
+                    << (extent == Extent::kOnce ? "" : ", with all after it") << ": " << result;
+      return number;
+    }
+  }
+}
+
+// Each allocation of a later run, all in the calling process; gives how many, or -1.
+std::int64_t tryLaterRuns(const Program& program, Extent extent) {
+  program();
+  for (std::int64_t number = 1;; ++number) {
+    std::fflush(nullptr);
+    bool hasHappened = false;
+    // What is found out once may be kept, and so may a thread that a queue has had to start. What is lost
+    // each time is a leak.
+    bool leaks = true;
+    for (int i = 0; i < kRunsWithLeak && leaks; ++i) {
+      const std::int64_t before = AllocationCount::liveInProcess();
+      if (!survives(program, number, extent, hasHappened)) return -1;
+      leaks = !settlesAt(before);
+    }
+    if (leaks) {
+      fail(number, extent, "something leaks");
+      return -1;
+    }
+    if (!hasHappened) return leaksNothing() ? number - 1 : -1;
+  }
+}
+
+}  // namespace
+
+void tryEachAllocation(const Program& program) {
+  if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to have allocations fail here";
+  for (const Extent extent : {Extent::kOnce, Extent::kFromThenOn}) {
+    const std::int64_t first = tryFirstRuns(program, extent);
+    if (testing::Test::HasFailure()) return;
+    std::printf("%lld allocations of a first run fail%s\n", static_cast<long long>(first),
+                extent == Extent::kOnce ? "" : ", each with all after it");
+    EXPECT_GT(first, 0);
+    const int result = resultOfChild([&] {
+      const std::int64_t later = tryLaterRuns(program, extent);
+      std::printf("%lld of a later run\n", static_cast<long long>(later));
+      return later < 0 ? kFailed : kSurvived;
+    });
+    EXPECT_EQ(result, kSurvived) << "later runs do not survive";
+    if (testing::Test::HasFailure()) return;
+  }
+}
+
+void onNewThread(const Program& body) {
+  const AllocationFailure::Pause pause;
+  std::exception_ptr thrown;
+  std::thread([&] {
+    try {
+      body();
+    } catch (...) {
+      thrown = std::current_exception();
+    }
+  }).join();
+  if (thrown) std::rethrow_exception(thrown);
+}
+
+}  // namespace WithoutMemory

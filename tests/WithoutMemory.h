@@ -23,7 +23,10 @@ namespace WithoutMemory {
 
 using Program = std::function<void()>;
 
-void tryEachAllocation(const Program& program);
+/// What it means that the process has more blocks after each run of the program.
+enum class Growth : bool { kIsLeak, kIsWanted };
+
+void tryEachAllocation(const Program& program, Growth growth = Growth::kIsLeak);
 
 /// Runs `body` on a new thread, whose allocations may fail, and throws what it throws.
 void onNewThread(const Program& body);

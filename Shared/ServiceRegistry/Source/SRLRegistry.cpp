@@ -168,12 +168,23 @@ bool SRLRegistry::multipleBindingsModulesAllowed() const {
 
 bool SRLRegistry::lazilyRegisterBindingsForAPI(const SRLAPIRegistrationData* api) {
   const std::string_view identifier = api->identifier;
+  const bool isNew =
+      ivars_->singleBindings.find(api) == nullptr && ivars_->multiBindings.find(api) == nullptr;
   bool isKnown = false;
-  for (const SRLBindingsModuleData* module : ivars_->bindingsModules) {
-    const _SRLBindingRegistrationData* binding = bindingOf(*module, identifier);
-    if (binding == nullptr) continue;
-    isKnown = true;
-    registerBindings(*binding);
+  try {
+    for (const SRLBindingsModuleData* module : ivars_->bindingsModules) {
+      const _SRLBindingRegistrationData* binding = bindingOf(*module, identifier);
+      if (binding == nullptr) continue;
+      isKnown = true;
+      registerBindings(*binding);
+    }
+  } catch (const std::bad_alloc&) {
+    // The next request begins anew, rather than find that some are missing.
+    if (isNew) {
+      ivars_->singleBindings.erase(api);
+      ivars_->multiBindings.erase(api);
+    }
+    throw;
   }
   return isKnown;
 }

@@ -26,7 +26,8 @@
 /// functions, the delegate, tags and instance types throw, and std::bad_alloc. The registry is usable then;
 /// but of an API whose bindings were being looked at, some may be bound and the others not, and the instance
 /// for a scope whose factory has thrown stays pending as long as the scope is there: whoever waits for it, or
-/// asks for it later, gets a report and null.
+/// asks for it later, gets a report and null. After std::bad_alloc, an API's bindings are looked at anew by
+/// the next request, and all of them are bound.
 ///
 /// Not for: what a constructor's argument can do.
 

@@ -90,6 +90,13 @@ class SRLTable {
     return (found != nullptr ? *found : insert(key, Value())).second;
   }
 
+  /// Takes the entry for `key` out, if there is one. No other thread may look into the table meanwhile.
+  void erase(const Key& key) {
+    if (entries_.erase(key) == 0) return;
+    index()->clear();
+    for (const Entry& entry : entries_) index()->insert(entry);
+  }
+
   /// Takes entries of the table out of it. Throws std::bad_alloc; then nothing has changed.
   std::vector<Node> extract(const std::vector<typename Entries::const_iterator>& entries) {
     std::vector<Node> nodes;
@@ -129,6 +136,11 @@ class SRLTable {
       while (places_[at].load(std::memory_order_relaxed) != nullptr) at = next(at);
       places_[at].store(&entry, std::memory_order_release);
       ++count_;
+    }
+
+    void clear() noexcept {
+      for (std::size_t at = 0; at <= lastPlace_; ++at) places_[at].store(nullptr, std::memory_order_relaxed);
+      count_ = 0;
     }
 
     // Owned from now on.

@@ -111,6 +111,17 @@ TEST(SRLTable, TellsKeysOfOneHashApart) {
   EXPECT_EQ(table.find(300), nullptr);
 }
 
+TEST(SRLTable, ErasesAnEntry) {
+  Table table;
+  table.erase(1);
+  for (int i = 0; i < 100; ++i) table[i] = std::to_string(i);
+  table.erase(50);
+  table.erase(50);
+  EXPECT_EQ(table.entries().size(), 99U);
+  for (int i = 0; i < 100; ++i) EXPECT_EQ(table.find(i) != nullptr, i != 50) << i;
+  EXPECT_EQ(table.insert(50, "again").second, "again");
+}
+
 TEST(SRLTable, DoesNotFindWhatIsOnlyPrepared) {
   Table table;
   Table::Node node = table.prepare(1, 1);

@@ -1,0 +1,194 @@
+// What the loggers and reports do where there is no memory.
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <filesystem>
+#include <new>
+#include <string>
+
+#include "AllocationFailure.h"
+#include "Foundation/ZEBLoggerMacroHelpers.h"
+#include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
+#include "Libraries/Util/ErrorHandler/PECReport.h"
+#include "PrivateDefaults.h"
+#include "Runtime/Exception.h"
+#include "Runtime/Queue.h"
+#include "Shared/Logging/LUMLog.h"
+#include "Shared/Logging/LUMLogComponentFilter.h"
+#include "Shared/Logging/LUMLogDropAllFilter.h"
+#include "Shared/Logging/LUMLogLogicalOrFilter.h"
+#include "Shared/Logging/LUMLogMinimumLevelFilter.h"
+#include "Shared/Logging/LUMLogMultiplexer.h"
+#include "Shared/Logging/LUMSystemLogger.h"
+#include "Shared/Logging/Shim/Classes/LUMLoggingReroutingZEBLogger.h"
+#include "TestLoggers.h"
+#include "WithoutMemory.h"
+
+namespace {
+
+using namespace rt::literals;
+using rt::Ref;
+using WithoutMemory::tryEachAllocation;
+
+const PrivateDefaults privateDefaults;
+
+constexpr const char* kLong =
+    "a text that is too long to be kept in a string of the language's library itself";
+
+std::atomic<int> seen = 0;
+std::atomic<int> seenLater = 0;
+
+// Takes its messages later, and those of level 4 at once. Its queue says when all are there.
+class LaterLogger final : public rt::Implements<LaterLogger, rt::Object, LUMAsyncLogger> {
+ public:
+  void logWithMessage(const Ref<LUMLogMessage>& /*message*/) override { ++seenLater; }
+  Ref<LUMLogFilter> filter() const override { return nullptr; }
+  Ref<rt::Queue> operationQueue() const override { return queue_; }
+  LUMLogDispatchMode dispatchModeForMessage(const LUMLogMessage& message) const override {
+    return message.level() == LUMLogLevelFault ? LUMLogDispatchModeSynchronous : 0;
+  }
+
+ private:
+  const Ref<rt::Queue> queue_ = rt::make<rt::Queue>("LaterLogger"_s);
+};
+
+// Without the log of the system, which would have a line for each attempt.
+void quietSystemLog() {
+  static const Ref<LUMSystemLogger> quiet = LUMSystemLogger::initWithFilter(LUMLogDropAllFilter::init());
+  LUMLogMultiplexer::sharedInstance()->addSyncLogger(quiet);
+}
+
+void waitForLoggers(const Ref<LaterLogger>& logger) {
+  LUMLogMultiplexer::sharedInstance()->waitForLogging();
+  logger->operationQueue()->barrierSync();
+}
+
+// What goes wrong with the loggers' own queues used to end the program.
+TEST(WithoutMemory, Logs) {
+  tryEachAllocation([] {
+    quietSystemLog();
+    const Ref<LUMLogMultiplexer>& multiplexer = LUMLogMultiplexer::sharedInstance();
+    const Ref<LaterLogger> later = rt::make<LaterLogger>();
+    const Ref<TestSyncLogger> now = rt::make<TestSyncLogger>([](const Ref<LUMLogMessage>&) { ++seen; });
+    const Ref<LUMLogFilter> filter = LUMLogMinimumLevelFilter::initWithMinimumLevel(LUMLogLevelInfo);
+    struct End {
+      ~End() {
+        const AllocationFailure::Pause pause;
+        multiplexer.removeAsyncLogger(later);
+        multiplexer.removeSyncLogger(now);
+        multiplexer.removeLogFilter(filter);
+        waitForLoggers(later);
+        multiplexer.setCaptureCallStackAddresses(true);
+      }
+      LUMLogMultiplexer& multiplexer;
+      const Ref<LaterLogger>& later;
+      const Ref<TestSyncLogger>& now;
+      const Ref<LUMLogFilter>& filter;
+    } const end{*multiplexer, later, now, filter};
+    multiplexer->addAsyncLogger(later);
+    multiplexer->addSyncLogger(now);
+    multiplexer->addLogFilter(filter);
+    seen = 0;
+    seenLater = 0;
+    const Ref<LUMLogMetadata> metadata = LUMLogMetadata::metadataWithComponent("Importer"_s);
+    EXPECT_TRUE(LUMLogAt(LUMLogLevelDebug, "nobody sees it"_s));
+    EXPECT_TRUE(LUMLogAt(LUMLogLevelInfo, metadata, "%@ and %d"_s,
+                         LUMSafeStringParameter::parameterWithString("parameter"_s, 1), 7));
+    EXPECT_TRUE(LUMLogAt(LUMLogLevelError, "with addresses"_s));
+    EXPECT_TRUE(LUMLogAt(LUMLogLevelFault, "at once"_s));
+    EXPECT_EQ(seen, 3);
+    EXPECT_GE(seenLater, 1);
+    multiplexer->setCaptureCallStackAddresses(false);
+    EXPECT_TRUE(multiplexer->captureCallStack());
+    waitForLoggers(later);
+    EXPECT_LE(seenLater, 3);
+  });
+}
+
+TEST(WithoutMemory, LogsToTheSystem) {
+  // To no daemon but the one that is there, and to nobody's terminal.
+  const int nowhere = open("/dev/null", O_WRONLY | O_CLOEXEC);
+  tryEachAllocation([&] {
+    const int before = dup(STDERR_FILENO);
+    dup2(nowhere, STDERR_FILENO);
+    struct End {
+      ~End() {
+        dup2(before, STDERR_FILENO);
+        close(before);
+      }
+      int before;
+    } const end{before};
+    const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
+    logger->logWithMessage(messageWith(LUMLogLevelError, rt::String::fromUTF8(kLong)));
+    logger->logWithMessage(messageWith(LUMLogLevelInfo, "short"_s));
+  });
+  close(nowhere);
+}
+
+// The first use of the shared logger used to throw. The shared logger never throws; without memory there is
+// none, and lines get lost.
+TEST(WithoutMemory, LogsTheOldWay) {
+  const std::string parent = std::filesystem::is_directory("/dev/shm") ? "/dev/shm/" : testing::TempDir();
+  const std::string path = parent + "without-memory." + std::to_string(getpid());
+  tryEachAllocation([&] {
+    const Ref<ZEBLogger> shared = ZEBLogger::sharedLogger();
+    rt::String text;
+    {
+      const AllocationFailure::Pause pause;
+      text = rt::String::fromUTF8(path.c_str());
+    }
+    const Ref<ZEBLogger> logger = ZEBLogger::standardLoggerWithPath(text);
+    if (logger) {
+      logger->logInfo("%@ has %d entries"_s, "text"_s, 7);
+      logger->logFuncError(__func__, "%s"_s, kLong);
+      logger->logMessage(text, ZEBLogLevelInfo);
+      logger->logMessage(text, ZEBLogLevelDebug);
+    }
+    ZEBLogger::setSharedLogger(logger);
+    ZEBLogDebug("through the shared logger"_s);
+    ZEBLogger::setSharedLogger(nullptr);
+    // Each is whole, or not there.
+    for (const Ref<ZEBLogger>& each : {ZEBLogger::standardLoggerWithStderr(), ZEBLogger::standardLogger(),
+                                       ZEBLogger::standardLoggerWithStdoutAndStderr(), ZEBLogger::logger()}) {
+      EXPECT_TRUE(!each || (each->writer() && each->formatter() && each->filter()));
+    }
+  });
+  unlink(path.c_str());
+}
+
+TEST(WithoutMemory, Reroutes) {
+  tryEachAllocation([] {
+    quietSystemLog();
+    const Ref<ZEBLogger> logger =
+        LUMLoggingReroutingZEBLogger::initWithLogMultiplexer(LUMLogMultiplexer::sharedInstance());
+    logger->logInfo("%@ has %d entries"_s, "text"_s, 7);
+    logger->logFuncAssert(__func__, "%s"_s, kLong);
+    logger->logMessage("message"_s, ZEBLogLevelError);
+  });
+}
+
+TEST(WithoutMemory, Reports) {
+  tryEachAllocation([] {
+    quietSystemLog();
+    const Ref<PECErrorHandler>& handler = PECErrorHandler::sharedInstance();
+    handler->setErrorCount(0);
+    seen = 0;
+    handler->setErrorHandlerBlock([](const Ref<PECErrorDescription>& error) {
+      EXPECT_TRUE(error->errorMessage());
+      ++seen;
+    });
+    const auto report = [](const char* text) {
+      PECReport({"Shared/File", "-[Class operation]"}, "%@ is %@"_s, rt::String::fromUTF8(text), 7);
+    };
+    report("a parameter");
+    EXPECT_EQ(seen, 1);
+    EXPECT_EQ(handler->errorCount(), 1);
+    EXPECT_EQ(PECErrorHandler::errorCountInBlock([&] { report(kLong); }), 1);
+    EXPECT_EQ(seen, 1);
+  });
+}
+
+}  // namespace

@@ -127,6 +127,16 @@ TEST_F(ZEBLogLevelFilterTest, FollowsTheUserDefaultFromAttachmentToDetachment) {
   filter->willDetachFromLogger();
 }
 
+TEST_F(ZEBLogLevelFilterTest, ReadsNothingWhenItIsAttachedAlready) {
+  const auto filter = ZEBLogLevelFilter::init();
+  set("yes");
+  filter->didAttachToLogger();
+  set("no");
+  filter->didAttachToLogger();
+  EXPECT_TRUE(filter->verboseLoggingEnabled());
+  filter->willDetachFromLogger();
+}
+
 TEST_F(ZEBLogLevelFilterTest, IsDetachedOnceHoweverOftenItWasAttached) {
   const auto defaults = rt::UserDefaults::standardUserDefaults();
   const auto filter = ZEBLogLevelFilter::init();

@@ -116,6 +116,27 @@ TEST_F(PECErrorHandlerTest, DescribesTheMessage) {
   EXPECT_NE(told, first);
 }
 
+// Callbacks nest, and may throw; others' threads do not count.
+TEST_F(PECErrorHandlerTest, KnowsWhetherTheThreadRunsACallback) {
+  struct Thrown {};
+  std::vector<bool> during;
+  bool ofAnother = true;
+  handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>&) {
+    during.push_back(PECErrorHandler::isCallingBack());
+    std::thread([&] { ofAnother = PECErrorHandler::isCallingBack(); }).join();
+    if (during.size() == 1) {
+      logError();
+      during.push_back(PECErrorHandler::isCallingBack());
+      throw Thrown();
+    }
+  });
+  EXPECT_FALSE(PECErrorHandler::isCallingBack());
+  EXPECT_THROW(logError(), Thrown);
+  EXPECT_THAT(during, ElementsAre(true, true, true));
+  EXPECT_FALSE(ofAnother);
+  EXPECT_FALSE(PECErrorHandler::isCallingBack());
+}
+
 TEST_F(PECErrorHandlerTest, CountsWhenTheCallbackHasReturned) {
   std::vector<std::int32_t> during;
   handler_->setErrorHandlerBlock(

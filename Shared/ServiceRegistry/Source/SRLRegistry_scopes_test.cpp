@@ -199,6 +199,21 @@ TEST_F(SRLRegistryScopes, EndByAnInstanceOfTheirOwnWhichHasTheTag) {
   EXPECT_EQ(delegate->tags[0].get(), address);
 }
 
+// The same where the reference itself becomes null.
+TEST_F(SRLRegistryScopes, EndByAReferenceThatOneOfTheirInstancesTakesBack) {
+  const Ref<Delegate> delegate = rt::make<Delegate>();
+  registry->setScopeLifecycleDelegate(delegate);
+  Ref<rt::Object> tag = rt::make<Tag>(1);
+  const rt::Object* address = tag.get();
+  registry->scopeWithTags(tagSet(tag))->instanceForIdentifier(this, nullptr, [&] {
+    return rt::make<Farewell>([&] { tag = nullptr; });
+  });
+  registry->removeScopesWithTag(tag);
+  EXPECT_FALSE(tag);
+  ASSERT_EQ(delegate->tags.size(), 1U);
+  EXPECT_EQ(delegate->tags[0].get(), address);
+}
+
 TEST_F(SRLRegistryScopes, EndWithoutASlotForNull) {
   const Ref<Delegate> delegate = rt::make<Delegate>();
   registry->setScopeLifecycleDelegate(delegate);

@@ -203,7 +203,7 @@ TEST_F(SRLRegistryScopes, EndByAnInstanceOfTheirOwnWhichHasTheTag) {
 TEST_F(SRLRegistryScopes, EndByAReferenceThatOneOfTheirInstancesTakesBack) {
   const Ref<Delegate> delegate = rt::make<Delegate>();
   registry->setScopeLifecycleDelegate(delegate);
-  Ref<rt::Object> tag = rt::make<Tag>(1);
+  Ref<rt::Object> tag = rt::make<Farewell>([] {});
   const rt::Object* address = tag.get();
   registry->scopeWithTags(tagSet(tag))->instanceForIdentifier(this, nullptr, [&] {
     return rt::make<Farewell>([&] { tag = nullptr; });

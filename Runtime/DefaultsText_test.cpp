@@ -48,6 +48,7 @@ TEST(DefaultsText, ReadsALine) {
   EXPECT_EQ(valueIn("key = C:\\n"), "C:\\n");
   EXPECT_EQ(valueIn("key = he said \"yes\""), "he said \"yes\"");
   EXPECT_EQ(valueIn("\"key\" = \" # \\\" \\\\ \\n\\r\\t\\u00fc\\u20AC \"  # remark"), " # \" \\ \n\r\tü€ ");
+  EXPECT_EQ(valueIn("key = \"\\uD7FF\\uE000\""), "\uD7FF\uE000");
   EXPECT_EQ(valueIn("key = \"\""), "");
   EXPECT_THAT(DefaultsText::parsed("\"\" = 1").find(""), Pointee(std::string("1")));
   EXPECT_THAT(DefaultsText::parsed("\"a = b\" = 1").find("a = b"), Pointee(std::string("1")));
@@ -64,7 +65,7 @@ TEST(DefaultsText, SaysWhatIsMalformedAndWhere) {
   EXPECT_EQ(errorOf("\"a = 1"), "line 1: a quotation mark without its other");
   EXPECT_EQ(errorOf("a = \"1\" 2"), "line 1: text behind a quoted value");
   for (const char* text : {R"(a = "\)", R"(a = "\x")", R"(a = "\u12")", R"(a = "\u12g4")", R"(a = "\uD83D")",
-                           R"(a = "\u+123")", R"(a = "\u")"}) {
+                           R"(a = "\uD800")", R"(a = "\uDFFF")", R"(a = "\u+123")", R"(a = "\u")"}) {
     EXPECT_EQ(errorOf(text), "line 1: a backslash that stands for no character") << text;
   }
   EXPECT_EQ(errorOf("a = \x01"), "line 1: a control character");

@@ -166,6 +166,8 @@ TEST(Format, Integers) {
             "-9223372036854775808 9223372036854775807 1 2 3 -9223372036854775808");
   EXPECT_EQ(rt::format("%lu %llx", UINT64_MAX, UINT64_MAX), "18446744073709551615 ffffffffffffffff");
   EXPECT_EQ(rt::format("%d %d %d", true, 'a', short{3}), "1 97 3");
+  // Nothing separates thousands.
+  EXPECT_EQ(formatted("%'d", 1234567), "1234567");
   enum Small : unsigned char { kOne = 1 };
   enum Large : std::uint64_t { kTwo = 2 };
   EXPECT_EQ(rt::format("%d %lu", kOne, kTwo), "1 2");

@@ -47,6 +47,9 @@ TEST(Number, ConvertsItsValue) {
   EXPECT_EQ(rt::Number::of(-2.9)->unsignedValue(), 0U);
   EXPECT_EQ(rt::Number::of(1e300)->integerValue(), kLargest);
   EXPECT_EQ(rt::Number::of(-1e300)->integerValue(), kLeast);
+  EXPECT_EQ(rt::Number::of(2.9)->unsignedValue(), 2U);
+  EXPECT_EQ(rt::Number::of(1.5e19)->unsignedValue(), 15'000'000'000'000'000'000U);
+  EXPECT_EQ(rt::Number::of(18446744073709551616.0)->unsignedValue(), kLargestUnsigned);
   EXPECT_EQ(rt::Number::of(1e300)->unsignedValue(), kLargestUnsigned);
   EXPECT_EQ(rt::Number::of(kNan)->integerValue(), 0);
   EXPECT_EQ(rt::Number::of(kNan)->unsignedValue(), 0U);

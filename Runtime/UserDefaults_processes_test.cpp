@@ -18,6 +18,7 @@
 #include <string_view>
 #include <system_error>
 #include <thread>
+#include <utility>
 #include <vector>
 
 #include "Runtime/Weak.h"
@@ -169,7 +170,10 @@ TEST_F(UserDefaultsOfOthers, ReportWhatAnObserverThrows) {
     report = line.view();
     reported.release();
   });
-  const auto first = defaults->observe("key", Notify::kOnChange, [] { throw std::runtime_error("oh"); });
+  const auto first = defaults->observe("key", Notify::kOnChange, [isFirst = true]() mutable {
+    if (std::exchange(isFirst, false)) throw std::runtime_error("oh");
+    throw 1;
+  });
   const auto second = observe(defaults);
   inShell(R"(echo 'key = 1' > "$1")", path());
   reported.acquire();
@@ -177,6 +181,7 @@ TEST_F(UserDefaultsOfOthers, ReportWhatAnObserverThrows) {
   await("1"_s);
   inShell(R"(echo 'key = 2' > "$1")", path());
   reported.acquire();
+  EXPECT_EQ(report, "an observer of user defaults threw: an exception of an unknown type");
   await("2"_s);
   rt::UserDefaults::setReportHandler(nullptr);
 }

@@ -167,7 +167,9 @@ TEST(PropertyList, RefusesWhatIsMalformed) {
   EXPECT_THAT(errorOfDecoding(file("\x61\xD8\x3D"sv, {8})), HasSubstr("half a character"));
   EXPECT_THAT(errorOfDecoding(file("\x62\xD8\x3D\0a"sv, {8})), HasSubstr("half a character"));
   EXPECT_THAT(errorOfDecoding(file("\x61\xDE\0"sv, {8})), HasSubstr("half a character"));
+  EXPECT_THAT(errorOfDecoding(file("\x62\xDE\0\xDE\0"sv, {8})), HasSubstr("half a character"));
   EXPECT_THAT(errorOfDecoding(file("\x14\0\0\0\0\0\0\0\1\0\0\0\0\0\0\0\0"sv, {8})), HasSubstr("64 bits"));
+  EXPECT_THAT(errorOfDecoding(file("\x14\0\0\0\0\0\0\0\1\x80\0\0\0\0\0\0\0"sv, {8})), HasSubstr("64 bits"));
   EXPECT_THAT(errorOfDecoding(file("\x11\1"sv, {8})), HasSubstr("runs out of the file at byte 8"));
   EXPECT_THAT(errorOfDecoding(file("\x5F\x13\x7F\xFF\xFF\xFF\xFF\xFF\xFF\xFF"sv, {8})), HasSubstr("larger"));
   EXPECT_THAT(errorOfDecoding(file("\xAF\x13\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFF"sv, {8})), HasSubstr("larger"));
@@ -175,7 +177,7 @@ TEST(PropertyList, RefusesWhatIsMalformed) {
   EXPECT_THAT(errorOfDecoding(file("\x09"sv, {7})), HasSubstr("outside the file"));
   EXPECT_THAT(errorOfDecoding(file("\x09"sv, {9})), HasSubstr("outside the file"));
   EXPECT_THAT(errorOfDecoding(file("\x09"sv, {8}, 1)), HasSubstr("trailer"));
-  EXPECT_THAT(errorOfDecoding(file("\xA1\1"sv, {8})), HasSubstr("outside the table"));
+  EXPECT_THAT(errorOfDecoding(file("\xA1\1"sv, {8})), HasSubstr("outside the table at byte 8"));
   EXPECT_THAT(errorOfDecoding(file("\xA1\0"sv, {8})), HasSubstr("contains itself"));
   EXPECT_THAT(errorOfDecoding(file("\xA1\1\xA1\0"sv, {8, 10})), HasSubstr("contains itself"));
   EXPECT_THAT(errorOfDecoding(file("\xD1\1\1\x09"sv, {8, 11})), HasSubstr("no text"));

@@ -79,6 +79,21 @@ TEST(StandardError, RaisesNoSignalWhereTheReaderIsGone) {
   }
 }
 
+TEST(StandardError, LeavesTheSignalsOfTheThreadAsTheyAre) {
+  const StandardErrorPipe pipe;
+  for (const int how : {SIG_BLOCK, SIG_UNBLOCK}) {
+    sigset_t brokenPipe;
+    sigset_t previous;
+    sigset_t afterwards;
+    sigemptyset(&brokenPipe);
+    sigaddset(&brokenPipe, SIGPIPE);
+    pthread_sigmask(how, &brokenPipe, &previous);
+    StandardError::write("text", kLong);
+    pthread_sigmask(SIG_SETMASK, &previous, &afterwards);
+    EXPECT_EQ(sigismember(&afterwards, SIGPIPE), how == SIG_BLOCK ? 1 : 0);
+  }
+}
+
 TEST(StandardError, LeavesASignalOfOthersPending) {
   sigset_t brokenPipe;
   sigset_t previous;

@@ -126,6 +126,26 @@ TEST_F(DefaultsFile, ThatIsMissingHasAVersion) {
   EXPECT_THROW(file.content(1), std::system_error);
 }
 
+TEST_F(DefaultsFile, SaysWhatItCannotReadOrMake) {
+  const auto errorOf = [](const auto& act) -> std::string {
+    try {
+      act();
+    } catch (const std::system_error& error) {
+      return error.what();
+    }
+    return "";
+  };
+  fs::create_symlink("loop", folder_ / "loop");
+  const rt::DefaultsFile loop((folder_ / "loop").string());
+  EXPECT_THAT(errorOf([&] { loop.content(1); }), testing::HasSubstr(loop.path()));
+  EXPECT_FALSE(loop.isStill(loop.version()));
+  std::ofstream(folder_ / "file") << "no folder";
+  const rt::DefaultsFile below((folder_ / "file" / "folder" / "file").string());
+  EXPECT_EQ(below.content(1), std::nullopt);
+  EXPECT_THAT(errorOf([&] { below.lock(); }),
+              testing::StartsWith("cannot make the folder " + (folder_ / "file" / "folder").string()));
+}
+
 TEST_F(DefaultsFile, IsReadAndReplacedWhole) {
   const rt::DefaultsFile file((folder_ / "file").string());
   for (const std::size_t size : {0U, 1U, 4095U, 4096U, 4097U, 100000U}) {

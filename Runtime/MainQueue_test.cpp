@@ -2,12 +2,15 @@
 
 #include "Runtime/MainQueue.h"
 
+#include <fcntl.h>
 #include <gtest/gtest.h>
 #include <poll.h>
+#include <sys/resource.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <latch>
+#include <system_error>
 #include <thread>
 #include <vector>
 
@@ -193,6 +196,58 @@ TEST_F(MainQueueTest, TheForkingThreadIsTheChildsMainThread) {
     waitpid(child, &status, 0);
   }).join();
   EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << status;
+}
+
+/// Has the system refuse descriptors.
+class DescriptorRefusal {
+ public:
+  DescriptorRefusal() {
+    getrlimit(RLIMIT_NOFILE, &before_);
+    rlimit limit = before_;
+    limit.rlim_cur = 0;
+    setrlimit(RLIMIT_NOFILE, &limit);
+  }
+  ~DescriptorRefusal() { setrlimit(RLIMIT_NOFILE, &before_); }
+  DescriptorRefusal(const DescriptorRefusal&) = delete;
+  DescriptorRefusal& operator=(const DescriptorRefusal&) = delete;
+
+ private:
+  rlimit before_{};
+};
+
+TEST_F(MainQueueDeathTest, SaysThatThereIsNoDescriptorAndTriesAgain) {
+  EXPECT_EXIT(
+      {
+        {
+          const DescriptorRefusal refusal;
+          EXPECT_THROW(MainQueue::fileDescriptor(), std::system_error);
+        }
+        Queue::main()->async([] {});
+        _exit(isReadable(MainQueue::fileDescriptor()) && !HasFailure() ? 0 : 1);
+      },
+      testing::ExitedWithCode(0), "");
+}
+
+// Where there had been no queue before, it went on with its parent's.
+TEST_F(MainQueueDeathTest, TheChildOfAForkHasNoneWhereThereIsNone) {
+  EXPECT_EXIT(
+      {
+        const int ofParent = MainQueue::fileDescriptor();
+        const DescriptorRefusal refusal;
+        const pid_t child = fork();
+        if (child != 0) {
+          int status = -1;
+          waitpid(child, &status, 0);
+          _exit(WIFEXITED(status) ? WEXITSTATUS(status) : 3);
+        }
+        try {
+          MainQueue::fileDescriptor();
+        } catch (const std::system_error&) {
+          _exit(fcntl(ofParent, F_GETFD) == -1 ? 0 : 1);
+        }
+        _exit(2);
+      },
+      testing::ExitedWithCode(0), "");
 }
 
 TEST_F(MainQueueDeathTest, OnlyTheMainThreadRunsIt) {

@@ -2,6 +2,7 @@
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <sys/resource.h>
 
 #include <atomic>
 #include <cstdint>
@@ -18,8 +19,10 @@
 namespace {
 
 using Notify = rt::UserDefaults::Notify;
+using testing::Contains;
 using testing::ElementsAre;
 using testing::IsEmpty;
+using testing::StartsWith;
 
 TEST_F(UserDefaults, TellObserversOfChanges) {
   const auto defaults = this->defaults();
@@ -49,6 +52,25 @@ TEST_F(UserDefaults, TellObserversOfChanges) {
   defaults->setInteger(2, "key");
   EXPECT_EQ(calls.size(), 1U);
   EXPECT_THAT(reports(), IsEmpty());
+}
+
+// They are read anew at each request all the same.
+TEST_F(UserDefaults, SayThatTheyAreNotWatched) {
+  const auto defaults = this->defaults();
+  defaults->setInteger(1, "key");
+  int calls = 0;
+  rlimit before{};
+  getrlimit(RLIMIT_NOFILE, &before);
+  rlimit none = before;
+  none.rlim_cur = 0;
+  setrlimit(RLIMIT_NOFILE, &none);
+  const auto observation = defaults->observe("key", Notify::kOnChange, [&] { ++calls; });
+  setrlimit(RLIMIT_NOFILE, &before);
+  EXPECT_THAT(reports(),
+              Contains(StartsWith("user defaults are not watched for changes: " + path().string())));
+  defaults->setInteger(2, "key");
+  EXPECT_EQ(calls, 1);
+  EXPECT_EQ(defaults->integerForKey("key"), 2);
 }
 
 TEST_F(UserDefaults, LiveAsLongAsTheyAreObserved) {

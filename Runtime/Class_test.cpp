@@ -221,6 +221,16 @@ TEST(Cast, AllocatesNothing) {
   EXPECT_EQ(count.allocations(), 0);
 }
 
+// As where a class is in several of the objects that a program loads, and the system takes one of them for
+// all.
+TEST(Class, MayBeAnnouncedAgain) {
+  static constinit rt::detail::NamedEntry<rt::ClassInfo> entry{&rt::classInfo<Watch>()};
+  StandardErrorPipe standardError;
+  rt::detail::announce(entry);
+  EXPECT_EQ(standardError.text(), "");
+  EXPECT_EQ(rt::classNamed("Watch"), &rt::classInfo<Watch>());
+}
+
 // The model is dynamic_cast, which the tests may use although the runtime does not.
 TEST(Cast, AgreesWithTheCompiler) {
   const std::vector<rt::Ref<rt::Object>> objects = {rt::make<SystemClock>(), rt::make<QuartzClock>(),

@@ -9,6 +9,7 @@
 
 #include "AllocationCount.h"
 #include "Runtime/Ref.h"
+#include "tests/StandardErrorPipe.h"
 #include "tests/TestClocks.h"
 
 namespace {

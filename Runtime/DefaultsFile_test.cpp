@@ -2,20 +2,27 @@
 #include "Runtime/DefaultsFile.h"
 
 #include <dlfcn.h>
+#include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
+#include <sys/file.h>
 #include <sys/stat.h>
+#include <sys/wait.h>
+#include <unistd.h>
 
 #include <cerrno>
+#include <csignal>
 #include <cstdio>
 #include <ctime>
 #include <filesystem>
 #include <fstream>
+#include <optional>
 #include <stdexcept>
 #include <string>
 #include <system_error>
 #include <vector>
 
+#include "Runtime/FileDescriptor.h"
 #include "tests/ClockHook.h"
 
 namespace {
@@ -154,6 +161,22 @@ TEST_F(DefaultsFile, IsReadAndReplacedWhole) {
     EXPECT_EQ(file.content(100000), content);
   }
   EXPECT_EQ(std::distance(fs::directory_iterator(folder_), {}), 1);
+}
+
+// The child has the lock's file open, too, and may never end.
+TEST_F(DefaultsFile, IsUnlockedAlsoWhereAChildWasForkedMeanwhile) {
+  const rt::DefaultsFile file((folder_ / "file").string());
+  std::optional<rt::DefaultsFile::Lock> lock(file.lock());
+  const pid_t child = fork();
+  if (child == 0) {
+    for (;;) pause();
+  }
+  const rt::FileDescriptor folder = rt::FileDescriptor::open(folder_.string(), O_RDONLY | O_DIRECTORY);
+  EXPECT_NE(flock(folder.get(), LOCK_EX | LOCK_NB), 0);
+  lock.reset();
+  EXPECT_EQ(flock(folder.get(), LOCK_EX | LOCK_NB), 0);
+  kill(child, SIGKILL);
+  EXPECT_EQ(waitpid(child, nullptr, 0), child);
 }
 
 // After a loss of power the new name would stand for a file whose content had not been written, or the old

@@ -217,6 +217,9 @@ TEST(CollectionDescription, Empty) {
 TEST(CollectionDescription, OneElementALine) {
   EXPECT_EQ(rt::Array::of(number(2), number(1))->description(), "(\n    2,\n    1\n)");
   EXPECT_EQ(rt::Set::of(number(2), number(1))->description(), "{(\n    1,\n    2\n)}");
+  // Strings come before what only describes itself, and numbers before both.
+  EXPECT_EQ(rt::Set::of(rt::make<Stone>("a"_s), "b"_s, rt::make<Stone>("c"_s), number(3))->description(),
+            "{(\n    3,\n    b,\n    a,\n    c\n)}");
   EXPECT_EQ(rt::Dictionary::of({{"b"_s, number(1)}, {"a"_s, "x"_s}})->description(),
             "{\n    a = x;\n    b = 1;\n}");
 }

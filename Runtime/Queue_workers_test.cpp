@@ -3,6 +3,7 @@
 #if !defined(__APPLE__)
 
 #include <gtest/gtest.h>
+#include <sys/prctl.h>
 #include <sys/resource.h>
 #include <unistd.h>
 
@@ -164,12 +165,15 @@ TEST_F(QueueTest, WorkersDoNotBearTheNameOfWhoStartedThem) {
         rt::make<Queue>("test"_s, QualityOfService::kBackground, -15);  // A worker of its own.
     std::latch hasRun(1);
     rt::String name = "untouched"_s;
+    char ofSystem[16] = "";
     queue->async([&] {
       name = rt::Thread::currentName();
+      prctl(PR_GET_NAME, ofSystem);
       hasRun.count_down();
     });
     hasRun.wait();
     EXPECT_TRUE(name.isNull()) << name.view();
+    EXPECT_STRNE(ofSystem, "Importer");
   }).join();
 }
 

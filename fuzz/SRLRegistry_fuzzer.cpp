@@ -419,7 +419,7 @@ class Session {
   }
 
   void run() {
-    for (int i = 0; i < 200 && data_.remaining_bytes() > 0; ++i) step();
+    for (int i = 0; i < 80 && data_.remaining_bytes() > 0; ++i) step();
   }
 
  private:

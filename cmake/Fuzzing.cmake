@@ -23,7 +23,7 @@ function(mount_point_fuzzer name)
   target_link_options(${name} PRIVATE -fsanitize=fuzzer)
 
   file(GLOB seeds CONFIGURE_DEPENDS "${CMAKE_CURRENT_SOURCE_DIR}/corpus/${name}/*")
-  list(JOIN seeds "\n" seeds)
+  list(JOIN seeds "," seeds)
   file(CONFIGURE OUTPUT "${CMAKE_CURRENT_BINARY_DIR}/${name}.seeds" CONTENT "${seeds}")
   add_test(NAME ${name}.short-run COMMAND ${name} -runs=${fuzzer_RUNS} -seed=1 -timeout=20
     "-seed_inputs=@${CMAKE_CURRENT_BINARY_DIR}/${name}.seeds" "-artifact_prefix=${CMAKE_CURRENT_BINARY_DIR}/${name}.")

@@ -57,7 +57,11 @@ bool LogSocket::connect(int descriptor) const noexcept {
   std::strncpy(address.sun_path, path_, sizeof address.sun_path - 1);
   // Other threads may be sending at the same time, which the kernel keeps apart. The thread sanitizer takes
   // `connect` for the making of a descriptor that nobody may use yet; it does not look at the call itself.
-  return syscall(SYS_connect, descriptor, &address, sizeof address) == 0;
+  long result = -1;
+  do {
+    result = syscall(SYS_connect, descriptor, &address, sizeof address);
+  } while (result != 0 && errno == EINTR);
+  return result == 0;
 }
 
 LogSocket::Outcome LogSocket::send(const msghdr& message, const Patience& patience) noexcept {

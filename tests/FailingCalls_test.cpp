@@ -1,0 +1,329 @@
+// Files, user defaults, the system's log and call stacks, where a call of the system fails or is interrupted.
+//
+// The program runs itself once more for each call that a small program makes, and has strace fail that call:
+// interrupted, the program must do the whole of its work all the same; with another error it must do what is
+// documented, keep what it had, and leave nothing open.
+
+#include <fcntl.h>
+#include <gtest/gtest.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <array>
+#include <cerrno>
+#include <cstdio>
+#include <cstdlib>
+#include <filesystem>
+#include <fstream>
+#include <functional>
+#include <iterator>
+#include <map>
+#include <set>
+#include <span>
+#include <string>
+#include <string_view>
+#include <system_error>
+#include <thread>
+#include <vector>
+
+#include "PrivateJournal.h"
+#include "Process.h"
+#include "Runtime/CallStack.h"
+#include "Runtime/FileHandle.h"
+#include "Runtime/StandardError.h"
+#include "Runtime/SystemLog.h"
+#include "Runtime/UserDefaults.h"
+#include "Sanitizers.h"
+
+namespace {
+
+using namespace rt::literals;
+using rt::Ref;
+namespace fs = std::filesystem;
+
+// Why there is no private journal; empty when there is one.
+std::string journalRefusal;
+
+// How a program ends that has found something wrong.
+constexpr int kIsWrong = 3;
+constexpr unsigned kPatience = 60;
+
+// Between these the calls count: nothing else makes them.
+void begin() {
+  static_cast<void>(getppid());
+}
+void end() {
+  static_cast<void>(getppid());
+}
+
+void require(bool isRight, const char* what) {
+  if (isRight) return;
+  std::fprintf(stderr, "wrong: %s\n", what);
+  std::_Exit(kIsWrong);
+}
+
+std::size_t countOfDescriptors() {
+  return static_cast<std::size_t>(std::distance(fs::directory_iterator("/proc/self/fd"), {}));
+}
+
+std::string contentOf(const fs::path& path) {
+  std::ifstream stream(path);
+  return {std::istreambuf_iterator<char>(stream), {}};
+}
+
+// Appends to a file. What was written is whole lines, or the start of one where an error was thrown.
+void writeFile(const fs::path& folder, bool isInterrupted) {
+  const fs::path path = folder / "log";
+  begin();
+  bool isWhole = true;
+  {
+    const Ref<rt::FileHandle> handle =
+        rt::FileHandle::openForAppending(rt::String::fromUTF8(path.string()), 0600);
+    isWhole = handle != nullptr;
+    try {
+      if (handle) handle->writeLine("first");
+    } catch (const std::system_error&) {
+      isWhole = false;
+    }
+    try {
+      if (handle) handle->writeLine(std::string(5000, 'x'));
+    } catch (const std::system_error&) {
+      isWhole = false;
+    }
+  }
+  end();
+  require(isWhole || !isInterrupted, "a line was not written");
+  if (isWhole) require(contentOf(path) == "first\n" + std::string(5000, 'x') + "\n", "the lines");
+}
+
+// Changes a setting. The file has the old settings or the new ones, and there is no other file.
+void changeDefaults(const fs::path& folder, bool isInterrupted) {
+  const fs::path path = folder / "defaults.conf";
+  std::ofstream(path) << "kept = 1\n";
+  fs::permissions(path, fs::perms::owner_read | fs::perms::owner_write | fs::perms::group_read);
+  int reports = 0;
+  rt::UserDefaults::setReportHandler([&](const rt::String&) { ++reports; });
+  const std::string text = path.string();
+  begin();
+  bool isWhole = true;
+  int calls = 0;
+  {
+    const Ref<rt::UserDefaults> defaults = rt::UserDefaults::initWithPath(rt::String::fromUTF8(text));
+    const rt::UserDefaults::Observation observation =
+        defaults->observe("key", rt::UserDefaults::Notify::kAlsoNow, [&] { ++calls; });
+    try {
+      defaults->setString("new"_s, "key");
+    } catch (const std::system_error&) {
+      isWhole = false;
+    }
+    if (isInterrupted) {
+      require(defaults->integerForKey("kept") == 1, "what was there is not found");
+      require(defaults->stringForKey("key") == "new", "what was set is not found");
+    }
+  }
+  end();
+  require(calls >= 1 && calls <= 2, "the observer");
+  if (isInterrupted) {
+    require(isWhole, "it was not set");
+    require(calls == 2 && reports == 0, "the observer, or a report");
+    require((fs::status(path).permissions() & fs::perms::group_read) != fs::perms::none, "the mode");
+  }
+  const std::string content = contentOf(path);
+  require(content == "kept = 1\nkey = new\n" || (!isWhole && content == "kept = 1\n"), "the file");
+  require(std::distance(fs::directory_iterator(folder), {}) == 1, "another file");
+}
+
+void logToSystem(const fs::path& /*folder*/, bool isInterrupted) {
+  const rt::SystemLog log("com.example.test"_s, "calls"_s);
+  // Larger than a datagram.
+  const std::string large(1000000, 'x');
+  begin();
+  errno = EXDEV;
+  log.write(rt::SystemLog::Type::error, "short");
+  log.write(rt::SystemLog::Type::info, large);
+  log.write(rt::SystemLog::Type::info, "last");
+  const int error = errno;
+  end();
+  require(error == EXDEV, "errno");
+  require(rt::SystemLog::droppedCount() <= 1, "more was dropped than failed");
+  if (isInterrupted) require(rt::SystemLog::droppedCount() == 0, "something was dropped");
+}
+
+void writeError(const fs::path& /*folder*/, bool isInterrupted) {
+  begin();
+  const bool isWritten = rt::StandardError::write("a line\n", std::chrono::seconds(1));
+  end();
+  require(isWritten || !isInterrupted, "it was not written");
+}
+
+void describeCallStack(const fs::path& /*folder*/, bool /*isInterrupted*/) {
+  std::array<std::uint64_t, 16> addresses{};
+  const std::size_t count = rt::CallStack::capture(addresses);
+  begin();
+  const std::vector<rt::String> lines = rt::CallStack::symbols(std::span(addresses).first(count));
+  end();
+  require(lines.size() == count, "the lines");
+}
+
+using Program = void (*)(const fs::path& folder, bool isInterrupted);
+const std::map<std::string_view, Program> kPrograms = {{"file", writeFile},
+                                                       {"defaults", changeDefaults},
+                                                       {"log", logToSystem},
+                                                       {"error", writeError},
+                                                       {"stack", describeCallStack}};
+
+int runProgram(std::string_view name, const fs::path& folder, std::string_view call, std::string_view error) {
+  // For what would wait for ever.
+  alarm(kPatience);
+  const std::size_t before = countOfDescriptors();
+  kPrograms.at(name)(folder, error == "EINTR");
+  // The log keeps a socket for each daemon. A call of `close` that fails on strace's word closes nothing.
+  if (call == "close" || name == "log") return 0;
+  // The thread that watches for changes of defaults closes what it has when it ends.
+  while (name == "defaults" && countOfDescriptors() > before) std::this_thread::yield();
+  require(countOfDescriptors() == before, "a file is open");
+  return 0;
+}
+
+// A call of the system, by its name and as the how-manieth of that name.
+struct Call {
+  std::string name;
+  int number = 0;
+  bool mayFail = true;
+};
+
+class FailingCalls : public testing::Test {
+ protected:
+  void SetUp() override {
+    if (RT_TEST_ADDRESS_SANITIZER || RT_TEST_THREAD_SANITIZER)
+      GTEST_SKIP() << "calls of the sanitizer's own would fail as well";
+    const std::string refused = tracingRefusal();
+    if (!refused.empty()) GTEST_SKIP() << refused;
+  }
+
+  void TearDown() override { forgetTrace(); }
+
+  // Has each call fail that the program `name` makes.
+  void tryEachCall(const std::string& name) {
+    static const std::set<std::string> kInterruptible = {"open",   "openat", "read",    "pread64", "write",
+                                                         "writev", "close",  "fsync",   "flock",   "fchmod",
+                                                         "fchown", "poll",   "connect", "sendmsg"};
+    static const std::set<std::string> kOthers = {
+        "access",     "dup",          "eventfd2", "faccessat",     "faccessat2",        "fcntl",
+        "fstat",      "getcwd",       "ioctl",    "inotify_init1", "inotify_add_watch", "inotify_rm_watch",
+        "lseek",      "memfd_create", "mkdir",    "newfstatat",    "readlink",          "rename",
+        "setsockopt", "socket",       "stat"};
+    run(name, {}, "");
+    const std::vector<Call> calls = callsInTrace();
+    int interrupted = 0;
+    int failed = 0;
+    for (const Call& call : calls) {
+      const bool isInterruptible = kInterruptible.contains(call.name);
+      if (isInterruptible) {
+        runWith(name, call, "EINTR");
+        ++interrupted;
+      }
+      if (call.mayFail && (isInterruptible || kOthers.contains(call.name))) {
+        runWith(name, call, "EIO");
+        ++failed;
+      }
+      if (HasFailure()) return;
+    }
+    std::printf("%d calls interrupted, %d failed\n", interrupted, failed);
+    EXPECT_GT(failed, 0);
+  }
+
+ private:
+  void forgetTrace() const {
+    std::error_code error;
+    fs::remove(trace_, error);
+  }
+
+  void runWith(const std::string& name, const Call& call, const std::string& error) {
+    run(name, call, error);
+    const std::string what = call.name + " " + std::to_string(call.number) + " with " + error;
+    EXPECT_NE(contentOf(trace_).find("(INJECTED)"), std::string::npos) << what << " was not made";
+    if (HasFailure()) FAIL() << what;
+  }
+
+  void run(const std::string& name, const Call& call, const std::string& error) {
+    std::string folder = testing::TempDir() + "failing-calls.XXXXXX";
+    ASSERT_NE(mkdtemp(folder.data()), nullptr);
+    forgetTrace();
+    trace_ = folder + ".trace";
+    std::vector<std::string> whole = {"strace", "-y", "-qq", "-o", trace_};
+    if (!error.empty()) {
+      whole.insert(whole.end(), {"-e", "inject=" + call.name + ":error=" + error +
+                                           ":when=" + std::to_string(call.number)});
+    }
+    whole.insert(whole.end(),
+                 {fs::read_symlink("/proc/self/exe"), "--program", name, folder, call.name, error});
+    const ProcessResult result = runProcess(whole);
+    fs::remove_all(folder);
+    EXPECT_EQ(result.signal, 0) << result.standardError;
+    EXPECT_EQ(result.exitStatus, 0) << result.standardError;
+    if (error == "EINTR") {
+      EXPECT_EQ(result.standardError, name == "error" ? "a line\n" : "");
+    }
+  }
+
+  std::vector<Call> callsInTrace() const {
+    std::ifstream stream(trace_);
+    std::map<std::string, int> counts;
+    std::vector<Call> calls;
+    int marks = 0;
+    for (std::string line; std::getline(stream, line);) {
+      const std::string name = line.substr(0, line.find('('));
+      const int number = ++counts[name];
+      if (name == "getppid") {
+        ++marks;
+      } else if (marks == 1) {
+        // A thread is woken by a counter in memory, to which adding 1 cannot fail.
+        const bool wakes = name == "write" && line.find("[eventfd]") != std::string::npos;
+        calls.push_back({name, number, !wakes});
+      }
+    }
+    EXPECT_EQ(marks, 2);
+    return calls;
+  }
+
+  std::string trace_;
+};
+
+TEST_F(FailingCalls, OfFiles) {
+  tryEachCall("file");
+}
+
+TEST_F(FailingCalls, OfDefaults) {
+  tryEachCall("defaults");
+}
+
+TEST_F(FailingCalls, OfStandardError) {
+  tryEachCall("error");
+}
+
+TEST_F(FailingCalls, OfCallStacks) {
+  tryEachCall("stack");
+}
+
+TEST_F(FailingCalls, OfTheJournal) {
+  if (!PrivateJournal::entered()) GTEST_SKIP() << journalRefusal;
+  PrivateJournal journal;
+  journal.start();
+  tryEachCall("log");
+}
+
+}  // namespace
+
+int main(int argumentCount, char** arguments) {
+  if (argumentCount == 6 && std::string_view(arguments[1]) == "--program")
+    return runProgram(arguments[2], arguments[3], arguments[4], arguments[5]);
+  testing::InitGoogleTest(&argumentCount, arguments);
+  if (testing::GTEST_FLAG(list_tests)) return RUN_ALL_TESTS();
+  try {
+    PrivateJournal::enter();
+  } catch (const std::exception& problem) {
+    journalRefusal = std::string("no private journal: ") + problem.what();
+  }
+  return RUN_ALL_TESTS();
+}

@@ -27,4 +27,5 @@ function(mount_point_fuzzer name)
   file(CONFIGURE OUTPUT "${CMAKE_CURRENT_BINARY_DIR}/${name}.seeds" CONTENT "${seeds}")
   add_test(NAME ${name}.short-run COMMAND ${name} -runs=${fuzzer_RUNS} -seed=1 -timeout=20
     "-seed_inputs=@${CMAKE_CURRENT_BINARY_DIR}/${name}.seeds" "-artifact_prefix=${CMAKE_CURRENT_BINARY_DIR}/${name}.")
+  set_tests_properties(${name}.short-run PROPERTIES FAIL_REGULAR_EXPRESSION "starting from an empty corpus")
 endfunction()

@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "Runtime/ThreadIdentifier.h"
+#include "tests/Sanitizers.h"
 
 namespace {
 
@@ -198,6 +199,8 @@ TEST_F(MainQueueTest, TheForkingThreadIsTheChildsMainThread) {
   EXPECT_TRUE(WIFEXITED(status) && WEXITSTATUS(status) == 0) << status;
 }
 
+constexpr const char* kSanitizerNeedsDescriptors = "the address sanitizer needs descriptors for its checks";
+
 /// Has the system refuse descriptors.
 class DescriptorRefusal {
  public:
@@ -216,6 +219,7 @@ class DescriptorRefusal {
 };
 
 TEST_F(MainQueueDeathTest, SaysThatThereIsNoDescriptorAndTriesAgain) {
+  if (RT_TEST_ADDRESS_SANITIZER) GTEST_SKIP() << kSanitizerNeedsDescriptors;
   EXPECT_EXIT(
       {
         {
@@ -230,6 +234,7 @@ TEST_F(MainQueueDeathTest, SaysThatThereIsNoDescriptorAndTriesAgain) {
 
 // Where there had been no queue before, it went on with its parent's.
 TEST_F(MainQueueDeathTest, TheChildOfAForkHasNoneWhereThereIsNone) {
+  if (RT_TEST_ADDRESS_SANITIZER) GTEST_SKIP() << kSanitizerNeedsDescriptors;
   EXPECT_EXIT(
       {
         const int ofParent = MainQueue::fileDescriptor();

@@ -30,6 +30,7 @@
 #include "Runtime/Thread.h"
 #include "Runtime/UserDefaults.h"
 #include "Runtime/Weak.h"
+#include "Sanitizers.h"
 #include "WithoutMemory.h"
 
 namespace {
@@ -207,7 +208,12 @@ TEST(WithoutMemory, WritesFiles) {
 TEST(WithoutMemory, DescribesCallStacks) {
   tryEachAllocation([] {
     std::array<std::uint64_t, 64> addresses{};
-    const std::size_t count = std::min<std::size_t>(rt::CallStack::capture(addresses), 2);
+    std::size_t count = std::min<std::size_t>(rt::CallStack::capture(addresses), 2);
+    if (RT_TEST_ADDRESS_SANITIZER || RT_TEST_THREAD_SANITIZER) {
+      // Instrumented programs have so many symbols that reading them over and over takes minutes.
+      addresses[0] = reinterpret_cast<std::uint64_t>(&std::getenv);
+      count = 1;
+    }
     const int before = nextDescriptor();
     try {
       const std::vector<rt::String> lines = rt::CallStack::symbols(std::span(addresses).first(count));

@@ -1,13 +1,13 @@
 #include "Runtime/Bundle.h"
 
-#include "Runtime/ForkSafeLock.h"
 #include "Runtime/SystemBundle.h"
+#include "Runtime/UnfairLock.h"
 
 namespace rt::Bundle {
 
 namespace {
 
-constinit ForkSafeLock lock;
+constinit UnfairLock lock;
 // Never destroyed: identifiers are asked for until the process is gone.
 constinit Object* chosen RT_GUARDED_BY(lock) = nullptr;
 

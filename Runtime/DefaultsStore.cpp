@@ -6,13 +6,13 @@
 #include <algorithm>
 #include <chrono>
 #include <csignal>
-#include <new>
 #include <stdexcept>
 #include <system_error>
 #include <thread>
 #include <utility>
 
 #include "Runtime/Exception.h"
+#include "Runtime/Lazy.h"
 #include "Runtime/StandardError.h"
 #include "Runtime/Thread.h"
 #include "Runtime/UTF8.h"
@@ -21,12 +21,12 @@ namespace rt::detail {
 
 namespace {
 
-constinit ForkSafeLock reportLock;
+constinit UnfairLock reportLock;
 
 // Never destroyed: the thread that waits for changes may report until the process is gone.
 Block<void(const String&)>& reportHandler() RT_REQUIRES(reportLock) {
-  static auto& handler = *new Block<void(const String&)>();
-  return handler;
+  static constinit Lazy<Block<void(const String&)>> handler;
+  return handler.get([] { return Block<void(const String&)>(); });
 }
 
 std::string textOf(const std::exception_ptr& exception) {
@@ -82,7 +82,7 @@ void reportDefaults(std::initializer_list<std::string_view> parts) noexcept {
   }
 }
 
-constinit ForkSafeLock DefaultsStore::lock_;
+constinit UnfairLock DefaultsStore::lock_;
 
 DefaultsStore::DefaultsStore(std::string path, std::string problem)
     : file_(std::move(path)), placeProblem_(std::move(problem)), process_(getpid()) {}
@@ -107,10 +107,6 @@ void DefaultsStore::change(std::string_view key, std::optional<std::string_view>
   if (file_.path().empty()) fail(placeProblem_);
   std::string problem;
   Observers observers;
-  {
-    const LockGuard guard(lock_);
-    forgetParent();
-  }
   {
     const LockGuard guard(changeLock_);
     const DefaultsFile::Lock lock = file_.lock();
@@ -154,7 +150,7 @@ std::shared_ptr<DefaultsObserver> DefaultsStore::observe(std::string_view key, b
     watchProblem = startWatching();
     readProblem = refresh();
     if (alsoNow) {
-      observer->caller = currentThreadIdentifier();
+      observer->caller = currentThreadToken();
     } else {
       observer->seen = find(key);
     }
@@ -178,7 +174,7 @@ void DefaultsStore::remove(DefaultsObserver& observer) noexcept {
   forgetParent();
   observer.isRemoved = true;
   std::erase_if(observers_, [&](const auto& each) { return each.get() == &observer; });
-  while (observer.isRunning && observer.caller != currentThreadIdentifier()) {
+  while (observer.isRunning && observer.caller != currentThreadToken()) {
     const std::uint32_t ended = endedCalls_;
     lock_.unlock();
     endedCalls_.wait(ended);
@@ -200,16 +196,11 @@ void DefaultsStore::forgetParent() {
   if (process_ == process) return;
   process_ = process;
   watch_ = nullptr;
-  new (&changeLock_) UnfairLock;
   for (const auto& observer : observers_) {
-    if (observer->caller == 0) continue;
-    if (isOrWasCurrentThread(observer->caller)) {
-      // It forks in the observer, which goes on in the child as well.
-      observer->caller = currentThreadIdentifier();
-    } else {
-      observer->caller = 0;
-      observer->isRunning = false;
-    }
+    // One in which the thread forks goes on in the child as well.
+    if (observer->caller == 0 || !isThreadGone(observer->caller)) continue;
+    observer->caller = 0;
+    observer->isRunning = false;
   }
 }
 
@@ -302,12 +293,13 @@ std::shared_ptr<SystemFileWatch> DefaultsStore::renewedWatch() noexcept {
 
 DefaultsStore::Observers DefaultsStore::claim(std::string& problem) {
   const LockGuard guard(lock_);
+  forgetParent();
   problem = refresh();
   Observers claimed;
   claimed.reserve(observers_.size());
   for (const auto& observer : observers_) {
     if (observer->caller != 0 || hasSeen(*observer)) continue;
-    observer->caller = currentThreadIdentifier();
+    observer->caller = currentThreadToken();
     claimed.push_back(observer);
   }
   return claimed;

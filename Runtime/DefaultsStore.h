@@ -17,7 +17,7 @@
 #include "Runtime/Block.h"
 #include "Runtime/DefaultsFile.h"
 #include "Runtime/DefaultsText.h"
-#include "Runtime/ForkSafeLock.h"
+#include "Runtime/LongLock.h"
 #include "Runtime/String.h"
 #include "Runtime/SystemFileWatch.h"
 #include "Runtime/ThreadIdentifier.h"
@@ -39,7 +39,7 @@ struct DefaultsObserver {
   /// The value that it has been called for.
   std::optional<std::string> seen;
   /// The thread that calls it or is about to; 0 for none.
-  ThreadIdentifier caller = 0;
+  ThreadToken caller = 0;
   bool isRunning = false;
   bool isRemoved = false;
 };
@@ -63,7 +63,7 @@ class DefaultsStore : public std::enable_shared_from_this<DefaultsStore> {
 
  private:
   // Forgets, in the child of a fork, the threads that it does not have, and what they were doing. Comes first
-  // wherever they count.
+  // wherever observers and the thread count.
   void forgetParent() RT_REQUIRES(lock_);
 
   // Reads the file if it has changed. Returns what is to be reported, without the lock; "" for nothing.
@@ -92,9 +92,9 @@ class DefaultsStore : public std::enable_shared_from_this<DefaultsStore> {
 
   const DefaultsFile file_;
   // Held while the file is being changed, until the observers are claimed; taken before `lock_`.
-  UnfairLock changeLock_;
+  LongLock changeLock_;
   // One for all stores, of which a process has hardly more than one.
-  static constinit ForkSafeLock lock_;
+  static constinit UnfairLock lock_;
   DefaultsText text_ RT_GUARDED_BY(lock_);
   DefaultsFile::Version version_ RT_GUARDED_BY(lock_);
   // What was reported last, until it is no longer so.

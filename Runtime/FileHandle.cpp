@@ -12,6 +12,8 @@
 #include <system_error>
 
 #include "Runtime/FileDescriptor.h"
+#include "Runtime/Lazy.h"
+#include "Runtime/UnfairLock.h"
 
 namespace rt {
 
@@ -82,14 +84,13 @@ FileHandle::~FileHandle() {
 }
 
 Ref<FileHandle> FileHandle::standardOutput() {
-  // Never destroyed: programs write until the process is gone.
-  static FileHandle* const handle = make<FileHandle>(STDOUT_FILENO, Closing::leavesOpen).detach();
-  return handle;
+  static constinit Lazy<Ref<FileHandle>> handle;
+  return handle.get([] { return make<FileHandle>(STDOUT_FILENO, Closing::leavesOpen); });
 }
 
 Ref<FileHandle> FileHandle::standardError() {
-  static FileHandle* const handle = make<FileHandle>(STDERR_FILENO, Closing::leavesOpen).detach();
-  return handle;
+  static constinit Lazy<Ref<FileHandle>> handle;
+  return handle.get([] { return make<FileHandle>(STDERR_FILENO, Closing::leavesOpen); });
 }
 
 Ref<FileHandle> FileHandle::openForAppending(const String& path, std::uint16_t mode) {

@@ -9,8 +9,8 @@
 /// Lines of different threads do not mix, and neither do those of processes that append to one file: a
 /// line and its end are handed to the system in one piece, and the rest of a piece that the system took
 /// only in part goes out before any other line of this handle. Every operation is safe on any thread. In the
-/// child of a fork a handle goes on, unless another thread was writing a line with it as the process
-/// forked: then the child would wait for ever.
+/// child of a fork a handle goes on, also where another thread was writing a line with it as the process
+/// forked: that line is the parent's to end.
 ///
 /// Not for: reading; files that are rewritten in place.
 
@@ -18,10 +18,10 @@
 #include <string_view>
 
 #include "Runtime/Class.h"
+#include "Runtime/LongLock.h"
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
-#include "Runtime/UnfairLock.h"
 #include "Runtime/Visibility.h"
 
 namespace rt {
@@ -58,7 +58,7 @@ class RT_VISIBLE FileHandle final : public Implements<FileHandle, Object> {
  private:
   const int descriptor_;
   const Closing closing_;
-  UnfairLock lock_;
+  LongLock lock_;
   // Whether the system took only a part of the last line.
   bool isInLine_ RT_GUARDED_BY(lock_) = false;
 };

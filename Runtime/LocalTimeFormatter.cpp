@@ -29,7 +29,7 @@ void putMilliseconds(char* place, std::int64_t milliseconds) noexcept {
 
 }  // namespace
 
-constinit ForkSafeLock LocalTimeFormatter::lock_;
+constinit UnfairLock LocalTimeFormatter::lock_;
 
 bool LocalTimeFormatter::parse(std::string_view pattern, std::vector<Piece>& pieces) {
   constexpr std::pair<std::string_view, Field> kFields[] = {

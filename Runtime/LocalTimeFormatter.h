@@ -32,10 +32,10 @@
 #include <vector>
 
 #include "Runtime/Class.h"
-#include "Runtime/ForkSafeLock.h"
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/String.h"
+#include "Runtime/UnfairLock.h"
 #include "Runtime/Visibility.h"
 
 namespace rt {
@@ -74,7 +74,7 @@ class RT_VISIBLE LocalTimeFormatter final : public Implements<LocalTimeFormatter
   const std::vector<Piece> pieces_;
 
   // One for all formatters, as it is for the system's function, whose own lock a fork must not catch either.
-  static constinit ForkSafeLock lock_;
+  static constinit UnfairLock lock_;
   // The text of `second_`, with three digits to be filled in at each of `milliseconds_`.
   bool isRendered_ RT_GUARDED_BY(lock_) = false;
   std::time_t second_ RT_GUARDED_BY(lock_) = 0;

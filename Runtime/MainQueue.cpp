@@ -3,6 +3,7 @@
 #include <cstdio>
 #include <cstdlib>
 
+#include "Runtime/Lazy.h"
 #include "Runtime/ThreadIdentifier.h"
 
 namespace rt {
@@ -11,8 +12,8 @@ constinit detail::WakeDescriptor MainQueue::wakeDescriptor_;
 constinit std::atomic<bool> MainQueue::isStopping_ = false;
 
 MainQueue& MainQueue::instance() {
-  static auto* const queue = new MainQueue;  // For ever: tasks are queued until the very end.
-  return *queue;
+  static constinit Lazy<Ref<MainQueue>> queue;
+  return *queue.get([] { return Ref<MainQueue>::adopt(new MainQueue); });
 }
 
 bool MainQueue::mayRunHere() const noexcept {

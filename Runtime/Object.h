@@ -34,6 +34,8 @@ struct ClassInfo;
 struct ProtocolInfo;
 class String;
 template <class T>
+class AtomicRef;
+template <class T>
 class Ref;
 
 namespace detail {
@@ -107,6 +109,8 @@ class Object {
 
  private:
   friend class detail::WeakCell;
+  template <class T>
+  friend class AtomicRef;
 
   // The count is below both bits as long as the object lives. While the object is being destroyed
   // kDestroying is set, so that references which come and go in a destructor do not destroy it again. A
@@ -120,6 +124,15 @@ class Object {
     return (count_.load(std::memory_order_relaxed) & (kImmortal | kDestroying)) == kDestroying;
   }
   bool retainUnlessDestroyed() const noexcept;
+
+  // As many calls of `retain`, or of `release` by somebody who has one reference more.
+  void retainTimes(std::uint32_t times) const noexcept {
+    if (!isImmortal()) count_.fetch_add(times, std::memory_order_relaxed);
+  }
+  void releaseTimes(std::uint32_t times) const noexcept {
+    if (!isImmortal()) count_.fetch_sub(times, std::memory_order_acq_rel);
+  }
+
   [[gnu::noinline]] void destroy() const noexcept;
   [[gnu::cold]] void checkNotEscaped() const noexcept;
 

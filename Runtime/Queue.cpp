@@ -4,7 +4,6 @@
 #include <cstdio>
 #include <cstdlib>
 #include <exception>
-#include <new>
 
 #include "Runtime/MainQueue.h"
 #include "Runtime/QueueRegistry.h"
@@ -286,11 +285,9 @@ bool Queue::isShortOfThreads() const noexcept {
   return detail::WorkerPool::isShort(qualityOfService_, relativePriority_);
 }
 
-// Not analysed: there is no other thread, and whichever held the lock is gone. The tasks are the parent's
-// and are forgotten, not destroyed. The reference that a busy queue has to itself stays, if it was to be
-// given up by a thread that is gone.
+// Not analysed: there is no other thread. The tasks are the parent's and are forgotten, not destroyed. The
+// reference that a busy queue has to itself stays, if it was to be given up by a thread that is gone.
 void Queue::resetAfterFork() noexcept RT_NO_THREAD_SAFETY_ANALYSIS {
-  new (&lock_) UnfairLock;
   isRunning_ = isCurrent();
   isScheduled_ = false;
   tasks_ = {};

@@ -6,14 +6,13 @@
 #include <cstdint>
 #include <cstdio>
 #include <cstdlib>
-#include <new>
 #include <vector>
 
 #include "Runtime/AddressWait.h"
+#include "Runtime/Lazy.h"
 #include "Runtime/MainQueue.h"
 #include "Runtime/Queue.h"
 #include "Runtime/Ref.h"
-#include "Runtime/ThreadIdentifier.h"
 
 namespace rt::detail {
 
@@ -32,7 +31,7 @@ constinit std::atomic<bool> QueueRegistry::isExiting_ = false;
 constinit Queue* QueueRegistry::first_ = nullptr;
 
 void QueueRegistry::add(Queue& queue) {
-  registerForkHandlers();
+  registerForkHandler();
   LockGuard guard(lock);
   queue.next_ = first_;
   if (first_ != nullptr) first_->previous_ = &queue;
@@ -55,8 +54,11 @@ void QueueRegistry::changeExitEvents() noexcept {
 }
 
 void QueueRegistry::drainAtExit() {
-  static const auto deadline = std::chrono::steady_clock::now() +
-                               std::chrono::nanoseconds(exitPatience.load(std::memory_order_relaxed));
+  static constinit Lazy<std::chrono::steady_clock::time_point> end;
+  const std::chrono::steady_clock::time_point deadline = end.get([] {
+    return std::chrono::steady_clock::now() +
+           std::chrono::nanoseconds(exitPatience.load(std::memory_order_relaxed));
+  });
   static bool hasGivenUp = false;
   if (hasGivenUp) return;
   isExiting_ = true;
@@ -105,20 +107,17 @@ bool QueueRegistry::runUntilIdle(std::chrono::steady_clock::time_point deadline)
   return false;
 }
 
-void QueueRegistry::registerForkHandlers() noexcept {
+void QueueRegistry::registerForkHandler() noexcept {
   static constinit std::atomic<bool> isRegistered = false;
   if (isRegistered.load(std::memory_order_relaxed) || isRegistered.exchange(true)) return;
-  currentThreadIdentifier();  // Its handler comes first, so that ours knows the thread.
-  pthread_atfork([]() RT_NO_THREAD_SAFETY_ANALYSIS { lock.lock(); },
-                 []() RT_NO_THREAD_SAFETY_ANALYSIS { lock.unlock(); }, resetAfterFork);
+  pthread_atfork(nullptr, nullptr, resetAfterFork);
 }
 
-// Not analysed: the lock has been taken before the fork and is made anew.
-void QueueRegistry::resetAfterFork() noexcept RT_NO_THREAD_SAFETY_ANALYSIS {
+void QueueRegistry::resetAfterFork() noexcept {
   WorkerPool::resetAfterFork();
   MainQueue::wakeDescriptor_.renewAfterFork();
+  const LockGuard guard(lock);
   for (Queue* queue = first_; queue != nullptr; queue = queue->next_) queue->resetAfterFork();
-  new (&lock) UnfairLock;
 }
 
 }  // namespace rt::detail

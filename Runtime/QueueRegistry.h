@@ -38,7 +38,7 @@ class QueueRegistry {
   static constinit UnfairLock lock;
 
  private:
-  static void registerForkHandlers() noexcept;
+  static void registerForkHandler() noexcept;
   static void registerExitHandler() noexcept;
   static void changeExitEvents() noexcept;
   static void drainAtExit();

@@ -2,34 +2,30 @@
 
 namespace rt {
 
-bool RecursiveLock::isHeldByCaller() const noexcept {
-  const ThreadIdentifier owner = owner_.load(std::memory_order_relaxed);
-  return owner != 0 && isOrWasCurrentThread(owner);
-}
+// The depth begins anew with each holder: one that a fork has left behind leaves its own in the child.
 
 // Not analysed: whether the inner lock is taken or only counted is known at run time.
 void RecursiveLock::lock() noexcept RT_NO_THREAD_SAFETY_ANALYSIS {
-  if (!isHeldByCaller()) {
+  if (lock_.isHeldByCaller()) {
+    ++depth_;
+  } else {
     lock_.lock();
-    owner_.store(currentThreadIdentifier(), std::memory_order_relaxed);
+    depth_ = 1;
   }
-  ++depth_;
 }
 
 bool RecursiveLock::tryLock() noexcept RT_NO_THREAD_SAFETY_ANALYSIS {
-  if (!isHeldByCaller()) {
-    if (!lock_.tryLock()) return false;
-    owner_.store(currentThreadIdentifier(), std::memory_order_relaxed);
+  if (lock_.isHeldByCaller()) {
+    ++depth_;
+    return true;
   }
-  ++depth_;
+  if (!lock_.tryLock()) return false;
+  depth_ = 1;
   return true;
 }
 
 void RecursiveLock::unlock() noexcept RT_NO_THREAD_SAFETY_ANALYSIS {
-  if (isHeldByCaller()) {
-    if (--depth_ != 0) return;
-    owner_.store(0, std::memory_order_relaxed);
-  }
+  if (lock_.isHeldByCaller() && --depth_ != 0) return;
   lock_.unlock();  // Ends the program when the caller does not hold it.
 }
 

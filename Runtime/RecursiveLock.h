@@ -10,17 +10,16 @@
 ///
 /// It is let go when it has been unlocked as often as it was locked. Letting go a lock that another
 /// thread, or none, holds ends the program with a line on standard error. Otherwise as
-/// Runtime/UnfairLock.h.
+/// Runtime/LongLock.h, also where a fork is concerned.
 ///
 /// Not for: code that can be arranged to take its lock once. The annotations see one function at a time,
 /// so a function that itself takes the lock twice does not compile with clang.
 
-#include <atomic>
 #include <cstdint>
 
-#include "Runtime/ThreadIdentifier.h"
+#include "Runtime/OwnerLock.h"
 #include "Runtime/ThreadSafety.h"
-#include "Runtime/UnfairLock.h"
+#include "Runtime/UnfairLock.h"  // LockGuard
 
 namespace rt {
 
@@ -44,11 +43,7 @@ class RT_CAPABILITY("lock") RecursiveLock {
   void assertOwner() const noexcept RT_ASSERT_CAPABILITY(this);
 
  private:
-  bool isHeldByCaller() const noexcept;
-
-  UnfairLock lock_;
-  // Only its holder writes it, and only the holder finds itself in it.
-  std::atomic<ThreadIdentifier> owner_ = 0;
+  detail::OwnerLock lock_;
   std::uint32_t depth_ = 0;  // The holder's.
 };
 

@@ -8,6 +8,8 @@
 #include <thread>
 #include <vector>
 
+#include "tests/ForkTest.h"
+
 namespace {
 
 using rt::LockGuard;
@@ -115,6 +117,35 @@ TEST(RecursiveLock, HeldAcrossForkIsTheForkingThreadsInTheChild) {
     return status;
   };
   EXPECT_EQ(forkWithTheLock(), 0);
+}
+
+// Its depth, too, is the other thread's.
+TEST(RecursiveLock, HeldByAnotherThreadIsFreeInTheChildOfAFork) {
+  RecursiveLock lock;
+  struct Twice {
+    void lock() RT_NO_THREAD_SAFETY_ANALYSIS {
+      inner.lock();
+      inner.lock();
+    }
+    void unlock() RT_NO_THREAD_SAFETY_ANALYSIS {
+      inner.unlock();
+      inner.unlock();
+    }
+    RecursiveLock& inner;
+  } twice{lock};
+  const HeldElsewhere holder(twice);
+  EXPECT_EQ(statusOfChild(NOT_ANALYSED {
+              if (!lock.tryLock()) return 1;
+              lock.lock();
+              lock.unlock();
+              lock.assertOwner();
+              lock.unlock();
+              lock.lock();
+              lock.unlock();
+              // The thread sanitizer allows no new threads here.
+              return RT_TEST_THREAD_SANITIZER || anotherThreadCanTake(lock) ? 0 : 2;
+            }),
+            0);
 }
 
 TEST(RecursiveLockDeathTest, LettingGoAFreeLockEndsTheProgram) {

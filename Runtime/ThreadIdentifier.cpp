@@ -1,43 +1,33 @@
 #include "Runtime/ThreadIdentifier.h"
 
-#include <pthread.h>
+#include "Runtime/ForkGate.h"
 
-#include <atomic>
-#include <cstdint>
+namespace rt {
 
-namespace rt::detail {
+namespace detail {
 
-constinit thread_local ThreadIdentity currentThread;
+constinit thread_local ThreadState currentThread;
 
-namespace {
-
-void refreshAfterFork() noexcept {
-  if (currentThread.identifier == 0) return;
-  currentThread.identifierBeforeFork = currentThread.identifier;
-  currentThread.identifier = 0;  // The next call learns it.
-}
-
-/// Whether a child of a fork will ask anew.
-bool hasForkHandler() noexcept {
-  enum State : std::uint8_t { kNone, kRegistering, kRegistered };
-  static constinit std::atomic<State> state = kNone;
-  State expected = kNone;
-  if (state.compare_exchange_strong(expected, kRegistering)) {
-    const bool isRegistered = pthread_atfork(nullptr, nullptr, refreshAfterFork) == 0;
-    state = isRegistered ? kRegistered : kNone;
-    return isRegistered;
-  }
-  return expected == kRegistered;
-}
-
-}  // namespace
-
-ThreadIdentifier learnThreadIdentity() noexcept {
+ThreadToken learnThreadToken() noexcept {
+  ThreadState& self = currentThread;
   const ThreadIdentifier identifier = systemThreadIdentifier();
-  currentThread.isMain = systemIsMainThread();
+  self.isMain = systemIsMainThread();
+  self.token = ForkGate::tokenOf(systemThreadNumber());
   // Kept only where it cannot go stale; the next call asks the system again otherwise.
-  if (hasForkHandler()) currentThread.identifier = identifier;
-  return identifier;
+  if (ForkGate::add(self)) self.identifier = identifier;
+  return self.token;
 }
 
-}  // namespace rt::detail
+ThreadIdentifier learnThreadIdentifier() noexcept {
+  currentThreadToken();
+  const ThreadIdentifier known = currentThread.identifier;
+  return known != 0 ? known : systemThreadIdentifier();
+}
+
+}  // namespace detail
+
+bool isThreadGone(ThreadToken token) noexcept {
+  return detail::ForkGate::isGone(token);
+}
+
+}  // namespace rt

@@ -10,6 +10,8 @@
 #include <thread>
 #include <vector>
 
+#include "tests/ForkTest.h"
+
 namespace {
 
 TEST(ThreadIdentifier, IsTheSystemsAndStays) {
@@ -49,11 +51,12 @@ TEST(ThreadIdentifier, OnlyTheMainThreadIsMain) {
 /// parent, and that it is the main thread now.
 int statusOfForkedChild() {
   const rt::ThreadIdentifier inParent = rt::currentThreadIdentifier();
+  const rt::ThreadToken token = rt::currentThreadToken();
   const pid_t child = fork();
   if (child == 0) {
     if (rt::currentThreadIdentifier() != rt::detail::systemThreadIdentifier()) _exit(1);
     if (rt::currentThreadIdentifier() == inParent) _exit(2);
-    if (!rt::isOrWasCurrentThread(inParent)) _exit(3);
+    if (rt::currentThreadToken() != token || rt::isThreadGone(token)) _exit(3);
     if (!rt::isMainThread()) _exit(4);
     _exit(0);
   }
@@ -72,20 +75,54 @@ TEST(ThreadIdentifier, ForkingThreadIsTheChildsMainThread) {
   EXPECT_EQ(status, 0);
 }
 
-TEST(ThreadIdentifier, AnotherThreadsIsNotTheCallers) {
-  rt::ThreadIdentifier other = 0;
-  std::latch hasAsked(1);
-  std::latch mayEnd(1);
-  std::thread thread([&] {
-    other = rt::currentThreadIdentifier();
-    hasAsked.count_down();
-    mayEnd.wait();
-  });
-  hasAsked.wait();
-  EXPECT_FALSE(rt::isOrWasCurrentThread(other));
-  EXPECT_TRUE(rt::isOrWasCurrentThread(rt::currentThreadIdentifier()));
-  mayEnd.count_down();
-  thread.join();
+/// A thread that is alive, and its token.
+class Other {
+ public:
+  Other() { hasAsked_.wait(); }
+  Other(const Other&) = delete;
+  Other& operator=(const Other&) = delete;
+  ~Other() {
+    mayEnd_.count_down();
+    thread_.join();
+  }
+
+  rt::ThreadToken token() const { return token_; }
+
+ private:
+  rt::ThreadToken token_ = 0;
+  std::latch hasAsked_{1};
+  std::latch mayEnd_{1};
+  std::thread thread_{[this] {
+    token_ = rt::currentThreadToken();
+    hasAsked_.count_down();
+    mayEnd_.wait();
+  }};
+};
+
+TEST(ThreadToken, DiffersBetweenThreadsAndStays) {
+  const Other other;
+  EXPECT_NE(other.token(), 0U);
+  EXPECT_NE(other.token(), rt::currentThreadToken());
+  EXPECT_LT(rt::currentThreadToken(), 0x80000000U);
+  EXPECT_EQ(rt::currentThreadToken(), rt::currentThreadToken());
+  EXPECT_FALSE(rt::isThreadGone(other.token()));
+}
+
+TEST(ThreadToken, IsKnownToBeGoneInTheChildOfAForkUnlessTheThreadForked) {
+  const Other other;
+  const rt::ThreadToken own = rt::currentThreadToken();
+  EXPECT_EQ(statusOfChild([&] {
+              if (!rt::isThreadGone(other.token()) || rt::isThreadGone(own)) return 1;
+              if (RT_TEST_THREAD_SANITIZER) return 0;  // It allows no new threads in the child.
+              const Other ofChild;
+              if (rt::isThreadGone(ofChild.token()) || ofChild.token() == other.token()) return 2;
+              return statusOfChild([&] {
+                if (!rt::isThreadGone(other.token()) || !rt::isThreadGone(ofChild.token())) return 3;
+                return rt::isThreadGone(own) ? 4 : 0;
+              });
+            }),
+            0);
+  EXPECT_FALSE(rt::isThreadGone(other.token()));
 }
 
 }  // namespace

@@ -18,14 +18,19 @@
 /// takes a lock it holds, and one that lets go a lock it does not hold, ends the program with a line on
 /// standard error that names lock and thread.
 ///
-/// Constant-initialised: a lock at namespace scope is ready before anything runs, and needs nothing at
-/// exit. After `fork`, the child's thread holds what the thread that forked held, and may unlock it (on
-/// macOS it makes the lock anew instead); a lock that another thread held stays locked in the child for
-/// ever.
+/// Constant-initialised: a lock at namespace scope is ready before anything runs, and needs nothing at exit.
 ///
-/// Not for: locks that a thread takes again while it holds them (Runtime/RecursiveLock.h); waiting for a
-/// condition; long waits, for which a queue is better (Runtime/Queue.h).
+/// Fork. A fork waits until no other thread holds a lock of this kind. So all of them are free in the child,
+/// but those of the thread that forked, and what they guard is whole. (On macOS the child cannot let go what
+/// that thread held.) For a lock that is held for longer than about a second the fork does not wait: it is
+/// free in the child nevertheless, but what it guards is as the other thread had left it. On macOS it stays
+/// held then.
+///
+/// Not for: what takes long, such as system calls that wait and code of others (Runtime/LongLock.h); locks
+/// that a thread takes again while it holds them (Runtime/RecursiveLock.h); waiting for a condition, for
+/// which a queue is better (Runtime/Queue.h).
 
+#include "Runtime/ForkGate.h"
 #include "Runtime/ThreadSafety.h"
 
 #if defined(__APPLE__)
@@ -36,21 +41,6 @@
 
 namespace rt {
 
-namespace detail {
-
-// How many locks a thread holds is counted where RT_COUNTS_HELD_LOCKS is defined, as it is in instrumented
-// builds: for tests of what runs without any.
-#if defined(RT_COUNTS_HELD_LOCKS)
-inline constinit thread_local int heldLocks = 0;
-inline void countHeldLocks(int change) noexcept {
-  heldLocks += change;
-}
-#else
-inline void countHeldLocks(int /*change*/) noexcept {}
-#endif
-
-}  // namespace detail
-
 class RT_CAPABILITY("lock") UnfairLock {
  public:
   /// Not held.
@@ -59,42 +49,54 @@ class RT_CAPABILITY("lock") UnfairLock {
   UnfairLock& operator=(const UnfairLock&) = delete;
 
   /// Takes the lock, after waiting until no thread holds it. Ends the program when the caller holds it.
-  void lock() noexcept RT_ACQUIRE() {
+  [[gnu::always_inline]] void lock() noexcept RT_ACQUIRE() {
+    detail::ForkGate::enter();
     lock_.lock();
-    detail::countHeldLocks(1);
+    if (detail::ForkGate::isShut()) [[unlikely]]
+      lockAfterFork();
   }
 
   /// Takes the lock and returns true, or returns false at once when any thread, the caller included,
   /// holds it.
-  [[nodiscard]] bool tryLock() noexcept RT_TRY_ACQUIRE(true) {
+  [[nodiscard, gnu::always_inline]] bool tryLock() noexcept RT_TRY_ACQUIRE(true) {
+    detail::ForkGate::enter();
     const bool isTaken = lock_.tryLock();
-    if (isTaken) detail::countHeldLocks(1);
+    if (!isTaken) {
+      detail::ForkGate::leave();
+    } else if (detail::ForkGate::isShut()) [[unlikely]] {
+      return tryLockAfterFork();
+    }
     return isTaken;
   }
 
   /// Lets the lock go. Ends the program when the caller does not hold it.
-  void unlock() noexcept RT_RELEASE() {
+  [[gnu::always_inline]] void unlock() noexcept RT_RELEASE() {
     lock_.unlock();
-    detail::countHeldLocks(-1);
+    detail::ForkGate::leave();
   }
 
   /// Ends the program when the caller does not hold the lock.
   void assertOwner() const noexcept RT_ASSERT_CAPABILITY(this) { lock_.assertOwner(); }
 
  private:
+  // The lock has been taken while a fork is being made: it is let go, and taken when that is done.
+  [[gnu::cold]] void lockAfterFork() noexcept;
+  [[gnu::cold]] bool tryLockAfterFork() noexcept;
+  void waitForFork() noexcept;
+
   detail::SystemLock lock_;
 };
 
 static_assert(sizeof(UnfairLock) == 4);
 
-/// Holds a lock for as long as a scope lasts, however it is left. For `UnfairLock`, `RecursiveLock` and
-/// what else has `lock` and `unlock`.
+/// Holds a lock for as long as a scope lasts, however it is left. For `UnfairLock`, `LongLock`,
+/// `RecursiveLock` and what else has `lock` and `unlock`.
 template <class Lock>
 class RT_SCOPED_CAPABILITY [[nodiscard]] LockGuard {
  public:
   /// Takes `lock`, which outlives the guard.
-  explicit LockGuard(Lock& lock) RT_ACQUIRE(lock) : lock_(lock) { lock_.lock(); }
-  ~LockGuard() RT_RELEASE() { lock_.unlock(); }
+  [[gnu::always_inline]] explicit LockGuard(Lock& lock) RT_ACQUIRE(lock) : lock_(lock) { lock_.lock(); }
+  [[gnu::always_inline]] ~LockGuard() RT_RELEASE() { lock_.unlock(); }
   LockGuard(const LockGuard&) = delete;
   LockGuard& operator=(const LockGuard&) = delete;
 

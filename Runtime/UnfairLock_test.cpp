@@ -230,23 +230,6 @@ TEST(UnfairLock, HeldAcrossForkIsTheForkingThreadsInTheChild) {
   lock.assertOwner();
 }
 
-TEST(UnfairLock, HeldByAnotherThreadStaysHeldInTheChild) {
-  UnfairLock lock;
-  std::atomic<bool> isHeld = false;
-  std::atomic<bool> isDone = false;
-  std::thread holder([&] {
-    LockGuard guard(lock);
-    isHeld = true;
-    isHeld.notify_one();
-    isDone.wait(false);
-  });
-  isHeld.wait(false);
-  EXPECT_EQ(0, exitStatusOfChild(NOT_ANALYSED { EXPECT_FALSE(lock.tryLock()); }));
-  isDone = true;
-  isDone.notify_one();
-  holder.join();
-}
-
 TEST(UnfairLockDeathTest, TakingItAgainInTheChildOfAForkIsStillCaught) {
   UnfairLock lock;
   const auto takeInChild = NOT_ANALYSED {

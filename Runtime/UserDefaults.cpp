@@ -14,6 +14,7 @@
 #include "Runtime/Bundle.h"
 #include "Runtime/DefaultsStore.h"
 #include "Runtime/FilePath.h"
+#include "Runtime/Lazy.h"
 #include "Runtime/Process.h"
 #include "Runtime/SystemDefaultsFolder.h"
 
@@ -85,8 +86,8 @@ UserDefaults::~UserDefaults() {
 }
 
 Ref<UserDefaults> UserDefaults::standardUserDefaults() {
-  static auto* const standard = new UserDefaults(standardStore());
-  return standard;
+  static constinit Lazy<Ref<UserDefaults>> standard;
+  return standard.get([] { return Ref<UserDefaults>::adopt(new UserDefaults(standardStore())); });
 }
 
 Ref<UserDefaults> UserDefaults::initWithPath(const String& path) {

@@ -47,8 +47,5 @@ elseif(MOUNT_POINT_INSTRUMENTATION)
   message(FATAL_ERROR "MOUNT_POINT_INSTRUMENTATION is \"${MOUNT_POINT_INSTRUMENTATION}\"; "
     "it takes address, thread, coverage or nothing.")
 endif()
-if(MOUNT_POINT_INSTRUMENTATION)
-  target_compile_definitions(compiler-options INTERFACE RT_COUNTS_HELD_LOCKS)
-endif()
 target_compile_options(compiler-options INTERFACE ${instrumentation})
 target_link_options(compiler-options INTERFACE ${instrumentation})

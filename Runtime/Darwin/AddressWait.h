@@ -35,4 +35,12 @@ inline void wakeAtAddress(const std::atomic<std::uint32_t>* word) noexcept {
   errno = error;
 }
 
+/// Wakes all threads that sleep at `word`.
+inline void wakeAllAtAddress(const std::atomic<std::uint32_t>* word) noexcept {
+  const int error = errno;
+  os_sync_wake_by_address_all(const_cast<std::atomic<std::uint32_t>*>(word), sizeof(*word),
+                              OS_SYNC_WAKE_BY_ADDRESS_NONE);
+  errno = error;
+}
+
 }  // namespace rt::detail

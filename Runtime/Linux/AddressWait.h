@@ -7,6 +7,7 @@
 #include <atomic>
 #include <cerrno>
 #include <chrono>
+#include <climits>
 #include <cstdint>
 #include <ctime>
 
@@ -31,6 +32,11 @@ inline void waitAtAddress(const std::atomic<std::uint32_t>& word, std::uint32_t 
 /// whoever uses its place now is at worst woken for no reason.
 inline void wakeAtAddress(const std::atomic<std::uint32_t>* word) noexcept {
   syscall(SYS_futex, word, FUTEX_WAKE_PRIVATE, 1, nullptr, nullptr, 0);
+}
+
+/// Wakes all threads that sleep at `word`.
+inline void wakeAllAtAddress(const std::atomic<std::uint32_t>* word) noexcept {
+  syscall(SYS_futex, word, FUTEX_WAKE_PRIVATE, INT_MAX, nullptr, nullptr, 0);
 }
 
 }  // namespace rt::detail

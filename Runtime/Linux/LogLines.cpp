@@ -8,9 +8,9 @@
 #include <ctime>
 #include <string>
 
-#include "Runtime/ForkSafeLock.h"
 #include "Runtime/Linux/LogSocket.h"
 #include "Runtime/StandardError.h"
+#include "Runtime/UnfairLock.h"
 
 namespace rt::detail {
 
@@ -75,7 +75,7 @@ Delivery writeToSyslog(const LogEntry& entry, const Patience& patience) {
   std::tm local{};
   {
     // The system's function has a lock that would stay locked in the child of a fork.
-    static constinit ForkSafeLock lock;
+    static constinit UnfairLock lock;
     const LockGuard guard(lock);
     localtime_r(&now, &local);
   }

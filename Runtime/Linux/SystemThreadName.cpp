@@ -8,6 +8,8 @@
 #include <cerrno>
 #include <string_view>
 
+#include "Runtime/Lazy.h"
+
 namespace rt::detail {
 
 namespace {
@@ -34,8 +36,8 @@ Text processName() noexcept {
 
 // What the process was called before its main thread was given a name, which is then the process's, too.
 const Text& firstProcessName() noexcept {
-  static const Text name = processName();
-  return name;
+  static constinit Lazy<Text> name;
+  return name.get(processName);
 }
 
 }  // namespace

@@ -1,5 +1,6 @@
 #include "Shared/Logging/LUMDefaultMinimumLogLevelFilter.h"
 
+#include "Runtime/Lazy.h"
 #include "Runtime/Process.h"
 #include "Runtime/String.h"
 #include "Shared/Logging/LUMLogLevel.h"
@@ -16,6 +17,6 @@ LUMLogLevel levelFromEnvironment() {
 }  // namespace
 
 bool LUMDefaultMinimumLogLevelFilter::allowLogMessage(const LUMLogMessage& message) const {
-  static const LUMLogLevel threshold = levelFromEnvironment();
-  return message.level() >= threshold;
+  static constinit rt::Lazy<LUMLogLevel> threshold;
+  return message.level() >= threshold.get(levelFromEnvironment);
 }

@@ -6,6 +6,7 @@
 #include <utility>
 #include <vector>
 
+#include "Runtime/Lazy.h"
 #include "Runtime/QualityOfService.h"
 #include "Shared/Logging/LUMDefaultMinimumLogLevelFilter.h"
 
@@ -36,8 +37,6 @@ void deliver(LUMLogger& logger, const rt::Ref<LUMLogMessage>& message) {
 
 }  // namespace
 
-constinit rt::ForkSafeLock LUMLogMultiplexer::lock_;
-
 struct LUMLogMultiplexer::Lists {
   std::vector<rt::Ref<LUMLogFilter>> filters;
   std::vector<rt::Ref<LUMSyncLogger>> syncLoggers;
@@ -57,8 +56,8 @@ class LUMLogMultiplexer::Members final : public rt::Implements<Members, rt::Obje
 };
 
 const rt::Ref<LUMLogMultiplexer>& LUMLogMultiplexer::sharedInstance() {
-  static const rt::Ref<LUMLogMultiplexer>& instance = *new rt::Ref<LUMLogMultiplexer>(init());
-  return instance;
+  static constinit rt::Lazy<rt::Ref<LUMLogMultiplexer>> instance;
+  return instance.get(init);
 }
 
 rt::Ref<LUMLogMultiplexer> LUMLogMultiplexer::init() {
@@ -74,19 +73,14 @@ LUMLogMultiplexer::LUMLogMultiplexer(rt::Ref<LUMSystemLogger> systemLogger)
   Lists lists;
   if (systemLogger) lists.syncLoggers.emplace_back(systemLogger);
   lists.systemLogger = std::move(systemLogger);
-  members_ = rt::make<Members>(std::move(lists));
+  members_.exchange(rt::make<Members>(std::move(lists)));
 }
 
 LUMLogMultiplexer::~LUMLogMultiplexer() = default;
 
-rt::Ref<LUMLogMultiplexer::Members> LUMLogMultiplexer::members() const {
-  const rt::LockGuard guard(lock_);
-  return members_;
-}
-
 [[gnu::flatten]] void LUMLogMultiplexer::logWithMessage(const rt::Ref<LUMLogMessage>& message) {
   if (!message) return;
-  const rt::Ref<Members> current = members();
+  const rt::Ref<Members> current = members_.load();
   const Lists& lists = current->lists;
 
   for (const rt::Ref<LUMLogFilter>& filter : lists.filters) {
@@ -130,21 +124,14 @@ std::vector<rt::Ref<LUMAsyncLogger>> LUMLogMultiplexer::deliverLater(
   return blockingLoggers;
 }
 
-/// Has `change` make the next members of those that there are. It runs without the lock, since objects are
-/// compared by their own `isEqual`, and again where somebody else was quicker.
+/// Has `change` make the next members of those that there are, and again where somebody else was quicker.
 template <class Change>
 void LUMLogMultiplexer::replaceMembers(Change change) {
   for (;;) {
-    // Given up without the lock as well: a logger may go with it.
-    rt::Ref<Members> known = members();
+    const rt::Ref<Members> known = members_.load();
     Lists lists = known->lists;
     change(lists);
-    const rt::Ref<Members> next = rt::make<Members>(std::move(lists));
-    const rt::LockGuard guard(lock_);
-    if (members_ == known) {
-      members_ = next;
-      return;
-    }
+    if (members_.compareExchange(known, rt::make<Members>(std::move(lists)))) return;
   }
 }
 

@@ -26,8 +26,8 @@
 /// std::bad_alloc before any logger has it; an asynchronous logger for whose own queue there is none does not
 /// get the message.
 ///
-/// In the child of a fork it may be used at once, whatever other threads were doing, given that it had been
-/// used before the fork, and that filters and loggers bear it. The messages that were queued are the
+/// In the child of a fork it may be used at once, whatever other threads were doing, given that filters and
+/// loggers bear it. The messages that were queued are the
 /// parent's, as all tasks are (Runtime/Queue.h).
 ///
 /// Not for: many of them in a program; LUMLog uses the shared one.
@@ -35,12 +35,11 @@
 #include <atomic>
 #include <vector>
 
+#include "Runtime/AtomicRef.h"
 #include "Runtime/Class.h"
-#include "Runtime/ForkSafeLock.h"
 #include "Runtime/Object.h"
 #include "Runtime/Queue.h"
 #include "Runtime/Ref.h"
-#include "Runtime/ThreadSafety.h"
 #include "Runtime/Visibility.h"
 #include "Shared/Logging/LUMLogAppControl.h"
 #include "Shared/Logging/LUMLogMultiplexing.h"
@@ -94,19 +93,15 @@ class RT_VISIBLE LUMLogMultiplexer
   class Members;
   struct Lists;
 
-  rt::Ref<Members> members() const RT_EXCLUDES(lock_);
   template <class Change>
-  void replaceMembers(Change change) RT_EXCLUDES(lock_);
+  void replaceMembers(Change change);
   /// Has those of `loggers` called later that do not want `message` at once, and returns those that do. A
   /// function of its own, so that a message costs nothing for it where there are no such loggers.
   [[gnu::noinline]] std::vector<rt::Ref<LUMAsyncLogger>> deliverLater(
       const std::vector<rt::Ref<LUMAsyncLogger>>& loggers, const rt::Ref<LUMLogMessage>& message);
 
-  // Held to read or replace the reference, never while anything else runs. One for all multiplexers, of which
-  // a process has hardly more than one.
-  static constinit rt::ForkSafeLock lock_;
   // Replaced, never changed, so that a message goes on with those that it has found.
-  rt::Ref<Members> members_ RT_GUARDED_BY(lock_);
+  rt::AtomicRef<Members> members_;
 
   std::atomic<bool> captureCallStack_{true};
   std::atomic<bool> captureCallStackAddresses_{true};

@@ -7,6 +7,7 @@
 #include "Runtime/AssertionHandler.h"
 #include "Runtime/Exception.h"
 #include "Runtime/Format.h"
+#include "Runtime/Lazy.h"
 #include "Shared/Logging/LUMLogLevel.h"
 #include "Shared/Logging/LUMLogMinimumLevelFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
@@ -53,14 +54,16 @@ constinit thread_local int CallbackScope::depth_ = 0;
 }  // namespace
 
 const rt::Ref<PECErrorHandler>& PECErrorHandler::sharedInstance() {
-  static const rt::Ref<PECErrorHandler>& instance = *new rt::Ref<PECErrorHandler>(init());
-  return instance;
+  static constinit rt::Lazy<rt::Ref<PECErrorHandler>> instance;
+  return instance.get(init);
 }
 
 void PECErrorHandler::register_() {
-  static const bool isRegistered =
-      (LUMLogMultiplexer::sharedInstance()->addSyncLogger(sharedInstance()), true);
-  static_cast<void>(isRegistered);
+  static constinit rt::Lazy<bool> isRegistered;
+  isRegistered.get([] {
+    LUMLogMultiplexer::sharedInstance()->addSyncLogger(sharedInstance());
+    return true;
+  });
 }
 
 rt::Ref<PECErrorHandler> PECErrorHandler::init() {

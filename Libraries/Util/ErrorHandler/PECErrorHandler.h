@@ -14,8 +14,8 @@
 /// The handler is a synchronous logger of the shared LUMLogMultiplexer from the first report on
 /// (Libraries/Util/ErrorHandler/PECReport.h), or from a call of `register_`.
 ///
-/// A fork does not wait for the handler, whose lock is held while the callback runs: in the child of a fork
-/// that came while another thread reported an error, the next error may wait for ever.
+/// A fork does not wait for the handler, whose lock is held while the callback runs. In the child the lock is
+/// free, also where another thread was in the callback: it never returns there, and its error is not counted.
 ///
 /// A test asks what is reported by some code:
 ///

@@ -9,6 +9,7 @@
 #include "Runtime/ClassMethod.h"
 #include "Runtime/Dictionary.h"
 #include "Runtime/Format.h"
+#include "Runtime/Lazy.h"
 #include "Runtime/LoadHook.h"
 #include "Runtime/MainQueue.h"
 #include "Runtime/ThreadIdentifier.h"
@@ -161,9 +162,11 @@ void SRLRegistry::internalRegisterBindings(std::span<const SRLBindingsModuleData
 }
 
 bool SRLRegistry::multipleBindingsModulesAllowed() const {
-  static const bool isAllowed = std::ranges::all_of(
-      ivars_->bindingsModules, [](const auto* module) { return module->allowsMultipleModules != 0; });
-  return isAllowed;
+  static constinit rt::Lazy<bool> isAllowed;
+  return isAllowed.get([&] {
+    return std::ranges::all_of(ivars_->bindingsModules,
+                               [](const auto* module) { return module->allowsMultipleModules != 0; });
+  });
 }
 
 bool SRLRegistry::lazilyRegisterBindingsForAPI(const SRLAPIRegistrationData* api) {

@@ -18,7 +18,9 @@ constexpr const char* kFile = "Shared/ServiceRegistry/Source/Private/SRLMemoizin
 SRLPendingCreation* beginCreation(SRLMemoizingScopeIvars& ivars, const void* identifier)
     RT_REQUIRES(ivars.lock) {
   SRLPendingCreation* creation = nullptr;
-  if (auto entry = std::move(ivars.spareCreation)) {
+  if (const auto found = ivars.pendingCreations.find(identifier); found != ivars.pendingCreations.end()) {
+    creation = found->second.get();  // Abandoned.
+  } else if (auto entry = std::move(ivars.spareCreation)) {
     entry.key() = identifier;
     creation = entry.mapped().get();
     ivars.pendingCreations.insert(std::move(entry));
@@ -61,7 +63,8 @@ rt::Ref<rt::Object> SRLMemoizingScope::makeOrAwaitInstance(const void* identifie
     const rt::LockGuard guard(ivars.lock);
     // It may have been made since.
     if (const auto* made = ivars.instances.find(identifier)) return made->second;
-    if (const auto found = ivars.pendingCreations.find(identifier); found != ivars.pendingCreations.end()) {
+    if (const auto found = ivars.pendingCreations.find(identifier);
+        found != ivars.pendingCreations.end() && !found->second->isAbandoned()) {
       awaited = found->second;
       awaited->expectWaiter();
     } else {

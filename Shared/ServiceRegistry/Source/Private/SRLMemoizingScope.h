@@ -15,6 +15,9 @@
 /// gets a report and null. Memory for an instance is there before its factory runs: without it, nothing has
 /// begun.
 ///
+/// In the child of a fork, an instance that another thread was making counts as not begun: who asks for it
+/// first makes it.
+///
 /// Not for: hosts. They ask SRLRegistry, which has a scope for each set of tags.
 
 #include <concepts>

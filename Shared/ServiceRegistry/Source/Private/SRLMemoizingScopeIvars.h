@@ -11,6 +11,7 @@
 #include <unordered_map>
 
 #include "Runtime/Class.h"
+#include "Runtime/LongLock.h"
 #include "Runtime/Object.h"
 #include "Runtime/Ref.h"
 #include "Runtime/UnfairLock.h"
@@ -28,11 +29,15 @@ class RT_VISIBLE SRLPendingCreation final : public rt::Implements<SRLPendingCrea
   void expectWaiter() noexcept { isAwaited_ = true; }
   bool isAwaited() const noexcept { return isAwaited_; }
 
+  /// Whether the thread that makes the instance is in another process, which a fork has left it behind in.
+  /// Then another may begin.
+  bool isAbandoned() const noexcept { return lock_.isAbandoned(); }
+
   /// Waits until nobody makes the instance any more.
   void wait() noexcept { const rt::LockGuard guard(lock_); }
 
  private:
-  rt::UnfairLock lock_;
+  rt::LongLock lock_;
   bool isAwaited_ = false;
 };
 

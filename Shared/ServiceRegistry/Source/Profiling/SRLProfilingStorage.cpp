@@ -2,6 +2,7 @@
 
 #include <utility>
 
+#include "Runtime/Lazy.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPSelectorSort.h"
 
 namespace {
@@ -14,8 +15,8 @@ rt::Ref<rt::Array> arrayOf(const std::vector<rt::Ref<T>>& list) {
 }  // namespace
 
 const rt::Ref<SRLProfilingStorage>& SRLProfilingStorage::sharedInstance() {
-  static const rt::Ref<SRLProfilingStorage>& instance = *new rt::Ref<SRLProfilingStorage>(init());
-  return instance;
+  static constinit rt::Lazy<rt::Ref<SRLProfilingStorage>> instance;
+  return instance.get(init);
 }
 
 rt::Ref<SRLProfilingStorage> SRLProfilingStorage::init() {

@@ -1,9 +1,10 @@
-#include "Runtime/Linux/SystemLock.h"
+#include "Runtime/OwnerLock.h"
 
 #include <cstdio>
 #include <cstdlib>
 
 #include "Runtime/AddressWait.h"
+#include "Runtime/ForkGate.h"
 
 namespace rt::detail {
 
@@ -15,11 +16,11 @@ constexpr int kLongestPause = 16;
 
 }  // namespace
 
-void SystemLock::lockSlow(ThreadIdentifier self) noexcept {
+void OwnerLock::lockSlow(ThreadToken self) noexcept {
   std::uint32_t state = state_.load(std::memory_order_relaxed);
-  if (state != 0 && isOrWasCurrentThread(state & ~kHasWaiters)) {
+  if ((state & ~kHasWaiters) == self) {
     std::fprintf(stderr, "rt: the lock at %p is taken again by thread %u, which holds it\n",
-                 static_cast<void*>(this), self);
+                 static_cast<void*>(this), currentThreadIdentifier());
     std::abort();
   }
   for (int pauses = 1; pauses <= kLongestPause; pauses *= 2) {
@@ -32,8 +33,8 @@ void SystemLock::lockSlow(ThreadIdentifier self) noexcept {
   // must wake one of them when it lets it go.
   for (;;) {
     state = state_.load(std::memory_order_relaxed);
-    if (state == 0) {
-      if (state_.compare_exchange_weak(state, self | kHasWaiters, std::memory_order_acquire,
+    if (state == 0 || isAbandoned(state)) {
+      if (state_.compare_exchange_weak(state, self | kHasWaiters, std::memory_order_acq_rel,
                                        std::memory_order_relaxed)) {
         return;
       }
@@ -44,20 +45,26 @@ void SystemLock::lockSlow(ThreadIdentifier self) noexcept {
   }
 }
 
-void SystemLock::wakeOne() noexcept {
+bool OwnerLock::takeOver(ThreadToken self) noexcept {
+  std::uint32_t state = state_.load(std::memory_order_relaxed);
+  return isAbandoned(state) &&
+         state_.compare_exchange_strong(state, self | (state & kHasWaiters), std::memory_order_acq_rel,
+                                        std::memory_order_relaxed);
+}
+
+void OwnerLock::wakeOne() noexcept {
   wakeAtAddress(&state_);
 }
 
-void SystemLock::checkOwner(const char* verb) const noexcept {
-  const ThreadIdentifier owner = state_.load(std::memory_order_relaxed) & ~kHasWaiters;
-  if (owner != 0 && isOrWasCurrentThread(owner)) return;
+void OwnerLock::failOwner(const char* verb) const noexcept {
+  const ThreadToken owner = state_.load(std::memory_order_relaxed) & ~kHasWaiters;
   const ThreadIdentifier self = currentThreadIdentifier();
   if (owner == 0) {
     std::fprintf(stderr, "rt: the lock at %p is %s by thread %u, but no thread holds it\n",
                  static_cast<const void*>(this), verb, self);
   } else {
     std::fprintf(stderr, "rt: the lock at %p is %s by thread %u, but thread %u holds it\n",
-                 static_cast<const void*>(this), verb, self, owner);
+                 static_cast<const void*>(this), verb, self, ForkGate::numberOf(owner));
   }
   std::abort();
 }

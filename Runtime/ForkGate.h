@@ -1,0 +1,89 @@
+#pragma once
+
+// What keeps the data of locks whole across a fork. For Runtime/UnfairLock.h and Runtime/ThreadIdentifier.h.
+//
+// The child of a fork has one thread, and the memory as it was at that moment: a lock that another thread
+// held stays held there, and what it guards may be half changed. So a fork waits until no other thread holds
+// one. Every thread counts the locks that it holds, in a variable of its own. A fork closes the gate, and
+// waits until the counts of all other threads are 0. It opens the gate afterwards, in both processes. A
+// thread that wants its first lock meanwhile waits at the gate. One that holds a lock may take more, so that
+// it gets done.
+//
+// A lock costs two writes to the thread's own memory for that, and a look at a variable that hardly ever
+// changes. The alternative is a list of all locks: it needs a place in each lock and a lock of its own, and
+// locks come and go with objects.
+//
+// A fork waits for about a second at most. After that, a lock that is still held is free in the child
+// nevertheless, since its holder is known to be gone there (Runtime/OwnerLock.h).
+//
+// A program and a shared library may both bring this file. Either they share its variables, which are all
+// external, and the first that is loaded registers the fork handlers for both; or each has its own.
+
+#include <atomic>
+#include <cstdint>
+
+#include "Runtime/ThreadIdentifier.h"
+
+namespace rt::detail {
+
+class ForkGate {
+ public:
+  /// Counts a lock that the calling thread is about to take, or has let go.
+  [[gnu::always_inline]] static void enter() noexcept {
+    std::atomic<std::uint32_t>& count = currentThread.heldLocks;
+    count.store(count.load(std::memory_order_relaxed) + 1, std::memory_order_relaxed);
+  }
+  [[gnu::always_inline]] static void leave() noexcept {
+    std::atomic<std::uint32_t>& count = currentThread.heldLocks;
+    count.store(count.load(std::memory_order_relaxed) - 1, std::memory_order_release);
+  }
+
+  /// Whether the calling thread, which has counted and taken a lock, has to let it go and to wait. Taking it
+  /// was an atomic read-modify-write with release order: either the fork sees the count, or this the gate.
+  [[gnu::always_inline]] static bool isShut() noexcept {
+#if !defined(__x86_64__)
+    // There, the read-modify-write is a barrier as it is.
+    std::atomic_thread_fence(std::memory_order_seq_cst);
+#endif
+    return isClosed_.load(std::memory_order_relaxed) != 0 && isFirstLock();
+  }
+
+  /// Returns when the gate is open. The caller holds no lock that counts.
+  [[gnu::cold]] static void wait() noexcept;
+
+  /// Has forks look at the counts of `thread`, the calling one, until it ends. Returns whether forks are
+  /// noticed: false where the system refuses the handlers.
+  static bool add(ThreadState& thread) noexcept;
+
+  /// The token of a thread of this process that has `number`, which is below 2^22.
+  static ThreadToken tokenOf(std::uint32_t number) noexcept;
+
+  /// The number in a token.
+  static std::uint32_t numberOf(ThreadToken token) noexcept;
+
+  /// See `rt::isThreadGone`.
+  static bool isGone(ThreadToken token) noexcept;
+
+ private:
+  struct Threads;
+
+  static bool isFirstLock() noexcept { return currentThread.heldLocks.load(std::memory_order_relaxed) == 1; }
+  static bool registerHandlers() noexcept;
+  static void remove(ThreadState& thread) noexcept;
+  static void threadEnds(void* thread) noexcept;
+  static bool isAnyLockHeldElsewhere() noexcept;
+  static void prepare() noexcept;
+  static void open() noexcept;
+  static void continueInParent() noexcept;
+  static void continueInChild() noexcept;
+
+  // 1 while a fork is being made, from when it waits.
+  static constinit std::atomic<std::uint32_t> isClosed_;
+  // How many forks lie between the first process and this one, modulo 2^9.
+  static constinit std::atomic<std::uint32_t> generation_;
+  // Of the thread that has made this process by a fork; 0 in one that was not made so.
+  static constinit std::atomic<ThreadToken> survivor_;
+  static Threads threads_;
+};
+
+}  // namespace rt::detail

@@ -1,5 +1,6 @@
 #include "Foundation/ZEBLogger.h"
 
+#include <string_view>
 #include <utility>
 
 #include "Foundation/ZEBArrayCompositeLogWriter.h"
@@ -11,17 +12,21 @@
 #include "Foundation/ZEBLogMininumLevelFilter.h"
 #include "Foundation/ZEBLogNoFilter.h"
 #include "Foundation/ZEBLogStandardFormatter.h"
+#include "Runtime/Lazy.h"
 
 using namespace rt::literals;
 
 namespace {
 
-// Recursive: making the first shared logger reads the user defaults, and what is wrong with these is reported
-// to a handler of the host's, which may log.
+// Of those who set the shared logger. Recursive: making the first one reads the user defaults, and what is
+// wrong with these is reported to a handler of the host's, which may log.
 constinit rt::RecursiveLock sharedLock;
 
-// Owned. Never destroyed: programs log until the process is gone.
-constinit ZEBLogger* shared RT_GUARDED_BY(sharedLock) = nullptr;
+// Never destroyed: programs log until the process is gone.
+rt::AtomicRef<ZEBLogger>& shared() {
+  static constinit rt::Lazy<rt::AtomicRef<ZEBLogger>> logger;
+  return logger.get([] { return rt::AtomicRef<ZEBLogger>(); });
+}
 
 rt::Ref<ZEBLogWriter> standardOutput() {
   return ZEBFileHandleLogWriter::initWithFileHandle(rt::FileHandle::standardOutput());
@@ -46,19 +51,30 @@ rt::Ref<ZEBLogger> buildStandardLogger(rt::Ref<ZEBLogWriter> writer) {
 
 }  // namespace
 
+// What a line is logged with. One object, so that it is read at one go.
+class ZEBLogger::Pieces final : public rt::Implements<Pieces, rt::Object> {
+ public:
+  static constexpr std::string_view kClassName = "ZEBLoggerPieces";
+
+  // Changed only before they are a logger's.
+  rt::Ref<ZEBLogWriter> writer;
+  rt::Ref<ZEBLogFormatter> formatter;
+  rt::Ref<ZEBLogFilter> filter;
+};
+
 rt::Ref<ZEBLogger> ZEBLogger::sharedLogger() {
+  if (rt::Ref<ZEBLogger> logger = shared().load()) return logger;
   const rt::LockGuard guard(sharedLock);
-  if (shared == nullptr) {
-    rt::Ref<ZEBLogger> logger = standardLogger();
-    if (shared == nullptr) shared = logger.detach();
-  }
-  return shared;
+  if (rt::Ref<ZEBLogger> logger = shared().load()) return logger;
+  // Where one is set meanwhile, on this thread, it stays.
+  shared().compareExchange(nullptr, standardLogger());
+  return shared().load();
 }
 
 void ZEBLogger::setSharedLogger(rt::Ref<ZEBLogger> logger) {
   const rt::LockGuard guard(sharedLock);
   // `logger` lets the old one go, after the lock.
-  logger = rt::Ref<ZEBLogger>::adopt(std::exchange(shared, logger.detach()));
+  logger = shared().exchange(std::move(logger));
 }
 
 rt::Ref<ZEBLogger> ZEBLogger::standardLogger() {
@@ -110,54 +126,67 @@ rt::Ref<ZEBLogger> ZEBLogger::init() {
   return initWithWriter(nullptr, nullptr, nullptr);
 }
 
+ZEBLogger::ZEBLogger() = default;
+
 ZEBLogger::~ZEBLogger() {
-  if (pieces_.filter == nullptr) return;
-  ZEBDropExceptions([this] { pieces().filter->willDetachFromLogger(); });
+  if (const rt::Ref<ZEBLogFilter> last = pieceOf(&Pieces::filter)) {
+    ZEBDropExceptions([&] { last->willDetachFromLogger(); });
+  }
 }
 
-ZEBLogger::Pieces ZEBLogger::pieces() const {
-  const rt::LockGuard guard(piecesLock_);
-  return pieces_;
+template <class Piece>
+rt::Ref<Piece> ZEBLogger::pieceOf(rt::Ref<Piece> Pieces::* piece) const {
+  const rt::Ref<Pieces> pieces = pieces_.load();
+  return pieces != nullptr ? (*pieces).*piece : nullptr;
 }
 
 rt::Ref<ZEBLogWriter> ZEBLogger::writer() const {
-  return pieces().writer;
+  return pieceOf(&Pieces::writer);
 }
 
 rt::Ref<ZEBLogFormatter> ZEBLogger::formatter() const {
-  return pieces().formatter;
+  return pieceOf(&Pieces::formatter);
 }
 
 rt::Ref<ZEBLogFilter> ZEBLogger::filter() const {
-  return pieces().filter;
+  return pieceOf(&Pieces::filter);
 }
 
-// The setters' parameters let the old pieces go, after the locks.
+// Has `piece` take the place of what is there.
+template <class Piece>
+void ZEBLogger::setPiece(rt::Ref<Piece> Pieces::* piece, rt::Ref<Piece> value, rt::Ref<Pieces>& next) {
+  if (const rt::Ref<Pieces> known = pieces_.load()) {
+    next->writer = known->writer;
+    next->formatter = known->formatter;
+    next->filter = known->filter;
+  }
+  (*next).*piece = std::move(value);
+  next = pieces_.exchange(std::move(next));
+}
+
+// What is replaced goes after the lock.
 
 void ZEBLogger::setWriter(rt::Ref<ZEBLogWriter> writer) {
   if (writer == nullptr) writer = standardOutput();
+  rt::Ref<Pieces> pieces = rt::make<Pieces>();
   const rt::LockGuard guard(lock_);
-  const rt::LockGuard piecesGuard(piecesLock_);
-  pieces_.writer.swap(writer);
+  setPiece(&Pieces::writer, std::move(writer), pieces);
 }
 
 void ZEBLogger::setFormatter(rt::Ref<ZEBLogFormatter> formatter) {
   if (formatter == nullptr) formatter = rt::make<ZEBLogBasicFormatter>();
+  rt::Ref<Pieces> pieces = rt::make<Pieces>();
   const rt::LockGuard guard(lock_);
-  const rt::LockGuard piecesGuard(piecesLock_);
-  pieces_.formatter.swap(formatter);
+  setPiece(&Pieces::formatter, std::move(formatter), pieces);
 }
 
 void ZEBLogger::setFilter(rt::Ref<ZEBLogFilter> filter) {
   if (filter == nullptr) filter = rt::make<ZEBLogNoFilter>();
-  const rt::Ref<ZEBLogFilter> added = filter;
+  rt::Ref<Pieces> pieces = rt::make<Pieces>();
   const rt::LockGuard guard(lock_);
-  if (const rt::Ref<ZEBLogFilter> old = pieces().filter) old->willDetachFromLogger();
-  {
-    const rt::LockGuard piecesGuard(piecesLock_);
-    pieces_.filter.swap(filter);
-  }
-  added->didAttachToLogger();
+  if (const rt::Ref<ZEBLogFilter> old = pieceOf(&Pieces::filter)) old->willDetachFromLogger();
+  setPiece(&Pieces::filter, filter, pieces);
+  filter->didAttachToLogger();
 }
 
 void ZEBLogger::logMessage(const rt::String& message, ZEBLogLevel level) {
@@ -167,10 +196,10 @@ void ZEBLogger::logMessage(const rt::String& message, ZEBLogLevel level) {
 void ZEBLogger::logInternalFunc(const char* func, const rt::String& format, std::va_list valist,
                                 ZEBLogLevel level) {
   ZEBDropExceptions([&] {
-    const Pieces pieces = this->pieces();
+    const rt::Ref<Pieces> pieces = pieces_.load();
     const rt::String line =
-        pieces.formatter->stringForFunc(rt::String::fromUTF8(func), format, valist, level);
-    if (line && pieces.filter->filterAllowsMessage(line, level)) pieces.writer->logMessage(line, level);
+        pieces->formatter->stringForFunc(rt::String::fromUTF8(func), format, valist, level);
+    if (line && pieces->filter->filterAllowsMessage(line, level)) pieces->writer->logMessage(line, level);
   });
 }
 

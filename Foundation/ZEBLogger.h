@@ -16,7 +16,7 @@
 /// Whatever else goes wrong, in a formatter, a filter, a writer or the description of an argument, logging
 /// throws nothing: the line is lost and the next one tries again.
 ///
-/// Any thread may use all of it.
+/// Any thread may use all of it, also in the child of a fork, whatever other threads were doing.
 ///
 /// Not for: new code, which has the structured framework; a writer that logs through its own logger.
 
@@ -27,11 +27,11 @@
 #include "Foundation/ZEBLogFormatter.h"
 #include "Foundation/ZEBLogLevel.h"
 #include "Foundation/ZEBLogWriter.h"
+#include "Runtime/AtomicRef.h"
 #include "Runtime/FormatArguments.h"
 #include "Runtime/FormatString.h"
 #include "Runtime/RecursiveLock.h"
 #include "Runtime/Ref.h"
-#include "Runtime/UnfairLock.h"
 #include "Runtime/Visibility.h"
 
 class RT_VISIBLE ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLogWriter> {
@@ -158,16 +158,17 @@ class RT_VISIBLE ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLog
  protected:
   /// Without pieces. A subclass sets them, or overrides what would use them: `logInternalFunc`, and the
   /// accessors and setters.
-  ZEBLogger() = default;
+  ZEBLogger();
 
  private:
-  struct Pieces {
-    rt::Ref<ZEBLogWriter> writer;
-    rt::Ref<ZEBLogFormatter> formatter;
-    rt::Ref<ZEBLogFilter> filter;
-  };
+  class Pieces;
 
-  Pieces pieces() const;
+  template <class Piece>
+  rt::Ref<Piece> pieceOf(rt::Ref<Piece> Pieces::* piece) const;
+  // `next` is new, and is the pieces that were there when it returns. Allocates nothing.
+  template <class Piece>
+  void setPiece(rt::Ref<Piece> Pieces::* piece, rt::Ref<Piece> value, rt::Ref<Pieces>& next)
+      RT_REQUIRES(lock_);
 
   template <class... Arguments>
   [[gnu::always_inline]] void log(ZEBLogLevel level, const char* func,
@@ -182,8 +183,7 @@ class RT_VISIBLE ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLog
 
   // The setters'.
   rt::RecursiveLock lock_;
-  // Held while references are copied or exchanged, and never while anything else runs: loggings read the
-  // pieces without waiting for a setter and what it tells filters.
-  mutable rt::UnfairLock piecesLock_;
-  Pieces pieces_ RT_GUARDED_BY(piecesLock_);
+  // Replaced, never changed, so that a line goes on with those that it has found. Null in a subclass that
+  // sets none.
+  rt::AtomicRef<Pieces> pieces_;
 };

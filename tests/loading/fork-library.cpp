@@ -1,0 +1,28 @@
+// A shared library that has the runtime, and uses it for its caller.
+#include "Runtime/Queue.h"
+#include "Runtime/ThreadIdentifier.h"
+#include "Runtime/UnfairLock.h"
+
+using namespace rt::literals;
+
+namespace {
+
+constinit rt::UnfairLock lock;
+constinit int uses RT_GUARDED_BY(lock) = 0;
+
+void count() {
+  const rt::LockGuard guard(lock);
+  ++uses;
+}
+
+}  // namespace
+
+extern "C" [[gnu::visibility("default")]] int useInLibrary() {
+  count();
+  static rt::Queue* const queue = rt::make<rt::Queue>("library"_s).detach();
+  return queue->sync([] { return rt::currentThreadIdentifier() != 0 ? 1 : 0; });
+}
+
+extern "C" [[gnu::visibility("default")]] void* stateOfLibrary() {
+  return &rt::detail::currentThread;
+}

@@ -1,0 +1,34 @@
+# A program that forks, and a shared library, both of which have the runtime. What they export, and how the library
+# comes in, decides whether they have one of it or two.
+
+# loading_forks(NAME EXPECTED HOW VISIBILITY [EXPORTS]): an entry of ctest. HOW is linked or opened; the archive's
+# symbols in the library have VISIBILITY, exported or hidden; with EXPORTS the program exports its own.
+function(loading_forks name expected how visibility)
+  set(program "loading-forks-${name}")
+  add_library(${program}-library SHARED fork-library.cpp)
+  add_executable(${program} fork-program.cpp)
+  foreach(target ${program} ${program}-library)
+    target_link_libraries(${target} PRIVATE MountPoint::Options MountPoint::Runtime)
+  endforeach()
+  if(visibility STREQUAL "hidden")
+    target_link_options(${program}-library PRIVATE -Wl,--exclude-libs,ALL)
+    target_compile_options(${program}-library PRIVATE -fvisibility=hidden -fvisibility-inlines-hidden)
+  endif()
+  if("EXPORTS" IN_LIST ARGN)
+    set_target_properties(${program} PROPERTIES ENABLE_EXPORTS ON)
+  endif()
+  if(how STREQUAL "linked")
+    target_link_libraries(${program} PRIVATE -Wl,--no-as-needed ${program}-library)
+  else()
+    add_dependencies(${program} ${program}-library)
+  endif()
+  add_test(NAME loading.forks.${name} COMMAND ${program} "$<TARGET_FILE:${program}-library>" ${expected})
+endfunction()
+
+loading_forks(linked shared linked exported)
+loading_forks(linked-exports shared linked exported EXPORTS)
+loading_forks(linked-hidden separate linked hidden)
+loading_forks(linked-hidden-exports separate linked hidden EXPORTS)
+loading_forks(opened separate opened exported)
+loading_forks(opened-exports shared opened exported EXPORTS)
+loading_forks(opened-hidden separate opened hidden)

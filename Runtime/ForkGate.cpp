@@ -1,10 +1,10 @@
 #include "Runtime/ForkGate.h"
 
-#include <limits.h>
 #include <pthread.h>
 #include <sched.h>
 
 #include <cerrno>
+#include <climits>
 #include <ctime>
 
 #include "Runtime/AddressWait.h"

@@ -7,6 +7,9 @@
 #include <limits>
 #include <new>
 
+#include "AllocationCount.h"
+#include "Sanitizers.h"
+
 namespace {
 
 constexpr std::int64_t kNever = std::numeric_limits<std::int64_t>::max();
@@ -47,7 +50,11 @@ bool AllocationFailure::happensNow() noexcept {
   return true;
 }
 
-#ifdef SANITIZES_ALLOCATIONS
+bool AllocationFailure::isSupported() noexcept {
+  return AllocationCount::isSupported() && RT_TEST_THREAD_SANITIZER == 0;
+}
+
+#if RT_TEST_ADDRESS_SANITIZER
 
 namespace {
 

@@ -2,7 +2,7 @@
 
 #include <cstdint>
 
-// The sanitizers own malloc: there only what C++ allocates, by `new`, can fail.
+// The sanitizers own malloc: with that for addresses, only what C++ allocates, by `new`, can fail.
 #if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
 #define SANITIZES_ALLOCATIONS 1
 #elif defined(__has_feature)
@@ -17,10 +17,14 @@
 ///     EXPECT_THROW(rt::format("%@"_s, list), std::bad_alloc);
 ///     EXPECT_TRUE(failure.hasHappened());
 ///
-/// One at a time in a process. Where AllocationCount is not supported, nothing ever fails.
+/// One at a time in a process. Where it is not supported, nothing ever fails.
 class AllocationFailure {
  public:
   enum class Extent : bool { kOnce, kFromThenOn };
+
+  /// Whether allocations can be made to fail on this system. Not under the thread sanitizer, which owns
+  /// `new`.
+  static bool isSupported() noexcept;
 
   /// The `number`-th allocation from now, counted from 1, fails, and those after it if `extent` says so.
   explicit AllocationFailure(std::int64_t number, Extent extent = Extent::kOnce) noexcept;

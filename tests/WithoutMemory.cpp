@@ -164,7 +164,7 @@ std::int64_t tryLaterRuns(const Program& program, Extent extent, Growth growth) 
 }  // namespace
 
 void tryEachAllocation(const Program& program, Growth growth) {
-  if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to have allocations fail here";
+  if (!AllocationFailure::isSupported()) GTEST_SKIP() << "no way to have allocations fail here";
   for (const Extent extent : {Extent::kOnce, Extent::kFromThenOn}) {
     const std::int64_t first = tryFirstRuns(program, extent);
     if (testing::Test::HasFailure()) return;

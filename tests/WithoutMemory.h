@@ -18,8 +18,8 @@
 /// A program leaves behind what it found. What it sets up for itself alone goes under an
 /// `AllocationFailure::Pause`. How many allocations there were is printed.
 ///
-/// Not for: programs with threads of their own that last; where AllocationCount is not supported, the test is
-/// skipped.
+/// Not for: programs with threads of their own that last; where AllocationFailure is not supported, the test
+/// is skipped.
 namespace WithoutMemory {
 
 using Program = std::function<void()>;

@@ -33,7 +33,7 @@ class MountPointBinaryTest : public testing::Test {
 
   // The files that our own code was compiled to.
   static std::vector<std::string> commandObjects() {
-    std::istringstream list(COMMAND_OBJECTS);
+    std::istringstream list(COMMAND_OBJECTS " " MAIN_OBJECT);
     return {std::istream_iterator<std::string>(list), {}};
   }
   static std::string commandObject(const std::string& name) {
@@ -138,7 +138,7 @@ TEST_F(MountPointBinaryTest, IsStrippedAndLeadsToItsSymbols) {
 // every object to be compiled for it; ours are, the C library is not.
 TEST_F(MountPointBinaryTest, BearsTheMarkOfShadowStacks) {
   EXPECT_THAT(outputOf({"readelf", "--notes", MOUNT_POINT}), HasSubstr("SHSTK"));
-  for (const std::string object : {COMMAND_OBJECT, MAIN_OBJECT}) {
+  for (const std::string& object : commandObjects()) {
     EXPECT_THAT(outputOf({"readelf", "--notes", object}), HasSubstr("IBT, SHSTK")) << object;
   }
 }
@@ -202,9 +202,7 @@ TEST_F(MountPointTracedTest, ReadsNoEnvironmentVariableThatIsNotAccountedFor) {
 
 // What the trace cannot show, for want of a directory to make: our own code refers to no environment.
 TEST_F(MountPointBinaryTest, RefersToNoEnvironment) {
-  std::vector<std::string> objects = commandObjects();
-  objects.emplace_back(MAIN_OBJECT);
-  for (const std::string& object : objects) {
+  for (const std::string& object : commandObjects()) {
     const std::string symbols = outputOf({"nm", "--undefined-only", object});
     EXPECT_THAT(symbols, HasSubstr(" U "));
     for (const char* const name : {"getenv", "environ", "pthread_", "setlocale"}) {

@@ -13,7 +13,7 @@ struct ImageState {
 [[gnu::visibility("hidden")]] inline constinit ImageState imageState;
 
 /// Calls the functions of the image whose state this is, notes that it has announced what it has, and runs
-/// the load hooks where it was the last.
+/// the load hooks where it was the last. Does nothing when it is called again.
 void announce(ImageState& state, const std::int32_t* begin, const std::int32_t* end) noexcept;
 
 inline constexpr char kImageMarkName[] = "rt-image";
@@ -26,10 +26,25 @@ inline constexpr unsigned kImageMarkType = 1;
 [[gnu::weak,
   gnu::visibility("hidden")]] extern const std::int32_t announcementsEnd[] asm("__stop_rt_announcements");
 
-/// Emitted into each image that refers to it, once, together with the mark: an ELF note, which no linker
-/// discards and which can be found from the image's program headers. It holds the distance from itself
-/// to the image's state. [[gnu::constructor]] would leave one call for each source file.
-[[gnu::used, gnu::visibility("hidden")]] inline void announceImage() {
+// clang runs initialisers of static objects while it compiles, so it must know what goes before them: the
+// attribute tells, and leaves one call for each source file. g++ takes it from the section that the function
+// puts itself in, once for the image.
+#if defined(__clang__)
+#define RT_CALLED_ON_LOADING gnu::constructor(102)
+#define RT_CALL_ON_LOADING
+#else
+#define RT_CALLED_ON_LOADING gnu::used
+#define RT_CALL_ON_LOADING                                                    \
+  ".pushsection .init_array.00102, \"awG\", %%init_array, rt_image, comdat\n" \
+  "  .balign 8\n"                                                             \
+  "  .quad %c2\n"                                                             \
+  ".popsection\n"
+#endif
+
+/// Emitted into each image that refers to it, together with the mark: an ELF note, which no linker discards
+/// and which can be found from the image's program headers. It holds the distance from itself to the
+/// image's state. Called when the image is loaded.
+[[RT_CALLED_ON_LOADING, gnu::visibility("hidden")]] inline void announceImage() {
   asm volatile(
       ".pushsection .note.rt-image, \"aG\", %%note, rt_image, comdat\n"
       "  .balign 4\n"
@@ -37,15 +52,14 @@ inline constexpr unsigned kImageMarkType = 1;
       "  .asciz \"rt-image\"\n"
       "  .balign 4\n"
       "  .quad %c1 - .\n"
-      ".popsection\n"
-      ".pushsection .init_array.00102, \"awG\", %%init_array, rt_image, comdat\n"
-      "  .balign 8\n"
-      "  .quad %c2\n"
-      ".popsection"
+      ".popsection\n" RT_CALL_ON_LOADING
       :
       : "i"(kImageMarkType), "i"(&imageState), "i"(&announceImage));
   announce(imageState, announcementsBegin, announcementsEnd);
 }
+
+#undef RT_CALLED_ON_LOADING
+#undef RT_CALL_ON_LOADING
 
 /// Emitted where it is mentioned, in each source file: announces `entry` when the image is loaded. Hidden,
 /// since only such a function has an address that the operand may be.

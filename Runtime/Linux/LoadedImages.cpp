@@ -73,6 +73,7 @@ int inspect(dl_phdr_info* image, std::size_t /*size*/, void* /*context*/) {
 }  // namespace
 
 void announce(ImageState& state, const std::int32_t* begin, const std::int32_t* end) noexcept {
+  if (state.isAnnounced) return;
   for (const std::int32_t* distance = begin; distance != end; ++distance) {
     const std::uintptr_t address =
         reinterpret_cast<std::uintptr_t>(distance) + static_cast<std::uintptr_t>(std::intptr_t{*distance});

@@ -50,14 +50,9 @@ bool fail(std::int64_t number, Extent extent, const char* what) {
   return false;
 }
 
-// How many locks the thread holds, as far as they are counted. In the child of a fork, those count that the
-// fork has taken and made anew.
+// How many locks the thread holds.
 int heldLocks() {
-#if defined(RT_COUNTS_HELD_LOCKS)
-  return rt::detail::heldLocks;
-#else
-  return 0;
-#endif
+  return static_cast<int>(rt::detail::currentThread.heldLocks.load());
 }
 
 // Whether no more is allocated than that, once the threads of queues have let go of what they have done.

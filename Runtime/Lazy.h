@@ -7,9 +7,9 @@
 ///       return clock.get([] { return rt::make<Clock>(); });
 ///     }
 ///
-/// As the initialisation of a static variable in a function, but for two things: nothing runs at exit, and in
-/// the child of a fork a value that another thread was making counts as not begun, where a static variable
-/// would be waited for for ever. Asking for a value that is there takes no lock and allocates nothing.
+/// Differs from a static variable of a function in two ways. Nothing runs at exit. In the child of a fork, a
+/// value that another thread was making counts as not begun; a static variable would be waited for for ever.
+/// Asking for a value that is there takes no lock and allocates nothing.
 ///
 /// Not for: values that are made with the program; members of objects, which end.
 

@@ -4,11 +4,12 @@
 /// the runtime; nothing here is for its users.
 ///
 /// The system loads all images of a program, then calls the functions that each has for that, libraries
-/// before those that use them. Each image that has anything to announce bears a mark, which shows before any
-/// of its functions has been called. By such a function it announces its classes, protocols, class methods
-/// and load hooks, and then says that it has done so. Load hooks run once all images have. Whoever uses a
-/// class announces it too, since each image may have a record of its own; so an image with a literal, which
-/// is an object, is one of them.
+/// before those that use them. One of these functions announces what the image has: classes, protocols, class
+/// methods and load hooks. Such an image bears a mark, which shows before any function has been called. Load
+/// hooks run when all images with a mark have announced what they have.
+///
+/// Whoever uses a class announces it too, since each image may have a record of its own. A literal is an
+/// object, so an image with a literal announces the class of strings.
 
 namespace rt::detail {
 

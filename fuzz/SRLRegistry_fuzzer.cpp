@@ -1,7 +1,5 @@
-// Registries against a model that is all maps: whatever the records say, and in whatever order services are
-// asked for, scopes end, registries are copied and take each other's place, the same instances come out, made
-// by the same factories from the same tags; the same errors are reported; and nothing lives that no scope
-// holds.
+// Compares registries with a model made of maps, for any records and any order of requests. Both must give the
+// same instances, from the same factories and tags, and the same reports. Nothing may live that no scope holds.
 #include <fuzzer/FuzzedDataProvider.h>
 
 #include <algorithm>

@@ -10,10 +10,9 @@
 ///     }
 ///
 /// The program throws std::bad_alloc, or does what is documented, which it says itself by expectations. Then
-/// it is run again with memory, and must get through: no lock is held, and nothing is half made. All that is
-/// done in children of the process, for which every first use is the first, and once more in one child, for
-/// which no use is: there nothing may leak, however often an allocation fails. A child that hangs is ended.
-/// In instrumented builds, where a child takes long to start, one in sixteen of the first runs is tried.
+/// it is run again with memory, and must get through: no lock is held, and nothing is half made. Each attempt
+/// runs in a new child, where every use is the first. A last child repeats all of them, to find leaks. A
+/// child that hangs is ended. In instrumented builds one in sixteen of the first attempts is made.
 ///
 /// A program leaves behind what it found. What it sets up for itself alone goes under an
 /// `AllocationFailure::Pause`. How many allocations there were is printed.

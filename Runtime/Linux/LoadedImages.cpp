@@ -3,6 +3,7 @@
 #include <dlfcn.h>
 #include <link.h>
 
+#include <algorithm>
 #include <bit>
 #include <cstddef>
 #include <cstdint>
@@ -42,18 +43,26 @@ constexpr std::size_t aligned(std::size_t size, std::size_t alignment) {
 
 /// Whether the notes from `note` to `end` have no mark of an image that has yet to announce anything.
 bool areAnnounced(const std::byte* note, const std::byte* end, std::size_t alignment) noexcept {
-  while (static_cast<std::size_t>(end - note) >= sizeof(ElfW(Nhdr))) {
+  auto left = static_cast<std::size_t>(end - note);
+  while (left >= sizeof(ElfW(Nhdr))) {
     ElfW(Nhdr) header;
     std::memcpy(&header, note, sizeof header);
-    const std::byte* const name = note + sizeof header;
-    const std::byte* const description = note + aligned(sizeof header + header.n_namesz, alignment);
+    const std::size_t descriptionAt = aligned(sizeof header + header.n_namesz, alignment);
+    const std::size_t size = descriptionAt + header.n_descsz;
+    // What other tools have written may be cut off.
+    if (size > left) break;
+    std::int64_t distance = 0;
     if (header.n_type == kImageMarkType && header.n_namesz == sizeof kImageMarkName &&
-        std::memcmp(name, kImageMarkName, sizeof kImageMarkName) == 0) {
-      std::int64_t distance = 0;
+        header.n_descsz == sizeof distance &&
+        std::memcmp(note + sizeof header, kImageMarkName, sizeof kImageMarkName) == 0) {
+      const std::byte* const description = note + descriptionAt;
       std::memcpy(&distance, description, sizeof distance);
       if (!reinterpret_cast<const ImageState*>(description + distance)->isAnnounced) return false;
     }
-    note = description + aligned(header.n_descsz, alignment);
+    // The last need not be padded.
+    const std::size_t paddedSize = std::min(aligned(size, alignment), left);
+    note += paddedSize;
+    left -= paddedSize;
   }
   return true;
 }

@@ -8,6 +8,7 @@
 #include <ctime>
 
 #include "Runtime/AddressWait.h"
+#include "Runtime/LoadedImages.h"
 
 namespace rt::detail {
 
@@ -40,9 +41,13 @@ constinit std::atomic<ThreadToken> ForkGate::survivor_ = 0;
 
 namespace {
 
+struct Handlers {};
+
+constinit Handlers handlers;
+
 // A fork that has begun would not know of handlers that are registered meanwhile. Early, so that the handlers
 // of others find the gate open: of those that prepare a fork, the first registered is called last.
-[[gnu::constructor(101)]] void registerAtLoad() {
+void announce(Handlers& /*handlers*/) noexcept {
   currentThreadToken();
 }
 
@@ -56,6 +61,10 @@ void pauseFork(int look) noexcept {
 }
 
 }  // namespace
+
+// Announced as a class is, so that an image which uses nothing but a lock stays, too: the system calls the
+// handlers, and those for the end of threads, as long as the process lives.
+template struct AnnouncedOnLoading<handlers>;
 
 void ForkGate::wait() noexcept {
   while (isClosed_.load(std::memory_order_acquire) != 0) waitAtAddress(isClosed_, 1);

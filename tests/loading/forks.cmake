@@ -32,3 +32,16 @@ loading_forks(linked-hidden-exports separate linked hidden EXPORTS)
 loading_forks(opened separate opened exported)
 loading_forks(opened-exports shared opened exported EXPORTS)
 loading_forks(opened-hidden separate opened hidden)
+
+# A library whose only use of the runtime is a lock, and a program without the runtime that opens and closes it.
+add_library(loading-lock-library MODULE lock-library.cpp)
+target_include_directories(loading-lock-library PRIVATE "${PROJECT_SOURCE_DIR}")
+# Only those parts of the archive that are referred to.
+target_link_libraries(loading-lock-library PRIVATE MountPoint::Options "$<TARGET_FILE:runtime>")
+add_dependencies(loading-lock-library runtime)
+target_compile_options(loading-lock-library PRIVATE -fvisibility=hidden -fvisibility-inlines-hidden)
+target_link_options(loading-lock-library PRIVATE -Wl,--exclude-libs,ALL)
+add_executable(loading-lock-host lock-host.cpp)
+target_link_libraries(loading-lock-host PRIVATE MountPoint::Options ${CMAKE_DL_LIBS})
+add_dependencies(loading-lock-host loading-lock-library)
+add_test(NAME loading.closed.lock COMMAND loading-lock-host "$<TARGET_FILE:loading-lock-library>")

@@ -1,0 +1,12 @@
+// A library that brings the runtime and uses nothing of it but a lock.
+#include "Runtime/UnfairLock.h"
+
+namespace {
+
+constinit rt::UnfairLock lock;
+
+}  // namespace
+
+extern "C" [[gnu::visibility("default")]] void useInLibrary() {
+  const rt::LockGuard guard(lock);
+}

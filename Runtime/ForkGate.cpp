@@ -2,10 +2,14 @@
 
 #include <pthread.h>
 #include <sched.h>
+#include <sys/mman.h>
 
+#include <array>
 #include <cerrno>
-#include <climits>
+#include <chrono>
+#include <csignal>
 #include <ctime>
+#include <new>
 
 #include "Runtime/AddressWait.h"
 #include "Runtime/LoadedImages.h"
@@ -22,20 +26,47 @@ constexpr std::uint32_t kGenerations = 1U << 9;
 constexpr int kQuickLooks = 100;
 constexpr int kLooks = kQuickLooks + 1000;
 
+// How many milliseconds a thread waits at the gate, counted likewise: longer than the fork for the thread.
+constexpr int kPauses = 2 * kLooks;
+
 }  // namespace
 
-struct ForkGate::Threads {
-  // Guards the rest. A fork holds it from when it waits to its end, in both processes. The system's, since
-  // ours count for threads that are in the list.
+struct ForkGate::Forks {
+  // Held by a fork from when it waits to its end, in both processes, and while handlers are registered. The
+  // system's, since ours use the gate.
   pthread_mutex_t lock = PTHREAD_MUTEX_INITIALIZER;
-  bool areHandlersRegistered = false;
-  // Its value is destroyed when a thread ends.
+  std::atomic<bool> areHandlersRegistered = false;
+  // Its value, a thread's place, is given back when the thread ends.
   pthread_key_t end{};
-  ThreadState* first = nullptr;
+  std::uint32_t number = 0;
 };
 
-constinit ForkGate::Threads ForkGate::threads_;
-constinit std::atomic<std::uint32_t> ForkGate::isClosed_ = 0;
+// Where a thread counts its locks. Outlives the thread, so that a fork may look at any time; the next thread
+// gets it.
+struct alignas(64) ForkGate::Place {
+  std::atomic<std::uint32_t> heldLocks = 0;
+  std::atomic<bool> isTaken = false;
+};
+
+// A page of places, and those that came after it. Nothing is ever taken out, so that no lock is needed: a
+// thread may get its place inside of a signal handler, and while a fork is being made.
+struct ForkGate::Places {
+  std::atomic<Places*> next = nullptr;
+  std::array<Place, 63> all;
+
+  template <class Visit>
+  static void forEach(Visit visit) {
+    for (Places* each = &places_; each != nullptr; each = each->next.load(std::memory_order_acquire)) {
+      for (Place& place : each->all) {
+        if (visit(place)) return;
+      }
+    }
+  }
+};
+
+constinit ForkGate::Forks ForkGate::forks_;
+constinit ForkGate::Places ForkGate::places_;
+constinit std::atomic<std::uint32_t> ForkGate::shutFor_ = 0;
 constinit std::atomic<std::uint32_t> ForkGate::generation_ = 0;
 constinit std::atomic<ThreadToken> ForkGate::survivor_ = 0;
 
@@ -66,8 +97,26 @@ void pauseFork(int look) noexcept {
 // handlers, and those for the end of threads, as long as the process lives.
 template struct AnnouncedOnLoading<handlers>;
 
+void ForkGate::pass() noexcept {
+  for (;;) {
+    enter();
+    std::atomic_thread_fence(std::memory_order_seq_cst);
+    if (!isShut()) return;
+    leave();
+    wait();
+  }
+}
+
 void ForkGate::wait() noexcept {
-  while (isClosed_.load(std::memory_order_acquire) != 0) waitAtAddress(isClosed_, 1);
+  constexpr std::chrono::nanoseconds kPause = std::chrono::milliseconds(1);
+  std::uint32_t fork = shutFor_.load(std::memory_order_acquire);
+  for (int pauses = 0; fork != 0 && shutFor_.load(std::memory_order_acquire) == fork; ++pauses) {
+    if (pauses < kPauses) {
+      waitAtAddress(shutFor_, fork, &kPause);
+    } else if (shutFor_.compare_exchange_strong(fork, 0, std::memory_order_acq_rel)) {
+      wakeAllAtAddress(&shutFor_);
+    }
+  }
 }
 
 ThreadToken ForkGate::tokenOf(std::uint32_t number) noexcept {
@@ -84,74 +133,109 @@ bool ForkGate::isGone(ThreadToken token) noexcept {
 }
 
 bool ForkGate::registerHandlers() noexcept {
-  if (threads_.areHandlersRegistered) return true;
-  if (pthread_key_create(&threads_.end, threadEnds) != 0) return false;
-  if (pthread_atfork(prepare, continueInParent, continueInChild) != 0) {
-    pthread_key_delete(threads_.end);
-    return false;
+  if (forks_.areHandlersRegistered.load(std::memory_order_acquire)) return true;
+  // A signal handler on this thread must not wait for the lock.
+  sigset_t all;
+  sigset_t previous;
+  sigfillset(&all);
+  pthread_sigmask(SIG_SETMASK, &all, &previous);
+  pthread_mutex_lock(&forks_.lock);
+  bool areRegistered = forks_.areHandlersRegistered.load(std::memory_order_relaxed);
+  if (!areRegistered && pthread_key_create(&forks_.end, threadEnds) == 0) {
+    areRegistered = pthread_atfork(prepare, continueInParent, continueInChild) == 0;
+    if (!areRegistered) pthread_key_delete(forks_.end);
+    forks_.areHandlersRegistered.store(areRegistered, std::memory_order_release);
   }
-  threads_.areHandlersRegistered = true;
-  return true;
+  pthread_mutex_unlock(&forks_.lock);
+  pthread_sigmask(SIG_SETMASK, &previous, nullptr);
+  return areRegistered;
 }
 
-bool ForkGate::add(ThreadState& thread) noexcept {
-  pthread_mutex_lock(&threads_.lock);
-  const bool isRegistered = registerHandlers();
-  // A thread that could not be taken out at its end must not be put in. Forks do not wait for its locks.
-  if (isRegistered && pthread_setspecific(threads_.end, &thread) == 0) {
-    thread.next = threads_.first;
-    if (threads_.first != nullptr) threads_.first->previous = &thread;
-    threads_.first = &thread;
-  }
-  pthread_mutex_unlock(&threads_.lock);
-  return isRegistered;
+ForkGate::Place* ForkGate::takePlace() noexcept {
+  Place* taken = nullptr;
+  Places::forEach([&taken](Place& place) {
+    if (place.isTaken.load(std::memory_order_relaxed)) return false;
+    if (!place.isTaken.exchange(true, std::memory_order_acquire)) taken = &place;
+    return taken != nullptr;
+  });
+  if (taken != nullptr) return taken;
+  // Not by an allocator, which may use locks.
+  void* const memory =
+      mmap(nullptr, sizeof(Places), PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
+  if (memory == MAP_FAILED) return nullptr;
+  auto* const added = ::new (memory) Places;
+  taken = added->all.data();
+  taken->isTaken.store(true, std::memory_order_relaxed);
+  Places* next = places_.next.load(std::memory_order_relaxed);
+  do {
+    added->next.store(next, std::memory_order_relaxed);
+  } while (!places_.next.compare_exchange_weak(next, added, std::memory_order_acq_rel));
+  return taken;
 }
 
-void ForkGate::remove(ThreadState& thread) noexcept {
-  pthread_mutex_lock(&threads_.lock);
-  (thread.previous == nullptr ? threads_.first : thread.previous->next) = thread.next;
-  if (thread.next != nullptr) thread.next->previous = thread.previous;
-  pthread_mutex_unlock(&threads_.lock);
+std::atomic<std::uint32_t>& ForkGate::beginCounting() noexcept {
+  const int error = errno;
+  currentThreadToken();
+  ThreadState& self = currentThread;
+  Place* const place = registerHandlers() ? takePlace() : nullptr;
+  std::atomic<std::uint32_t>* count = &self.unseenLockCount;
+  if (place != nullptr) count = &place->heldLocks;
+  std::atomic<std::uint32_t>* known = nullptr;
+  if (!self.lockCount.compare_exchange_strong(known, count)) {
+    // A signal handler has been faster.
+    if (place != nullptr) place->isTaken.store(false, std::memory_order_release);
+  } else if (place != nullptr && pthread_setspecific(forks_.end, place) != 0) {
+    // Nobody would give it back. Forks do not wait for this thread.
+    giveBack(*place, &self.unseenLockCount);
+  }
+  errno = error;
+  return *self.lockCount.load(std::memory_order_relaxed);
 }
 
-// The system asks several times, so that what other values do when they are destroyed still counts. Not in
-// the last round, in which a sanitizer takes leave of the thread.
-void ForkGate::threadEnds(void* thread) noexcept {
-  auto& ending = *static_cast<ThreadState*>(thread);
-  if (++ending.endCalls < PTHREAD_DESTRUCTOR_ITERATIONS - 1 &&
-      pthread_setspecific(threads_.end, thread) == 0) {
-    return;
-  }
-  remove(ending);
+// Has the calling thread count at `next` from now on, null where it is to get a place when it needs one.
+void ForkGate::giveBack(Place& place, std::atomic<std::uint32_t>* next) noexcept {
+  if (next != nullptr) next->store(place.heldLocks.load(std::memory_order_relaxed), std::memory_order_relaxed);
+  currentThread.lockCount.store(next, std::memory_order_relaxed);
+  place.heldLocks.store(0, std::memory_order_release);
+  place.isTaken.store(false, std::memory_order_release);
+}
+
+// What the thread still does, as it ends, has it count in a place again, and the system asks again. In its
+// last round it does not: then a place is never given back, with a count of 0.
+void ForkGate::threadEnds(void* place) noexcept {
+  giveBack(*static_cast<Place*>(place), heldLocks() != 0 ? &currentThread.unseenLockCount : nullptr);
 }
 
 bool ForkGate::isAnyLockHeldElsewhere() noexcept {
-  for (const ThreadState* each = threads_.first; each != nullptr; each = each->next) {
-    if (each != &currentThread && each->heldLocks.load(std::memory_order_acquire) != 0) return true;
-  }
-  return false;
+  const std::atomic<std::uint32_t>* const own = currentThread.lockCount.load(std::memory_order_relaxed);
+  bool isHeld = false;
+  Places::forEach([&isHeld, own](const Place& place) {
+    isHeld = &place.heldLocks != own && place.heldLocks.load(std::memory_order_acquire) != 0;
+    return isHeld;
+  });
+  return isHeld;
 }
 
 void ForkGate::prepare() noexcept {
   const int error = errno;
-  currentThreadToken();
-  pthread_mutex_lock(&threads_.lock);
+  pthread_mutex_lock(&forks_.lock);
   enter();  // This thread passes the gate, whatever the handlers of others do.
-  isClosed_.store(1, std::memory_order_relaxed);
+  if (++forks_.number == 0) ++forks_.number;
+  shutFor_.store(forks_.number, std::memory_order_relaxed);
   std::atomic_thread_fence(std::memory_order_seq_cst);
   for (int look = 0; look < kLooks && isAnyLockHeldElsewhere(); ++look) pauseFork(look);
   errno = error;
 }
 
 void ForkGate::open() noexcept {
-  isClosed_.store(0, std::memory_order_release);
+  shutFor_.store(0, std::memory_order_release);
   leave();
-  pthread_mutex_unlock(&threads_.lock);
+  pthread_mutex_unlock(&forks_.lock);
 }
 
 void ForkGate::continueInParent() noexcept {
   open();
-  wakeAllAtAddress(&isClosed_);
+  wakeAllAtAddress(&shutFor_);
 }
 
 void ForkGate::continueInChild() noexcept {
@@ -159,11 +243,15 @@ void ForkGate::continueInChild() noexcept {
   generation_.store((generation_.load(std::memory_order_relaxed) + 1) % kGenerations,
                     std::memory_order_relaxed);
   survivor_.store(thread.token, std::memory_order_relaxed);
-  // The others' places may be used again.
-  const bool isListed = thread.previous != nullptr || threads_.first == &thread;
-  threads_.first = isListed ? &thread : nullptr;
-  thread.previous = nullptr;
-  thread.next = nullptr;
+  // The others' places are free.
+  const std::atomic<std::uint32_t>* const own = thread.lockCount.load(std::memory_order_relaxed);
+  Places::forEach([own](Place& place) {
+    if (&place.heldLocks != own) {
+      place.heldLocks.store(0, std::memory_order_relaxed);
+      place.isTaken.store(false, std::memory_order_relaxed);
+    }
+    return false;
+  });
   thread.identifier = systemThreadIdentifier();
   thread.isMain = true;
   open();

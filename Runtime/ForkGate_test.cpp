@@ -51,7 +51,7 @@ struct Nest {
 };
 
 std::uint32_t heldLocks() {
-  return rt::detail::currentThread.heldLocks;
+  return rt::detail::ForkGate::heldLocks();
 }
 
 // Invariant: whatever the other threads were doing, all locks are free in the child, and what they guard is

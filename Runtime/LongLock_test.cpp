@@ -54,7 +54,7 @@ TEST(LongLock, KeepsThreadsApart) {
 TEST(LongLock, IsNotCountedForForks) {
   LongLock lock;
   const LockGuard guard(lock);
-  EXPECT_EQ(rt::detail::currentThread.heldLocks, 0U);
+  EXPECT_EQ(rt::detail::ForkGate::heldLocks(), 0U);
 }
 
 TEST(LongLock, HeldByAnotherThreadIsFreeInTheChildOfAFork) {

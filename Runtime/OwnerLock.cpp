@@ -16,7 +16,7 @@ constexpr int kLongestPause = 16;
 
 }  // namespace
 
-void OwnerLock::lockSlow(ThreadToken self) noexcept {
+void OwnerLock::lockSlow(ThreadToken self, bool isCounted) noexcept {
   std::uint32_t state = state_.load(std::memory_order_relaxed);
   if ((state & ~kHasWaiters) == self) {
     std::fprintf(stderr, "rt: the lock at %p is taken again by thread %u, which holds it\n",
@@ -29,6 +29,8 @@ void OwnerLock::lockSlow(ThreadToken self) noexcept {
     for (int i = 0; i < pauses; ++i) spinPause();
     state = state_.load(std::memory_order_relaxed);
   }
+  // A fork need not wait for a thread that sleeps and holds nothing.
+  const bool isUncountedAsleep = isCounted && ForkGate::heldLocks() == 1;
   // From here on the lock is taken with the bit set: others may still sleep, and who has taken the lock
   // must wake one of them when it lets it go.
   for (;;) {
@@ -40,7 +42,9 @@ void OwnerLock::lockSlow(ThreadToken self) noexcept {
       }
     } else if ((state & kHasWaiters) != 0 ||
                state_.compare_exchange_weak(state, state | kHasWaiters, std::memory_order_relaxed)) {
+      if (isUncountedAsleep) ForkGate::leave();
       waitAtAddress(state_, state | kHasWaiters);
+      if (isUncountedAsleep) ForkGate::enter();
     }
   }
 }

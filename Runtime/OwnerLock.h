@@ -18,10 +18,11 @@ class OwnerLock {
  public:
   constexpr OwnerLock() noexcept = default;
 
-  [[gnu::always_inline]] void lock() noexcept {
+  /// `isCounted` is whether the caller has counted the lock for forks (Runtime/ForkGate.h).
+  [[gnu::always_inline]] void lock(bool isCounted = false) noexcept {
     const ThreadToken self = currentThreadToken();
     if (!take(self)) [[unlikely]]
-      lockSlow(self);
+      lockSlow(self, isCounted);
   }
 
   [[gnu::always_inline]] bool tryLock() noexcept {
@@ -63,7 +64,7 @@ class OwnerLock {
                                           std::memory_order_relaxed);
   }
 
-  [[gnu::cold]] void lockSlow(ThreadToken self) noexcept;
+  [[gnu::cold]] void lockSlow(ThreadToken self, bool isCounted) noexcept;
   [[gnu::cold]] bool takeOver(ThreadToken self) noexcept;
   [[gnu::cold]] void wakeOne() noexcept;
   [[noreturn, gnu::cold]] void failOwner(const char* verb) const noexcept;

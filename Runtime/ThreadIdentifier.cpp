@@ -14,7 +14,7 @@ ThreadToken learnThreadToken() noexcept {
   self.isMain = systemIsMainThread();
   self.token = ForkGate::tokenOf(systemThreadNumber());
   // Kept only where it cannot go stale; the next call asks the system again otherwise.
-  if (ForkGate::add(self)) self.identifier = identifier;
+  if (ForkGate::registerHandlers()) self.identifier = identifier;
   return self.token;
 }
 

@@ -10,8 +10,8 @@
 /// the same one in the child, where those of all other threads are known to be gone. Either may be given
 /// again after a thread has ended.
 ///
-/// The first call on a thread asks the system; no call allocates. Any thread may call all of it at any time,
-/// also while the program is being loaded and in the destructors of thread-local variables.
+/// The first call on a thread asks the system. No call allocates. Any thread may call all of it at any time,
+/// also in signal handlers, while the program is being loaded and in the destructors of thread-local variables.
 ///
 /// Not for: telling threads apart that may have ended; names of threads.
 
@@ -30,14 +30,12 @@ namespace detail {
 struct ThreadState {
   ThreadIdentifier identifier = 0;
   ThreadToken token = 0;
-  /// The locks for which a fork waits (Runtime/ForkGate.h); other threads read it.
-  std::atomic<std::uint32_t> heldLocks = 0;
   bool isMain = false;
 
-  // The fork gate's.
-  int endCalls = 0;
-  ThreadState* previous = nullptr;
-  ThreadState* next = nullptr;
+  // The fork gate's (Runtime/ForkGate.h): where the thread counts its locks, null where it has no such place;
+  // and a place for the count of which no fork knows. Atomic for the sake of signal handlers.
+  std::atomic<std::atomic<std::uint32_t>*> lockCount = nullptr;
+  std::atomic<std::uint32_t> unseenLockCount = 0;
 };
 
 // Initial-exec: read without a call, wherever the code is linked to.

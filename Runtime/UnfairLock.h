@@ -22,9 +22,8 @@
 ///
 /// Fork. A fork waits until no other thread holds a lock of this kind. So all of them are free in the child,
 /// but those of the thread that forked, and what they guard is whole. (On macOS the child cannot let go what
-/// that thread held.) For a lock that is held for longer than about a second the fork does not wait: it is
-/// free in the child nevertheless, but what it guards is as the other thread had left it. On macOS it stays
-/// held then.
+/// that thread held.) A fork waits for about a second at most. A lock that is still held then is free in the child. What it guards
+/// is as its holder left it. On macOS it stays held then.
 ///
 /// Not for: what takes long, such as system calls that wait and code of others (Runtime/LongLock.h); locks
 /// that a thread takes again while it holds them (Runtime/RecursiveLock.h); waiting for a condition, for
@@ -50,20 +49,29 @@ class RT_CAPABILITY("lock") UnfairLock {
 
   /// Takes the lock, after waiting until no thread holds it. Ends the program when the caller holds it.
   [[gnu::always_inline]] void lock() noexcept RT_ACQUIRE() {
-    detail::ForkGate::enter();
-    lock_.lock();
-    if (detail::ForkGate::isShut()) [[unlikely]]
-      lockAfterFork();
+    if constexpr (detail::SystemLock::kIsTakenOver) {
+      detail::ForkGate::enter();
+      lock_.lock();
+      if (detail::ForkGate::isShut()) [[unlikely]]
+        lockAfterFork();
+    } else {
+      detail::ForkGate::pass();
+      lock_.lock();
+    }
   }
 
   /// Takes the lock and returns true, or returns false at once when any thread, the caller included,
   /// holds it.
   [[nodiscard, gnu::always_inline]] bool tryLock() noexcept RT_TRY_ACQUIRE(true) {
-    detail::ForkGate::enter();
+    if constexpr (detail::SystemLock::kIsTakenOver) {
+      detail::ForkGate::enter();
+    } else {
+      detail::ForkGate::pass();
+    }
     const bool isTaken = lock_.tryLock();
     if (!isTaken) {
       detail::ForkGate::leave();
-    } else if (detail::ForkGate::isShut()) [[unlikely]] {
+    } else if (detail::SystemLock::kIsTakenOver && detail::ForkGate::isShut()) [[unlikely]] {
       return tryLockAfterFork();
     }
     return isTaken;

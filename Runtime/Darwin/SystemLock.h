@@ -5,23 +5,17 @@
 
 #include <os/lock.h>
 
-#include "Runtime/ThreadIdentifier.h"
-
 namespace rt::detail {
 
 class SystemLock {
  public:
+  /// Whether one that another thread held can be had in the child of a fork.
+  static constexpr bool kIsTakenOver = false;
+
   constexpr SystemLock() noexcept = default;
 
-  // A thread is known to the fork gate before it has a lock.
-  void lock() noexcept {
-    currentThreadToken();
-    os_unfair_lock_lock(&lock_);
-  }
-  bool tryLock() noexcept {
-    currentThreadToken();
-    return os_unfair_lock_trylock(&lock_);
-  }
+  void lock() noexcept { os_unfair_lock_lock(&lock_); }
+  bool tryLock() noexcept { return os_unfair_lock_trylock(&lock_); }
   void unlock() noexcept { os_unfair_lock_unlock(&lock_); }
   void assertOwner() const noexcept { os_unfair_lock_assert_owner(&lock_); }
 

@@ -6,6 +6,12 @@
 
 namespace rt::detail {
 
-using SystemLock = OwnerLock;
+class SystemLock : public OwnerLock {
+ public:
+  /// Whether one that another thread held can be had in the child of a fork.
+  static constexpr bool kIsTakenOver = true;
+
+  [[gnu::always_inline]] void lock() noexcept { OwnerLock::lock(true); }
+};
 
 }  // namespace rt::detail

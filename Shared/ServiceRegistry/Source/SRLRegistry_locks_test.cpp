@@ -27,7 +27,7 @@ using testing::UnorderedElementsAre;
 std::vector<std::pair<std::string, int>> runs;
 
 int heldLocks() {
-  return static_cast<int>(rt::detail::currentThread.heldLocks.load());
+  return static_cast<int>(rt::detail::ForkGate::heldLocks());
 }
 
 void note(const char* what) {

@@ -195,6 +195,23 @@ TEST_F(MountPointPrivilegesTest, DoesNothingWhereAClosedStreamCannotBeFilled) {
   EXPECT_FALSE(fs::exists("/Volumes/a"));
 }
 
+// Without raised privileges the C library takes this apart before the command begins, and this one is more
+// than the command has memory for.
+TEST_F(MountPointPrivilegesTest, WorksWhateverTheLengthOfTheSearchPathForLibraries) {
+  const auto searching = [] {
+    as(kCaller)();
+    std::string path;
+    for (int number = 0; number < 10000; ++number) path += "/" + std::to_string(number) + ":";
+    require(setenv("LD_LIBRARY_PATH", path.c_str(), 1) == 0);
+  };
+  if (kInstrumentation.empty()) {
+    EXPECT_NE(runProcess({kPlainCommand, "a"}, searching).exitStatus, EACCES) << "too short to show anything";
+  }
+  expectSuccess(run({"a"}, searching));
+  expectResult(run({"a"}, searching), 17, "Failed to create [/Volumes/a], errno: 17\n");
+  expectSuccess(run({"a", "--remove"}, searching));
+}
+
 TEST_F(MountPointPrivilegesTest, RemovesAnothersEmptyDirectory) {
   expectSuccess(runAs(kOther, {"a"}));
   expectSuccess(runAs(kCaller, {"a", "--remove"}));
@@ -457,29 +474,82 @@ TEST_F(MountPointPrivilegesTest, HasNoRightsWhereItsCallerMayFilterItsCalls) {
   expectResult(result, 13, "Failed to create [/Volumes/a], errno: 13\n");
 }
 
-// ---- What is root's share of a file system ----
+// ---- What only root may write ----
 
-TEST_F(MountPointPrivilegesTest, GetsNoBlockThatIsReservedForRoot) {
-  const ProcessResult made =
-      runProcess({"bash", "-c",
-                  "truncate -s 4M /image && mkfs.ext4 -q -b 1024 -m 40 -O ^has_journal /image"
-                  " && mount -o loop /image /Volumes"});
-  if (made.exitStatus != 0) GTEST_SKIP() << "no image can be mounted here: " << made.standardError;
-  fs::create_directory("/Volumes/full");
-  ASSERT_EQ(chown("/Volumes/full", kCaller.user, kCaller.group), 0);
-  EXPECT_EQ(inProcessOf(kCaller,
-                        [] {
-                          const int file = open("/Volumes/full/file", O_WRONLY | O_CREAT, 0600);
-                          const std::string block(1024, '.');
-                          while (write(file, block.data(), block.size()) > 0) {
-                          }
-                          return errno;
-                        }),
-            ENOSPC);
+// /Volumes as a file system of which 40 % are reserved for root, and the caller has filled the rest.
+class MountPointFullFileSystemTest : public MountPointPrivilegesTest {
+ protected:
+  static constexpr const char* kFile = "/Volumes/full/file";
+
+  void SetUp() override {
+    MountPointPrivilegesTest::SetUp();
+    if (IsSkipped()) return;
+    const ProcessResult made =
+        runProcess({"bash", "-c",
+                    "truncate -s 4M /image && mkfs.ext4 -q -b 1024 -m 40 -O ^has_journal /image"
+                    " && mount -o loop /image /Volumes"});
+    if (made.exitStatus != 0) GTEST_SKIP() << "no image can be mounted here: " << made.standardError;
+    fs::create_directory("/Volumes/full");
+    ASSERT_EQ(chown("/Volumes/full", kCaller.user, kCaller.group), 0);
+    EXPECT_EQ(inProcessOf(kCaller, fill), ENOSPC);
+  }
+  void TearDown() override {
+    umount("/Volumes");
+    fs::remove("/image");
+    MountPointPrivilegesTest::TearDown();
+  }
+
+ private:
+  // Until nothing is left even once the file system has settled what it had put off.
+  static int fill() {
+    const int file = open(kFile, O_WRONLY | O_CREAT, 0600);
+    const std::string block(1024, '.');
+    while (write(file, block.data(), block.size()) > 0) {
+      while (write(file, block.data(), block.size()) > 0) {
+      }
+      fsync(file);
+    }
+    return errno;
+  }
+};
+
+TEST_F(MountPointFullFileSystemTest, GetsNoBlockThatIsReservedForRoot) {
   expectResult(runAs(kCaller, {"a"}), 28, "Failed to create [/Volumes/a], errno: 28\n");
   expectSuccess(run({"roots"}));
-  umount("/Volumes");
-  fs::remove("/image");
+}
+
+// Messages about the arguments used to be root's writing: up to 128 KiB of the caller's bytes for each.
+TEST_F(MountPointFullFileSystemTest, GetsNoBlockThatIsReservedForRootForItsMessages) {
+  const off_t size = statusOf(kFile).st_size;
+  const auto intoFile = [] {
+    as(kCaller)();
+    const int file = open(kFile, O_WRONLY | O_APPEND);
+    require(file >= 0 && dup2(file, STDERR_FILENO) == STDERR_FILENO);
+  };
+  const std::string name(100000, 'y');
+  expectResult(run({"/" + name}, intoFile), 22, "");
+  expectResult(run({}, intoFile), 22, "");
+  expectResult(run({name}, intoFile), ENOSPC, "");
+  EXPECT_EQ(statusOf(kFile).st_size, size);
+}
+
+// A program that raises the rights of whoever runs it loses that when somebody else than root writes into it.
+TEST_F(MountPointPrivilegesTest, LetsNoFileKeepTheBitsThatItsCallersWritingTakesAway) {
+  const auto intoProgram = [] {
+    as(kCaller)();
+    const int file = open("/Volumes/program", O_WRONLY | O_APPEND);
+    require(file >= 0 && dup2(file, STDERR_FILENO) == STDERR_FILENO);
+  };
+  makeFile("/Volumes/program");
+  ASSERT_EQ(chown("/Volumes/program", kOther.user, kOther.group), 0);
+  for (const std::vector<std::string>& arguments : {std::vector<std::string>{}, {"a/b"}, {"program"}}) {
+    SCOPED_TRACE(testing::PrintToString(arguments));
+    const off_t size = statusOf("/Volumes/program").st_size;
+    ASSERT_EQ(chmod("/Volumes/program", 06777), 0);
+    expectResult(run(arguments, intoProgram), arguments == std::vector<std::string>{"program"} ? 17 : 22, "");
+    EXPECT_GT(statusOf("/Volumes/program").st_size, size);
+    EXPECT_EQ(statusOf("/Volumes/program").st_mode & 07777U, 0777U);
+  }
 }
 
 }  // namespace

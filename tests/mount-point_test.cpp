@@ -211,20 +211,18 @@ TEST_F(MountPointTest, LeavesTheDirectoryWhereItCouldNotBeHandedOver) {
 
 // ---- What it asks of the system, and nothing else ----
 
-// What taking on the caller's identity asks, whatever it is about to do.
-const std::vector<std::string> kIdentity = {"capget",   "getgid",   "getuid",   "setfsgid",
-                                            "setfsuid", "setfsgid", "setfsuid", "capset"};
+// What every run begins with: the caller's identity is taken on, and the signal of a limit on the size of
+// files is ignored.
+const std::vector<std::string> kPreparation = {"capget",   "getgid",   "getuid", "setfsgid",    "setfsuid",
+                                               "setfsgid", "setfsuid", "capset", "rt_sigaction"};
 
-// The calls that `arguments` lead to, in their order, once the signal of a limit on the size of files is
-// ignored and, where `asCaller` is, the identity is taken on. Of the latter the names stand in `kIdentity`.
-std::vector<std::string> withoutPreparation(std::vector<std::string> calls, bool asCaller) {
-  std::vector<std::string> expected = {"rt_sigaction"};
-  if (asCaller) expected.insert(expected.end(), kIdentity.begin(), kIdentity.end());
+// `calls` without the preparation.
+std::vector<std::string> withoutPreparation(std::vector<std::string> calls) {
   std::vector<std::string> names;
-  for (std::size_t index = 0; index < std::min(expected.size(), calls.size()); ++index) {
+  for (std::size_t index = 0; index < std::min(kPreparation.size(), calls.size()); ++index) {
     names.push_back(calls[index].substr(0, calls[index].find('(')));
   }
-  EXPECT_EQ(names, expected);
+  EXPECT_EQ(names, kPreparation);
   calls.erase(calls.begin(), calls.begin() + static_cast<std::ptrdiff_t>(names.size()));
   return calls;
 }
@@ -233,7 +231,7 @@ TEST_F(MountPointTest, AsksTheSystemForItsWorkAndNothingElse) {
   if (!kInstrumentation.empty()) GTEST_SKIP() << "built with instrumentation, which asks for more";
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
   const auto callsOf = [](const std::vector<std::string>& arguments) {
-    return withoutPreparation(systemCalls(arguments), true);
+    return withoutPreparation(systemCalls(arguments));
   };
   using Calls = std::vector<std::string>;
   // The identifiers may be asked for in any order.
@@ -246,7 +244,7 @@ TEST_F(MountPointTest, AsksTheSystemForItsWorkAndNothingElse) {
                                    "write(2, \"Failed to create [/Volumes/a], errno: 17\\n\", 41) = 41",
                                    "exit_group(17) = ?"}));
   EXPECT_EQ(callsOf({"a", "--remove"}), (Calls{"rmdir(\"/Volumes/a\") = 0", "exit_group(0) = ?"}));
-  EXPECT_EQ(withoutPreparation(systemCalls({}), false),
+  EXPECT_EQ(callsOf({}),
             (Calls{"write(2, \"No subdirectory specified.\\n\", 27) = 27", "exit_group(22) = ?"}));
   const std::vector<std::string> missing = callsOf({"a", "--remove"});
   ASSERT_EQ(missing.size(), 4U) << testing::PrintToString(missing);

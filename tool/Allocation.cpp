@@ -1,9 +1,12 @@
 // The command's memory: handed out from one piece, front to back, and never taken back. The C library's
 // own allocator does as a dozen environment variables say, some of which end the process; a command that
 // may run with raised privileges listens to none. It runs for a millisecond and allocates a handful of
-// blocks, the largest of which holds an argument, at most 128 KiB; the C++ library reserves 71 KiB for
-// exceptions, and the C library and the libraries that the command carries take about 3 KiB when they are
-// loaded, and nothing after that.
+// blocks, the largest of which holds an argument, at most 128 KiB. The C++ library reserves 71 KiB for
+// exceptions. The C library and the libraries that the command carries take about 3 KiB when they are loaded.
+//
+// One variable remains: without raised privileges the C library takes LD_LIBRARY_PATH apart before `main`,
+// and ends the process where more than about 2,000 different directories in it leave no memory. With raised
+// privileges it ignores the variable.
 //
 // These are all the functions of an allocator that anything in the command refers to. Were there another,
 // the linker would take the C library's allocator for it, and complain that it finds these twice.

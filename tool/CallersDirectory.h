@@ -13,16 +13,19 @@ enum class Making : std::uint8_t {
   notHandedOver,
 };
 
-/// Makes the directory at `path`, mode 0700 less the umask, and hands it to the real user and group of the
+/// Makes the directory at `path`, mode 0700 less the umask (where the parent has a default
+/// access control list, what that leaves of 0700), and hands it to the real user and group of the
 /// process: the caller, on whose behalf the program may run with raised privileges.
+///
+/// Precondition: the calling thread has taken the identity of its caller on (`CallerIdentity.h`).
 ///
 /// The caller may stop the process between any two of its steps, and wait until something else stands at
 /// `path`. That never becomes the caller's. docs/security.md tells how, and where this does not hold.
 ///
-/// On Linux the calling thread keeps the identity of its caller afterwards. Not thread-safe.
+/// Not thread-safe.
 Making makeCallersDirectory(const std::string& path);
 
 /// Removes the empty directory at `path`. Returns false where the system refuses; `errno` tells why.
 ///
-/// On Linux the calling thread keeps the identity of its caller afterwards. Not thread-safe.
+/// Precondition: the calling thread has taken the identity of its caller on. Not thread-safe.
 bool removeCallersDirectory(const std::string& path);

@@ -6,6 +6,7 @@
 #include <string>
 #include <string_view>
 
+#include "tool/CallerIdentity.h"
 #include "tool/CallersDirectory.h"
 
 namespace {
@@ -45,6 +46,9 @@ int removeDirectory(const std::string& path) {
 }  // namespace
 
 int runMountPointCommand(int argumentCount, const char* const* arguments) {
+  // Before any message: root's rights to write are not for the caller's bytes.
+  takeOnCallersIdentity();
+
   // A message that the caller's limit on the size of files cuts short shows in the status, as EFBIG. By
   // default the signal would end the process and leave no status at all.
   std::signal(SIGXFSZ, SIG_IGN);

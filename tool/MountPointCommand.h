@@ -3,7 +3,7 @@
 /// The `mount-point` command: makes or removes one directory directly under "/Volumes/" for the user
 /// who calls it.
 ///
-///     mount-point Backup             makes /Volumes/Backup, mode 0700, owned by the caller
+///     mount-point Backup             makes /Volumes/Backup, mode 0700 less the umask, owned by the caller
 ///     mount-point Backup --remove    removes it again
 ///
 /// `arguments` holds `argumentCount` NUL-terminated byte strings, the program's own name first, as
@@ -21,8 +21,8 @@
 /// handed over stays.
 ///
 /// Calls the operating system directly, starts no thread, reads no environment variable. Not thread-safe, and
-/// changes its process for good: SIGXFSZ is ignored from then on, and on Linux the calling thread becomes its
-/// caller to the file system, with CAP_DAC_OVERRIDE alone, before a name is touched. So with raised
-/// privileges it hands over no other directory than the one it has made; docs/security.md tells what else
-/// holds.
+/// changes its process for good: SIGXFSZ is ignored from then on, and the calling thread becomes its caller
+/// to the file system (`CallerIdentity.h`) before a message is written or a name is touched. So with raised
+/// privileges it writes nothing as root, and hands over no other directory than the one it has made;
+/// docs/security.md tells what else holds.
 int runMountPointCommand(int argumentCount, const char* const* arguments);

@@ -10,14 +10,33 @@
 
 namespace {
 
+// Root's rights for as long as it lives, where the process took its caller's identity on and root is still
+// the saved user. Keeps `errno` at its end.
+class AsRoot {
+ public:
+  AsRoot() : isRoot_(geteuid() == getuid() && seteuid(0) == 0) {}
+  ~AsRoot() {
+    const int error = errno;
+    if (isRoot_) seteuid(getuid());
+    errno = error;
+  }
+  AsRoot(const AsRoot&) = delete;
+  AsRoot& operator=(const AsRoot&) = delete;
+
+  explicit operator bool() const { return isRoot_; }
+
+ private:
+  bool isRoot_;
+};
+
 Making makeAndHandOver(const std::string& path) {
   if (mkdir(path.c_str(), S_IRWXU) != 0) return Making::notMade;
   if (chown(path.c_str(), getuid(), getgid()) != 0) return Making::notHandedOver;
   return Making::done;
 }
 
-// `mkdir` at `path`, by a detour: under a name that nobody else uses, nobody else's directory can be opened
-// by mistake, and the directory gets `path` only where nothing is. Returns its descriptor, or -1.
+// Makes the directory under a new name, opens it, and renames it to `path` if nothing is there. Between
+// `mkdir` at `path` and `open`, another directory could take its place. Returns the descriptor, or -1.
 int makeOpened(const std::string& path) {
   struct stat status{};
   if (lstat(path.c_str(), &status) == 0) errno = EEXIST;
@@ -37,10 +56,10 @@ int makeOpened(const std::string& path) {
 
 }  // namespace
 
-// The system has no right to write anywhere that a program could keep while it becomes its caller. So it
-// stays root, and hands over what it has made by a descriptor: `path` may be something else by then.
+// Root hands over what it has made by a descriptor: `path` may be something else by then.
 Making makeCallersDirectory(const std::string& path) {
-  if (geteuid() != 0) return makeAndHandOver(path);  // nobody but root can give away what is another's
+  const AsRoot root;
+  if (!root) return makeAndHandOver(path);  // nobody but root can give away what is another's
   const int directory = makeOpened(path);
   if (directory < 0) return Making::notMade;
   const bool handedOver = fchown(directory, getuid(), getgid()) == 0;
@@ -51,5 +70,6 @@ Making makeCallersDirectory(const std::string& path) {
 }
 
 bool removeCallersDirectory(const std::string& path) {
+  const AsRoot root;
   return rmdir(path.c_str()) == 0;
 }

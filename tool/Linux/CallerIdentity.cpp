@@ -1,4 +1,4 @@
-#include "tool/Linux/CallerIdentity.h"
+#include "tool/CallerIdentity.h"
 
 #include <linux/capability.h>
 #include <sys/fsuid.h>

@@ -60,10 +60,11 @@ ProcessResult MountPointTest::runInjected(const std::string& calls, const std::s
   });
 }
 
-std::vector<std::string> MountPointTest::systemCalls(const std::vector<std::string>& arguments) {
+std::vector<std::string> MountPointTest::systemCalls(const std::vector<std::string>& arguments,
+                                                     const std::function<void()>& beforeExec) {
   std::vector<std::string> whole = {"strace", "-f", "-qq", "-s", "200", "-o", kTrace, kCommand};
   whole.insert(whole.end(), arguments.begin(), arguments.end());
-  runProcess(whole, leaveLeaksAlone);
+  runProcess(whole, beforeExec);
   std::ifstream file(kTrace);
   std::vector<std::string> calls;
   for (std::string line; std::getline(file, line);) {

@@ -40,7 +40,8 @@ class MountPointTest : public testing::Test {
                                    const std::function<void()>& beforeExec = {});
 
   /// What the command, once it has started, asks the system for, a line each as strace writes it.
-  static std::vector<std::string> systemCalls(const std::vector<std::string>& arguments);
+  static std::vector<std::string> systemCalls(const std::vector<std::string>& arguments,
+                                              const std::function<void()>& beforeExec = leaveLeaksAlone);
 
   /// Runs the command with none of root's capabilities.
   static ProcessResult runPowerless(const std::vector<std::string>& arguments);

@@ -195,6 +195,22 @@ TEST_F(MountPointPrivilegesTest, DoesNothingWhereAClosedStreamCannotBeFilled) {
   EXPECT_FALSE(fs::exists("/Volumes/a"));
 }
 
+TEST_F(MountPointPrivilegesTest, AsksTheSystemForTheSameOnBehalfOfACallerAsOfRoot) {
+  if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
+  const auto namesOf = [](const std::vector<std::string>& calls) {
+    std::vector<std::string> names;
+    for (const std::string& call : calls) names.push_back(call.substr(0, call.find('(')));
+    return names;
+  };
+  const std::vector<std::vector<std::string>> runs = {{}, {"a/b"}, {"a"}, {"a"}, {"a", "--remove"}};
+  std::vector<std::vector<std::string>> asked;
+  for (const std::vector<std::string>& arguments : runs) asked.push_back(namesOf(systemCalls(arguments)));
+  for (std::size_t index = 0; index < runs.size(); ++index) {
+    EXPECT_THAT(asked[index], testing::Contains("capset"));
+    EXPECT_EQ(namesOf(systemCalls(runs[index], onBehalfOf(kCaller))), asked[index]) << index;
+  }
+}
+
 // Without raised privileges the C library takes this apart before the command begins, and this one is more
 // than the command has memory for.
 TEST_F(MountPointPrivilegesTest, WorksWhateverTheLengthOfTheSearchPathForLibraries) {

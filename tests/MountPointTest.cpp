@@ -64,6 +64,9 @@ std::vector<std::string> MountPointTest::systemCalls(const std::vector<std::stri
                                                      const std::function<void()>& beforeExec) {
   std::vector<std::string> whole = {"strace", "-f", "-qq", "-s", "200", "-o", kTrace, kCommand};
   whole.insert(whole.end(), arguments.begin(), arguments.end());
+  // Empty, and for everybody: strace opens it as its real user.
+  std::ofstream(kTrace).close();
+  chmod(kTrace, 0666);
   runProcess(whole, beforeExec);
   std::ifstream file(kTrace);
   std::vector<std::string> calls;

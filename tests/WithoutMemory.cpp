@@ -52,7 +52,7 @@ bool fail(std::int64_t number, Extent extent, const char* what) {
 
 // How many locks the thread holds.
 int heldLocks() {
-  return static_cast<int>(rt::detail::currentThread.heldLocks.load());
+  return static_cast<int>(rt::detail::ForkGate::heldLocks());
 }
 
 // Whether no more is allocated than that, once the threads of queues have let go of what they have done.

@@ -194,7 +194,8 @@ std::atomic<std::uint32_t>& ForkGate::beginCounting() noexcept {
 
 // Has the calling thread count at `next` from now on, null where it is to get a place when it needs one.
 void ForkGate::giveBack(Place& place, std::atomic<std::uint32_t>* next) noexcept {
-  if (next != nullptr) next->store(place.heldLocks.load(std::memory_order_relaxed), std::memory_order_relaxed);
+  if (next != nullptr)
+    next->store(place.heldLocks.load(std::memory_order_relaxed), std::memory_order_relaxed);
   currentThread.lockCount.store(next, std::memory_order_relaxed);
   place.heldLocks.store(0, std::memory_order_release);
   place.isTaken.store(false, std::memory_order_release);

@@ -9,6 +9,9 @@
 #include <array>
 #include <atomic>
 #include <cerrno>
+#include <climits>
+#include <cstdint>
+#include <set>
 #include <thread>
 #include <vector>
 
@@ -192,6 +195,113 @@ TEST(ForkGate, CountsThreadsUntilTheyHaveEnded) {
   for (std::thread& each : starters) each.join();
   EXPECT_EQ(status, 0);
   pthread_key_delete(key);
+}
+
+// Used to follow a list into the memory of threads that had ended, for ever.
+TEST(ForkGate, LooksAtNoThreadThatHasEndedHoweverLateItsFirstLockCame) {
+  static constinit UnfairLock lock;
+  static constinit pthread_key_t key{};
+  // In the last round of destructors that the system makes, and in those before it.
+  const auto end = [](void* value) {
+    const auto rounds = reinterpret_cast<std::intptr_t>(value);
+    if (rounds > 1) {
+      pthread_setspecific(key, reinterpret_cast<void*>(rounds - 1));  // NOLINT(performance-no-int-to-ptr)
+    } else {
+      const LockGuard guard(lock);
+    }
+  };
+  ASSERT_EQ(pthread_key_create(&key, end), 0);
+  EXPECT_EQ(statusOfChild([] {
+              for (std::intptr_t rounds = 1; rounds <= PTHREAD_DESTRUCTOR_ITERATIONS; ++rounds) {
+                for (int i = 0; i < 3; ++i) {
+                  // NOLINTNEXTLINE(performance-no-int-to-ptr)
+                  std::thread([&] { pthread_setspecific(key, reinterpret_cast<void*>(rounds)); }).join();
+                }
+              }
+              return statusOfChild([] { return 0; });
+            }),
+            0);
+  pthread_key_delete(key);
+}
+
+TEST(ForkGate, ThreadsCountOneAfterAnotherInTheSamePlace) {
+  static constinit UnfairLock lock;
+  std::set<const void*> places;
+  for (int i = 0; i < 100; ++i) {
+    std::thread([&] {
+      const LockGuard guard(lock);
+      places.insert(rt::detail::currentThread.lockCount.load());
+    }).join();
+  }
+  EXPECT_EQ(places.size(), 1U);
+}
+
+// More than the places that need no memory.
+TEST(ForkGate, WaitsForTheLocksOfManyThreads) {
+  std::vector<Pair> pairs(200);
+  std::atomic<bool> isEnding = false;
+  std::atomic<std::size_t> started = 0;
+  std::vector<std::thread> threads;
+  threads.reserve(pairs.size());
+  for (Pair& each : pairs) {
+    threads.emplace_back([&] {
+      each.change();
+      for (++started; !isEnding;) each.change();
+    });
+  }
+  while (started < pairs.size()) std::this_thread::yield();
+  int status = 0;
+  for (int i = 0; i < 20 && status == 0; ++i) {
+    status = statusOfChild([&] {
+      bool isWhole = true;
+      for (Pair& each : pairs) isWhole = each.isWhole() && isWhole;
+      return isWhole ? 0 : 1;
+    });
+  }
+  isEnding = true;
+  for (std::thread& each : threads) each.join();
+  EXPECT_EQ(status, 0);
+}
+
+// A handler that was registered before the gate's, so that it runs while the gate is shut.
+constinit std::atomic<std::atomic<bool>*> forkWaitsFor = nullptr;
+constinit std::atomic<bool> isForkWaiting = false;
+
+[[gnu::constructor(101)]] void registerEarlyHandler() {
+  pthread_atfork(
+      [] {
+        const std::atomic<bool>* const event = forkWaitsFor.load();
+        if (event == nullptr) return;
+        isForkWaiting = true;
+        isForkWaiting.notify_all();
+        event->wait(false);
+      },
+      nullptr, nullptr);
+}
+
+// Used to deadlock: the handler waits for a thread that waits at the gate.
+TEST(ForkGate, OpensForAThreadThatTheForkItselfWaitsFor) {
+  if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "no new threads in the child here";
+  EXPECT_EQ(statusOfChild([] {
+              static constinit UnfairLock lock;
+              static constinit std::atomic<bool> hasLocked = false;
+              forkWaitsFor = &hasLocked;
+              std::thread thread([] {
+                isForkWaiting.wait(false);
+                for (int i = 0; i < 1000; ++i) {
+                  const LockGuard guard(lock);
+                }
+                hasLocked = true;
+                hasLocked.notify_all();
+              });
+              const int status = statusOfChild([] {
+                const LockGuard guard(lock);
+                return 0;
+              });
+              thread.join();
+              return status;
+            }),
+            0);
 }
 
 TEST(ForkGate, LeavesErrnoAlone) {

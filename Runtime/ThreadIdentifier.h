@@ -11,7 +11,8 @@
 /// again after a thread has ended.
 ///
 /// The first call on a thread asks the system. No call allocates. Any thread may call all of it at any time,
-/// also in signal handlers, while the program is being loaded and in the destructors of thread-local variables.
+/// also in signal handlers, while the program is being loaded and in the destructors of thread-local
+/// variables.
 ///
 /// Not for: telling threads apart that may have ended; names of threads.
 

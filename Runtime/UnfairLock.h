@@ -22,8 +22,8 @@
 ///
 /// Fork. A fork waits until no other thread holds a lock of this kind. So all of them are free in the child,
 /// but those of the thread that forked, and what they guard is whole. (On macOS the child cannot let go what
-/// that thread held.) A fork waits for about a second at most. A lock that is still held then is free in the child. What it guards
-/// is as its holder left it. On macOS it stays held then.
+/// that thread held.) A fork waits for about a second at most. A lock that is still held then is free in the
+/// child. What it guards is as its holder left it. On macOS it stays held then.
 ///
 /// Not for: what takes long, such as system calls that wait and code of others (Runtime/LongLock.h); locks
 /// that a thread takes again while it holds them (Runtime/RecursiveLock.h); waiting for a condition, for

@@ -110,7 +110,8 @@ bool QueueRegistry::runUntilIdle(std::chrono::steady_clock::time_point deadline)
 void QueueRegistry::registerForkHandler() noexcept {
   static constinit std::atomic<bool> isRegistered = false;
   if (isRegistered.load(std::memory_order_relaxed) || isRegistered.exchange(true)) return;
-  pthread_atfork(nullptr, nullptr, resetAfterFork);
+  // Where there is no memory for it now, the next queue tries again.
+  if (pthread_atfork(nullptr, nullptr, resetAfterFork) != 0) isRegistered = false;
 }
 
 void QueueRegistry::resetAfterFork() noexcept {

@@ -17,6 +17,7 @@
 #include <new>
 #include <utility>
 
+#include "Runtime/Lazy.h"
 #include "Runtime/Ref.h"
 
 namespace rt {
@@ -41,11 +42,12 @@ class ThreadReference {
   // By a key of the thread library: for the destructor of a variable the C library needs memory, and ends the
   // program where there is none.
   static void giveUpAtEnd() {
-    static const pthread_key_t key = [] {
+    static constinit Lazy<pthread_key_t> shared;
+    const pthread_key_t key = shared.get([] {
       pthread_key_t made{};
       if (pthread_key_create(&made, giveUp) != 0) throw std::bad_alloc();
       return made;
-    }();
+    });
     if (pthread_getspecific(key) == nullptr && pthread_setspecific(key, &object_) != 0)
       throw std::bad_alloc();
   }

@@ -18,6 +18,9 @@
 /// takes a lock it holds, and one that lets go a lock it does not hold, ends the program with a line on
 /// standard error that names lock and thread.
 ///
+/// The lock itself needs no memory. The first that a thread takes has the thread library note the thread's
+/// end, which allocates in a process with many keys.
+///
 /// Constant-initialised: a lock at namespace scope is ready before anything runs, and needs nothing at exit.
 ///
 /// Fork. A fork waits until no other thread holds a lock of this kind. So all of them are free in the child,

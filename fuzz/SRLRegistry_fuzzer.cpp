@@ -1,5 +1,6 @@
-// Compares registries with a model made of maps, for any records and any order of requests. Both must give the
-// same instances, from the same factories and tags, and the same reports. Nothing may live that no scope holds.
+// Compares registries with a model made of maps, for any records and any order of requests. Both must give
+// the same instances, from the same factories and tags, and the same reports. Nothing may live that no scope
+// holds.
 #include <fuzzer/FuzzedDataProvider.h>
 
 #include <algorithm>

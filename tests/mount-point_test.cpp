@@ -211,10 +211,11 @@ TEST_F(MountPointTest, LeavesTheDirectoryWhereItCouldNotBeHandedOver) {
 
 // ---- What it asks of the system, and nothing else ----
 
-// What every run begins with: the caller's identity is taken on, and the signal of a limit on the size of
-// files is ignored.
-const std::vector<std::string> kPreparation = {"capget",   "getgid",   "getuid", "setfsgid",    "setfsuid",
-                                               "setfsgid", "setfsuid", "capset", "rt_sigaction"};
+// What every run begins with. The libraries' start ends with signals blocked for a moment. Then the caller's
+// identity is taken on, and the signal of a limit on the size of files is ignored.
+const std::vector<std::string> kPreparation = {"rt_sigprocmask", "rt_sigprocmask", "capget",      "getgid",
+                                               "getuid",         "setfsgid",       "setfsuid",    "setfsgid",
+                                               "setfsuid",       "capset",         "rt_sigaction"};
 
 // `calls` without the preparation.
 std::vector<std::string> withoutPreparation(std::vector<std::string> calls) {

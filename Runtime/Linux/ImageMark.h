@@ -42,11 +42,11 @@ inline constexpr unsigned kImageMarkType = 1;
 #endif
 
 /// Emitted into each image that refers to it, together with the mark: an ELF note, which no linker discards
-/// and which can be found from the image's program headers. It holds the distance from itself to the
-/// image's state. Called when the image is loaded.
+/// unless it is in a group, and which is found from the image's program headers. The note holds the distance
+/// from itself to the image's state. Called when the image is loaded.
 [[RT_CALLED_ON_LOADING, gnu::visibility("hidden")]] inline void announceImage() {
   asm volatile(
-      ".pushsection .note.rt-image, \"aG\", %%note, rt_image, comdat\n"
+      ".pushsection .note.rt-image, \"a\", %%note\n"
       "  .balign 4\n"
       "  .long 9, 8, %c0\n"
       "  .asciz \"rt-image\"\n"

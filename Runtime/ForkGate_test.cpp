@@ -199,7 +199,7 @@ TEST(ForkGate, CountsThreadsUntilTheyHaveEnded) {
 
 // Used to follow a list into the memory of threads that had ended, for ever.
 TEST(ForkGate, LooksAtNoThreadThatHasEndedHoweverLateItsFirstLockCame) {
-  if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "no new threads in the child here";
+  if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer allows no new threads in the child";
   static constinit UnfairLock lock;
   static constinit pthread_key_t key{};
   // In the last round of destructors that the system makes, and in those before it.
@@ -282,7 +282,7 @@ constinit std::atomic<bool> isForkWaiting = false;
 
 // Used to deadlock: the handler waits for a thread that waits at the gate.
 TEST(ForkGate, OpensForAThreadThatTheForkItselfWaitsFor) {
-  if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "no new threads in the child here";
+  if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer allows no new threads in the child";
   EXPECT_EQ(statusOfChild([] {
               static constinit UnfairLock lock;
               static constinit std::atomic<bool> hasLocked = false;

@@ -9,9 +9,9 @@
 ///       if (clock == CLOCK_REALTIME) time.tv_sec += 3;
 ///     };
 ///
-/// It is called on every thread of the program that reads a clock by `clock_gettime`, as the clocks of the
-/// C++ library do, with what the system says, which it may change. The other calls of the system keep to the
-/// system's clocks. Null, as at the start, changes nothing.
+/// It is called on every thread that reads a clock by `clock_gettime`, as the clocks of the C++ library do.
+/// It gets what the system says, and may change it. The other calls of the system keep to the system's
+/// clocks. Null, as at the start, changes nothing.
 using ClockHook = void (*)(clockid_t clock, timespec& time);
 
 extern constinit std::atomic<ClockHook> clockHook;

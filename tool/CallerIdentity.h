@@ -5,8 +5,8 @@
 ///
 /// On Linux the caller may then write in any directory: new files belong to the caller, and of all
 /// capabilities only CAP_DAC_OVERRIDE is left, effective and permitted. There is no way back. Changes nothing
-/// where the thread has no CAP_CHOWN, without which nothing can be given away, where CAP_DAC_OVERRIDE is not
-/// permitted, and where the system refuses a part of it, as a filter of system calls may.
+/// in three cases: CAP_CHOWN is not effective; CAP_DAC_OVERRIDE is not permitted; the system refuses a step,
+/// as a filter of system calls may.
 ///
 /// On macOS the effective user and group become the real ones, and the saved user stays root. Changes nothing
 /// where the effective user is not root.

@@ -13,9 +13,9 @@ enum class Making : std::uint8_t {
   notHandedOver,
 };
 
-/// Makes the directory at `path`, mode 0700 less the umask (where the parent has a default
-/// access control list, what that leaves of 0700), and hands it to the real user and group of the
-/// process: the caller, on whose behalf the program may run with raised privileges.
+/// Makes the directory at `path` and hands it to the real user and group of the process: the caller, on whose
+/// behalf the program may run with raised privileges. The mode is 0700 less the umask. Where the parent has a
+/// default access control list, it is what that leaves of 0700.
 ///
 /// Precondition: the calling thread has taken the identity of its caller on (`CallerIdentity.h`).
 ///

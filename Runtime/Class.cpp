@@ -2,7 +2,6 @@
 
 #include <array>
 #include <atomic>
-#include <cstdint>
 #include <cstdio>
 
 #include "Runtime/UnfairLock.h"
@@ -21,7 +20,7 @@ class NameTable {
 
   void add(detail::NamedEntry<Info>& entry) noexcept {
     const LockGuard guard(lock_);
-    std::atomic<Entry*>* place = &bucket(entry.info->name);
+    std::atomic<Entry*>* place = &buckets_[entry.nameHash % kBucketCount];
     for (Entry* known = nullptr; (known = place->load(std::memory_order_relaxed)) != nullptr;
          place = &known->next) {
       if (known->info == entry.info) return;
@@ -31,21 +30,13 @@ class NameTable {
   }
 
   const Info* find(std::string_view name) const noexcept {
-    const Entry* entry = bucket(name).load(std::memory_order_acquire);
+    const Entry* entry = buckets_[detail::nameHash(name) % kBucketCount].load(std::memory_order_acquire);
     while (entry != nullptr && entry->info->name != name) entry = entry->next.load(std::memory_order_acquire);
     return entry != nullptr ? entry->info : nullptr;
   }
 
  private:
   using Entry = detail::NamedEntry<Info>;
-
-  static std::size_t bucketOf(std::string_view name) noexcept {
-    std::uint32_t hash = 2166136261U;
-    for (const char character : name) hash = (hash ^ static_cast<unsigned char>(character)) * 16777619U;
-    return hash % kBucketCount;
-  }
-  std::atomic<Entry*>& bucket(std::string_view name) noexcept { return buckets_[bucketOf(name)]; }
-  const std::atomic<Entry*>& bucket(std::string_view name) const noexcept { return buckets_[bucketOf(name)]; }
 
   void reportClash(Entry& first) const noexcept {
     if (first.isClashReported) return;
@@ -64,7 +55,7 @@ class NameTable {
 constinit NameTable<ClassInfo> classes("classes");
 constinit NameTable<ProtocolInfo> protocols("protocols");
 
-constinit detail::NamedEntry<ClassInfo> objectEntry{&classInfo<Object>()};
+constinit detail::NamedEntry<ClassInfo> objectEntry{&classInfo<Object>(), detail::nameHash("Object")};
 
 }  // namespace
 

@@ -12,6 +12,7 @@
 #include <atomic>
 #include <concepts>
 #include <cstddef>
+#include <cstdint>
 #include <string_view>
 
 #include "Runtime/ClassInfo.h"
@@ -23,10 +24,19 @@ class AnyProtocol;
 
 namespace detail {
 
+/// What the table of names goes by.
+constexpr std::uint32_t nameHash(std::string_view name) noexcept {
+  std::uint32_t hash = 2166136261U;
+  for (const char character : name) hash = (hash ^ static_cast<unsigned char>(character)) * 16777619U;
+  return hash;
+}
+
 /// A record as the table of names holds it.
 template <class Info>
 struct NamedEntry {
   const Info* info;
+  /// Of the record's name, since names of constants are known when the program is compiled.
+  std::uint32_t nameHash;
   std::atomic<NamedEntry*> next{nullptr};
   bool isClashReported = false;
 };
@@ -104,7 +114,7 @@ template <class T>
 constinit const ProtocolInfo ProtocolRecord<T>::kInfo{protocolName<T>(), inherited()};
 
 template <class T>
-constinit NamedEntry<ProtocolInfo> ProtocolRecord<T>::entry_{&kInfo};
+constinit NamedEntry<ProtocolInfo> ProtocolRecord<T>::entry_{&kInfo, nameHash(protocolName<T>())};
 
 /// How many protocols T stands for: itself and those that it inherits.
 template <class T>
@@ -154,7 +164,7 @@ constinit const ClassInfo ClassRecord<T, Protocols...>::kInfo{className<T>(), &T
                                                               kConformances<T, Protocols...>};
 
 template <class T, class... Protocols>
-constinit NamedEntry<ClassInfo> ClassRecord<T, Protocols...>::entry_{&kInfo};
+constinit NamedEntry<ClassInfo> ClassRecord<T, Protocols...>::entry_{&kInfo, nameHash(className<T>())};
 
 }  // namespace detail
 }  // namespace rt

@@ -225,7 +225,8 @@ TEST(Cast, AllocatesNothing) {
 // As where a class is in several of the objects that a program loads, and the system takes one of them for
 // all.
 TEST(Class, MayBeAnnouncedAgain) {
-  static constinit rt::detail::NamedEntry<rt::ClassInfo> entry{&rt::classInfo<Watch>()};
+  static constinit rt::detail::NamedEntry<rt::ClassInfo> entry{&rt::classInfo<Watch>(),
+                                                               rt::detail::nameHash("Watch")};
   StandardErrorPipe standardError;
   rt::detail::announce(entry);
   EXPECT_EQ(standardError.text(), "");

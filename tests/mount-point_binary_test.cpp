@@ -251,7 +251,12 @@ TEST_F(MountPointTracedTest, DoesTheSameInAnyEnvironment) {
         "OS_ACTIVITY_MODE=debug",
         "ZEBVerboseLogging=YES"}) {
     SCOPED_TRACE(variable);
-    const Run run = runTraced(variable);
+    Run run = runTraced(variable);
+    // The C library copies this one into what is left of the program's last page, or else into a new one.
+    if (std::string_view(variable).starts_with("GLIBC_TUNABLES=")) {
+      const auto copied = run.systemCalls.begin() + 1;
+      if (*copied == "mmap") run.systemCalls.erase(copied);
+    }
     EXPECT_EQ(run.result.exitStatus, expected.result.exitStatus);
     EXPECT_EQ(run.result.signal, 0);
     EXPECT_EQ(run.result.standardOutput, expected.result.standardOutput);

@@ -67,7 +67,7 @@ template <auto& entry>
 struct AnnouncedOnLoading {
   [[gnu::used, gnu::visibility("hidden")]] static void run() {
     asm volatile(
-        ".pushsection rt_announcements, \"aR\", %%progbits\n"
+        ".pushsection rt_announcements, \"aR?\", %%progbits\n"
         "  .balign 4\n"
         "  .long %c0 - .\n"
         ".popsection"

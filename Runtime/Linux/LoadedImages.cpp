@@ -41,8 +41,9 @@ constexpr std::size_t aligned(std::size_t size, std::size_t alignment) {
   return (size + alignment - 1) / alignment * alignment;
 }
 
-/// Whether the notes from `note` to `end` have no mark of an image that has yet to announce anything.
-bool areAnnounced(const std::byte* note, const std::byte* end, std::size_t alignment) noexcept {
+/// What the first mark among the notes from `note` to `end` leads to, or null. All marks of an image lead to
+/// the same.
+const ImageState* stateIn(const std::byte* note, const std::byte* end, std::size_t alignment) noexcept {
   auto left = static_cast<std::size_t>(end - note);
   while (left >= sizeof(ElfW(Nhdr))) {
     ElfW(Nhdr) header;
@@ -57,14 +58,14 @@ bool areAnnounced(const std::byte* note, const std::byte* end, std::size_t align
         std::memcmp(note + sizeof header, kImageMarkName, sizeof kImageMarkName) == 0) {
       const std::byte* const description = note + descriptionAt;
       std::memcpy(&distance, description, sizeof distance);
-      if (!reinterpret_cast<const ImageState*>(description + distance)->isAnnounced) return false;
+      return reinterpret_cast<const ImageState*>(description + distance);
     }
     // The last need not be padded.
     const std::size_t paddedSize = std::min(aligned(size, alignment), left);
     note += paddedSize;
     left -= paddedSize;
   }
-  return true;
+  return nullptr;
 }
 
 /// 0 to go on with the next image, another value to end.
@@ -74,7 +75,8 @@ int inspect(dl_phdr_info* image, std::size_t /*size*/, void* /*context*/) {
     if (segment.p_type != PT_NOTE) continue;
     // NOLINTNEXTLINE(performance-no-int-to-ptr): the system says so
     const auto* notes = reinterpret_cast<const std::byte*>(image->dlpi_addr + segment.p_vaddr);
-    if (!areAnnounced(notes, notes + segment.p_memsz, segment.p_align == 8 ? 8 : 4)) return 1;
+    const ImageState* const state = stateIn(notes, notes + segment.p_memsz, segment.p_align == 8 ? 8 : 4);
+    if (state != nullptr && !state->isAnnounced) return 1;
   }
   return 0;
 }

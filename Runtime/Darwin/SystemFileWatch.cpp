@@ -20,12 +20,12 @@ constexpr unsigned kEvents = NOTE_WRITE | NOTE_EXTEND | NOTE_ATTRIB | NOTE_DELET
   throw std::system_error(errno, std::generic_category(), what);
 }
 
-// Has `queue` tell of `path`; returns the descriptor by which it does, or -1.
-int watch(int queue, const char* path) {
-  const int file = open(path, O_EVTONLY | O_CLOEXEC);
-  if (file < 0) return -1;
+// Has `queue` tell of `path`; returns the descriptor by which it does, or none.
+FileDescriptor watch(int queue, const char* path) {
+  FileDescriptor file(open(path, O_EVTONLY | O_CLOEXEC));
+  if (!file) return file;
   struct kevent event;
-  EV_SET(&event, file, EVFILT_VNODE, EV_ADD | EV_CLEAR, kEvents, 0, nullptr);
+  EV_SET(&event, file.get(), EVFILT_VNODE, EV_ADD | EV_CLEAR, kEvents, 0, nullptr);
   if (kevent(queue, &event, 1, nullptr, 0, nullptr) != 0) fail("kevent");
   return file;
 }
@@ -48,16 +48,17 @@ SystemFileWatch::~SystemFileWatch() {
 void SystemFileWatch::arm() {
   // A folder tells of names that come and go in it, the file of what is written to it.
   std::vector<int> watched;
+  watched.reserve(2);
   std::string folder = folderOf(path_);
-  int file = watch(events_.get(), folder.c_str());
-  while (file < 0 && folder != "/") {
+  FileDescriptor file = watch(events_.get(), folder.c_str());
+  while (!file && folder != "/") {
     folder = folderOf(folder);
     file = watch(events_.get(), folder.c_str());
   }
-  if (file < 0) fail("open");
-  watched.push_back(file);
-  const int target = watch(events_.get(), path_.c_str());
-  if (target >= 0) watched.push_back(target);
+  if (!file) fail("open");
+  FileDescriptor target = watch(events_.get(), path_.c_str());
+  watched.push_back(file.release());
+  if (target) watched.push_back(target.release());
   for (const int old : watched_) close(old);
   watched_ = std::move(watched);
 }

@@ -18,10 +18,10 @@
 #include <vector>
 
 #include "Foundation/ZEBLogWriter.h"
-#include "Runtime/Array.h"
-#include "Runtime/RecursiveLock.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Locks/RecursiveLock.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Values/Array.h"
 
 class RT_VISIBLE ZEBArrayCompositeLogWriter final
     : public rt::Implements<ZEBArrayCompositeLogWriter, rt::Object, ZEBLogWriter> {

@@ -11,8 +11,8 @@
 #include <vector>
 
 #include "Foundation/ZEBLogger.h"
-#include "Runtime/FileHandle.h"
-#include "Runtime/Number.h"
+#include "Runtime/Process/FileHandle.h"
+#include "Runtime/Values/Number.h"
 
 namespace {
 

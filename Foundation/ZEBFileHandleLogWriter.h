@@ -13,9 +13,9 @@
 #include <cstdint>
 
 #include "Foundation/ZEBLogWriter.h"
-#include "Runtime/FileHandle.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Process/FileHandle.h"
 
 class RT_VISIBLE ZEBFileHandleLogWriter final
     : public rt::Implements<ZEBFileHandleLogWriter, rt::Object, ZEBLogWriter> {

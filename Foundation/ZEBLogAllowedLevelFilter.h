@@ -13,8 +13,8 @@
 #include <set>
 
 #include "Foundation/ZEBLogFilter.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Ref.h"
 
 class RT_VISIBLE ZEBLogAllowedLevelFilter
     : public rt::Implements<ZEBLogAllowedLevelFilter, rt::Object, ZEBLogFilter> {

@@ -2,7 +2,7 @@
 
 #include <type_traits>
 
-#include "Runtime/Format.h"
+#include "Runtime/Text/Format.h"
 
 using namespace rt::literals;
 

@@ -7,7 +7,7 @@
 /// Any thread may use it.
 
 #include "Foundation/ZEBLogFormatter.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
 
 class RT_VISIBLE ZEBLogBasicFormatter
     : public rt::Implements<ZEBLogBasicFormatter, rt::Object, ZEBLogFormatter> {

@@ -5,7 +5,7 @@
 #include <cstdarg>
 #include <utility>
 
-#include "Runtime/Array.h"
+#include "Runtime/Values/Array.h"
 
 namespace {
 

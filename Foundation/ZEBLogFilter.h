@@ -12,9 +12,9 @@
 /// Not for: sparing the work of formatting, which is done before a filter is asked.
 
 #include "Foundation/ZEBLogLevel.h"
-#include "Runtime/Class.h"
-#include "Runtime/String.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/String.h"
 
 struct RT_VISIBLE ZEBLogFilter : rt::Protocol<ZEBLogFilter> {
   /// Whether the finished line `message` is written. Called by any thread that logs, by several at once.

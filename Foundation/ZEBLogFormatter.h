@@ -15,9 +15,9 @@
 #include <cstdarg>
 
 #include "Foundation/ZEBLogLevel.h"
-#include "Runtime/Class.h"
-#include "Runtime/String.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/String.h"
 
 struct RT_VISIBLE ZEBLogFormatter : rt::Protocol<ZEBLogFormatter> {
   /// The line, without an end, for the format `withFormat` with the arguments of `valist`, which is left

@@ -1,7 +1,7 @@
 #include "Foundation/ZEBLogLevelFilter.h"
 
-#include "Runtime/AssertionHandler.h"
-#include "Runtime/Process.h"
+#include "Runtime/Process/AssertionHandler.h"
+#include "Runtime/Process/Process.h"
 
 using namespace rt::literals;
 

@@ -7,9 +7,9 @@
 ///
 /// The switch is the environment variable ZEBVerboseLogging where there is one: on when it begins, after
 /// white space, with a Y or T of either case, or is an integer other than 0. Otherwise it is the user default
-/// of the same name (Runtime/UserDefaults.h), which is read when the filter is set into a logger and whenever
-/// it changes, also by another process, until the filter leaves its logger. In one that never was in a logger
-/// the switch is off.
+/// of the same name (Runtime/Defaults/UserDefaults.h), which is read when the filter is set into a logger and
+/// whenever it changes, also by another process, until the filter leaves its logger. In one that never was in
+/// a logger the switch is off.
 ///
 /// Any thread may use it. One filter is for one logger at a time: the first that lets it go ends its watching
 /// of the user default.
@@ -19,10 +19,10 @@
 #include <atomic>
 
 #include "Foundation/ZEBLogFilter.h"
-#include "Runtime/RecursiveLock.h"
-#include "Runtime/Ref.h"
-#include "Runtime/UserDefaults.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Defaults/UserDefaults.h"
+#include "Runtime/Locks/RecursiveLock.h"
+#include "Runtime/Objects/Ref.h"
 
 class RT_VISIBLE ZEBLogLevelFilter final
     : public rt::Implements<ZEBLogLevelFilter, rt::Object, ZEBLogFilter> {

@@ -12,8 +12,8 @@
 #include <vector>
 
 #include "Foundation/ZEBLogger.h"
-#include "Runtime/AssertionHandler.h"
-#include "Runtime/Exception.h"
+#include "Runtime/Objects/Exception.h"
+#include "Runtime/Process/AssertionHandler.h"
 #include "tests/PrivateDefaults.h"
 #include "tests/Process.h"
 

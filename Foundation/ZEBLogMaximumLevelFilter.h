@@ -5,7 +5,7 @@
 ///     logger->setFilter(ZEBLogMaximumLevelFilter::initWithMaximumLevel(ZEBLogLevelInfo));
 
 #include "Foundation/ZEBLogAllowedLevelFilter.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
 
 class RT_VISIBLE ZEBLogMaximumLevelFilter final
     : public rt::Implements<ZEBLogMaximumLevelFilter, ZEBLogAllowedLevelFilter> {

@@ -7,7 +7,7 @@
 /// Its name is spelled like this for good: classes are found by their names.
 
 #include "Foundation/ZEBLogAllowedLevelFilter.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
 
 class RT_VISIBLE ZEBLogMininumLevelFilter final
     : public rt::Implements<ZEBLogMininumLevelFilter, ZEBLogAllowedLevelFilter> {

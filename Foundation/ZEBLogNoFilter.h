@@ -7,7 +7,7 @@
 /// Any thread may use it.
 
 #include "Foundation/ZEBLogFilter.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
 
 class RT_VISIBLE ZEBLogNoFilter final : public rt::Implements<ZEBLogNoFilter, rt::Object, ZEBLogFilter> {
  public:

@@ -4,9 +4,9 @@
 #include <chrono>
 #include <utility>
 
-#include "Runtime/Process.h"
-#include "Runtime/StringBuilder.h"
-#include "Runtime/Thread.h"
+#include "Runtime/Objects/StringBuilder.h"
+#include "Runtime/Process/Process.h"
+#include "Runtime/Process/Thread.h"
 
 using namespace rt::literals;
 

@@ -7,17 +7,17 @@
 ///
 ///     2026-11-21 08:04:20.123 importer[4711/0x7f3a5c0e2740] [lvl=3] main() 3 left
 ///
-/// The time is the local one (Runtime/LocalTimeFormatter.h); the thread is its handle. The process is the one
-/// in which the formatter was made, also in the child of a fork.
+/// The time is the local one (Runtime/Text/LocalTimeFormatter.h); the thread is its handle. The process is
+/// the one in which the formatter was made, also in the child of a fork.
 ///
 /// Any thread may use it.
 
 #include <cstdint>
 
 #include "Foundation/ZEBLogBasicFormatter.h"
-#include "Runtime/LocalTimeFormatter.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Text/LocalTimeFormatter.h"
 
 class RT_VISIBLE ZEBLogStandardFormatter
     : public rt::Implements<ZEBLogStandardFormatter, ZEBLogBasicFormatter> {

@@ -14,9 +14,9 @@
 #include <string>
 #include <thread>
 
-#include "Runtime/Format.h"
-#include "Runtime/Process.h"
-#include "Runtime/Thread.h"
+#include "Runtime/Process/Process.h"
+#include "Runtime/Process/Thread.h"
+#include "Runtime/Text/Format.h"
 
 namespace {
 

@@ -15,9 +15,9 @@
 /// Not for: deciding which lines are written, which filters do.
 
 #include "Foundation/ZEBLogLevel.h"
-#include "Runtime/Class.h"
-#include "Runtime/String.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/String.h"
 
 struct RT_VISIBLE ZEBLogWriter : rt::Protocol<ZEBLogWriter> {
   /// Writes one finished line, which comes without its end. Called by any thread that logs, by several at

@@ -12,7 +12,7 @@
 #include "Foundation/ZEBLogMininumLevelFilter.h"
 #include "Foundation/ZEBLogNoFilter.h"
 #include "Foundation/ZEBLogStandardFormatter.h"
-#include "Runtime/Lazy.h"
+#include "Runtime/Locks/Lazy.h"
 
 using namespace rt::literals;
 

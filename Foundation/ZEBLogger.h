@@ -9,9 +9,9 @@
 ///     logger->logError("%@ has %d entries"_s, name, 0);
 ///     logger->logFuncInfo(__func__, "started"_s);      // shorter: Foundation/ZEBLoggerMacroHelpers.h
 ///
-/// A format that its arguments do not fit does not compile (Runtime/FormatString.h). `"..."_s` is as fast as
-/// it gets; a plain literal takes an allocation more, and std::bad_alloc passes there. A format that is known
-/// only at run time goes to `logInternalFunc`.
+/// A format that its arguments do not fit does not compile (Runtime/Text/FormatString.h). `"..."_s` is as
+/// fast as it gets; a plain literal takes an allocation more, and std::bad_alloc passes there. A format that
+/// is known only at run time goes to `logInternalFunc`.
 ///
 /// Whatever else goes wrong, in a formatter, a filter, a writer or the description of an argument, logging
 /// throws nothing: the line is lost and the next one tries again.
@@ -27,12 +27,12 @@
 #include "Foundation/ZEBLogFormatter.h"
 #include "Foundation/ZEBLogLevel.h"
 #include "Foundation/ZEBLogWriter.h"
-#include "Runtime/AtomicRef.h"
-#include "Runtime/FormatArguments.h"
-#include "Runtime/FormatString.h"
-#include "Runtime/RecursiveLock.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Locks/RecursiveLock.h"
+#include "Runtime/Objects/AtomicRef.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Text/FormatArguments.h"
+#include "Runtime/Text/FormatString.h"
 
 class RT_VISIBLE ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLogWriter> {
  public:

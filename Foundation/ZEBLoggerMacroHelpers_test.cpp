@@ -7,7 +7,7 @@
 #include <vector>
 
 #include "Foundation/ZEBLogBasicFormatter.h"
-#include "Runtime/Format.h"
+#include "Runtime/Text/Format.h"
 
 namespace {
 

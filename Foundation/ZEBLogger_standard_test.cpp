@@ -13,7 +13,7 @@
 #include "Foundation/ZEBLogLevelFilter.h"
 #include "Foundation/ZEBLogStandardFormatter.h"
 #include "Foundation/ZEBLogger.h"
-#include "Runtime/UserDefaults.h"
+#include "Runtime/Defaults/UserDefaults.h"
 #include "tests/ZEBLoggerTest.h"
 
 namespace {

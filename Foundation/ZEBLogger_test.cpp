@@ -17,8 +17,8 @@
 #include "Foundation/ZEBLogAllowedLevelFilter.h"
 #include "Foundation/ZEBLogBasicFormatter.h"
 #include "Foundation/ZEBLogNoFilter.h"
-#include "Runtime/CallStack.h"
-#include "Runtime/Format.h"
+#include "Runtime/Process/CallStack.h"
+#include "Runtime/Text/Format.h"
 #include "tests/ZEBLoggerTest.h"
 
 namespace {

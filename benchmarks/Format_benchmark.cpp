@@ -7,7 +7,7 @@
 #include <string>
 
 #include "Comparison.h"
-#include "Runtime/Format.h"
+#include "Runtime/Text/Format.h"
 
 namespace {
 

@@ -3,8 +3,8 @@
 #include <benchmark/benchmark.h>
 
 #include "Comparison.h"
-#include "Runtime/Class.h"
-#include "Runtime/Ref.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementation.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingEnabled.h"

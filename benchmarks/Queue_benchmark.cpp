@@ -14,7 +14,7 @@
 #include <vector>
 
 #include "Comparison.h"
-#include "Runtime/Queue.h"
+#include "Runtime/Queues/Queue.h"
 
 namespace {
 

@@ -6,10 +6,10 @@
 #include <memory>
 
 #include "Comparison.h"
-#include "Runtime/Block.h"
-#include "Runtime/Class.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Weak.h"
+#include "Runtime/Objects/Block.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/Weak.h"
 #include "tests/TestClocks.h"
 
 namespace {

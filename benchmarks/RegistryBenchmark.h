@@ -15,9 +15,9 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 
 namespace RegistryBenchmark {

@@ -16,9 +16,9 @@
 
 #include "Comparison.h"
 #include "RegistryBenchmark.h"
-#include "Runtime/ClassMethod.h"
-#include "Runtime/Ref.h"
-#include "Runtime/UnfairLock.h"
+#include "Runtime/Locks/UnfairLock.h"
+#include "Runtime/Objects/ClassMethod.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 
 namespace {

@@ -9,12 +9,12 @@
 #include <vector>
 
 #include "Comparison.h"
-#include "Runtime/Array.h"
-#include "Runtime/Block.h"
-#include "Runtime/Class.h"
-#include "Runtime/Ref.h"
-#include "Runtime/ThreadSafety.h"
-#include "Runtime/UnfairLock.h"
+#include "Runtime/Base/ThreadSafety.h"
+#include "Runtime/Locks/UnfairLock.h"
+#include "Runtime/Objects/Block.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Values/Array.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTag.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSet.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope.h"

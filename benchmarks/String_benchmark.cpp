@@ -3,7 +3,7 @@
 #include <string>
 
 #include "Comparison.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/String.h"
 
 namespace {
 

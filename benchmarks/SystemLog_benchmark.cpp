@@ -20,7 +20,7 @@
 #include <thread>
 
 #include "Comparison.h"
-#include "Runtime/SystemLog.h"
+#include "Runtime/SystemLog/SystemLog.h"
 #include "tests/PrivateJournal.h"
 
 namespace {

@@ -5,7 +5,7 @@
 #include <thread>
 
 #include "Comparison.h"
-#include "Runtime/UnfairLock.h"
+#include "Runtime/Locks/UnfairLock.h"
 
 namespace {
 

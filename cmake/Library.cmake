@@ -33,14 +33,12 @@ function(mount_point_library name public_name)
     ARCHIVE DESTINATION "${CMAKE_INSTALL_LIBDIR}" COMPONENT development)
   # Headers keep their folder. What differs by system is installed for this system only.
   cmake_path(RELATIVE_PATH CMAKE_CURRENT_SOURCE_DIR BASE_DIRECTORY "${PROJECT_SOURCE_DIR}" OUTPUT_VARIABLE folder)
+  set(other_system Linux Darwin)
+  list(REMOVE_ITEM other_system ${CMAKE_SYSTEM_NAME})
   install(DIRECTORY "${CMAKE_CURRENT_SOURCE_DIR}/" COMPONENT development
     DESTINATION "${CMAKE_INSTALL_INCLUDEDIR}/mount-point/${folder}"
     FILES_MATCHING PATTERN "*.h" PATTERN must-not-compile EXCLUDE PATTERN CMakeFiles EXCLUDE
-    PATTERN Linux EXCLUDE PATTERN Darwin EXCLUDE)
-  if(IS_DIRECTORY "${CMAKE_CURRENT_SOURCE_DIR}/${CMAKE_SYSTEM_NAME}")
-    install(DIRECTORY "${CMAKE_CURRENT_SOURCE_DIR}/${CMAKE_SYSTEM_NAME}" COMPONENT development
-      DESTINATION "${CMAKE_INSTALL_INCLUDEDIR}/mount-point/${folder}" FILES_MATCHING PATTERN "*.h")
-  endif()
+    PATTERN ${other_system} EXCLUDE)
 
   # The prefix is told from where the file is, so that the whole may be moved. One word for what is
   # linked whole: pkg-config reorders words.

@@ -6,8 +6,8 @@
 #include <string>
 #include <string_view>
 
-#include "Runtime/DefaultsText.h"
-#include "Runtime/UTF8.h"
+#include "Runtime/Base/UTF8.h"
+#include "Runtime/Defaults/DefaultsText.h"
 
 namespace {
 

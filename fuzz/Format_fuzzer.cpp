@@ -16,9 +16,9 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Format.h"
-#include "Runtime/String.h"
-#include "Runtime/UTF8.h"
+#include "Runtime/Base/UTF8.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Text/Format.h"
 
 // Formats are what is being made up here.
 #pragma clang diagnostic ignored "-Wformat-nonliteral"

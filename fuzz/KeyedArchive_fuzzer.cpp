@@ -7,13 +7,13 @@
 #include <string_view>
 #include <vector>
 
-#include "Runtime/Array.h"
-#include "Runtime/Coding.h"
-#include "Runtime/Dictionary.h"
-#include "Runtime/Exception.h"
-#include "Runtime/KeyedArchiver.h"
-#include "Runtime/KeyedUnarchiver.h"
-#include "Runtime/PropertyList.h"
+#include "Runtime/Archive/Coding.h"
+#include "Runtime/Archive/KeyedArchiver.h"
+#include "Runtime/Archive/KeyedUnarchiver.h"
+#include "Runtime/Archive/PropertyList.h"
+#include "Runtime/Objects/Exception.h"
+#include "Runtime/Values/Array.h"
+#include "Runtime/Values/Dictionary.h"
 
 namespace {
 

@@ -16,12 +16,12 @@
 #include <variant>
 #include <vector>
 
-#include "Runtime/Class.h"
-#include "Runtime/Dictionary.h"
-#include "Runtime/Number.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
-#include "Runtime/UTF8.h"
+#include "Runtime/Base/UTF8.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Values/Dictionary.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLog.h"
 #include "Shared/Logging/LUMLogDropAllFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"

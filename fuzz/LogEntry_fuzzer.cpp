@@ -18,12 +18,12 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Linux/Journal.h"
-#include "Runtime/Linux/LogEntry.h"
-#include "Runtime/Linux/LogLines.h"
-#include "Runtime/Linux/Patience.h"
-#include "Runtime/ThreadIdentifier.h"
-#include "Runtime/UTF8.h"
+#include "Runtime/Base/UTF8.h"
+#include "Runtime/Locks/ThreadIdentifier.h"
+#include "Runtime/SystemLog/Linux/Journal.h"
+#include "Runtime/SystemLog/Linux/LogEntry.h"
+#include "Runtime/SystemLog/Linux/LogLines.h"
+#include "Runtime/SystemLog/Linux/Patience.h"
 
 namespace {
 

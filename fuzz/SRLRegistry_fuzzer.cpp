@@ -18,11 +18,11 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Array.h"
-#include "Runtime/Class.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Set.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Values/Array.h"
+#include "Runtime/Values/Set.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"

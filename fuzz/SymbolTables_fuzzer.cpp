@@ -18,7 +18,7 @@
 #include <string_view>
 #include <vector>
 
-#include "Runtime/SymbolTables.h"
+#include "Runtime/Process/SymbolTables.h"
 
 namespace {
 

@@ -8,8 +8,8 @@
 #include <string_view>
 #include <unordered_set>
 
-#include "Runtime/String.h"
-#include "Runtime/UTF8.h"
+#include "Runtime/Base/UTF8.h"
+#include "Runtime/Objects/String.h"
 
 namespace {
 

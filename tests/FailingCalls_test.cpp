@@ -29,11 +29,11 @@
 
 #include "PrivateJournal.h"
 #include "Process.h"
-#include "Runtime/CallStack.h"
-#include "Runtime/FileHandle.h"
-#include "Runtime/StandardError.h"
-#include "Runtime/SystemLog.h"
-#include "Runtime/UserDefaults.h"
+#include "Runtime/Base/StandardError.h"
+#include "Runtime/Defaults/UserDefaults.h"
+#include "Runtime/Process/CallStack.h"
+#include "Runtime/Process/FileHandle.h"
+#include "Runtime/SystemLog/SystemLog.h"
 #include "Sanitizers.h"
 
 namespace {

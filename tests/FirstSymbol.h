@@ -10,9 +10,9 @@
 #include <span>
 #include <string>
 
-#include "Runtime/Array.h"
-#include "Runtime/CallStack.h"
-#include "Runtime/Class.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Process/CallStack.h"
+#include "Runtime/Values/Array.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogMessage.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"

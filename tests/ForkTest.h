@@ -10,7 +10,7 @@
 #include <atomic>
 #include <thread>
 
-#include "Runtime/ThreadSafety.h"
+#include "Runtime/Base/ThreadSafety.h"
 #include "Sanitizers.h"
 
 #if defined(__APPLE__)

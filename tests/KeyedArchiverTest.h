@@ -11,16 +11,16 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Array.h"
-#include "Runtime/Class.h"
-#include "Runtime/ClassMethod.h"
-#include "Runtime/Coding.h"
-#include "Runtime/Exception.h"
-#include "Runtime/KeyedArchiver.h"
-#include "Runtime/KeyedUnarchiver.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
+#include "Runtime/Archive/Coding.h"
+#include "Runtime/Archive/KeyedArchiver.h"
+#include "Runtime/Archive/KeyedUnarchiver.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/ClassMethod.h"
+#include "Runtime/Objects/Exception.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Values/Array.h"
 
 class Plain final : public rt::Implements<Plain, rt::Object> {};
 

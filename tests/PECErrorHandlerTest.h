@@ -8,7 +8,7 @@
 #include <utility>
 
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
-#include "Runtime/AssertionHandler.h"
+#include "Runtime/Process/AssertionHandler.h"
 #include "Shared/Logging/LUMLogDropAllFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMSystemLogger.h"

@@ -4,7 +4,7 @@
 
 #include <gtest/gtest.h>
 
-#include "Runtime/Queue.h"
+#include "Runtime/Queues/Queue.h"
 
 class QueueTest : public testing::Test {
  protected:

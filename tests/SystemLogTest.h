@@ -15,7 +15,7 @@
 #include <string>
 #include <vector>
 
-#include "Runtime/SystemLog.h"
+#include "Runtime/SystemLog/SystemLog.h"
 #include "tests/PrivateJournal.h"
 #include "tests/StandardErrorPipe.h"
 

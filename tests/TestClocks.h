@@ -4,7 +4,7 @@
 ///
 /// Not for: anything but tests and benchmarks.
 
-#include "Runtime/Class.h"
+#include "Runtime/Objects/Class.h"
 
 struct Clock : rt::Protocol<Clock> {
   virtual int now() const = 0;

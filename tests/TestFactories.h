@@ -6,9 +6,9 @@
 
 #include <gtest/gtest.h>
 
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
 
 class Instance final : public rt::Implements<Instance, rt::Object> {};
 

@@ -16,12 +16,12 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Block.h"
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/Queue.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/Block.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Queues/Queue.h"
 #include "Shared/Logging/LUMAsyncLogger.h"
 #include "Shared/Logging/LUMLogFilter.h"
 #include "Shared/Logging/LUMLogFormatter.h"

@@ -15,8 +15,8 @@
 #include <vector>
 
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
-#include "Runtime/Dictionary.h"
-#include "Runtime/Number.h"
+#include "Runtime/Values/Dictionary.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLogDropAllFilter.h"
 #include "Shared/Logging/LUMLogLevel.h"
 #include "Shared/Logging/LUMLogMessage.h"

@@ -12,9 +12,9 @@
 #include <string>
 #include <vector>
 
-#include "Runtime/Class.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "tests/TestReports.h"
 #include "tests/WholeReports.h"

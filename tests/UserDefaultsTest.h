@@ -17,7 +17,7 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/UserDefaults.h"
+#include "Runtime/Defaults/UserDefaults.h"
 
 inline std::string contentOf(const std::filesystem::path& path) {
   std::ifstream stream(path, std::ios::binary);

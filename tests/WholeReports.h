@@ -15,8 +15,8 @@
 #include <string>
 #include <vector>
 
-#include "Runtime/Dictionary.h"
-#include "Runtime/Number.h"
+#include "Runtime/Values/Dictionary.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLogLevel.h"
 #include "Shared/Logging/LUMLogMessage.h"
 #include "Shared/Logging/LUMSafeStringParameter.h"

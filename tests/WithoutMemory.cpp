@@ -13,8 +13,8 @@
 
 #include "AllocationCount.h"
 #include "AllocationFailure.h"
-#include "Runtime/UnfairLock.h"
-#include "Runtime/WorkerPool.h"
+#include "Runtime/Locks/UnfairLock.h"
+#include "Runtime/Queues/WorkerPool.h"
 #include "Sanitizers.h"
 
 #if RT_TEST_ADDRESS_SANITIZER

@@ -11,8 +11,8 @@
 #include <utility>
 
 #include "AllocationFailure.h"
-#include "Runtime/KeyedArchiver.h"
-#include "Runtime/KeyedUnarchiver.h"
+#include "Runtime/Archive/KeyedArchiver.h"
+#include "Runtime/Archive/KeyedUnarchiver.h"
 #include "Shared/Async/Provider/AVOProvider.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSetCodableWrapper.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingEnabled.h"

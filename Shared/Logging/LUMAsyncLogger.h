@@ -25,9 +25,9 @@
 
 #include <cstdint>
 
-#include "Runtime/Queue.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Queues/Queue.h"
 #include "Shared/Logging/LUMLogger.h"
 
 /// How a LUMAsyncLogger wants to be called.

@@ -1,8 +1,8 @@
 #include "Shared/Logging/LUMDefaultMinimumLogLevelFilter.h"
 
-#include "Runtime/Lazy.h"
-#include "Runtime/Process.h"
-#include "Runtime/String.h"
+#include "Runtime/Locks/Lazy.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Process/Process.h"
 #include "Shared/Logging/LUMLogLevel.h"
 
 namespace {

@@ -9,10 +9,10 @@
 ///
 /// Not for: a level that the program decides; see LUMLogMinimumLevelFilter.
 
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/Logging/LUMLogFilter.h"
 
 class RT_VISIBLE LUMDefaultMinimumLogLevelFilter

@@ -6,9 +6,9 @@
 #include <string_view>
 #include <utility>
 
-#include "Runtime/Dictionary.h"
-#include "Runtime/Format.h"
-#include "Runtime/Number.h"
+#include "Runtime/Text/Format.h"
+#include "Runtime/Values/Dictionary.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMLogSourceText.h"

@@ -12,8 +12,8 @@
 /// 3 and 4 it has a call stack, unless the multiplexer is told otherwise; the caller's own function is first
 /// in it. Arguments that are a LUMSafeParameter are kept in the message besides.
 ///
-/// The format is a literal and is checked, while compiling, against the arguments (Runtime/FormatString.h).
-/// With `_s` it costs no allocation.
+/// The format is a literal and is checked, while compiling, against the arguments
+/// (Runtime/Text/FormatString.h). With `_s` it costs no allocation.
 ///
 /// Any thread may log, at any time, also while the program is being loaded. What a description throws passes
 /// through, and what filters and loggers throw before the call returns (Shared/Logging/LUMLogMultiplexing.h);
@@ -27,11 +27,11 @@
 #include <source_location>
 #include <type_traits>
 
-#include "Runtime/CallStack.h"
-#include "Runtime/FormatArguments.h"
-#include "Runtime/FormatString.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Process/CallStack.h"
+#include "Runtime/Text/FormatArguments.h"
+#include "Runtime/Text/FormatString.h"
 #include "Shared/Logging/LUMLogCallstack.h"
 #include "Shared/Logging/LUMLogLevel.h"
 #include "Shared/Logging/LUMLogMessage.h"

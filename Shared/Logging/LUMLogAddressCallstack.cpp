@@ -8,9 +8,9 @@
 #include <new>
 #include <utility>
 
-#include "Runtime/CallStack.h"
-#include "Runtime/Number.h"
-#include "Runtime/StringBuilder.h"
+#include "Runtime/Objects/StringBuilder.h"
+#include "Runtime/Process/CallStack.h"
+#include "Runtime/Values/Number.h"
 
 rt::Ref<LUMLogAddressCallstack> LUMLogAddressCallstack::addressCallstackIgnoringFrameCount(
     std::uint64_t count) {

@@ -21,13 +21,13 @@
 #include <memory>
 #include <span>
 
-#include "Runtime/Array.h"
-#include "Runtime/Block.h"
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Block.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Values/Array.h"
 #include "Shared/Logging/LUMLogCallstack.h"
 
 class RT_VISIBLE LUMLogAddressCallstack

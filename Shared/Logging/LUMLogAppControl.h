@@ -8,8 +8,8 @@
 ///
 /// Not for: a call stack of one message only; all that are logged from then on have one, or have none.
 
-#include "Runtime/Class.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
 
 struct RT_VISIBLE LUMLogAppControl : rt::Protocol<LUMLogAppControl> {
   /// Whether messages of the levels 3 and 4 have a call stack.

@@ -7,10 +7,10 @@
 ///       send(addresses->frameCount());
 ///     }
 ///
-/// Not for: a call stack without a message (Runtime/CallStack.h).
+/// Not for: a call stack without a message (Runtime/Process/CallStack.h).
 
-#include "Runtime/Class.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
 
 struct RT_VISIBLE LUMLogCallstack : rt::Protocol<LUMLogCallstack> {
  protected:

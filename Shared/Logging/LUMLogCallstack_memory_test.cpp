@@ -7,7 +7,7 @@
 #include <cstdlib>
 #include <new>
 
-#include "Runtime/CallStack.h"
+#include "Runtime/Process/CallStack.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
 #include "tests/Sanitizers.h"

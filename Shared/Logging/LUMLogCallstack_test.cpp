@@ -14,9 +14,9 @@
 #include <string>
 #include <vector>
 
-#include "Runtime/CallStack.h"
-#include "Runtime/Format.h"
-#include "Runtime/Number.h"
+#include "Runtime/Process/CallStack.h"
+#include "Runtime/Text/Format.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
 

@@ -11,11 +11,11 @@
 
 #include <utility>
 
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
 #include "Shared/Logging/LUMLogFilter.h"
 
 class RT_VISIBLE LUMLogComponentFilter

@@ -6,10 +6,10 @@
 ///
 /// Not for: a logger that is to hear nothing any more, which is removed.
 
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/Logging/LUMLogFilter.h"
 
 class RT_VISIBLE LUMLogDropAllFilter : public rt::Implements<LUMLogDropAllFilter, rt::Object, LUMLogFilter> {

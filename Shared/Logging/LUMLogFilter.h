@@ -12,8 +12,8 @@
 ///
 /// Not for: changing messages, which nobody can.
 
-#include "Runtime/Class.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
 #include "Shared/Logging/LUMLogMessage.h"
 
 struct RT_VISIBLE LUMLogFilter : rt::Protocol<LUMLogFilter> {

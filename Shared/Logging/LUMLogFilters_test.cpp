@@ -8,9 +8,9 @@
 #include <stdexcept>
 #include <vector>
 
-#include "Runtime/Array.h"
-#include "Runtime/Dictionary.h"
-#include "Runtime/Number.h"
+#include "Runtime/Values/Array.h"
+#include "Runtime/Values/Dictionary.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLogComponentFilter.h"
 #include "Shared/Logging/LUMLogDropAllFilter.h"
 #include "Shared/Logging/LUMLogLogicalAndFilter.h"

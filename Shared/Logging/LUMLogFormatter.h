@@ -10,9 +10,9 @@
 ///
 /// Not for: leaving messages out, which takes a LUMLogFilter.
 
-#include "Runtime/Class.h"
-#include "Runtime/String.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/String.h"
 #include "Shared/Logging/LUMLogMessage.h"
 
 struct RT_VISIBLE LUMLogFormatter : rt::Protocol<LUMLogFormatter> {

@@ -2,8 +2,8 @@
 
 #include <utility>
 
-#include "Runtime/Queue.h"
-#include "Runtime/Thread.h"
+#include "Runtime/Process/Thread.h"
+#include "Runtime/Queues/Queue.h"
 
 namespace {
 

@@ -14,12 +14,12 @@
 
 #include <cstdint>
 
-#include "Runtime/Class.h"
-#include "Runtime/Dictionary.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Values/Dictionary.h"
 #include "Shared/Logging/LUMLogCallstack.h"
 #include "Shared/Logging/LUMLogLevel.h"
 #include "Shared/Logging/LUMLogMetadata.h"

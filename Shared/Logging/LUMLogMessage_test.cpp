@@ -6,9 +6,9 @@
 #include <thread>
 #include <vector>
 
-#include "Runtime/Number.h"
-#include "Runtime/Queue.h"
-#include "Runtime/Thread.h"
+#include "Runtime/Process/Thread.h"
+#include "Runtime/Queues/Queue.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
 #include "Shared/Logging/LUMSafeNumberParameter.h"

@@ -2,7 +2,7 @@
 
 #include <gtest/gtest.h>
 
-#include "Runtime/Number.h"
+#include "Runtime/Values/Number.h"
 
 namespace {
 

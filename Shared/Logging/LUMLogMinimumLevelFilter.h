@@ -6,10 +6,10 @@
 ///
 /// Not for: what the environment is to decide; see LUMDefaultMinimumLogLevelFilter.
 
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/Logging/LUMLogFilter.h"
 #include "Shared/Logging/LUMLogLevel.h"
 

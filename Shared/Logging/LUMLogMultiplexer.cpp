@@ -6,8 +6,8 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Lazy.h"
-#include "Runtime/QualityOfService.h"
+#include "Runtime/Locks/Lazy.h"
+#include "Runtime/Queues/QualityOfService.h"
 #include "Shared/Logging/LUMDefaultMinimumLogLevelFilter.h"
 
 namespace {

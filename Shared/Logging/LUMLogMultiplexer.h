@@ -28,19 +28,19 @@
 ///
 /// In the child of a fork it may be used at once, whatever other threads were doing, given that filters and
 /// loggers bear it. The messages that were queued are the
-/// parent's, as all tasks are (Runtime/Queue.h).
+/// parent's, as all tasks are (Runtime/Queues/Queue.h).
 ///
 /// Not for: many of them in a program; LUMLog uses the shared one.
 
 #include <atomic>
 #include <vector>
 
-#include "Runtime/AtomicRef.h"
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/Queue.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/AtomicRef.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Queues/Queue.h"
 #include "Shared/Logging/LUMLogAppControl.h"
 #include "Shared/Logging/LUMLogMultiplexing.h"
 #include "Shared/Logging/LUMSystemLogger.h"

@@ -11,7 +11,7 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Weak.h"
+#include "Runtime/Objects/Weak.h"
 #include "tests/LUMLogMultiplexerTest.h"
 
 namespace {

@@ -15,7 +15,7 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/QualityOfService.h"
+#include "Runtime/Queues/QualityOfService.h"
 #include "Shared/Logging/LUMLogNoFilter.h"
 #include "tests/AtEnd.h"
 #include "tests/LUMLogMultiplexerTest.h"

@@ -6,9 +6,9 @@
 ///
 /// Not for: whoever logs, who calls LUMLogAt (LUMLog.h).
 
-#include "Runtime/Class.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/Logging/LUMAsyncLogger.h"
 #include "Shared/Logging/LUMLogFilter.h"
 #include "Shared/Logging/LUMLogMessage.h"

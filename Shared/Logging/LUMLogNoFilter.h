@@ -6,10 +6,10 @@
 ///
 /// Not for: a logger's `filter`, which may be null.
 
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/Logging/LUMLogFilter.h"
 
 class RT_VISIBLE LUMLogNoFilter : public rt::Implements<LUMLogNoFilter, rt::Object, LUMLogFilter> {

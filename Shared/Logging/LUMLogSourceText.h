@@ -13,7 +13,7 @@
 
 #include <cstddef>
 
-#include "Runtime/String.h"
+#include "Runtime/Objects/String.h"
 
 inline constexpr std::size_t kLUMLogSourceTextCount = 4096;
 inline constexpr std::size_t kLUMLogSourceTextLength = 1024;

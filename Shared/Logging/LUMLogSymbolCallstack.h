@@ -12,12 +12,12 @@
 #include <cstdint>
 #include <utility>
 
-#include "Runtime/Array.h"
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Values/Array.h"
 #include "Shared/Logging/LUMLogCallstack.h"
 
 class RT_VISIBLE LUMLogSymbolCallstack
@@ -31,7 +31,7 @@ class RT_VISIBLE LUMLogSymbolCallstack
   /// With `symbols`, strings; may be null. Throws std::bad_alloc.
   static rt::Ref<LUMLogSymbolCallstack> initWithSymbols(rt::Ref<rt::Array> symbols);
 
-  /// As given. The form of the lines is that of Runtime/CallStack.h, where they are from there.
+  /// As given. The form of the lines is that of Runtime/Process/CallStack.h, where they are from there.
   const rt::Ref<rt::Array>& symbols() const noexcept { return symbols_; }
 
   /// Whether `other` is such a call stack with equal lines.

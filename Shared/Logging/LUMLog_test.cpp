@@ -13,10 +13,10 @@
 #include <thread>
 #include <vector>
 
-#include "Runtime/Format.h"
-#include "Runtime/Number.h"
-#include "Runtime/Queue.h"
-#include "Runtime/Thread.h"
+#include "Runtime/Process/Thread.h"
+#include "Runtime/Queues/Queue.h"
+#include "Runtime/Text/Format.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogDropAllFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"

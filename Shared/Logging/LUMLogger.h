@@ -10,9 +10,9 @@
 ///
 /// Not for: classes to conform to directly; name one of the two.
 
-#include "Runtime/Class.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/Logging/LUMLogFilter.h"
 #include "Shared/Logging/LUMLogMessage.h"
 

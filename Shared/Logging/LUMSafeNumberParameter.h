@@ -11,12 +11,12 @@
 #include <cstdint>
 #include <utility>
 
-#include "Runtime/Class.h"
-#include "Runtime/Number.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMSafeParameter.h"
 
 class RT_VISIBLE LUMSafeNumberParameter

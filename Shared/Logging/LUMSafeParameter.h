@@ -13,8 +13,8 @@
 
 #include <cstdint>
 
-#include "Runtime/Class.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
 
 struct RT_VISIBLE LUMSafeParameter : rt::Protocol<LUMSafeParameter> {
   /// What the value is, in the caller's own numbers.

@@ -7,7 +7,7 @@
 #include <cstdint>
 #include <limits>
 
-#include "Runtime/Format.h"
+#include "Runtime/Text/Format.h"
 #include "Shared/Logging/LUMSafeNumberParameter.h"
 #include "Shared/Logging/LUMSafeStringParameter.h"
 

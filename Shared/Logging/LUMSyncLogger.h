@@ -14,7 +14,7 @@
 ///
 /// Not for: what takes long; see LUMAsyncLogger.
 
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
 #include "Shared/Logging/LUMLogger.h"
 
 struct RT_VISIBLE LUMSyncLogger : rt::Protocol<LUMSyncLogger, LUMLogger> {

@@ -7,9 +7,9 @@
 #include <optional>
 #include <utility>
 
-#include "Runtime/Bundle.h"
-#include "Runtime/Format.h"
-#include "Runtime/SystemLog.h"
+#include "Runtime/Process/Bundle.h"
+#include "Runtime/SystemLog/SystemLog.h"
+#include "Runtime/Text/Format.h"
 #include "Shared/Logging/LUMSystemLoggerFormatter.h"
 
 namespace {

@@ -1,6 +1,6 @@
 #pragma once
 
-/// Writes messages to the system's log (Runtime/SystemLog.h).
+/// Writes messages to the system's log (Runtime/SystemLog/SystemLog.h).
 ///
 ///     $ journalctl SUBSYSTEM=com.example.host.Importer CATEGORY=network
 ///
@@ -10,11 +10,11 @@
 ///
 /// Not for: text that must stay on the machine's disk only as long as the host says.
 
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
 #include "Shared/Logging/LUMLogFilter.h"
 #include "Shared/Logging/LUMLogFormatter.h"
 #include "Shared/Logging/LUMSyncLogger.h"

@@ -1,6 +1,6 @@
 #include "Shared/Logging/LUMSystemLoggerFormatter.h"
 
-#include "Runtime/Format.h"
+#include "Runtime/Text/Format.h"
 
 rt::String LUMSystemLoggerFormatter::formattedLogMessage(const LUMLogMessage& message) const {
   if (message.function().isEmpty()) return message.formattedString();

@@ -7,11 +7,11 @@
 ///
 /// Not for: lines in files, which want the time too.
 
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
 #include "Shared/Logging/LUMLogFormatter.h"
 
 class RT_VISIBLE LUMSystemLoggerFormatter

@@ -27,9 +27,9 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Bundle.h"
-#include "Runtime/Number.h"
-#include "Runtime/SystemLog.h"
+#include "Runtime/Process/Bundle.h"
+#include "Runtime/SystemLog/SystemLog.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLog.h"
 #include "Shared/Logging/LUMLogDropAllFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"

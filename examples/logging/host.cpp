@@ -6,10 +6,10 @@
 #include <utility>
 
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
-#include "Runtime/FileHandle.h"
-#include "Runtime/Format.h"
-#include "Runtime/Number.h"
-#include "Runtime/Queue.h"
+#include "Runtime/Process/FileHandle.h"
+#include "Runtime/Queues/Queue.h"
+#include "Runtime/Text/Format.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMAsyncLogger.h"
 #include "Shared/Logging/LUMLog.h"
 #include "Shared/Logging/LUMLogComponentFilter.h"

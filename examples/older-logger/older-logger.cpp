@@ -7,8 +7,8 @@
 #include "Foundation/ZEBArrayCompositeLogWriter.h"
 #include "Foundation/ZEBLogger.h"
 #include "Foundation/ZEBLoggerMacroHelpers.h"
-#include "Runtime/FileHandle.h"
-#include "Runtime/Format.h"
+#include "Runtime/Process/FileHandle.h"
+#include "Runtime/Text/Format.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/Shim/Classes/LUMLoggingReroutingZEBLogger.h"
 

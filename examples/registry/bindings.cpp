@@ -6,8 +6,8 @@
 #include <iterator>
 #include <utility>
 
-#include "Runtime/ClassMethod.h"
-#include "Runtime/Format.h"
+#include "Runtime/Objects/ClassMethod.h"
+#include "Runtime/Text/Format.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 
 using namespace rt::literals;

@@ -2,9 +2,9 @@
 
 // The injectors, one for each service, as a generator writes them: what the program calls.
 
-#include "Runtime/Array.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Values/Array.h"
 #include "examples/registry/services.h"
 
 // The service for an account.

@@ -5,9 +5,9 @@
 #include <string>
 #include <vector>
 
-#include "Runtime/Class.h"
-#include "Runtime/Format.h"
-#include "Runtime/Weak.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Weak.h"
+#include "Runtime/Text/Format.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "examples/registry/bindings.h"
 

@@ -4,9 +4,9 @@
 
 #include <utility>
 
-#include "Runtime/Class.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
 
 // Where an account's messages are.
 struct MessageStore : rt::Protocol<MessageStore> {

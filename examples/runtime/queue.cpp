@@ -1,13 +1,13 @@
 // A queue that guards an account: what only its tasks touch needs no lock, and what a task throws reaches
 // whoever waits for it.
 
-#include "Runtime/Queue.h"
+#include "Runtime/Queues/Queue.h"
 
 #include <cstdio>
 #include <stdexcept>
 
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
 
 using namespace rt::literals;
 

@@ -3,11 +3,11 @@
 
 #include <cstdio>
 
-#include "Runtime/Class.h"
-#include "Runtime/Format.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Text/Format.h"
 
 using namespace rt::literals;
 

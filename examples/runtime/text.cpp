@@ -3,11 +3,11 @@
 
 #include <cstdio>
 
-#include "Runtime/Array.h"
-#include "Runtime/Dictionary.h"
-#include "Runtime/Format.h"
-#include "Runtime/Number.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Text/Format.h"
+#include "Runtime/Values/Array.h"
+#include "Runtime/Values/Dictionary.h"
+#include "Runtime/Values/Number.h"
 
 using namespace rt::literals;
 

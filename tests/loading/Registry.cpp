@@ -2,8 +2,8 @@
 
 #include <string_view>
 
-#include "Runtime/ClassMethod.h"
-#include "Runtime/LoadHook.h"
+#include "Runtime/Objects/ClassMethod.h"
+#include "Runtime/Objects/LoadHook.h"
 
 namespace {
 

@@ -2,8 +2,8 @@
 
 #include <string>
 
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
 
 /// A class with a load hook that looks at everything a hook may rely on, for the programs here that
 /// are put together in different ways.

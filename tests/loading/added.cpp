@@ -1,6 +1,6 @@
 // Adds a method and a class, both called LETTER, to which no symbol leads from anywhere.
 #include "Registry.h"
-#include "Runtime/ClassMethod.h"
+#include "Runtime/Objects/ClassMethod.h"
 
 #define TEXT(x) #x
 #define TEXT_OF(x) TEXT(x)

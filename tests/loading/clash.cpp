@@ -2,8 +2,8 @@
 // found by the first name: 1 if it is one of the three.
 #include <cstdio>
 
-#include "Runtime/Class.h"
-#include "Runtime/Ref.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
 
 namespace one {
 struct P : rt::Protocol<P> {

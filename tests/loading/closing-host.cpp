@@ -7,7 +7,7 @@
 #include <string>
 
 #include "Registry.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/String.h"
 #include "Shared/Logging/LUMLogMessage.h"
 #include "guest.h"
 

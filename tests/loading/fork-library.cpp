@@ -1,7 +1,7 @@
 // A shared library that has the runtime, and uses it for its caller.
-#include "Runtime/Queue.h"
-#include "Runtime/ThreadIdentifier.h"
-#include "Runtime/UnfairLock.h"
+#include "Runtime/Locks/ThreadIdentifier.h"
+#include "Runtime/Locks/UnfairLock.h"
+#include "Runtime/Queues/Queue.h"
 
 using namespace rt::literals;
 

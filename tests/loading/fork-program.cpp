@@ -10,9 +10,9 @@
 #include <string_view>
 #include <thread>
 
-#include "Runtime/Queue.h"
-#include "Runtime/ThreadIdentifier.h"
-#include "Runtime/UnfairLock.h"
+#include "Runtime/Locks/ThreadIdentifier.h"
+#include "Runtime/Locks/UnfairLock.h"
+#include "Runtime/Queues/Queue.h"
 
 using namespace rt::literals;
 

@@ -1,7 +1,7 @@
 // Adds a class method, and gives an object of a class of the program's.
 #include "Registry.h"
-#include "Runtime/ClassMethod.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/ClassMethod.h"
+#include "Runtime/Objects/String.h"
 #include "guest.h"
 
 namespace {

@@ -1,5 +1,5 @@
 // Gives an object of a class of its own.
-#include "Runtime/String.h"
+#include "Runtime/Objects/String.h"
 #include "guest.h"
 
 namespace {

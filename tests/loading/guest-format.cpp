@@ -1,5 +1,5 @@
 // Gives a format that was a plain literal.
-#include "Runtime/FormatString.h"
+#include "Runtime/Text/FormatString.h"
 #include "guest.h"
 
 extern "C" [[gnu::visibility("default")]] void give(rt::Ref<rt::Object>& gift) {

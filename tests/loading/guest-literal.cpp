@@ -1,5 +1,5 @@
 // Gives a literal.
-#include "Runtime/String.h"
+#include "Runtime/Objects/String.h"
 #include "guest.h"
 
 using namespace rt::literals;

@@ -1,7 +1,7 @@
 #pragma once
 
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
 
 /// What a library that is opened and closed again exports as "give": sets `gift` to an object that the
 /// program keeps.

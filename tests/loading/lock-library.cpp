@@ -1,5 +1,5 @@
 // A library that brings the runtime and uses nothing of it but a lock.
-#include "Runtime/UnfairLock.h"
+#include "Runtime/Locks/UnfairLock.h"
 
 namespace {
 

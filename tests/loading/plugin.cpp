@@ -1,7 +1,7 @@
 // Opened by plugin-host: adds a method and has a class with a load hook of its own.
 #include "Registry.h"
-#include "Runtime/ClassMethod.h"
-#include "Runtime/LoadHook.h"
+#include "Runtime/Objects/ClassMethod.h"
+#include "Runtime/Objects/LoadHook.h"
 
 namespace {
 

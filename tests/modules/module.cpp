@@ -1,7 +1,7 @@
 // A bindings module called NAME, of which no symbol is referred to from anywhere: it binds an API of that
 // name to a class of that name. When it is asked for its configurations, it asks for its service, which is
 // too early.
-#include "Runtime/ClassMethod.h"
+#include "Runtime/Objects/ClassMethod.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "Trace.h"
 

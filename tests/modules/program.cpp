@@ -10,7 +10,7 @@
 #include <string_view>
 
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
-#include "Runtime/ClassMethod.h"
+#include "Runtime/Objects/ClassMethod.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "Shared/ServiceRegistry/Source/SRLStartUpHook.h"
 #include "Trace.h"

@@ -1,7 +1,7 @@
 // A program of somebody who has only what was installed. Prints what a provider provides.
 #include <cstdio>
 
-#include "Runtime/Number.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/Async/Provider/AVOProvider.h"
 
 int main() {

@@ -1,13 +1,13 @@
 // A program of somebody who has only what was installed. Prints the time that a class found by name knows.
 #include <cstdio>
 
-#include "Runtime/Block.h"
-#include "Runtime/Class.h"
-#include "Runtime/ClassMethod.h"
-#include "Runtime/LoadHook.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
-#include "Runtime/Weak.h"
+#include "Runtime/Objects/Block.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/ClassMethod.h"
+#include "Runtime/Objects/LoadHook.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Objects/Weak.h"
 
 struct Clock : rt::Protocol<Clock> {
   virtual int now() const = 0;

@@ -2,7 +2,7 @@
 #include <cstdio>
 #include <iterator>
 
-#include "Runtime/ClassMethod.h"
+#include "Runtime/Objects/ClassMethod.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 
 struct Clock : rt::Protocol<Clock> {

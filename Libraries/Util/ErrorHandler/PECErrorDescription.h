@@ -12,10 +12,10 @@
 #include <cstdint>
 #include <utility>
 
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/String.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/String.h"
 
 class RT_VISIBLE PECErrorDescription : public rt::Implements<PECErrorDescription, rt::Object> {
  public:

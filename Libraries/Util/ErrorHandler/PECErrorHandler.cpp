@@ -4,10 +4,10 @@
 #include <utility>
 
 #include "Libraries/Util/ErrorHandler/PECReport.h"
-#include "Runtime/AssertionHandler.h"
-#include "Runtime/Exception.h"
-#include "Runtime/Format.h"
-#include "Runtime/Lazy.h"
+#include "Runtime/Locks/Lazy.h"
+#include "Runtime/Objects/Exception.h"
+#include "Runtime/Process/AssertionHandler.h"
+#include "Runtime/Text/Format.h"
 #include "Shared/Logging/LUMLogLevel.h"
 #include "Shared/Logging/LUMLogMinimumLevelFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"

@@ -12,7 +12,7 @@
 #include <utility>
 
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
-#include "Runtime/Exception.h"
+#include "Runtime/Objects/Exception.h"
 #include "Shared/Logging/LUMLog.h"
 #include "tests/PECErrorHandlerTest.h"
 

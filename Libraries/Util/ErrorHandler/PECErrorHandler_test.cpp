@@ -20,8 +20,8 @@
 #include <vector>
 
 #include "Libraries/Util/ErrorHandler/PECReport.h"
-#include "Runtime/AssertionHandler.h"
-#include "Runtime/Exception.h"
+#include "Runtime/Objects/Exception.h"
+#include "Runtime/Process/AssertionHandler.h"
 #include "Shared/Logging/LUMLog.h"
 #include "Shared/Logging/LUMLogMinimumLevelFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"

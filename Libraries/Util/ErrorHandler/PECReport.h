@@ -27,12 +27,12 @@
 #include <type_traits>
 
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
-#include "Runtime/CallStack.h"
-#include "Runtime/FormatArguments.h"
-#include "Runtime/FormatString.h"
-#include "Runtime/Number.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Process/CallStack.h"
+#include "Runtime/Text/FormatArguments.h"
+#include "Runtime/Text/FormatString.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLog.h"
 #include "Shared/Logging/LUMSafeNumberParameter.h"
 #include "Shared/Logging/LUMSafeStringParameter.h"

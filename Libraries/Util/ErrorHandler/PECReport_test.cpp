@@ -12,10 +12,10 @@
 #include <vector>
 
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
-#include "Runtime/CallStack.h"
-#include "Runtime/Dictionary.h"
-#include "Runtime/Exception.h"
-#include "Runtime/Number.h"
+#include "Runtime/Objects/Exception.h"
+#include "Runtime/Process/CallStack.h"
+#include "Runtime/Values/Dictionary.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogDropAllFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"

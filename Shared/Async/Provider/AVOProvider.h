@@ -11,11 +11,11 @@
 
 #include <utility>
 
-#include "Runtime/Block.h"
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Block.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
 
 class RT_VISIBLE AVOProvider final : public rt::Implements<AVOProvider, rt::Object> {
  public:

@@ -5,8 +5,8 @@
 #include <stdexcept>
 #include <vector>
 
-#include "Runtime/Class.h"
-#include "Runtime/Weak.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Weak.h"
 #include "tests/TestReports.h"
 
 namespace {

@@ -1,5 +1,5 @@
 // Messages that their arguments do not fit.
-#include "Runtime/Number.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLog.h"
 
 using namespace rt::literals;

@@ -8,8 +8,8 @@
 ///
 /// Not for: hosts, who have blocks (AVOProvider).
 
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/Async/Provider/AVOProvider.h"
 
 /// A provider that calls `function` at each `get`. Null is reported, and yields null. Throws what the error

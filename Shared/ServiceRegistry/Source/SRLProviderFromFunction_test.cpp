@@ -5,7 +5,7 @@
 #include <stdexcept>
 #include <vector>
 
-#include "Runtime/Class.h"
+#include "Runtime/Objects/Class.h"
 #include "tests/TestReports.h"
 
 namespace {

@@ -11,8 +11,8 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/MainQueue.h"
-#include "Runtime/UnfairLock.h"
+#include "Runtime/Locks/UnfairLock.h"
+#include "Runtime/Queues/MainQueue.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 
 namespace {

@@ -11,7 +11,7 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/MainQueue.h"
+#include "Runtime/Queues/MainQueue.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "tests/TestBindings.h"
 #include "tests/WholeReports.h"

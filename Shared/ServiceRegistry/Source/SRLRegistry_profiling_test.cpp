@@ -6,7 +6,7 @@
 
 #include <cstddef>
 
-#include "Runtime/Number.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingMeasurement.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingSwitch.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationEvent.h"

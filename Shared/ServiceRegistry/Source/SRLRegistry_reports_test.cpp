@@ -7,7 +7,7 @@
 #include <string>
 #include <vector>
 
-#include "Runtime/UnfairLock.h"
+#include "Runtime/Locks/UnfairLock.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "tests/TestServices.h"
 

@@ -9,8 +9,8 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Number.h"
-#include "Runtime/Weak.h"
+#include "Runtime/Objects/Weak.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "tests/TestServices.h"

@@ -10,8 +10,8 @@
 #include <string>
 #include <vector>
 
-#include "Runtime/Number.h"
-#include "Runtime/UnfairLock.h"
+#include "Runtime/Locks/UnfairLock.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "tests/AllocationCount.h"

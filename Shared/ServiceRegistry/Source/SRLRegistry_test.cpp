@@ -11,8 +11,8 @@
 #include <thread>
 #include <utility>
 
-#include "Runtime/MainQueue.h"
-#include "Runtime/ThreadIdentifier.h"
+#include "Runtime/Locks/ThreadIdentifier.h"
+#include "Runtime/Queues/MainQueue.h"
 #include "tests/TestBindings.h"
 #include "tests/WholeReports.h"
 

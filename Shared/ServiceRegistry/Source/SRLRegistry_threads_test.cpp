@@ -16,8 +16,8 @@
 #include <tuple>
 #include <vector>
 
-#include "Runtime/Class.h"
-#include "Runtime/Ref.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "tests/TestReports.h"
 

@@ -16,11 +16,11 @@
 
 #include <vector>
 
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Visibility.h"
-#include "Runtime/Weak.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/Weak.h"
 
 struct RT_VISIBLE SRLScopeLifecycleDelegate : rt::Protocol<SRLScopeLifecycleDelegate> {
   /// The scopes with `tag` have been removed, and have given up the instances that they had:

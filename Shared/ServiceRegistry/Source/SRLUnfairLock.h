@@ -16,7 +16,7 @@
 ///
 /// Not for: anything but registries.
 
-#include "Runtime/UnfairLock.h"
+#include "Runtime/Locks/UnfairLock.h"
 
 struct RT_CAPABILITY("lock") SRLUnfairLock {
   void lock() noexcept RT_ACQUIRE() RT_NO_THREAD_SAFETY_ANALYSIS {

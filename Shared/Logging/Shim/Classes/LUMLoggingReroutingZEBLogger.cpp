@@ -4,9 +4,9 @@
 
 #include "Foundation/ZEBDropExceptions.h"
 #include "Foundation/ZEBLogMininumLevelFilter.h"
-#include "Runtime/AssertionHandler.h"
-#include "Runtime/CallStack.h"
-#include "Runtime/Format.h"
+#include "Runtime/Process/AssertionHandler.h"
+#include "Runtime/Process/CallStack.h"
+#include "Runtime/Text/Format.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogAppControl.h"
 #include "Shared/Logging/LUMLogMessage.h"

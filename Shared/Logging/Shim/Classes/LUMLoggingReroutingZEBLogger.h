@@ -26,10 +26,10 @@
 #include "Foundation/ZEBLogLevel.h"
 #include "Foundation/ZEBLogWriter.h"
 #include "Foundation/ZEBLogger.h"
-#include "Runtime/Class.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
 #include "Shared/Logging/LUMLogMultiplexing.h"
 
 class RT_VISIBLE LUMLoggingReroutingZEBLogger
@@ -50,7 +50,7 @@ class RT_VISIBLE LUMLoggingReroutingZEBLogger
   rt::Ref<ZEBLogFormatter> formatter() const override { return nullptr; }
   rt::Ref<ZEBLogFilter> filter() const override { return nullptr; }
 
-  /// Do nothing with null, and otherwise fail an assertion (Runtime/AssertionHandler.h).
+  /// Do nothing with null, and otherwise fail an assertion (Runtime/Process/AssertionHandler.h).
   void setWriter(rt::Ref<ZEBLogWriter> writer) override;
   void setFormatter(rt::Ref<ZEBLogFormatter> formatter) override;
   void setFilter(rt::Ref<ZEBLogFilter> filter) override;

@@ -12,7 +12,7 @@
 #include <cstring>
 #include <string_view>
 
-#include "Runtime/String.h"
+#include "Runtime/Objects/String.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"
 
 /// The identifier's bytes, as many as the record says.

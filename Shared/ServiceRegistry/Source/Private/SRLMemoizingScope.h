@@ -25,12 +25,12 @@
 #include <type_traits>
 #include <utility>
 
-#include "Runtime/Array.h"
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/UnfairLock.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Locks/UnfairLock.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Values/Array.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScopeIvars.h"
 
 class RT_VISIBLE SRLMemoizingScope final : public rt::Implements<SRLMemoizingScope, rt::Object> {

@@ -10,12 +10,12 @@
 
 #include <unordered_map>
 
-#include "Runtime/Class.h"
-#include "Runtime/LongLock.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/UnfairLock.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Locks/LongLock.h"
+#include "Runtime/Locks/UnfairLock.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLTable.h"
 
 /// The making of an instance: a lock that whoever makes it holds meanwhile, and for which the others wait.

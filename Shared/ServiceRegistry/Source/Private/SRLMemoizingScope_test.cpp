@@ -13,10 +13,10 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Block.h"
-#include "Runtime/Class.h"
-#include "Runtime/String.h"
-#include "Runtime/Weak.h"
+#include "Runtime/Objects/Block.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Objects/Weak.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScopeIvars.h"
 #include "tests/AllocationCount.h"
 #include "tests/TestFactories.h"

@@ -14,8 +14,8 @@
 #include <thread>
 #include <vector>
 
-#include "Runtime/Block.h"
-#include "Runtime/Class.h"
+#include "Runtime/Objects/Block.h"
+#include "Runtime/Objects/Class.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope.h"
 #include "tests/TestFactories.h"
 

@@ -14,8 +14,8 @@
 #include <variant>
 #include <vector>
 
-#include "Runtime/Ref.h"
-#include "Runtime/Set.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Values/Set.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLBindingsModuleData.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementation.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"

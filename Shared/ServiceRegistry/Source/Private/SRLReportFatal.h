@@ -9,7 +9,7 @@
 /// Not for: what a program can do wrong while it runs (PECReport).
 
 #include "Libraries/Util/ErrorHandler/PECReport.h"
-#include "Runtime/FormatString.h"
+#include "Runtime/Text/FormatString.h"
 
 /// Reports `message`, and ends the program, whether the error callback returns or throws.
 [[noreturn]] void SRLReportFatal(const PECReportSite& site, const rt::FormatString<>& message) noexcept;

@@ -1,6 +1,6 @@
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingEnabled.h"
 
-#include "Runtime/Lazy.h"
+#include "Runtime/Locks/Lazy.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingSwitch.h"
 
 constinit std::atomic<bool> SRLPProfilingDetail::isOff{false};

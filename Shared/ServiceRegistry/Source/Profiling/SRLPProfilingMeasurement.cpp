@@ -6,11 +6,11 @@
 #include <vector>
 
 #include "Libraries/Util/ErrorHandler/PECReport.h"
-#include "Runtime/MonotonicClock.h"
-#include "Runtime/String.h"
-#include "Runtime/Thread.h"
-#include "Runtime/ThreadSafety.h"
-#include "Runtime/UnfairLock.h"
+#include "Runtime/Base/MonotonicClock.h"
+#include "Runtime/Base/ThreadSafety.h"
+#include "Runtime/Locks/UnfairLock.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Process/Thread.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLAPIIdentifier.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationEvent.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLProfilingStorage.h"

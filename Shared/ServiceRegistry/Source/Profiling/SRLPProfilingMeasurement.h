@@ -24,15 +24,15 @@
 #include <cstddef>
 #include <cstdint>
 
-#include "Runtime/Ref.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementation.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"
 
 /// A measurement that has begun.
 struct SRLPProfilingMeasurementPartial {
-  /// By the clock of Runtime/MonotonicClock.h.
+  /// By the clock of Runtime/Base/MonotonicClock.h.
   std::uint64_t startTime = 0;
-  /// The handle of the thread that began it (Runtime/Thread.h).
+  /// The handle of the thread that began it (Runtime/Process/Thread.h).
   const void* callingThread = nullptr;
   /// What that thread was making then; null where it was making nothing.
   rt::Ref<SRLImplementation> parent;

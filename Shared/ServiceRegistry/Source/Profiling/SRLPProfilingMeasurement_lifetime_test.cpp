@@ -9,10 +9,10 @@
 #include <thread>
 #include <utility>
 
-#include "Runtime/Class.h"
-#include "Runtime/LoadHook.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/LoadHook.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingMeasurement.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLProfilingStorage.h"
 

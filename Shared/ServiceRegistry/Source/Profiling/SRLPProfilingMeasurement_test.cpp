@@ -19,12 +19,12 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Class.h"
-#include "Runtime/MonotonicClock.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Thread.h"
-#include "Runtime/Weak.h"
+#include "Runtime/Base/MonotonicClock.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/Weak.h"
+#include "Runtime/Process/Thread.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLProfilingStorage.h"
 #include "tests/SRLPProfilingTest.h"

@@ -1,6 +1,6 @@
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationEvent.h"
 
-#include "Runtime/Format.h"
+#include "Runtime/Text/Format.h"
 
 using namespace rt::literals;
 

@@ -9,9 +9,9 @@
 #include <limits>
 #include <string>
 
-#include "Runtime/Class.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
 
 using namespace rt::literals;
 

@@ -11,9 +11,9 @@
 
 #include <cstdint>
 
-#include "Runtime/Class.h"
-#include "Runtime/String.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/String.h"
 
 struct RT_VISIBLE SRLPServiceInitializationNewInstanceEventProtocol
     : rt::Protocol<SRLPServiceInitializationNewInstanceEventProtocol> {

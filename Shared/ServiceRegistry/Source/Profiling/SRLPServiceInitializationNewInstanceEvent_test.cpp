@@ -8,9 +8,9 @@
 #include <initializer_list>
 #include <limits>
 
-#include "Runtime/Class.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
 
 using namespace rt::literals;
 

@@ -2,7 +2,7 @@
 
 #include <utility>
 
-#include "Runtime/Lazy.h"
+#include "Runtime/Locks/Lazy.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPSelectorSort.h"
 
 namespace {

@@ -14,14 +14,14 @@
 #include <unordered_map>
 #include <vector>
 
-#include "Runtime/Array.h"
-#include "Runtime/Class.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
-#include "Runtime/ThreadSafety.h"
-#include "Runtime/UnfairLock.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/ThreadSafety.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Locks/UnfairLock.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Values/Array.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationEvent.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationNewInstanceEvent.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLProfilingStorageProtocol.h"

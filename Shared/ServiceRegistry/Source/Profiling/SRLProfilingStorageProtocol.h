@@ -13,11 +13,11 @@
 
 #include <cstdint>
 
-#include "Runtime/Array.h"
-#include "Runtime/Class.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Values/Array.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationEvent.h"
 
 struct RT_VISIBLE SRLProfilingStorageProtocol : rt::Protocol<SRLProfilingStorageProtocol> {

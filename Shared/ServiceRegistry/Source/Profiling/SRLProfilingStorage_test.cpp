@@ -10,9 +10,9 @@
 #include <thread>
 #include <vector>
 
-#include "Runtime/Class.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
 
 using namespace rt::literals;
 

@@ -10,10 +10,10 @@
 /// others. Whatever they are, they are immutable, equal when they stand for the same type, and described by
 /// what people call it: the registry compares them and puts them into its reports.
 ///
-/// Not for: asking an object what it is (`rt::cast`, Runtime/Class.h).
+/// Not for: asking an object what it is (`rt::cast`, Runtime/Objects/Class.h).
 
-#include "Runtime/Class.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
 
 struct RT_VISIBLE SRLInstanceType : rt::Protocol<SRLInstanceType> {
   /// Whether every instance of `aClass` is of this type. Any thread may ask.

@@ -11,9 +11,9 @@
 #include <string_view>
 #include <vector>
 
-#include "Runtime/Class.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassProtocolType.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLMakeInstanceTypeContainer.h"

@@ -6,8 +6,8 @@
 ///
 /// Not for: who knows which it is; the classes have initialisers of their own.
 
-#include "Runtime/Class.h"
-#include "Runtime/Ref.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLInstanceType.h"
 
 /// A new SRLClassProtocolType for both, an SRLProtocolType for a protocol, an SRLClassType for a class. That

@@ -4,7 +4,7 @@
 #include <string_view>
 
 #include "Libraries/Util/ErrorHandler/PECReport.h"
-#include "Runtime/Format.h"
+#include "Runtime/Text/Format.h"
 
 using namespace rt::literals;
 

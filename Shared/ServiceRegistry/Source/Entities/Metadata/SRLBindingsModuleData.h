@@ -22,10 +22,10 @@
 #include <string_view>
 #include <unordered_map>
 
-#include "Runtime/Block.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Block.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"
 
 /// For the addresses that stand for configurations, what makes them. A configuration is made once for each

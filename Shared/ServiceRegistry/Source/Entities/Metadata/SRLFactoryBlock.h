@@ -13,9 +13,9 @@
 /// Not for: the functions of generated code that make instances (SRLImplementationRegistrationData), which
 /// blocks of this kind call.
 
-#include "Runtime/Block.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
+#include "Runtime/Objects/Block.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSet.h"
 
 using SRLFactoryBlock = rt::Block<rt::Ref<rt::Object>(SRLScopeTagSet tags, bool* instanceCreated)>;

@@ -2,7 +2,7 @@
 
 #include <functional>
 
-#include "Runtime/Format.h"
+#include "Runtime/Text/Format.h"
 
 using namespace rt::literals;
 

@@ -1,7 +1,7 @@
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementationConfiguration.h"
 
 #include "Libraries/Util/ErrorHandler/PECReport.h"
-#include "Runtime/Format.h"
+#include "Runtime/Text/Format.h"
 
 using namespace rt::literals;
 

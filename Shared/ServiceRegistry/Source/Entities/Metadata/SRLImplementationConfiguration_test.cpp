@@ -6,7 +6,7 @@
 #include <limits>
 #include <vector>
 
-#include "Runtime/Class.h"
+#include "Runtime/Objects/Class.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "tests/TestReports.h"
 

@@ -11,8 +11,8 @@
 #include <string_view>
 #include <vector>
 
-#include "Runtime/Class.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/String.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 
 namespace {

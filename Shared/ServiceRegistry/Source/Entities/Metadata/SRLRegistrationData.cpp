@@ -2,7 +2,7 @@
 
 #include <type_traits>
 
-#include "Runtime/ClassInfo.h"
+#include "Runtime/Objects/ClassInfo.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLMakeInstanceTypeContainer.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLReportFatal.h"

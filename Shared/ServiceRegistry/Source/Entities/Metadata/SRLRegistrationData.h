@@ -27,8 +27,8 @@
 #include <cstddef>
 #include <cstdint>
 
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLInstanceType.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSet.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeType.h"

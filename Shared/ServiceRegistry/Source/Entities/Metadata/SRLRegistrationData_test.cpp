@@ -13,8 +13,8 @@
 #include <vector>
 
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
-#include "Runtime/Class.h"
-#include "Runtime/String.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/String.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassProtocolType.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLProtocolType.h"

@@ -13,8 +13,8 @@
 ///
 /// Not for: objects that are equal to themselves alone, by which no scope is found again.
 
-#include "Runtime/Class.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
 
 struct RT_VISIBLE SRLScopeTag : rt::Protocol<SRLScopeTag> {
  protected:

@@ -22,9 +22,9 @@
 #include <type_traits>
 #include <vector>
 
-#include "Runtime/Array.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Values/Array.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeType.h"
 
 /// The set. The first null ends it, and all that follow are null too.

@@ -10,8 +10,9 @@
 ///     if (wrapper) use(SRLScopeTagSetCreateWithTags(wrapper->tags().get()));
 ///
 /// Tags are archived if they are strings or numbers, arrays or dictionaries, or conform to rt::SecureCoding
-/// (Runtime/Coding.h); others end archiving with an rt::Exception, as does all else that a KeyedArchiver
-/// refuses, also of what was unarchived. The archive has them in an array, under the key "kTagsID".
+/// (Runtime/Archive/Coding.h); others end archiving with an rt::Exception, as does all else that a
+/// KeyedArchiver refuses, also of what was unarchived. The archive has them in an array, under the key
+/// "kTagsID".
 ///
 /// Owns its tags. Immutable: any thread may use it if the tags bear that.
 ///
@@ -20,15 +21,15 @@
 #include <cstdint>
 #include <utility>
 
-#include "Runtime/Array.h"
-#include "Runtime/Class.h"
-#include "Runtime/Coding.h"
-#include "Runtime/KeyedArchiver.h"
-#include "Runtime/KeyedUnarchiver.h"
-#include "Runtime/Object.h"
-#include "Runtime/Ref.h"
-#include "Runtime/String.h"
-#include "Runtime/Visibility.h"
+#include "Runtime/Archive/Coding.h"
+#include "Runtime/Archive/KeyedArchiver.h"
+#include "Runtime/Archive/KeyedUnarchiver.h"
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Values/Array.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSet.h"
 
 class RT_VISIBLE SRLScopeTagSetCodableWrapper final

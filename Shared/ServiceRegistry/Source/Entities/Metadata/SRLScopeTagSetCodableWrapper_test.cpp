@@ -12,13 +12,13 @@
 #include <variant>
 #include <vector>
 
-#include "Runtime/Array.h"
-#include "Runtime/Exception.h"
-#include "Runtime/KeyedArchiver.h"
-#include "Runtime/KeyedUnarchiver.h"
-#include "Runtime/Number.h"
-#include "Runtime/PropertyList.h"
-#include "Runtime/String.h"
+#include "Runtime/Archive/KeyedArchiver.h"
+#include "Runtime/Archive/KeyedUnarchiver.h"
+#include "Runtime/Archive/PropertyList.h"
+#include "Runtime/Objects/Exception.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Values/Array.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTag.h"
 #include "tests/PlistlibTest.h"
 #include "tests/TestReports.h"

@@ -9,10 +9,10 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Class.h"
-#include "Runtime/Number.h"
-#include "Runtime/String.h"
-#include "Runtime/Weak.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Objects/Weak.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTag.h"
 #include "tests/AllocationCount.h"
 #include "tests/TestReports.h"

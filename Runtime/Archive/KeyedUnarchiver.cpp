@@ -1,0 +1,274 @@
+#include "Runtime/Archive/KeyedUnarchiver.h"
+
+#include <algorithm>
+#include <utility>
+
+#include "Runtime/Archive/KeyedArchiveFormat.h"
+#include "Runtime/Objects/ClassMethod.h"
+#include "Runtime/Values/Array.h"
+#include "Runtime/Values/Dictionary.h"
+#include "Runtime/Values/Number.h"
+
+namespace rt {
+
+namespace {
+
+using namespace detail::keyedArchive;
+
+// For error texts: what comes from the archive may be long, and may be anything.
+std::string quoted(std::string_view text) {
+  constexpr std::size_t kMaximumLength = 100;
+  return '"' + std::string(text.substr(0, kMaximumLength)) + (text.size() > kMaximumLength ? "...\"" : "\"");
+}
+
+}  // namespace
+
+// One object on the way down to what is being decoded.
+class KeyedUnarchiver::Level {
+ public:
+  Level(KeyedUnarchiver& unarchiver, Index index)
+      : unarchiver_(unarchiver), index_(index), container_(unarchiver.container_) {
+    ++unarchiver_.depth_;
+    unarchiver_.isDecoding_[index_] = true;
+    unarchiver_.container_ = index_;
+  }
+  Level(const Level&) = delete;
+  Level& operator=(const Level&) = delete;
+  ~Level() {
+    --unarchiver_.depth_;
+    unarchiver_.isDecoding_[index_] = false;
+    unarchiver_.container_ = container_;
+  }
+
+ private:
+  KeyedUnarchiver& unarchiver_;
+  const Index index_;
+  const Index container_;
+};
+
+KeyedUnarchiver::KeyedUnarchiver(std::span<const std::byte> bytes)
+    : maximumSize_(detail::keyedArchive::maximumSize(bytes.size())) {
+  try {
+    list_ = PropertyList::decoded(bytes);
+  } catch (const MalformedPropertyList& error) {
+    fail(std::string("no keyed archive: ") + error.what());
+    return;
+  }
+  objects_ = archivedObjects();
+  isDecoding_.resize(list_.values.size());
+}
+
+KeyedUnarchiver::~KeyedUnarchiver() = default;
+
+const PropertyList::Array* KeyedUnarchiver::archivedObjects() {
+  const auto under = [this](std::string_view key) {
+    // An index that none has stands for nothing.
+    return list_.find(list_.root, key).value_or(static_cast<Index>(list_.values.size()));
+  };
+  const auto* version = list_.get<std::int64_t>(under(kVersionKey));
+  const auto* objects = list_.get<PropertyList::Array>(under(kObjectsKey));
+  const auto* null =
+      objects != nullptr && !objects->empty() ? list_.get<PropertyList::Text>(objects->front()) : nullptr;
+  container_ = under(kTopKey);
+  if (version == nullptr || *version != kVersion || null == nullptr || *null != kNull ||
+      list_.get<PropertyList::Text>(under(kArchiverKey)) == nullptr ||
+      list_.get<PropertyList::Dictionary>(container_) == nullptr) {
+    fail("no keyed archive, but another property list");
+    return nullptr;
+  }
+  return objects;
+}
+
+bool KeyedUnarchiver::containsValueForKey(std::string_view key) const {
+  return error_.isNull() && list_.find(container_, escaped(key)).has_value();
+}
+
+Ref<Object> KeyedUnarchiver::decodeObjectOfClasses(std::span<const ClassInfo* const> classes,
+                                                   std::string_view key) {
+  if (!error_.isNull()) return nullptr;
+  const std::optional<Index> index = list_.find(container_, escaped(key));
+  if (!index) return fail("there is nothing under the key " + quoted(key));
+  if (depth_ == 0) sizeLimit_ = size_ + maximumSize_;
+
+  Classes allowed(classes.begin(), classes.end());
+  std::ranges::sort(allowed);
+  const auto known = std::ranges::find(classes_, allowed);
+  const Wanted wanted{static_cast<std::size_t>(known - classes_.begin()), false};
+  if (known == classes_.end()) classes_.push_back(std::move(allowed));
+  return decodeReference(*index, wanted);
+}
+
+Ref<Object> KeyedUnarchiver::unarchivedObjectOfClasses(std::initializer_list<const ClassInfo*> classes,
+                                                       std::span<const std::byte> bytes, String* error) {
+  KeyedUnarchiver unarchiver(bytes);
+  Ref<Object> object = unarchiver.decodeObjectOfClasses(classes, kRootKey);
+  if (object == nullptr && error != nullptr) *error = unarchiver.error();
+  return object;
+}
+
+Ref<Object> KeyedUnarchiver::decodeReference(Index reference, Wanted wanted) {
+  const auto* place = list_.get<PropertyList::Reference>(reference);
+  if (place == nullptr || place->number >= objects_->size()) return fail("a reference to no object");
+  if (place->number == 0) return nullptr;
+  return decodeValue((*objects_)[place->number], wanted);
+}
+
+Ref<Object> KeyedUnarchiver::decodeValue(Index index, Wanted wanted) {
+  if (list_.get<PropertyList::Dictionary>(index) != nullptr) return decodeInstance(index, wanted);
+  return decodePlain(index, wanted);
+}
+
+Ref<Object> KeyedUnarchiver::decodePlain(Index index, Wanted wanted) {
+  auto& [object, size] = decoded_[index];
+  if (object == nullptr) {
+    size = 1;
+    if (const auto* text = list_.get<PropertyList::Text>(index)) {
+      object = String::fromUTF8(*text);
+      size += text->size();
+    } else if (const auto* boolean = list_.get<bool>(index)) {
+      object = Number::of(*boolean);
+    } else if (const auto* integer = list_.get<std::int64_t>(index)) {
+      object = Number::of(*integer);
+    } else if (const auto* large = list_.get<std::uint64_t>(index)) {
+      object = Number::of(*large);
+    } else if (const auto* real = list_.get<double>(index)) {
+      object = Number::of(*real);
+    } else {
+      return fail("an object that is neither text nor number, and has no class");
+    }
+  }
+  if (!wanted.isElement && !isAllowed(object->classInfo(), wanted)) return nullptr;
+  return grow(size) ? object : nullptr;
+}
+
+Ref<Object> KeyedUnarchiver::decodeInstance(Index index, Wanted wanted) {
+  const ClassInfo* info = classOf(index);
+  if (info == nullptr || !isAllowed(*info, wanted)) return nullptr;
+  const bool isCollection = info == &classInfo<Array>() || info == &classInfo<Dictionary>();
+  // What may be in a collection depends on the classes that it was asked for with.
+  const std::uint64_t key = index | (isCollection ? std::uint64_t{wanted.classes + 1} << 32U : 0);
+  if (const auto known = decoded_.find(key); known != decoded_.end()) {
+    return grow(known->second.size) ? known->second.object : nullptr;
+  }
+  if (isDecoding_[index]) return fail("an object of class " + quoted(info->name) + " contains itself");
+  if (depth_ == kMaximumDepth) return fail("objects are nested too deeply");
+
+  const std::size_t sizeBefore = size_;
+  if (!grow(1)) return nullptr;
+  Ref<Object> object;
+  {
+    const Level level(*this, index);
+    object = isCollection ? decodeCollection(index, *info, wanted) : decodeWithCoder(*info);
+  }
+  if (!error_.isNull()) return nullptr;
+  decoded_[key] = {object, size_ - sizeBefore};
+  return object;
+}
+
+Ref<Object> KeyedUnarchiver::decodeWithCoder(const ClassInfo& info) {
+  Initializer* const initializer = initializerOf(info);
+  if (initializer == nullptr) return fail("the class " + quoted(info.name) + " cannot be unarchived");
+  Ref<Object> object = initializer(*this);
+  if (object == nullptr) return fail("the class " + quoted(info.name) + " refused what is archived for it");
+  if (!object->isKindOf(info)) return fail("the class " + quoted(info.name) + " made another object");
+  return object;
+}
+
+Ref<Object> KeyedUnarchiver::decodeCollection(Index index, const ClassInfo& info, Wanted wanted) {
+  wanted.isElement = true;
+  std::vector<Ref<Object>> elements;
+  if (!decodeList(index, kElementsKey, wanted, elements)) return nullptr;
+  if (&info == &classInfo<Array>()) return make<Array>(std::move(elements));
+  return decodeDictionary(index, elements, wanted);
+}
+
+Ref<Object> KeyedUnarchiver::decodeDictionary(Index index, const std::vector<Ref<Object>>& elements,
+                                              Wanted wanted) {
+  std::vector<Ref<Object>> keys;
+  if (!decodeList(index, kKeysKey, wanted, keys)) return nullptr;
+  if (keys.size() != elements.size()) return fail("a Dictionary with more or fewer keys than elements");
+  Dictionary::Builder builder;
+  for (std::size_t i = 0; i < keys.size(); ++i) {
+    // Collections as keys would be hashed again at each level: few bytes could stand for much work.
+    if (!keys[i]->isKindOf(classInfo<StringObject>()) && !keys[i]->isKindOf(classInfo<Number>())) {
+      return fail("a Dictionary with a key that is neither text nor number");
+    }
+    builder.set(keys[i], elements[i]);
+  }
+  if (builder.count() != keys.size()) return fail("a Dictionary with a key twice");
+  return std::move(builder).dictionary();
+}
+
+bool KeyedUnarchiver::decodeList(Index owner, std::string_view key, Wanted wanted,
+                                 std::vector<Ref<Object>>& objects) {
+  const std::optional<Index> index = list_.find(owner, key);
+  const auto* references = index ? list_.get<PropertyList::Array>(*index) : nullptr;
+  if (!index || references == nullptr) return fail("a collection without " + std::string(key)) != nullptr;
+  // No archiver has two collections share a list, and many that did would multiply what a file holds.
+  if (listOwners_.try_emplace(*index, owner).first->second != owner) {
+    return fail("two collections with the same " + std::string(key)) != nullptr;
+  }
+  objects.reserve(references->size());
+  for (const Index reference : *references) {
+    objects.push_back(decodeReference(reference, wanted));
+    if (error_.isNull() && objects.back() == nullptr) fail("a collection that contains null");
+    if (!error_.isNull()) return false;
+  }
+  return true;
+}
+
+KeyedUnarchiver::Initializer* KeyedUnarchiver::initializerOf(const ClassInfo& info) {
+  const auto [known, isNew] = initializers_.try_emplace(&info, nullptr);
+  if (isNew && info.conformsTo(protocolInfo<SecureCoding>())) {
+    for (const ClassMethod& method : classMethods(info)) {
+      if (method.selector() == kInitializer) known->second = method.as<Initializer>();
+    }
+  }
+  return known->second;
+}
+
+// Looked for once for each object, since what it has to be looked for among may be much.
+const ClassInfo* KeyedUnarchiver::classOf(Index index) {
+  const ClassInfo*& info = classesOfObjects_[index];
+  if (info != nullptr) return info;
+  const std::optional<Index> reference = list_.find(index, kClassKey);
+  const auto* place = reference ? list_.get<PropertyList::Reference>(*reference) : nullptr;
+  if (place != nullptr && place->number < objects_->size()) info = archivedClass((*objects_)[place->number]);
+  if (info == nullptr) fail("an object without a class");
+  return info;
+}
+
+// The same for each class.
+const ClassInfo* KeyedUnarchiver::archivedClass(Index index) {
+  const ClassInfo*& info = archivedClasses_[index];
+  if (info != nullptr) return info;
+  const std::optional<Index> name = list_.find(index, kClassNameKey);
+  const auto* text = name ? list_.get<PropertyList::Text>(*name) : nullptr;
+  if (text == nullptr) return nullptr;
+  info = classNamed(*text);
+  if (info == nullptr) fail("an object of class " + quoted(*text) + ", which is not known here");
+  return info;
+}
+
+bool KeyedUnarchiver::isAllowed(const ClassInfo& info, Wanted wanted) {
+  const Classes& classes = classes_[wanted.classes];
+  if (std::ranges::any_of(classes, [&](const ClassInfo* each) { return info.isSubclassOf(*each); }))
+    return true;
+  std::string names;
+  for (const ClassInfo* each : classes) names += (names.empty() ? "" : " or ") + quoted(each->name);
+  fail("an object of class " + quoted(info.name) + " where one of class " + names + " was asked for");
+  return false;
+}
+
+bool KeyedUnarchiver::grow(std::size_t size) {
+  size_ += size;
+  if (size_ > sizeLimit_) fail("objects are referred to too often");
+  return error_.isNull();
+}
+
+Ref<Object> KeyedUnarchiver::fail(const std::string& reason) {
+  if (error_.isNull()) error_ = String::fromUTF8Repaired(reason);
+  return nullptr;
+}
+
+}  // namespace rt

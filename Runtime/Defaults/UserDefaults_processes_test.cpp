@@ -1,0 +1,353 @@
+// What other processes do to user defaults, and what is left of them in the child of a fork.
+
+#include <fcntl.h>
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <atomic>
+#include <csignal>
+#include <filesystem>
+#include <functional>
+#include <iterator>
+#include <mutex>
+#include <semaphore>
+#include <stdexcept>
+#include <string>
+#include <string_view>
+#include <system_error>
+#include <thread>
+#include <utility>
+#include <vector>
+
+#include "Runtime/Objects/Weak.h"
+#include "tests/Process.h"
+#include "tests/UserDefaultsTest.h"
+
+namespace {
+
+namespace fs = std::filesystem;
+using namespace rt::literals;
+using Notify = rt::UserDefaults::Notify;
+using testing::ElementsAre;
+using testing::HasSubstr;
+
+// Has another process run `script`, in which $1 is `path`.
+void inShell(const std::string& script, const fs::path& path) {
+  const ProcessResult result = runProcess({"sh", "-ec", script, "sh", path.string()});
+  ASSERT_EQ(result.exitStatus, 0) << result.standardError;
+}
+
+// Calls back on the thread that waits for other processes.
+class UserDefaultsOfOthers : public UserDefaults {
+ protected:
+  // Waits until the observer of "key" has seen `value`.
+  void await(const rt::String& value) {
+    for (;;) {
+      {
+        const std::scoped_lock lock(seenMutex_);
+        if (seen_ == value) return;
+      }
+      called_.acquire();
+    }
+  }
+
+  rt::UserDefaults::Observation observe(const rt::Ref<rt::UserDefaults>& defaults) {
+    return defaults->observe("key", Notify::kAlsoNow, [this, raw = defaults.get()] {
+      {
+        const std::scoped_lock lock(seenMutex_);
+        seen_ = raw->stringForKey("key");
+      }
+      called_.release();
+    });
+  }
+
+ private:
+  std::mutex seenMutex_;
+  rt::String seen_ = "(nothing yet)"_s;
+  std::counting_semaphore<> called_{0};
+};
+
+TEST_F(UserDefaultsOfOthers, AreToldOf) {
+  const auto defaults = this->defaults();
+  const auto observation = observe(defaults);
+  await(nullptr);
+  inShell(R"(echo 'key = 1' > "$1")", path());
+  await("1"_s);
+  inShell(R"(echo 'key = 2' > "$1")", path());
+  await("2"_s);
+  inShell(R"(echo 'key = 3' > "$1.new"; mv "$1.new" "$1")", path());
+  await("3"_s);
+  inShell(R"(rm "$1")", path());
+  await(nullptr);
+  inShell(R"(echo 'key = 4' > "$1"; echo 'not key' > "$1"; echo 'key = 5' > "$1")", path());
+  await("5"_s);
+}
+
+TEST_F(UserDefaultsOfOthers, AreToldOfThoughAReadCameFirst) {
+  const auto defaults = this->defaults();
+  const auto observation = observe(defaults);
+  for (int i = 0; i < 100; ++i) {
+    const std::string value = std::to_string(i);
+    write(path(), "key = " + value);
+    ASSERT_EQ(defaults->stringForKey("key"), std::string_view(value));
+    await(rt::String::fromUTF8(value));
+  }
+}
+
+TEST_F(UserDefaultsOfOthers, AreToldOfWhereTheFolderIsMissing) {
+  const fs::path path = folder_ / "a" / "b" / "c" / "defaults.conf";
+  const auto defaults = defaultsAt(path);
+  const auto observation = observe(defaults);
+  inShell(R"(mkdir -p "${1%/*}"; echo 'key = 1' > "$1")", path);
+  await("1"_s);
+  inShell(R"(rm -r "${1%/b/*}/b")", path);
+  await(nullptr);
+  inShell(R"(mkdir -p "${1%/*}")", path);
+  inShell(R"(echo 'key = 2' > "$1")", path);
+  await("2"_s);
+}
+
+TEST_F(UserDefaultsOfOthers, AreToldOfBehindASymbolicLink) {
+  fs::create_directory(folder_ / "elsewhere");
+  fs::create_symlink("elsewhere/target", path());
+  write(folder_ / "elsewhere" / "target", "key = 1");
+  const auto defaults = this->defaults();
+  const auto observation = observe(defaults);
+  await("1"_s);
+  inShell(R"(echo 'key = 2' > "${1%/*}/elsewhere/target")", path());
+  await("2"_s);
+  inShell(R"(mkdir "${1%/*}/third"; echo 'key = 3' > "${1%/*}/third/target"; ln -snf third/target "$1")",
+          path());
+  await("3"_s);
+  inShell(R"(echo 'key = 4' > "${1%/*}/third/target")", path());
+  await("4"_s);
+}
+
+TEST_F(UserDefaultsOfOthers, AreToldOfAfterAChildHasForked) {
+  auto defaults = this->defaults();
+  auto observation = observe(defaults);
+  const pid_t child = fork();
+  if (child == 0) {
+    // Ends what the parent has, but in the child only.
+    observation = {};
+    defaults = nullptr;
+    _exit(0);
+  }
+  int status = 0;
+  ASSERT_EQ(waitpid(child, &status, 0), child);
+  ASSERT_EQ(status, 0);
+  inShell(R"(echo 'key = 1' > "$1")", path());
+  await("1"_s);
+}
+
+TEST_F(UserDefaultsOfOthers, AreToldOfOnAThreadThatTakesNoSignals) {
+  const auto defaults = this->defaults();
+  std::binary_semaphore called{0};
+  sigset_t blocked;
+  sigemptyset(&blocked);
+  std::thread::id thread;
+  const auto observation = defaults->observe("key", Notify::kOnChange, [&] {
+    pthread_sigmask(SIG_SETMASK, nullptr, &blocked);
+    thread = std::this_thread::get_id();
+    called.release();
+  });
+  inShell(R"(echo 'key = 1' > "$1")", path());
+  called.acquire();
+  EXPECT_NE(thread, std::this_thread::get_id());
+  EXPECT_EQ(sigismember(&blocked, SIGTERM), 1);
+  sigset_t own;
+  pthread_sigmask(SIG_SETMASK, nullptr, &own);
+  EXPECT_EQ(sigismember(&own, SIGTERM), 0);
+}
+
+TEST_F(UserDefaultsOfOthers, ReportWhatAnObserverThrows) {
+  const auto defaults = this->defaults();
+  std::binary_semaphore reported{0};
+  std::string report;
+  rt::UserDefaults::setReportHandler([&](const rt::String& line) {
+    report = line.view();
+    reported.release();
+  });
+  const auto first = defaults->observe("key", Notify::kOnChange, [isFirst = true]() mutable {
+    if (std::exchange(isFirst, false)) throw std::runtime_error("oh");
+    throw 1;
+  });
+  const auto second = observe(defaults);
+  inShell(R"(echo 'key = 1' > "$1")", path());
+  reported.acquire();
+  EXPECT_EQ(report, "an observer of user defaults threw: oh");
+  await("1"_s);
+  inShell(R"(echo 'key = 2' > "$1")", path());
+  reported.acquire();
+  EXPECT_EQ(report, "an observer of user defaults threw: an exception of an unknown type");
+  await("2"_s);
+  rt::UserDefaults::setReportHandler(nullptr);
+}
+
+// An observer may drop the last reference on the thread that would otherwise be waited for.
+TEST_F(UserDefaultsOfOthers, MayBeLetGoOfByAnObserver) {
+  auto defaults = this->defaults();
+  const rt::Weak<rt::UserDefaults> weak = defaults;
+  std::binary_semaphore kept{0};
+  std::binary_semaphore called{0};
+  rt::UserDefaults::Observation observation;
+  observation = defaults->observe("key", Notify::kOnChange, [&] {
+    kept.acquire();
+    observation = {};
+    called.release();
+  });
+  kept.release();
+  defaults = nullptr;
+  inShell(R"(echo 'key = 1' > "$1")", path());
+  called.acquire();
+  EXPECT_FALSE(weak.lock());
+}
+
+// Invariant: no change is lost, whichever process makes it, and a reader never sees half a file.
+TEST_F(UserDefaults, ConcurrentChangesOfSeveralProcessesAllStand) {
+  constexpr int kProcesses = 3;
+  constexpr int kChanges = 15;
+  std::vector<pid_t> children;
+  for (int process = 0; process < kProcesses; ++process) {
+    const pid_t child = fork();
+    if (child == 0) {
+      try {
+        const auto defaults = this->defaults();
+        for (int i = 0; i < kChanges; ++i) {
+          defaults->setInteger(i, std::to_string(process) + "-" + std::to_string(i));
+        }
+      } catch (...) {
+        _exit(1);
+      }
+      _exit(reports().empty() ? 0 : 2);
+    }
+    children.push_back(child);
+  }
+  for (const pid_t child : children) {
+    int status = 0;
+    ASSERT_EQ(waitpid(child, &status, 0), child);
+    EXPECT_EQ(status, 0);
+  }
+  const auto defaults = this->defaults();
+  for (int process = 0; process < kProcesses; ++process) {
+    for (int i = 0; i < kChanges; ++i) {
+      EXPECT_EQ(defaults->stringForKey(std::to_string(process) + "-" + std::to_string(i)),
+                std::string_view(std::to_string(i)));
+    }
+  }
+  EXPECT_EQ(std::distance(fs::directory_iterator(folder_), {}), 1);
+}
+
+// In the child of a fork: what `inChild` returns, which is ended where it does not within a minute.
+int statusOfFork(const std::function<int()>& inChild) {
+  const pid_t child = fork();
+  if (child == 0) {
+    alarm(60);
+    _exit(inChild());
+  }
+  int status = -1;
+  waitpid(child, &status, 0);
+  return status;
+}
+
+// Used to wait in the child, for ever, for a call that a thread of the parent was making, and to call the
+// observer no more.
+TEST_F(UserDefaults, InAChildDoNotWaitForAThreadOfTheParent) {
+  const auto defaults = this->defaults();
+  std::counting_semaphore<> isCalled{0};
+  std::counting_semaphore<> mayReturn{0};
+  std::atomic<int> calls = 0;
+  const pid_t parent = getpid();
+  auto observation = defaults->observe("key", Notify::kOnChange, [&] {
+    ++calls;
+    if (getpid() != parent) return;
+    isCalled.release();
+    mayReturn.acquire();
+  });
+  std::thread setter([&] { defaults->setInteger(1, "key"); });
+  isCalled.acquire();
+  EXPECT_EQ(statusOfFork([&] {
+              calls = 0;
+              defaults->setInteger(2, "key");
+              const int callsInChild = calls;
+              observation.remove();
+              defaults->setInteger(3, "key");
+              return callsInChild == 1 && calls == 1 ? 0 : 1;
+            }),
+            0);
+  mayReturn.release(100);  // also for what the child has changed
+  setter.join();
+  observation.remove();
+}
+
+// Used to wait in the child, for ever, for itself.
+TEST_F(UserDefaults, MayBeForkedInAnObserver) {
+  const auto defaults = this->defaults();
+  const pid_t parent = getpid();
+  int status = -1;
+  rt::UserDefaults::Observation observation;
+  observation = defaults->observe("key", Notify::kOnChange, [&] {
+    if (getpid() != parent || defaults->integerForKey("key") != 1) return;
+    status = statusOfFork([&] {
+      observation.remove();
+      defaults->setInteger(2, "key");
+      return defaults->integerForKey("key") == 2 ? 0 : 1;
+    });
+  });
+  defaults->setInteger(1, "key");
+  EXPECT_EQ(status, 0);
+}
+
+// Invariant: a child reads, changes and is told whatever the threads of its parent were doing.
+TEST_F(UserDefaults, InAChildAreFreeOfWhatTheParentsThreadsHeld) {
+  const auto defaults = this->defaults();
+  std::atomic<bool> isEnding = false;
+  std::vector<std::thread> threads;
+  threads.emplace_back([&] {
+    for (int i = 0; !isEnding; ++i) defaults->setInteger(i, "key");
+  });
+  threads.emplace_back([&] {
+    while (!isEnding) defaults->integerForKey("key");
+  });
+  for (int i = 0; i < 30; ++i) {
+    const std::string key = "child " + std::to_string(i);
+    std::atomic<int> calls = 0;
+    const auto observation = defaults->observe(key, Notify::kOnChange, [&] { ++calls; });
+    EXPECT_EQ(statusOfFork([&] {
+                defaults->setInteger(7, key);
+                return calls == 1 && defaults->integerForKey(key) == 7 ? 0 : 1;
+              }),
+              0);
+  }
+  isEnding = true;
+  for (std::thread& thread : threads) thread.join();
+  for (int i = 0; i < 30; ++i) EXPECT_EQ(defaults->integerForKey("child " + std::to_string(i)), 7);
+}
+
+// Used to be watched no more, for as long as the process ran, once the system had refused.
+TEST_F(UserDefaultsOfOthers, AreToldOfAgainAfterTheSystemHasFailed) {
+  const auto defaults = this->defaults();
+  const auto observation = observe(defaults);
+  int replaced = 0;
+  const int nothing = open("/dev/null", O_RDONLY | O_CLOEXEC);
+  for (const fs::directory_entry& entry : fs::directory_iterator("/proc/self/fd")) {
+    std::error_code error;
+    if (fs::read_symlink(entry.path(), error) != "anon_inode:inotify") continue;
+    const int descriptor = std::stoi(entry.path().filename());
+    ASSERT_EQ(dup3(nothing, descriptor, O_CLOEXEC), descriptor);
+    ++replaced;
+  }
+  close(nothing);
+  ASSERT_GT(replaced, 0) << "the file is not watched";
+  // Either wakes the thread, which then finds that it cannot watch.
+  inShell(R"(echo 'key = 1' > "$1")", path());
+  await("1"_s);
+  inShell(R"(echo 'key = 2' > "$1")", path());
+  await("2"_s);
+  EXPECT_THAT(reports(), ElementsAre(HasSubstr("user defaults are not watched for changes until the system "
+                                               "allows it again: ")));
+}
+
+}  // namespace

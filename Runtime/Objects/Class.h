@@ -1,0 +1,203 @@
+#pragma once
+
+/// Classes and protocols. A protocol is an abstract class without data that names itself; a class names
+/// itself, its superclass and its protocols.
+///
+///     struct Clock : rt::Protocol<Clock> {
+///       virtual Time now() const = 0;
+///
+///      protected:
+///       ~Clock() = default;
+///     };
+///
+///     struct AlarmClock : rt::Protocol<AlarmClock, Clock> { ... };        // inherits Clock
+///
+///     class SystemClock : public rt::Implements<SystemClock, rt::Object, Clock> {
+///      public:
+///       Time now() const override;
+///     };
+///
+///     rt::Ref<rt::Object> object = rt::make<SystemClock>();               // Runtime/Objects/Ref.h
+///     if (Clock* clock = rt::cast<Clock>(object.get())) clock->now();
+///     rt::classNamed("SystemClock");                                      // Runtime/Objects/ClassInfo.h
+///
+/// A class is called as in the source, without the namespaces around it; likewise a protocol. One that
+/// is to be called otherwise, or whose name in the source is the compiler's choice (a template's
+/// arguments), says so:
+///
+///     static constexpr std::string_view kClassName = "SRLRegistry";       // kProtocolName
+///
+/// A class is known by name if the program anywhere makes an object of it or asks for its record, or if
+/// it has a virtual function that is neither pure nor inline (then by the source file that defines the
+/// first of these). A protocol is known by name if a known class conforms to it or the program asks for
+/// its record.
+///
+/// Not for: telling C++ types apart that are no objects. There is no virtual inheritance: a class that
+/// conforms to two protocols, both of which inherit a third, converts to the third by way of one of them.
+
+#include <concepts>
+#include <type_traits>
+
+#include "Runtime/Objects/ClassInfo.h"
+#include "Runtime/Objects/ClassRecord.h"
+#include "Runtime/Objects/Object.h"
+
+namespace rt {
+
+/// The root of all protocols: what leads from a protocol back to the object. Write
+/// `rt::Protocol<Self>`, never this.
+class AnyProtocol {
+ public:
+  /// The object that conforms to the protocol. Never null; not retained.
+  virtual Object* asObject() const noexcept = 0;
+
+  AnyProtocol(const AnyProtocol&) = delete;
+  AnyProtocol& operator=(const AnyProtocol&) = delete;
+
+ protected:
+  constexpr AnyProtocol() noexcept = default;
+  constexpr ~AnyProtocol() = default;
+};
+
+/// A class with a record of its own, that is `Object` or one that derives from `Implements<T, ...>`.
+/// A class that only inherits another's record is none: it would go by its superclass's name.
+template <class T>
+concept ClassType = std::derived_from<T, Object> && std::same_as<typename T::ClassSelf, std::remove_cv_t<T>>;
+
+/// A protocol: it derives from `Protocol<T>` or `Protocol<T, Inherited>`, and from no other protocol.
+template <class T>
+concept ProtocolType =
+    std::derived_from<T, AnyProtocol> && std::same_as<typename T::ProtocolSelf, std::remove_cv_t<T>>;
+
+/// The base of the protocol `Self`, which inherits the protocol `Inherited` where that is given.
+template <class Self, class Inherited = AnyProtocol>
+class Protocol : public Inherited {
+ public:
+  using ProtocolSelf = Self;
+  using ProtocolInherited = Inherited;
+
+ protected:
+  // Not private with `Self` as a friend: g++ would then take the destructor for accessible.
+  constexpr Protocol() noexcept = default;  // NOLINT(bugprone-crtp-constructor-accessibility)
+  constexpr ~Protocol() = default;
+};
+
+namespace detail {
+
+template <class Protocol, class... Protocols>
+consteval bool isBaseOfOneOnly() {
+  return (int{std::is_base_of_v<Protocol, Protocols>} + ...) == 1;
+}
+
+}  // namespace detail
+
+/// The base of the class `Self`: it derives from the class `Super` and conforms to `Protocols`, and
+/// to all that these inherit and `Super` conforms to. The constructors are those of `Super`.
+template <class Self, class Super, class... Protocols>
+class Implements : public Super, public Protocols... {
+ public:
+  using ClassSelf = Self;
+  using ClassSuper = Super;
+  static constexpr const ClassInfo& classRecord() noexcept {
+    return detail::ClassRecord<Self, Protocols...>::get();
+  }
+
+  const ClassInfo& classInfo() const noexcept override { return classRecord(); }
+  Object* asObject() const noexcept override { return const_cast<Implements*>(this); }
+
+ protected:
+  using Super::Super;
+  constexpr ~Implements() override = default;
+
+  static_assert(ClassType<Super>, "the superclass must be rt::Object or name itself by rt::Implements");
+  static_assert((ProtocolType<Protocols> && ...), "a protocol must name itself by rt::Protocol");
+  static_assert(!(std::is_base_of_v<Protocols, Super> || ...),
+                "the superclass conforms to one of these protocols already");
+  static_assert((detail::isBaseOfOneOnly<Protocols, Protocols...>() && ...),
+                "one of these protocols is named twice or inherited by another");
+
+ private:
+  friend Self;
+  constexpr Implements() = default;
+};
+
+/// The same for a class that adds no protocol.
+template <class Self, class Super>
+class Implements<Self, Super> : public Super {
+ public:
+  using ClassSelf = Self;
+  using ClassSuper = Super;
+  static constexpr const ClassInfo& classRecord() noexcept { return detail::ClassRecord<Self>::get(); }
+
+  const ClassInfo& classInfo() const noexcept override { return classRecord(); }
+
+ protected:
+  using Super::Super;
+  constexpr ~Implements() override = default;
+
+  static_assert(ClassType<Super>, "the superclass must be rt::Object or name itself by rt::Implements");
+
+ private:
+  friend Self;
+  constexpr Implements() = default;
+};
+
+/// The record of the class T.
+template <ClassType T>
+constexpr const ClassInfo& classInfo() noexcept {
+  return T::classRecord();
+}
+
+/// The record of the protocol T.
+template <ProtocolType T>
+constexpr const ProtocolInfo& protocolInfo() noexcept {
+  return detail::ProtocolRecord<std::remove_cv_t<T>>::get();
+}
+
+namespace detail {
+
+/// The object behind a pointer, not null, to a class or to a protocol.
+template <class T>
+Object* objectOf(const T* pointer) noexcept {
+  if constexpr (std::derived_from<T, Object>) {
+    return const_cast<T*>(pointer);
+  } else {
+    static_assert(std::derived_from<T, AnyProtocol>, "T must derive from rt::Object or be a protocol");
+    return pointer->asObject();
+  }
+}
+
+template <class From, class To>
+using CopyConst = std::conditional_t<std::is_const_v<From>, const To, To>;
+
+}  // namespace detail
+
+/// `from`, a pointer to an object or to one of its protocols, as a T, which is a class or a protocol;
+/// null where the object is none, and for null. Takes a few nanoseconds, allocates and locks nothing.
+/// The result is not retained.
+template <class T, class From>
+detail::CopyConst<From, T>* cast(From* from) noexcept {
+  static_assert(ClassType<T> || ProtocolType<T>, "rt::cast leads to a class or a protocol that names itself");
+  if (from == nullptr) return nullptr;
+  Object* object = detail::objectOf(from);
+  if constexpr (ClassType<T>) {
+    return object->isKindOf(classInfo<T>()) ? static_cast<T*>(object) : nullptr;
+  } else {
+    const Conformance* conformance = object->classInfo().conformance(protocolInfo<T>());
+    return conformance != nullptr ? static_cast<T*>(conformance->upcast(object)) : nullptr;
+  }
+}
+
+inline bool Object::isKindOf(const ClassInfo& other) const noexcept {
+  return classInfo().isSubclassOf(other);
+}
+
+inline bool Object::isMemberOf(const ClassInfo& other) const noexcept {
+  return &classInfo() == &other;
+}
+
+inline bool Object::conformsTo(const ProtocolInfo& protocol) const noexcept {
+  return classInfo().conformsTo(protocol);
+}
+
+}  // namespace rt

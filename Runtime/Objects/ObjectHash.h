@@ -1,0 +1,38 @@
+#pragma once
+
+/// Objects by their `isEqual` and `hash` in the standard library's tables, which may then be searched by
+/// pointer, without a reference.
+///
+///     std::unordered_set<rt::Ref<rt::Object>, rt::ObjectHash, rt::ObjectEqual> objects;
+///     objects.find(object.get());
+///
+/// Not for: objects by their identity, which is what std::hash and == of references go by.
+
+#include <cstddef>
+
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+
+namespace rt {
+
+struct ObjectHash {
+  using is_transparent = void;
+  std::size_t operator()(const Object* object) const { return object->hash(); }
+  std::size_t operator()(const Ref<Object>& object) const { return object->hash(); }
+};
+
+struct ObjectEqual {
+  using is_transparent = void;
+  bool operator()(const Object* first, const Object* second) const { return isEqual(first, second); }
+  bool operator()(const Ref<Object>& first, const Ref<Object>& second) const {
+    return isEqual(first.get(), second.get());
+  }
+  bool operator()(const Ref<Object>& first, const Object* second) const {
+    return isEqual(first.get(), second);
+  }
+  bool operator()(const Object* first, const Ref<Object>& second) const {
+    return isEqual(first, second.get());
+  }
+};
+
+}  // namespace rt

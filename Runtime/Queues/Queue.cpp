@@ -1,0 +1,304 @@
+#include "Runtime/Queues/Queue.h"
+
+#include <algorithm>
+#include <cstdio>
+#include <cstdlib>
+#include <exception>
+
+#include "Runtime/Queues/MainQueue.h"
+#include "Runtime/Queues/QueueRegistry.h"
+
+namespace rt {
+
+namespace {
+
+constexpr int kLowestRelativePriority = -15;
+
+constinit std::atomic<Queue::UncaughtExceptionHandler> uncaughtExceptionHandler = nullptr;
+
+void terminateForUncaughtException(const Queue& queue) noexcept {
+  const auto report = [&](const char* what) {
+    std::fprintf(stderr, "rt: an exception has left a task of the queue \"%.*s\": %s\n",
+                 static_cast<int>(queue.label().length()), queue.label().view().data(), what);
+    std::terminate();  // While the exception is being handled, so that it is seen there.
+  };
+  try {
+    throw;
+  } catch (const std::exception& exception) {
+    report(exception.what());
+  } catch (...) {
+    report("something that is no std::exception");
+  }
+}
+
+}  // namespace
+
+/// From when the calling thread has the queue to itself (isRunning_ is set) until it lets it go: the queue
+/// is the thread's current one.
+class Queue::RunningScope {
+ public:
+  RunningScope(Queue& queue, detail::TaskList batch) noexcept
+      : queue_(queue), batch_(batch), outer_(std::exchange(innermost_, this)) {}
+  ~RunningScope() {
+    innermost_ = outer_;
+    queue_.finish(*this);
+  }
+  RunningScope(const RunningScope&) = delete;
+  RunningScope& operator=(const RunningScope&) = delete;
+
+  static RunningScope* innermost() noexcept { return innermost_; }
+  RunningScope* outer() const noexcept { return outer_; }
+  Queue& queue() const noexcept { return queue_; }
+
+  /// The tasks to run next; the child of a fork forgets them.
+  detail::TaskList& batch() noexcept { return batch_; }
+
+  /// How many tasks have run and are not counted in the queue yet.
+  std::uint64_t& count() noexcept { return count_; }
+
+ private:
+  static constinit thread_local RunningScope* innermost_ [[gnu::tls_model("initial-exec")]];
+
+  Queue& queue_;
+  detail::TaskList batch_;
+  RunningScope* const outer_;
+  std::uint64_t count_ = 0;
+};
+
+constinit thread_local Queue::RunningScope* Queue::RunningScope::innermost_ = nullptr;
+
+Queue::Queue(String label, QualityOfService qualityOfService, int relativePriority)
+    : label_(label ? std::move(label) : ""_s),
+      qualityOfService_(qualityOfService),
+      relativePriority_(static_cast<std::int16_t>(std::clamp(relativePriority, kLowestRelativePriority, 0))) {
+  detail::QueueRegistry::add(*this);
+}
+
+Queue::~Queue() {
+  detail::QueueRegistry::remove(*this);
+}
+
+Ref<Queue> Queue::main() {
+  return &MainQueue::instance();
+}
+
+void Queue::enqueue(detail::Task& task) noexcept {
+  detail::QueueRegistry::runTasksAtExit();
+  // Known before the lock is let go, since the task may drop the last reference to the queue.
+  const QualityOfService qualityOfService = qualityOfService_;
+  const int relativePriority = relativePriority_;
+  lock_.lock();
+  const bool isStranded = isScheduled_ && !isRunning_ && isShortOfThreads();
+  const bool wantsSchedule = append(task);
+  lock_.unlock();
+  if (wantsSchedule) {
+    schedule();
+  } else if (isStranded) {
+    detail::WorkerPool::tryAgain(qualityOfService, relativePriority);
+  }
+}
+
+bool Queue::append(detail::Task& task) noexcept {
+  tasks_.append(task);
+  ++queuedCount_;
+  detail::QueueRegistry::wakeExit();
+  if (isRunning_ || isScheduled_) return false;
+  isScheduled_ = true;
+  retain();
+  return true;
+}
+
+detail::TaskList Queue::start() noexcept {
+  isRunning_ = true;
+  lastWaiter_ = nullptr;
+  return tasks_.takeAll();
+}
+
+void Queue::schedule() noexcept {
+  // From here on its tasks may run and drop the last reference to it.
+  detail::WorkerPool::schedule(*this, qualityOfService_, relativePriority_);
+  detail::QueueRegistry::wakeExit();  // There may be no thread for it.
+}
+
+void Queue::perform(detail::FunctionView function) {
+  if (isCurrent()) {
+    std::fprintf(stderr,
+                 "rt: sync on the queue \"%.*s\" from one of its own tasks, which would wait for itself\n",
+                 static_cast<int>(label_.length()), label_.view().data());
+    std::abort();
+  }
+  const bool mayRun = mayRunHere();
+  lock_.lock();
+  if (mayRun && !isRunning_) {
+    if (!isScheduled_) retain();
+    RunningScope scope(*this, start());
+    lock_.unlock();
+    runBatch(scope);
+    function();
+    return;
+  }
+  detail::SyncTask task(function);
+  const bool wantsSchedule = append(task);
+  if (mayRun) lastWaiter_ = &task;
+  lock_.unlock();
+  if (wantsSchedule) schedule();
+  if (task.wait() == detail::SyncTask::Outcome::kRan) return;
+  lock_.lock();
+  RunningScope scope(*this, tasks_.takeBefore(task));
+  lock_.unlock();
+  runBatch(scope);
+  ++scope.count();
+  function();
+}
+
+std::size_t Queue::runScheduled(const std::atomic<bool>* stop) noexcept {
+  lock_.lock();
+  if (!std::exchange(isScheduled_, false) || isRunning_) {
+    lock_.unlock();
+    return 0;
+  }
+  RunningScope scope(*this, start());
+  lock_.unlock();
+  return runBatch(scope, stop);
+}
+
+// Runs what is queued, unless some thread is at it. It stays scheduled, and so keeps its reference to itself.
+void Queue::runHere() noexcept {
+  const bool mayRun = mayRunHere();
+  lock_.lock();
+  if (!mayRun || isRunning_ || tasks_.isEmpty()) {
+    lock_.unlock();
+    return;
+  }
+  RunningScope scope(*this, start());
+  lock_.unlock();
+  runBatch(scope);
+}
+
+void Queue::runOnWorker() noexcept {
+  lock_.lock();
+  isScheduled_ = false;
+  if (isRunning_) {
+    lock_.unlock();
+    return;
+  }
+  RunningScope scope(*this, start());
+  lock_.unlock();
+  do {
+    runBatch(scope);
+  } while (takeMore(scope));
+}
+
+// NOLINTNEXTLINE(readability-make-member-function-const): it runs what the queue was given
+std::size_t Queue::runBatch(RunningScope& scope, const std::atomic<bool>* stop) noexcept {
+  std::size_t count = 0;
+  while (detail::Task* task = scope.batch().takeFirst()) {
+    // Counted before it runs: in the child of a fork, it is the parent's and no longer counted.
+    ++scope.count();
+    ++count;
+    try {
+      task->run();
+    } catch (...) {
+      const UncaughtExceptionHandler handler = uncaughtExceptionHandler.load(std::memory_order_acquire);
+      (handler != nullptr ? handler : terminateForUncaughtException)(*this);
+    }
+    if (stop != nullptr && stop->load(std::memory_order_relaxed)) break;
+  }
+  return count;
+}
+
+bool Queue::takeMore(RunningScope& scope) noexcept {
+  LockGuard guard(lock_);
+  if (tasks_.isEmpty()) return false;
+  // Other queues have their turn where threads are short, unless somebody waits for this one.
+  if (lastWaiter_ == nullptr && isShortOfThreads()) return false;
+  doneCount_ += std::exchange(scope.count(), 0);
+  scope.batch() = start();
+  detail::QueueRegistry::wakeExit();
+  return true;
+}
+
+void Queue::finish(RunningScope& scope) noexcept {
+  lock_.lock();
+  doneCount_ += scope.count();
+  detail::QueueRegistry::wakeExit();
+  tasks_.prepend(scope.batch());
+  if (tasks_.isEmpty()) {
+    isRunning_ = false;
+    const bool isIdle = !isScheduled_;
+    lock_.unlock();
+    if (isIdle) release();
+    return;
+  }
+  // A thread that waits goes on in place of this one: all workers may be waiting, and it needs none.
+  if (detail::SyncTask* waiter = std::exchange(lastWaiter_, nullptr)) {
+    lock_.unlock();
+    waiter->giveTurn();
+    return;
+  }
+  isRunning_ = false;
+  const bool wantsSchedule = !std::exchange(isScheduled_, true);
+  lock_.unlock();
+  if (wantsSchedule) schedule();
+}
+
+bool Queue::isCurrent() const noexcept {
+  for (RunningScope* scope = RunningScope::innermost(); scope != nullptr; scope = scope->outer()) {
+    if (&scope->queue() == this) return true;
+  }
+  return false;
+}
+
+void Queue::assertIsCurrent() const noexcept {
+  if (isCurrent()) return;
+  std::fprintf(stderr, "rt: outside of the tasks of the queue \"%.*s\"\n", static_cast<int>(label_.length()),
+               label_.view().data());
+  std::abort();
+}
+
+String Queue::currentLabel() noexcept {
+  const RunningScope* scope = RunningScope::innermost();
+  return scope != nullptr ? scope->queue().label() : ""_s;
+}
+
+Queue::UncaughtExceptionHandler Queue::setUncaughtExceptionHandler(
+    UncaughtExceptionHandler handler) noexcept {
+  return uncaughtExceptionHandler.exchange(handler, std::memory_order_acq_rel);
+}
+
+std::optional<std::uint64_t> Queue::exitGoal() noexcept {
+  if (isCurrent()) return std::nullopt;
+  LockGuard guard(lock_);
+  // In this order: a queue that is being made or destroyed at this moment is in the list, but has no tasks,
+  // and is not asked what only a whole one can answer.
+  if (doneCount_ == queuedCount_ || !mayRunHere()) return std::nullopt;
+  retain();  // It has a reference to itself until this lock is let go.
+  return queuedCount_;
+}
+
+bool Queue::hasReached(std::uint64_t goal) const noexcept {
+  LockGuard guard(lock_);
+  return doneCount_ >= goal;
+}
+
+bool Queue::isShortOfThreads() const noexcept {
+  return detail::WorkerPool::isShort(qualityOfService_, relativePriority_);
+}
+
+// Not analysed: there is no other thread. The tasks are the parent's and are forgotten, not destroyed. The
+// reference that a busy queue has to itself stays, if it was to be given up by a thread that is gone.
+void Queue::resetAfterFork() noexcept RT_NO_THREAD_SAFETY_ANALYSIS {
+  isRunning_ = isCurrent();
+  isScheduled_ = false;
+  tasks_ = {};
+  lastWaiter_ = nullptr;
+  queuedCount_ = 0;
+  doneCount_ = 0;
+  for (RunningScope* scope = RunningScope::innermost(); scope != nullptr; scope = scope->outer()) {
+    if (&scope->queue() != this) continue;
+    scope->batch() = {};
+    scope->count() = 0;
+  }
+}
+
+}  // namespace rt

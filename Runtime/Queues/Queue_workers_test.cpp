@@ -1,0 +1,315 @@
+// The threads that run the tasks of queues.
+
+#if !defined(__APPLE__)
+
+#include <gtest/gtest.h>
+#include <sys/prctl.h>
+#include <sys/resource.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <atomic>
+#include <chrono>
+#include <csignal>
+#include <cstddef>
+#include <cstdio>
+#include <cstdlib>
+#include <filesystem>
+#include <iterator>
+#include <latch>
+#include <string>
+#include <thread>
+#include <utility>
+#include <vector>
+
+#include "Runtime/Locks/ThreadIdentifier.h"
+#include "Runtime/Process/Thread.h"
+#include "Runtime/Queues/WorkerPool.h"
+#include "tests/ClockHook.h"
+#include "tests/QueueTest.h"
+#include "tests/Sanitizers.h"
+
+namespace {
+
+using namespace rt::literals;
+using rt::QualityOfService;
+using rt::Queue;
+using rt::Ref;
+
+std::ptrdiff_t threadCount() {
+  return std::distance(std::filesystem::directory_iterator("/proc/self/task"),
+                       std::filesystem::directory_iterator());
+}
+
+/// Lets idle workers end at once, and returns when there are none.
+void waitUntilWorkersHaveEnded() {
+  // Those that are asleep already have to be woken to see it.
+  rt::detail::WorkerPool::idleTimeout = 1;
+  while (threadCount() > 1) {
+    for (const auto qualityOfService : {QualityOfService::kDefault, QualityOfService::kUtility}) {
+      std::latch hasRun(1);
+      rt::make<Queue>("wake"_s, qualityOfService)->async([&] { hasRun.count_down(); });
+      hasRun.wait();
+    }
+    std::this_thread::yield();
+  }
+  rt::detail::WorkerPool::idleTimeout = std::chrono::nanoseconds(std::chrono::seconds(5)).count();
+}
+
+// More queues than there may be threads, all waiting for one queue that is busy. The thread that has kept
+// it busy leaves while no worker is free: so one of those that wait must go on.
+TEST_F(QueueTest, WaitingTasksDoNotNeedFreeThreads) {
+  constexpr int kQueues = 2 * rt::detail::WorkerPool::kMaximumThreads;
+  const Ref<Queue> shared = rt::make<Queue>("shared"_s);
+  std::atomic<int> started = 0;
+  int count = 0;
+  std::vector<Ref<Queue>> queues;
+  shared->sync([&] {
+    for (int i = 0; i < kQueues; ++i) {
+      queues.push_back(rt::make<Queue>("waiting"_s));
+      queues.back()->async([&] {
+        ++started;
+        shared->sync([&] { ++count; });
+      });
+    }
+    shared->async([&] { ++count; });
+    while (started < rt::detail::WorkerPool::kMaximumThreads) std::this_thread::yield();
+  });
+  for (const Ref<Queue>& queue : queues) queue->barrierSync();
+  EXPECT_EQ(count, kQueues + 1);
+}
+
+TEST_F(QueueTest, ThreadsEndWhenTheyHaveBeenIdle) {
+  if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer has a thread of its own";
+  queue_->async([] {});
+  queue_->barrierSync();
+  waitUntilWorkersHaveEnded();
+  int runs = 0;
+  for (int i = 0; i < 10; ++i) queue_->async([&] { ++runs; });
+  queue_->barrierSync();
+  EXPECT_EQ(runs, 10) << "there are new threads when they are needed";
+}
+
+/// What a worker queues at its next look at the clock, which is how it finds that it has been idle for too
+/// long.
+constinit thread_local Queue* queuedWhenIdle = nullptr;
+constinit std::atomic<bool> hasRunAfterwards = false;
+
+// Work that is given to a worker between the end of its wait and its leaving was lost with it. Here the
+// worker itself gives it, as it reads in the clock that its time is over.
+TEST_F(QueueDeathTest, AWorkerThatGetsWorkAsItsTimeEndsDoesIt) {
+  EXPECT_EXIT(
+      {
+        alarm(30);  // Instead of a hang.
+        rt::detail::WorkerPool::idleTimeout = 0;
+        clockHook = [](clockid_t /*clock*/, timespec& /*time*/) {
+          if (Queue* queue = std::exchange(queuedWhenIdle, nullptr))
+            queue->async([] { hasRunAfterwards = true; });
+        };
+        const Ref<Queue> other = rt::make<Queue>("other"_s);
+        queue_->async([&] { queuedWhenIdle = other.get(); });
+        while (!hasRunAfterwards) std::this_thread::yield();
+        _exit(0);
+      },
+      testing::ExitedWithCode(0), "");
+}
+
+TEST_F(QueueDeathTest, NoThreadStartsBeforeTheFirstAsync) {
+  EXPECT_EXIT(
+      {
+        const std::ptrdiff_t before = threadCount();
+        const Ref<Queue> queue = rt::make<Queue>("test"_s);
+        queue->sync([] {});
+        queue->barrierSync();
+        Queue::main()->async([] {});
+        _exit(threadCount() == before ? 0 : 1);
+      },
+      testing::ExitedWithCode(0), "");
+}
+
+TEST_F(QueueTest, WorkersTakeNoSignals) {
+  std::latch hasRun(1);
+  sigset_t blocked;
+  sigemptyset(&blocked);
+  queue_->async([&] {
+    pthread_sigmask(SIG_SETMASK, nullptr, &blocked);
+    hasRun.count_down();
+  });
+  hasRun.wait();
+  for (const int signal : {SIGINT, SIGTERM, SIGCHLD, SIGUSR1}) EXPECT_EQ(sigismember(&blocked, signal), 1);
+  sigset_t ofCaller;
+  pthread_sigmask(SIG_SETMASK, nullptr, &ofCaller);
+  EXPECT_EQ(sigismember(&ofCaller, SIGUSR1), 0) << "and the caller does as before";
+}
+
+// Blocked, they ended the process and its crash handler saw nothing.
+TEST_F(QueueDeathTest, FaultsOfATaskReachTheHostsHandler) {
+  for (const int signal : {SIGSEGV, SIGBUS, SIGFPE, SIGILL, SIGTRAP, SIGSYS}) {
+    EXPECT_EXIT(
+        {
+          std::signal(signal, [](int) { _exit(7); });
+          queue_->async([signal] {
+            std::raise(signal);
+            _exit(0);
+          });
+          for (;;) pause();
+        },
+        testing::ExitedWithCode(7), "");
+  }
+}
+
+TEST_F(QueueTest, WorkersDoNotBearTheNameOfWhoStartedThem) {
+  std::thread([&] {
+    rt::Thread::setCurrentName("Importer"_s);
+    const Ref<Queue> queue =
+        rt::make<Queue>("test"_s, QualityOfService::kBackground, -15);  // A worker of its own.
+    std::latch hasRun(1);
+    rt::String name = "untouched"_s;
+    char ofSystem[16] = "";
+    queue->async([&] {
+      name = rt::Thread::currentName();
+      prctl(PR_GET_NAME, ofSystem);
+      hasRun.count_down();
+    });
+    hasRun.wait();
+    EXPECT_TRUE(name.isNull()) << name.view();
+    EXPECT_STRNE(ofSystem, "Importer");
+  }).join();
+}
+
+TEST_F(QueueTest, NicenessFollowsClassAndRelativePriority) {
+  const int ofProcess = getpriority(PRIO_PROCESS, static_cast<id_t>(getpid()));
+  const struct {
+    QualityOfService qualityOfService;
+    int relativePriority;
+    int added;
+  } cases[] = {{QualityOfService::kUserInteractive, 0, 0}, {QualityOfService::kUserInitiated, 0, 0},
+               {QualityOfService::kDefault, 0, 0},         {QualityOfService::kDefault, -15, 5},
+               {QualityOfService::kUtility, 0, 5},         {QualityOfService::kUtility, -4, 6},
+               {QualityOfService::kBackground, 0, 10},     {QualityOfService::kBackground, -15, 15}};
+  for (const auto& each : cases) {
+    const Ref<Queue> queue = rt::make<Queue>("nice"_s, each.qualityOfService, each.relativePriority);
+    std::latch hasRun(1);
+    int ofTask = 0;
+    queue->async([&] {
+      ofTask = getpriority(PRIO_PROCESS, rt::currentThreadIdentifier());
+      hasRun.count_down();
+    });
+    hasRun.wait();
+    EXPECT_EQ(ofTask, std::min(19, ofProcess + each.added));
+  }
+}
+
+// A thread is as nice as the one that starts it, and may not become less so without a privilege: once a
+// background task had started a worker for urgent work, all urgent work was done as if in the background.
+TEST_F(QueueDeathTest, NicenessDoesNotSpreadFromTheBackground) {
+  EXPECT_EXIT(
+      {
+        if (geteuid() == 0 && setresuid(65534, 65534, 65534) != 0) _exit(1);
+        alarm(30);  // Instead of a hang.
+        const rlimit none{};
+        setrlimit(RLIMIT_NICE, &none);
+        rt::detail::WorkerPool::idleTimeout = std::chrono::nanoseconds(std::chrono::hours(1)).count();
+        const int ofProcess = getpriority(PRIO_PROCESS, static_cast<id_t>(getpid()));
+        const Ref<Queue> background = rt::make<Queue>("background"_s, QualityOfService::kBackground);
+        std::latch hasRun(1);
+        rt::ThreadIdentifier worker = 0;
+        background->async([&] {
+          queue_->async([&] {
+            worker = rt::currentThreadIdentifier();
+            hasRun.count_down();
+          });
+        });
+        hasRun.wait();
+        const std::string path = "/proc/self/task/" + std::to_string(worker);
+        while (std::filesystem::exists(path)) std::this_thread::yield();
+        queue_->async(
+            [&] { _exit(getpriority(PRIO_PROCESS, rt::currentThreadIdentifier()) == ofProcess ? 0 : 3); });
+        for (;;) pause();
+      },
+      testing::ExitedWithCode(0), "");
+}
+
+// Where the system refuses threads.
+class QueueWithoutThreadsDeathTest : public QueueTest {
+ protected:
+  void SetUp() override {
+    if (RT_TEST_THREAD_SANITIZER || RT_TEST_ADDRESS_SANITIZER) {
+      GTEST_SKIP() << "the sanitizers need more memory than a limit allows";
+    }
+  }
+};
+
+/// Has the system refuse threads: what memory there is stays, but a new stack is refused.
+class ThreadRefusal {
+ public:
+  ThreadRefusal() {
+    getrlimit(RLIMIT_AS, &before_);
+    rlimit limit = before_;
+    limit.rlim_cur = 1;
+    setrlimit(RLIMIT_AS, &limit);
+  }
+  ~ThreadRefusal() { setrlimit(RLIMIT_AS, &before_); }
+  ThreadRefusal(const ThreadRefusal&) = delete;
+  ThreadRefusal& operator=(const ThreadRefusal&) = delete;
+
+ private:
+  rlimit before_{};
+};
+
+TEST_F(QueueWithoutThreadsDeathTest, TasksWaitWhereTheSystemRefusesAThread) {
+  EXPECT_EXIT(
+      {
+        const Ref<Queue> queue = rt::make<Queue>("test"_s);
+        const Ref<Queue> other = rt::make<Queue>("other"_s);
+        std::latch haveRun(2);
+        std::atomic<bool> isRefused = true;
+        {
+          const ThreadRefusal refusal;
+          queue->async([&] {
+            if (isRefused) _exit(2);
+            haveRun.count_down();
+          });
+          isRefused = false;
+        }
+        other->async([&] { haveRun.count_down(); });
+        haveRun.wait();
+        _exit(0);
+      },
+      testing::ExitedWithCode(0), "");
+}
+
+// A queue that had once been refused a thread never asked again, and held its tasks until the process
+// exited.
+TEST_F(QueueWithoutThreadsDeathTest, AQueueThatWasRefusedAThreadAsksAgain) {
+  EXPECT_EXIT(
+      {
+        alarm(30);  // Instead of a hang.
+        std::latch haveRun(3);
+        {
+          const ThreadRefusal refusal;
+          for (int i = 0; i < 2; ++i) queue_->async([&] { haveRun.count_down(); });
+        }
+        queue_->async([&] { haveRun.count_down(); });
+        haveRun.wait();
+        _exit(0);
+      },
+      testing::ExitedWithCode(0), "");
+}
+
+TEST_F(QueueWithoutThreadsDeathTest, TasksRunBeforeTheProcessExitsAlsoWithoutThreads) {
+  EXPECT_EXIT(
+      {
+        static const ThreadRefusal refusal;
+        queue_->async([&] {
+          std::fprintf(stderr, "without a thread;");
+          queue_->async([] { std::fprintf(stderr, "and its task;"); });
+        });
+        std::exit(0);
+      },
+      testing::ExitedWithCode(0), "without a thread;and its task;");
+}
+
+}  // namespace
+
+#endif  // !defined(__APPLE__)

@@ -1,0 +1,397 @@
+// The system log against the machine's journald, run in a private root. The suite runs as root and as an
+// ordinary user. Where no journal is, and daemons that do not read, are in SystemLog_fallback_test.cpp and
+// SystemLog_stuck_test.cpp.
+
+#include "Runtime/SystemLog/SystemLog.h"
+
+#include <fcntl.h>
+#include <gmock/gmock.h>
+#include <gtest/gtest.h>
+#include <sys/socket.h>
+#include <sys/un.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <array>
+#include <atomic>
+#include <cerrno>
+#include <cstddef>
+#include <cstdint>
+#include <random>
+#include <set>
+#include <string>
+#include <thread>
+#include <vector>
+
+#include "Runtime/Locks/ThreadIdentifier.h"
+#include "tests/AllocationCount.h"
+#include "tests/PrivateJournal.h"
+#include "tests/PrivateRoot.h"
+#include "tests/Sanitizers.h"
+#include "tests/StandardErrorPipe.h"
+#include "tests/SystemLogTest.h"
+
+namespace {
+
+using namespace rt::literals;
+using testing::ElementsAre;
+using testing::IsEmpty;
+using Type = rt::SystemLog::Type;
+
+TEST_F(SystemLogTest, OpensNothingUntilTheFirstEntry) {
+  closeSockets();
+  PrivateJournal journal;
+  journal.start();
+  const rt::SystemLog log("com.example.test"_s, "unit"_s);
+  EXPECT_TRUE(log.isEnabled(Type::fault));
+  EXPECT_THAT(sockets(), IsEmpty());
+  log.write(Type::info, "first");
+  log.write(Type::info, "second");
+  const std::vector<int> opened = sockets();
+  ASSERT_EQ(opened.size(), 1U);
+  EXPECT_EQ(fcntl(opened[0], F_GETFD), FD_CLOEXEC);
+  EXPECT_THAT(messages(journal), ElementsAre("first", "second"));
+}
+
+TEST_F(SystemLogTest, HasEveryTypeEnabled) {
+  for (const Type type : {Type::debug, Type::info, Type::error, Type::fault}) {
+    EXPECT_TRUE(testLog().isEnabled(type));
+  }
+}
+
+TEST_F(SystemLogTest, WritesTheFieldsOfTheJournal) {
+  PrivateJournal journal;
+  journal.start();
+  for (const Type type : {Type::debug, Type::info, Type::error, Type::fault}) {
+    testLog().write(type, "h\xc3\xa9llo");
+  }
+  std::vector<PrivateJournal::Entry> entries = testEntries(journal);
+  ASSERT_EQ(entries.size(), 4U);
+  const std::array<const char*, 4> priorities = {"7", "6", "3", "2"};
+  for (std::size_t i = 0; i < entries.size(); ++i) {
+    EXPECT_EQ(entries[i]["PRIORITY"], priorities.at(i));
+    EXPECT_EQ(entries[i]["MESSAGE"], "h\xc3\xa9llo");
+    EXPECT_EQ(entries[i]["CATEGORY"], "unit");
+    EXPECT_EQ(entries[i]["SYSLOG_IDENTIFIER"], "SystemLog_test");
+    EXPECT_EQ(entries[i]["TID"], std::to_string(rt::currentThreadIdentifier()));
+    EXPECT_EQ(entries[i]["_PID"], std::to_string(getpid()));
+    EXPECT_EQ(entries[i]["_TRANSPORT"], "journal");
+    EXPECT_FALSE(entries[i].contains("DROPPED"));
+  }
+}
+
+TEST_F(SystemLogTest, TakesNullForEmptyAndLineFeedsEverywhere) {
+  PrivateJournal journal;
+  journal.start();
+  rt::SystemLog(nullptr, nullptr).write(Type::info, "nothing around it");
+  rt::SystemLog("a\nPRIORITY=0"_s, "b\n\nc"_s).write(Type::info, "");
+  std::vector<PrivateJournal::Entry> bare = journal.entries("SUBSYSTEM=");
+  ASSERT_EQ(bare.size(), 1U);
+  EXPECT_EQ(bare[0]["MESSAGE"], "nothing around it");
+  EXPECT_EQ(bare[0]["CATEGORY"], "");
+  std::vector<PrivateJournal::Entry> broken = journal.entries("SUBSYSTEM=a\nPRIORITY=0");
+  ASSERT_EQ(broken.size(), 1U);
+  EXPECT_EQ(broken[0]["PRIORITY"], "6");
+  EXPECT_EQ(broken[0]["CATEGORY"], "b\n\nc");
+  EXPECT_EQ(broken[0]["MESSAGE"], "");
+}
+
+TEST_F(SystemLogTest, KeepsEveryByteOfEveryValue) {
+  PrivateJournal journal;
+  journal.start();
+  std::string bytes;
+  for (int byte = 0; byte < 256; ++byte) bytes += static_cast<char>(byte);
+  std::string large;
+  while (large.size() < 200'000) large += bytes;
+  // More than a datagram holds.
+  const std::string huge(5'000'000, 'h');
+  const std::string hugeWithLines = huge + "\n" + bytes;
+  for (const std::string& text : {bytes, large, huge, hugeWithLines}) testLog().write(Type::info, text);
+  EXPECT_TRUE(messages(journal) == (std::vector<std::string>{bytes, large, huge, hugeWithLines}));
+  EXPECT_EQ(dropped(), 0U);
+}
+
+// The lengths at which values are no longer copied together, or no longer fit a datagram, and others.
+TEST_F(SystemLogTest, KeepsValuesOfAnyLength) {
+  PrivateJournal journal;
+  journal.start();
+  std::mt19937 random(20'260'731);
+  std::vector<std::string> sent;
+  const auto write = [&](std::size_t subsystemLength, std::size_t length) {
+    std::string text(length, 'x');
+    for (char& character : text) character = static_cast<char>(random());
+    const std::string subsystem = "com.example.test." + std::string(subsystemLength, 's');
+    rt::SystemLog(rt::String::fromUTF8(subsystem), "lengths"_s).write(Type::info, text);
+    sent.push_back(subsystem + '|' + text);
+  };
+  for (std::size_t length = 1600; length < 2100; length += 3) write(0, length);
+  for (std::size_t length = 1600; length < 2100; length += 7) write(length, 300);
+  for (std::size_t length = 212'200; length < 213'100; length += 60) write(0, length);
+  for (int i = 0; i < 100; ++i) write(random() % 3000, random() % 3000);
+  std::vector<std::string> kept;
+  for (PrivateJournal::Entry& entry : journal.entries("CATEGORY=lengths")) {
+    kept.push_back(entry["SUBSYSTEM"] + '|' + entry["MESSAGE"]);
+  }
+  EXPECT_EQ(kept.size(), sent.size());
+  EXPECT_TRUE(kept == sent);
+  EXPECT_EQ(dropped(), 0U);
+}
+
+TEST_F(SystemLogTest, AllocatesNothingWhereTheJournalListens) {
+  if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
+  PrivateJournal journal;
+  journal.start();
+  testLog().write(Type::info, "first");
+  const std::string large(10'000, 'l');
+  const AllocationCount count;
+  const rt::SystemLog log("com.example.test"_s, "unit"_s);
+  if (log.isEnabled(Type::info)) log.write(Type::info, "second");
+  log.write(Type::info, large);
+  EXPECT_EQ(count.allocations(), 0);
+  EXPECT_EQ(messages(journal).size(), 3U);
+}
+
+TEST_F(SystemLogTest, LeavesErrnoAlone) {
+  const StandardErrorPipe standardError;
+  errno = EDOM;
+  testLog().write(Type::info, "nobody listens");
+  EXPECT_EQ(errno, EDOM);
+  PrivateJournal journal;
+  journal.start();
+  errno = EDOM;
+  testLog().write(Type::info, "somebody listens");
+  EXPECT_EQ(errno, EDOM);
+}
+
+TEST_F(SystemLogTest, FindsAJournalThatWasStartedAnew) {
+  closeSockets();
+  PrivateJournal journal;
+  journal.start();
+  testLog().write(Type::info, "before");
+  EXPECT_THAT(messages(journal), ElementsAre("before"));
+  journal.stop();
+  {
+    StandardErrorPipe standardError;
+    testLog().write(Type::info, "between");
+    EXPECT_THAT(standardError.text(), testing::HasSubstr("between"));
+  }
+  journal.start();
+  testLog().write(Type::info, "after");
+  EXPECT_THAT(messages(journal), ElementsAre("before", "after"));
+  EXPECT_EQ(sockets().size(), 2U);  // of the journal and of the classic daemon, kept
+}
+
+TEST_F(SystemLogTest, LogsOnWhenTheProgramHasClosedItsDescriptors) {
+  closeSockets();
+  PrivateJournal journal;
+  journal.start();
+  testLog().write(Type::info, "before");
+  const std::vector<int> opened = sockets();
+  ASSERT_EQ(opened.size(), 1U);
+  close(opened[0]);
+  testLog().write(Type::info, "closed");
+  // What has taken the number is left alone: a file, a socket.
+  const int number = sockets().at(0);
+  ASSERT_EQ(dup2(STDOUT_FILENO, number), number);
+  testLog().write(Type::info, "a file");
+  close(number);
+  const int next = sockets().at(0);
+  const int foreign = socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0);
+  ASSERT_EQ(dup2(foreign, next), next);
+  testLog().write(Type::info, "a socket");
+  sockaddr_un peer{};
+  socklen_t length = sizeof peer;
+  EXPECT_EQ(getpeername(foreign, reinterpret_cast<sockaddr*>(&peer), &length), -1);
+  close(foreign);
+  close(next);
+  EXPECT_THAT(messages(journal), ElementsAre("before", "closed", "a file", "a socket"));
+}
+
+// Used to write the entry to whoever was at the other end of what had taken the number.
+TEST_F(SystemLogTest, WritesNothingToAConnectionThatTookItsNumber) {
+  closeSockets();
+  PrivateJournal journal;
+  journal.start();
+  testLog().write(Type::info, "before");
+  const int number = sockets().at(0);
+  std::array<int, 2> foreign{};
+  ASSERT_EQ(socketpair(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0, foreign.data()), 0);
+  ASSERT_EQ(dup2(foreign[0], number), number);
+  testLog().write(Type::info, "after");
+  std::array<char, 1024> bytes{};
+  EXPECT_EQ(recv(foreign[1], bytes.data(), bytes.size(), MSG_DONTWAIT), -1);
+  close(number);
+  close(foreign[0]);
+  close(foreign[1]);
+  EXPECT_THAT(messages(journal), ElementsAre("before", "after"));
+}
+
+TEST_F(SystemLogTest, NeverTakesTheNumberOfAStandardStream) {
+  closeSockets();
+  PrivateJournal journal;
+  journal.start();
+  const int kept = fcntl(STDIN_FILENO, F_DUPFD_CLOEXEC, 3);
+  close(STDIN_FILENO);
+  testLog().write(Type::info, "without standard input");
+  EXPECT_EQ(fcntl(STDIN_FILENO, F_GETFD), -1);
+  ASSERT_EQ(dup2(kept, STDIN_FILENO), STDIN_FILENO);
+  close(kept);
+  EXPECT_THAT(messages(journal), ElementsAre("without standard input"));
+}
+
+TEST_F(SystemLogTest, LogsOnInTheChildOfAFork) {
+  PrivateJournal journal;
+  journal.start();
+  testLog().write(Type::info, "parent");
+  const pid_t child = fork();
+  if (child == 0) {
+    testLog().write(Type::info, "child");
+    _exit(0);
+  }
+  int status = -1;
+  ASSERT_EQ(waitpid(child, &status, 0), child);
+  testLog().write(Type::info, "parent again");
+  std::vector<PrivateJournal::Entry> entries = testEntries(journal);
+  ASSERT_EQ(entries.size(), 3U);
+  EXPECT_EQ(entries[1]["MESSAGE"], "child");
+  EXPECT_EQ(entries[1]["_PID"], std::to_string(child));
+  EXPECT_EQ(entries[1]["TID"], std::to_string(child));
+  EXPECT_EQ(entries[2]["_PID"], std::to_string(getpid()));
+}
+
+// Invariant: a child logs whatever the threads of its parent were doing when it was forked.
+TEST_F(SystemLogTest, LogsOnInTheChildrenOfAProcessWhoseThreadsWrite) {
+  if (RT_TEST_THREAD_SANITIZER) {
+    GTEST_SKIP() << "the thread sanitizer's own locks may be held in the child of a fork";
+  }
+  PrivateJournal journal;
+  journal.start();
+  std::atomic<bool> isEnding = false;
+  std::atomic<std::uint64_t> sent = 0;
+  // So many for each child, or the journal has more than can be read again.
+  std::atomic<std::uint64_t> allowed = 0;
+  std::vector<std::thread> threads;
+  for (int thread = 0; thread < 3; ++thread) {
+    threads.emplace_back([&] {
+      while (!isEnding) {
+        if (sent >= allowed) {
+          std::this_thread::yield();
+          continue;
+        }
+        testLog().write(Type::info, "parent");
+        ++sent;
+      }
+    });
+  }
+  constexpr int kChildren = 20;
+  for (int i = 0; i < kChildren; ++i) {
+    allowed += 300;
+    const pid_t child = fork();
+    if (child == 0) {
+      const std::uint64_t before = rt::SystemLog::droppedCount();
+      for (int attempt = 0; attempt < 1000; ++attempt) {
+        const std::uint64_t count = rt::SystemLog::droppedCount();
+        testLog().write(Type::fault, "child");
+        if (rt::SystemLog::droppedCount() == count) _exit(before == 0 ? 0 : 1);
+        std::this_thread::yield();
+      }
+      _exit(2);
+    }
+    int status = -1;
+    ASSERT_EQ(waitpid(child, &status, 0), child);
+    EXPECT_EQ(status, 0);
+  }
+  isEnding = true;
+  for (std::thread& thread : threads) thread.join();
+  std::uint64_t ofParent = 0;
+  std::uint64_t ofChildren = 0;
+  for (const std::string& message : messages(journal)) ++(message == "child" ? ofChildren : ofParent);
+  EXPECT_EQ(ofChildren, kChildren);
+  EXPECT_EQ(ofParent + dropped(), sent);
+}
+
+// Invariant: every entry arrives once, and those of one thread in the order in which it wrote them, under
+// the thread's own number.
+TEST_F(SystemLogTest, IsUsedByAllThreadsAtOnce) {
+  PrivateJournal journal(PrivateJournal::Sockets::ownedByManager);
+  journal.start();
+  constexpr int kThreads = 8;
+  constexpr int kEntries = 250;
+  std::vector<std::thread> threads;
+  for (int thread = 0; thread < kThreads; ++thread) {
+    threads.emplace_back([thread] {
+      for (int i = 0; i < kEntries; ++i) {
+        const rt::SystemLog log("com.example.test"_s, "threads"_s);
+        log.write(Type::info, std::to_string(thread) + ' ' + std::to_string(i));
+      }
+    });
+  }
+  for (std::thread& thread : threads) thread.join();
+  std::array<int, kThreads> next{};
+  std::array<std::string, kThreads> identifiers;
+  std::uint64_t missing = 0;
+  for (PrivateJournal::Entry& entry : testEntries(journal)) {
+    std::size_t indexAt = 0;
+    const std::size_t thread = std::stoul(entry["MESSAGE"], &indexAt);
+    const int index = std::stoi(entry["MESSAGE"].substr(indexAt));
+    EXPECT_GE(index, next.at(thread));
+    missing += static_cast<std::uint64_t>(index - next.at(thread));
+    next.at(thread) = index + 1;
+    if (identifiers.at(thread).empty()) identifiers.at(thread) = entry["TID"];
+    EXPECT_EQ(entry["TID"], identifiers.at(thread));
+  }
+  // A machine that is too busy to run the daemon in time drops some, and says so.
+  for (const int index : next) missing += static_cast<std::uint64_t>(kEntries - index);
+  EXPECT_EQ(missing, dropped());
+  EXPECT_EQ(std::set<std::string>(identifiers.begin(), identifiers.end()).size(), kThreads);
+}
+
+// Invariant: what was written and what was counted as dropped is what was sent, although the daemon is
+// ended and started while threads write.
+TEST_F(SystemLogTest, AccountsForEveryEntryWhileTheJournalIsStartedAnew) {
+  PrivateJournal journal(PrivateJournal::Sockets::ownedByManager);
+  journal.start();
+  constexpr int kThreads = 8;
+  std::atomic<bool> isEnding = false;
+  std::atomic<std::uint64_t> sent = 0;
+  std::vector<std::thread> threads;
+  for (int thread = 0; thread < kThreads; ++thread) {
+    threads.emplace_back([&] {
+      while (!isEnding) {
+        testLog().write(Type::info, "while it restarts");
+        ++sent;
+        std::this_thread::yield();
+      }
+    });
+  }
+  for (int i = 0; i < 3; ++i) {
+    journal.stop();
+    // Until the socket is full and entries are dropped.
+    const std::uint64_t before = dropped();
+    while (dropped() == before) std::this_thread::yield();
+    journal.start();
+  }
+  isEnding = true;
+  for (std::thread& thread : threads) thread.join();
+  EXPECT_EQ(messages(journal).size() + dropped(), sent);
+  EXPECT_GT(messages(journal).size(), 0U);
+  // The socket is empty now, so that it takes what is left to tell.
+  testLog().write(Type::info, "after");
+  EXPECT_EQ(reportedDropped(journal), dropped());
+}
+
+}  // namespace
+
+int main(int argumentCount, char** arguments) {
+  testing::InitGoogleTest(&argumentCount, arguments);
+  if (testing::GTEST_FLAG(list_tests)) return RUN_ALL_TESTS();
+  try {
+    if (argumentCount > 1 && std::string_view(arguments[1]) == "--as-ordinary-user") {
+      PrivateRoot::becomeOrdinaryUser();
+    }
+    PrivateJournal::enter();
+  } catch (const std::exception& problem) {
+    refusal = std::string("no private journal: ") + problem.what();
+  }
+  return RUN_ALL_TESTS();
+}

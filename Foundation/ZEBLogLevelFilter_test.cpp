@@ -14,8 +14,8 @@
 #include "Foundation/ZEBLogger.h"
 #include "Runtime/Objects/Exception.h"
 #include "Runtime/Process/AssertionHandler.h"
-#include "tests/PrivateDefaults.h"
-#include "tests/Process.h"
+#include "tests/support/PrivateDefaults.h"
+#include "tests/support/Process.h"
 
 namespace {
 

@@ -14,7 +14,7 @@
 #include "Foundation/ZEBLogStandardFormatter.h"
 #include "Foundation/ZEBLogger.h"
 #include "Runtime/Defaults/UserDefaults.h"
-#include "tests/ZEBLoggerTest.h"
+#include "tests/support/ZEBLoggerTest.h"
 
 namespace {
 

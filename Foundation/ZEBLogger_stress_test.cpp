@@ -16,7 +16,7 @@
 #include "Foundation/ZEBLogAllowedLevelFilter.h"
 #include "Foundation/ZEBLogStandardFormatter.h"
 #include "Foundation/ZEBLogger.h"
-#include "tests/ZEBLoggerTest.h"
+#include "tests/support/ZEBLoggerTest.h"
 
 namespace {
 

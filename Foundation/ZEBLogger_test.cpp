@@ -19,7 +19,7 @@
 #include "Foundation/ZEBLogNoFilter.h"
 #include "Runtime/Process/CallStack.h"
 #include "Runtime/Text/Format.h"
-#include "tests/ZEBLoggerTest.h"
+#include "tests/support/ZEBLoggerTest.h"
 
 namespace {
 

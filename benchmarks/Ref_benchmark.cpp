@@ -10,7 +10,7 @@
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/Weak.h"
-#include "tests/TestClocks.h"
+#include "tests/support/TestClocks.h"
 
 namespace {
 

@@ -21,7 +21,7 @@
 
 #include "Comparison.h"
 #include "Runtime/SystemLog/SystemLog.h"
-#include "tests/PrivateJournal.h"
+#include "tests/support/PrivateJournal.h"
 
 namespace {
 

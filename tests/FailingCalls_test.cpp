@@ -27,14 +27,14 @@
 #include <thread>
 #include <vector>
 
-#include "PrivateJournal.h"
-#include "Process.h"
 #include "Runtime/Base/StandardError.h"
 #include "Runtime/Defaults/UserDefaults.h"
 #include "Runtime/Process/CallStack.h"
 #include "Runtime/Process/FileHandle.h"
 #include "Runtime/SystemLog/SystemLog.h"
-#include "Sanitizers.h"
+#include "tests/support/PrivateJournal.h"
+#include "tests/support/Process.h"
+#include "tests/support/Sanitizers.h"
 
 namespace {
 

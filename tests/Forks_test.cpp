@@ -28,9 +28,9 @@
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMLogNoFilter.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
-#include "tests/ForkTest.h"
-#include "tests/TestServices.h"
-#include "tests/ZEBLoggerTest.h"
+#include "tests/support/ForkTest.h"
+#include "tests/support/TestServices.h"
+#include "tests/support/ZEBLoggerTest.h"
 
 namespace {
 

@@ -34,23 +34,23 @@
 #include <thread>
 #include <vector>
 
-#include "ClockHook.h"
 #include "Foundation/ZEBFileHandleLogWriter.h"
 #include "Foundation/ZEBLogBasicFormatter.h"
 #include "Foundation/ZEBLogNoFilter.h"
 #include "Foundation/ZEBLogger.h"
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
-#include "PrivateJournal.h"
-#include "Process.h"
 #include "Runtime/Defaults/UserDefaults.h"
 #include "Runtime/SystemLog/SystemLog.h"
 #include "Shared/Logging/LUMLog.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
-#include "tests/ForkTest.h"
-#include "tests/Sanitizers.h"
-#include "tests/TestBindings.h"
-#include "tests/TestLoggers.h"
+#include "tests/support/ClockHook.h"
+#include "tests/support/ForkTest.h"
+#include "tests/support/PrivateJournal.h"
+#include "tests/support/Process.h"
+#include "tests/support/Sanitizers.h"
+#include "tests/support/TestBindings.h"
+#include "tests/support/TestLoggers.h"
 
 extern "C" std::size_t __sanitizer_get_current_allocated_bytes();
 

@@ -9,11 +9,9 @@
 #include <new>
 #include <string>
 
-#include "AllocationFailure.h"
 #include "Foundation/ZEBLoggerMacroHelpers.h"
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
 #include "Libraries/Util/ErrorHandler/PECReport.h"
-#include "PrivateDefaults.h"
 #include "Runtime/Objects/Exception.h"
 #include "Runtime/Queues/Queue.h"
 #include "Shared/Logging/LUMLog.h"
@@ -24,8 +22,10 @@
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMSystemLogger.h"
 #include "Shared/Logging/Shim/Classes/LUMLoggingReroutingZEBLogger.h"
-#include "TestLoggers.h"
-#include "WithoutMemory.h"
+#include "tests/support/AllocationFailure.h"
+#include "tests/support/PrivateDefaults.h"
+#include "tests/support/TestLoggers.h"
+#include "tests/support/WithoutMemory.h"
 
 namespace {
 

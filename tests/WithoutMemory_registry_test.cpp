@@ -10,7 +10,6 @@
 #include <string>
 #include <utility>
 
-#include "AllocationFailure.h"
 #include "Runtime/Archive/KeyedArchiver.h"
 #include "Runtime/Archive/KeyedUnarchiver.h"
 #include "Shared/Async/Provider/AVOProvider.h"
@@ -20,8 +19,9 @@
 #include "Shared/ServiceRegistry/Source/SRLProviderFromFunction.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "Shared/ServiceRegistry/Source/SRLScopeLifecycleDelegate.h"
-#include "TestReports.h"
-#include "WithoutMemory.h"
+#include "tests/support/AllocationFailure.h"
+#include "tests/support/TestReports.h"
+#include "tests/support/WithoutMemory.h"
 
 // The test is built twice, once with profiling.
 bool SRLPProfilingSwitch() {

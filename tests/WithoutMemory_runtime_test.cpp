@@ -16,8 +16,6 @@
 #include <thread>
 #include <vector>
 
-#include "AllocationFailure.h"
-#include "KeyedArchiverTest.h"
 #include "Runtime/Defaults/UserDefaults.h"
 #include "Runtime/Objects/Exception.h"
 #include "Runtime/Objects/Weak.h"
@@ -31,8 +29,10 @@
 #include "Runtime/Values/Dictionary.h"
 #include "Runtime/Values/Number.h"
 #include "Runtime/Values/Set.h"
-#include "Sanitizers.h"
-#include "WithoutMemory.h"
+#include "tests/support/AllocationFailure.h"
+#include "tests/support/KeyedArchiverTest.h"
+#include "tests/support/Sanitizers.h"
+#include "tests/support/WithoutMemory.h"
 
 namespace {
 

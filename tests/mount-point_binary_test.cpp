@@ -11,8 +11,8 @@
 #include <set>
 #include <sstream>
 
-#include "EnvironmentTrace.h"
-#include "Process.h"
+#include "tests/support/EnvironmentTrace.h"
+#include "tests/support/Process.h"
 
 namespace {
 

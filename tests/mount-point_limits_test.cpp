@@ -12,7 +12,7 @@
 #include <fstream>
 #include <sstream>
 
-#include "MountPointTest.h"
+#include "tests/support/MountPointTest.h"
 
 namespace {
 

@@ -11,7 +11,7 @@
 #include <filesystem>
 #include <fstream>
 
-#include "MountPointTest.h"
+#include "tests/support/MountPointTest.h"
 
 namespace {
 

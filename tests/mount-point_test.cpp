@@ -13,7 +13,7 @@
 #include <fstream>
 #include <sstream>
 
-#include "MountPointTest.h"
+#include "tests/support/MountPointTest.h"
 
 namespace {
 

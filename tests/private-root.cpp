@@ -8,7 +8,7 @@
 #include <cstdio>
 #include <exception>
 
-#include "PrivateRoot.h"
+#include "tests/support/PrivateRoot.h"
 
 int main(int argumentCount, char** arguments) {
   if (argumentCount < 2) {

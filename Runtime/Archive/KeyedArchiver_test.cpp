@@ -13,8 +13,8 @@
 #include "Runtime/Values/Array.h"
 #include "Runtime/Values/Dictionary.h"
 #include "Runtime/Values/Number.h"
-#include "tests/KeyedArchiverTest.h"
-#include "tests/PlistlibTest.h"
+#include "tests/support/KeyedArchiverTest.h"
+#include "tests/support/PlistlibTest.h"
 
 namespace {
 

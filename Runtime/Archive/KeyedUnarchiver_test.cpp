@@ -12,7 +12,7 @@
 #include "Runtime/Values/Array.h"
 #include "Runtime/Values/Dictionary.h"
 #include "Runtime/Values/Number.h"
-#include "tests/KeyedArchiverTest.h"
+#include "tests/support/KeyedArchiverTest.h"
 
 namespace {
 

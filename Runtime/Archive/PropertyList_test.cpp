@@ -10,7 +10,7 @@
 #include <limits>
 #include <random>
 
-#include "tests/PlistlibTest.h"
+#include "tests/support/PlistlibTest.h"
 
 namespace {
 

@@ -11,8 +11,8 @@
 #include <thread>
 #include <vector>
 
-#include "tests/AllocationCount.h"
-#include "tests/StandardErrorPipe.h"
+#include "tests/support/AllocationCount.h"
+#include "tests/support/StandardErrorPipe.h"
 
 namespace {
 

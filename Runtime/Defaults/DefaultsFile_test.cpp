@@ -23,7 +23,7 @@
 #include <vector>
 
 #include "Runtime/Base/FileDescriptor.h"
-#include "tests/ClockHook.h"
+#include "tests/support/ClockHook.h"
 
 namespace {
 

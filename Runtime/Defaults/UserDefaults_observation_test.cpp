@@ -14,8 +14,8 @@
 #include <vector>
 
 #include "Runtime/Objects/Weak.h"
-#include "tests/Sanitizers.h"
-#include "tests/UserDefaultsTest.h"
+#include "tests/support/Sanitizers.h"
+#include "tests/support/UserDefaultsTest.h"
 
 namespace {
 

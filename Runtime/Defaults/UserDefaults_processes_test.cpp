@@ -22,8 +22,8 @@
 #include <vector>
 
 #include "Runtime/Objects/Weak.h"
-#include "tests/Process.h"
-#include "tests/UserDefaultsTest.h"
+#include "tests/support/Process.h"
+#include "tests/support/UserDefaultsTest.h"
 
 namespace {
 

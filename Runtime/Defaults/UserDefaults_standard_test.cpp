@@ -13,9 +13,9 @@
 #include <system_error>
 
 #include "Runtime/Process/Bundle.h"
-#include "tests/PrivateRoot.h"
-#include "tests/Process.h"
-#include "tests/UserDefaultsTest.h"
+#include "tests/support/PrivateRoot.h"
+#include "tests/support/Process.h"
+#include "tests/support/UserDefaultsTest.h"
 
 namespace {
 

@@ -22,7 +22,7 @@
 #include <vector>
 
 #include "Runtime/Objects/Exception.h"
-#include "tests/UserDefaultsTest.h"
+#include "tests/support/UserDefaultsTest.h"
 
 namespace {
 

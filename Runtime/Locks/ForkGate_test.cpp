@@ -16,7 +16,7 @@
 #include <vector>
 
 #include "Runtime/Locks/UnfairLock.h"
-#include "tests/ForkTest.h"
+#include "tests/support/ForkTest.h"
 
 namespace {
 

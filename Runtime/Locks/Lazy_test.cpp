@@ -9,7 +9,7 @@
 
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"
-#include "tests/ForkTest.h"
+#include "tests/support/ForkTest.h"
 
 namespace {
 

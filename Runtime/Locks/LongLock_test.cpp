@@ -7,7 +7,7 @@
 #include <thread>
 
 #include "Runtime/Locks/ForkGate.h"
-#include "tests/ForkTest.h"
+#include "tests/support/ForkTest.h"
 
 namespace {
 

@@ -10,7 +10,7 @@
 #include <thread>
 #include <vector>
 
-#include "tests/ForkTest.h"
+#include "tests/support/ForkTest.h"
 
 namespace {
 

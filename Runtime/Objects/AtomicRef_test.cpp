@@ -10,8 +10,8 @@
 
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Weak.h"
-#include "tests/AllocationCount.h"
-#include "tests/ForkTest.h"
+#include "tests/support/AllocationCount.h"
+#include "tests/support/ForkTest.h"
 
 namespace {
 

@@ -9,8 +9,8 @@
 #include <thread>
 #include <vector>
 
-#include "AllocationCount.h"
 #include "Runtime/Objects/Weak.h"
+#include "tests/support/AllocationCount.h"
 
 namespace {
 

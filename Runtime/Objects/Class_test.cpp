@@ -7,10 +7,10 @@
 #include <type_traits>
 #include <vector>
 
-#include "AllocationCount.h"
 #include "Runtime/Objects/Ref.h"
-#include "tests/StandardErrorPipe.h"
-#include "tests/TestClocks.h"
+#include "tests/support/AllocationCount.h"
+#include "tests/support/StandardErrorPipe.h"
+#include "tests/support/TestClocks.h"
 
 namespace {
 

@@ -8,10 +8,10 @@
 #include <thread>
 #include <vector>
 
-#include "AllocationCount.h"
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
+#include "tests/support/AllocationCount.h"
 
 namespace {
 

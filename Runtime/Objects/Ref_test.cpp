@@ -10,8 +10,8 @@
 #include <utility>
 #include <vector>
 
-#include "AllocationCount.h"
-#include "tests/TestClocks.h"
+#include "tests/support/AllocationCount.h"
+#include "tests/support/TestClocks.h"
 
 namespace {
 

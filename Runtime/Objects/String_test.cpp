@@ -12,9 +12,9 @@
 #include <utility>
 #include <vector>
 
-#include "AllocationCount.h"
 #include "Runtime/Objects/StringBuilder.h"
 #include "Runtime/Objects/Weak.h"
+#include "tests/support/AllocationCount.h"
 
 namespace {
 

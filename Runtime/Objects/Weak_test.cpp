@@ -10,8 +10,8 @@
 #include <utility>
 #include <vector>
 
-#include "AllocationCount.h"
 #include "Runtime/Objects/Class.h"
+#include "tests/support/AllocationCount.h"
 
 namespace {
 

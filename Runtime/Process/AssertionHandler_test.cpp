@@ -9,7 +9,7 @@
 #include <vector>
 
 #include "Runtime/Objects/Exception.h"
-#include "tests/StandardErrorPipe.h"
+#include "tests/support/StandardErrorPipe.h"
 
 namespace {
 

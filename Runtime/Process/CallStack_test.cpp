@@ -17,8 +17,8 @@
 #include <regex>
 #include <thread>
 
-#include "tests/AllocationCount.h"
-#include "tests/Process.h"
+#include "tests/support/AllocationCount.h"
+#include "tests/support/Process.h"
 
 // The test program exports these, so that symbols() can name them. Each does something after its call, so
 // that none of them leaves its frame to the function that it calls.

@@ -18,7 +18,7 @@
 #include <thread>
 #include <vector>
 
-#include "tests/AllocationCount.h"
+#include "tests/support/AllocationCount.h"
 
 namespace {
 

@@ -8,7 +8,7 @@
 #include <semaphore>
 #include <thread>
 
-#include "tests/AllocationCount.h"
+#include "tests/support/AllocationCount.h"
 
 namespace {
 

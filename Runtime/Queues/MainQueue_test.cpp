@@ -15,7 +15,7 @@
 #include <vector>
 
 #include "Runtime/Locks/ThreadIdentifier.h"
-#include "tests/Sanitizers.h"
+#include "tests/support/Sanitizers.h"
 
 namespace {
 

@@ -21,7 +21,7 @@
 #include "Runtime/Locks/ThreadIdentifier.h"
 #include "Runtime/Queues/MainQueue.h"
 #include "Runtime/Queues/Queue.h"
-#include "tests/AllocationCount.h"
+#include "tests/support/AllocationCount.h"
 
 #if !defined(__APPLE__)
 #include <sys/resource.h>

@@ -14,8 +14,8 @@
 
 #include "Runtime/Queues/MainQueue.h"
 #include "Runtime/Queues/QueueRegistry.h"
-#include "tests/QueueTest.h"
-#include "tests/Sanitizers.h"
+#include "tests/support/QueueTest.h"
+#include "tests/support/Sanitizers.h"
 
 namespace {
 

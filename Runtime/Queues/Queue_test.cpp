@@ -14,7 +14,7 @@
 #include <vector>
 
 #include "Runtime/Objects/Weak.h"
-#include "tests/QueueTest.h"
+#include "tests/support/QueueTest.h"
 
 namespace {
 

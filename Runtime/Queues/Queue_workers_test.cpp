@@ -25,9 +25,9 @@
 #include "Runtime/Locks/ThreadIdentifier.h"
 #include "Runtime/Process/Thread.h"
 #include "Runtime/Queues/WorkerPool.h"
-#include "tests/ClockHook.h"
-#include "tests/QueueTest.h"
-#include "tests/Sanitizers.h"
+#include "tests/support/ClockHook.h"
+#include "tests/support/QueueTest.h"
+#include "tests/support/Sanitizers.h"
 
 namespace {
 

@@ -10,8 +10,8 @@
 #include <string_view>
 #include <vector>
 
-#include "tests/StandardErrorPipe.h"
-#include "tests/SystemLogTest.h"
+#include "tests/support/StandardErrorPipe.h"
+#include "tests/support/SystemLogTest.h"
 
 namespace {
 

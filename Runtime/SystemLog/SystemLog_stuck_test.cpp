@@ -20,9 +20,9 @@
 #include <string>
 #include <vector>
 
-#include "tests/ClockHook.h"
-#include "tests/StandardErrorPipe.h"
-#include "tests/SystemLogTest.h"
+#include "tests/support/ClockHook.h"
+#include "tests/support/StandardErrorPipe.h"
+#include "tests/support/SystemLogTest.h"
 
 namespace {
 

@@ -24,12 +24,12 @@
 #include <vector>
 
 #include "Runtime/Locks/ThreadIdentifier.h"
-#include "tests/AllocationCount.h"
-#include "tests/PrivateJournal.h"
-#include "tests/PrivateRoot.h"
-#include "tests/Sanitizers.h"
-#include "tests/StandardErrorPipe.h"
-#include "tests/SystemLogTest.h"
+#include "tests/support/AllocationCount.h"
+#include "tests/support/PrivateJournal.h"
+#include "tests/support/PrivateRoot.h"
+#include "tests/support/Sanitizers.h"
+#include "tests/support/StandardErrorPipe.h"
+#include "tests/support/SystemLogTest.h"
 
 namespace {
 

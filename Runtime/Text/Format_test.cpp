@@ -18,10 +18,10 @@
 #include <utility>
 #include <vector>
 
-#include "AllocationCount.h"
 #include "Runtime/Objects/StringBuilder.h"
 #include "Runtime/Values/Array.h"
 #include "Runtime/Values/Number.h"
+#include "tests/support/AllocationCount.h"
 
 // Formats are made up here.
 #pragma GCC diagnostic ignored "-Wformat-nonliteral"

@@ -14,7 +14,7 @@
 #include <thread>
 #include <vector>
 
-#include "tests/TestLoggers.h"
+#include "tests/support/TestLoggers.h"
 
 namespace {
 

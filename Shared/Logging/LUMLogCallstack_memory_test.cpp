@@ -10,7 +10,7 @@
 #include "Runtime/Process/CallStack.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
-#include "tests/Sanitizers.h"
+#include "tests/support/Sanitizers.h"
 
 // Whether malloc and its relatives fail too, where the C library lets a program bring its own.
 #if defined(__GLIBC__) && !RT_TEST_ADDRESS_SANITIZER && !RT_TEST_THREAD_SANITIZER

@@ -17,7 +17,7 @@
 #include "Shared/Logging/LUMLogLogicalOrFilter.h"
 #include "Shared/Logging/LUMLogMinimumLevelFilter.h"
 #include "Shared/Logging/LUMLogNoFilter.h"
-#include "tests/TestLoggers.h"
+#include "tests/support/TestLoggers.h"
 
 namespace {
 

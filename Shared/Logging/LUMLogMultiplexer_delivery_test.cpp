@@ -11,7 +11,7 @@
 #include <vector>
 
 #include "Shared/Logging/LUMLogDropAllFilter.h"
-#include "tests/LUMLogMultiplexerTest.h"
+#include "tests/support/LUMLogMultiplexerTest.h"
 
 namespace {
 

@@ -12,7 +12,7 @@
 #include <vector>
 
 #include "Runtime/Objects/Weak.h"
-#include "tests/LUMLogMultiplexerTest.h"
+#include "tests/support/LUMLogMultiplexerTest.h"
 
 namespace {
 

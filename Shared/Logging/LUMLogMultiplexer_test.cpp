@@ -17,8 +17,8 @@
 
 #include "Runtime/Queues/QualityOfService.h"
 #include "Shared/Logging/LUMLogNoFilter.h"
-#include "tests/AtEnd.h"
-#include "tests/LUMLogMultiplexerTest.h"
+#include "tests/support/AtEnd.h"
+#include "tests/support/LUMLogMultiplexerTest.h"
 
 namespace {
 

@@ -20,7 +20,7 @@
 #include "Shared/Logging/LUMLogMinimumLevelFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMLogNoFilter.h"
-#include "tests/TestLoggers.h"
+#include "tests/support/TestLoggers.h"
 
 namespace {
 

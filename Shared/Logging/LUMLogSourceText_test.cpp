@@ -7,7 +7,7 @@
 #include <thread>
 #include <vector>
 
-#include "tests/AllocationCount.h"
+#include "tests/support/AllocationCount.h"
 
 namespace {
 

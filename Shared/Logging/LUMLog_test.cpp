@@ -23,9 +23,9 @@
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
 #include "Shared/Logging/LUMSafeNumberParameter.h"
 #include "Shared/Logging/LUMSafeStringParameter.h"
-#include "tests/AllocationCount.h"
-#include "tests/FirstSymbol.h"
-#include "tests/TestLoggers.h"
+#include "tests/support/AllocationCount.h"
+#include "tests/support/FirstSymbol.h"
+#include "tests/support/TestLoggers.h"
 
 namespace {
 

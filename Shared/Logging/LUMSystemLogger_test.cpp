@@ -34,8 +34,8 @@
 #include "Shared/Logging/LUMLogDropAllFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMSystemLoggerFormatter.h"
-#include "tests/PrivateJournal.h"
-#include "tests/TestLoggers.h"
+#include "tests/support/PrivateJournal.h"
+#include "tests/support/TestLoggers.h"
 
 namespace {
 

@@ -1,6 +1,6 @@
 #include <gtest/gtest.h>
 
-#include "Process.h"
+#include "tests/support/Process.h"
 
 namespace {
 

@@ -14,7 +14,7 @@
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
 #include "Runtime/Objects/Exception.h"
 #include "Shared/Logging/LUMLog.h"
-#include "tests/PECErrorHandlerTest.h"
+#include "tests/support/PECErrorHandlerTest.h"
 
 namespace {
 

@@ -26,9 +26,9 @@
 #include "Shared/Logging/LUMLogMinimumLevelFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMSystemLogger.h"
-#include "tests/AtEnd.h"
-#include "tests/PECErrorHandlerTest.h"
-#include "tests/TestLoggers.h"
+#include "tests/support/AtEnd.h"
+#include "tests/support/PECErrorHandlerTest.h"
+#include "tests/support/TestLoggers.h"
 
 namespace {
 

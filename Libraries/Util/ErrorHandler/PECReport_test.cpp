@@ -23,7 +23,7 @@
 #include "Shared/Logging/LUMSafeNumberParameter.h"
 #include "Shared/Logging/LUMSafeStringParameter.h"
 #include "Shared/Logging/LUMSystemLogger.h"
-#include "tests/TestLoggers.h"
+#include "tests/support/TestLoggers.h"
 
 namespace {
 

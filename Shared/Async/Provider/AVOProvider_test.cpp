@@ -7,7 +7,7 @@
 
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Weak.h"
-#include "tests/TestReports.h"
+#include "tests/support/TestReports.h"
 
 namespace {
 

@@ -6,7 +6,7 @@
 #include <vector>
 
 #include "Runtime/Objects/Class.h"
-#include "tests/TestReports.h"
+#include "tests/support/TestReports.h"
 
 namespace {
 

@@ -7,8 +7,8 @@
 
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLProtocolType.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
-#include "tests/TestBindings.h"
-#include "tests/WholeReports.h"
+#include "tests/support/TestBindings.h"
+#include "tests/support/WholeReports.h"
 
 namespace {
 

@@ -13,8 +13,8 @@
 
 #include "Runtime/Queues/MainQueue.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
-#include "tests/TestBindings.h"
-#include "tests/WholeReports.h"
+#include "tests/support/TestBindings.h"
+#include "tests/support/WholeReports.h"
 
 namespace {
 

@@ -11,9 +11,9 @@
 #include <thread>
 
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
-#include "tests/TestBindings.h"
-#include "tests/TestLoggers.h"
-#include "tests/TestReports.h"
+#include "tests/support/TestBindings.h"
+#include "tests/support/TestLoggers.h"
+#include "tests/support/TestReports.h"
 
 namespace {
 

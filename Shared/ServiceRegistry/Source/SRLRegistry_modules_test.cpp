@@ -15,8 +15,8 @@
 #include <vector>
 
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
-#include "tests/TestBindings.h"
-#include "tests/WholeReports.h"
+#include "tests/support/TestBindings.h"
+#include "tests/support/WholeReports.h"
 
 namespace {
 

@@ -13,7 +13,7 @@
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationNewInstanceEvent.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLProfilingStorage.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
-#include "tests/TestServices.h"
+#include "tests/support/TestServices.h"
 
 bool SRLPProfilingSwitch() {
   return SWITCH_ANSWER;

@@ -9,7 +9,7 @@
 
 #include "Runtime/Locks/UnfairLock.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
-#include "tests/TestServices.h"
+#include "tests/support/TestServices.h"
 
 namespace {
 

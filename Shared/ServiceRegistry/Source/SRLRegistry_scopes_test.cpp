@@ -13,7 +13,7 @@
 #include "Runtime/Values/Number.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
-#include "tests/TestServices.h"
+#include "tests/support/TestServices.h"
 
 namespace {
 

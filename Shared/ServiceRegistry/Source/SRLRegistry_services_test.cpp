@@ -14,8 +14,8 @@
 #include "Runtime/Values/Number.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
-#include "tests/AllocationCount.h"
-#include "tests/TestServices.h"
+#include "tests/support/AllocationCount.h"
+#include "tests/support/TestServices.h"
 
 namespace {
 

@@ -13,8 +13,8 @@
 
 #include "Runtime/Locks/ThreadIdentifier.h"
 #include "Runtime/Queues/MainQueue.h"
-#include "tests/TestBindings.h"
-#include "tests/WholeReports.h"
+#include "tests/support/TestBindings.h"
+#include "tests/support/WholeReports.h"
 
 namespace {
 

@@ -19,7 +19,7 @@
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Ref.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
-#include "tests/TestReports.h"
+#include "tests/support/TestReports.h"
 
 namespace {
 

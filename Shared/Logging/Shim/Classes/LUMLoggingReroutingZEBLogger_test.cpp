@@ -21,7 +21,7 @@
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
-#include "tests/FirstSymbol.h"
+#include "tests/support/FirstSymbol.h"
 
 namespace {
 

@@ -18,9 +18,9 @@
 #include "Runtime/Objects/String.h"
 #include "Runtime/Objects/Weak.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScopeIvars.h"
-#include "tests/AllocationCount.h"
-#include "tests/TestFactories.h"
-#include "tests/TestReports.h"
+#include "tests/support/AllocationCount.h"
+#include "tests/support/TestFactories.h"
+#include "tests/support/TestReports.h"
 
 struct SRLMemoizingScopeTestAccess {
   static SRLMemoizingScopeIvars& ivars(const rt::Ref<SRLMemoizingScope>& scope) { return *scope->ivars_; }

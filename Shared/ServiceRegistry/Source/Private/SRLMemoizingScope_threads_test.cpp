@@ -17,7 +17,7 @@
 #include "Runtime/Objects/Block.h"
 #include "Runtime/Objects/Class.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope.h"
-#include "tests/TestFactories.h"
+#include "tests/support/TestFactories.h"
 
 namespace {
 

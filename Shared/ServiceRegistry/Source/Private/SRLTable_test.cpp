@@ -16,7 +16,7 @@
 #include <utility>
 #include <vector>
 
-#include "tests/AllocationCount.h"
+#include "tests/support/AllocationCount.h"
 
 namespace {
 

@@ -27,8 +27,8 @@
 #include "Runtime/Process/Thread.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLProfilingStorage.h"
-#include "tests/SRLPProfilingTest.h"
-#include "tests/TestReports.h"
+#include "tests/support/SRLPProfilingTest.h"
+#include "tests/support/TestReports.h"
 
 namespace {
 

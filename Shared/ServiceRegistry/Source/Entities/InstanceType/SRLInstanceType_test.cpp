@@ -18,7 +18,7 @@
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLMakeInstanceTypeContainer.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLProtocolType.h"
-#include "tests/TestReports.h"
+#include "tests/support/TestReports.h"
 
 namespace {
 

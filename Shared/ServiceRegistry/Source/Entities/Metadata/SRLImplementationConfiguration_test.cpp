@@ -8,7 +8,7 @@
 
 #include "Runtime/Objects/Class.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
-#include "tests/TestReports.h"
+#include "tests/support/TestReports.h"
 
 namespace {
 

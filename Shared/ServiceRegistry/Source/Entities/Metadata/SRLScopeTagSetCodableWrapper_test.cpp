@@ -20,8 +20,8 @@
 #include "Runtime/Values/Array.h"
 #include "Runtime/Values/Number.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTag.h"
-#include "tests/PlistlibTest.h"
-#include "tests/TestReports.h"
+#include "tests/support/PlistlibTest.h"
+#include "tests/support/TestReports.h"
 
 namespace {
 

@@ -14,8 +14,8 @@
 #include "Runtime/Objects/Weak.h"
 #include "Runtime/Values/Number.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTag.h"
-#include "tests/AllocationCount.h"
-#include "tests/TestReports.h"
+#include "tests/support/AllocationCount.h"
+#include "tests/support/TestReports.h"
 
 namespace {
 

@@ -12,7 +12,7 @@
 #include <vector>
 
 #include "Shared/Logging/LUMLogMultiplexer.h"
-#include "tests/TestLoggers.h"
+#include "tests/support/TestLoggers.h"
 
 // A system logger that writes nowhere.
 class TestSystemLogger final : public rt::Implements<TestSystemLogger, LUMSystemLogger> {

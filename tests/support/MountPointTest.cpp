@@ -1,4 +1,4 @@
-#include "MountPointTest.h"
+#include "tests/support/MountPointTest.h"
 
 #include <unistd.h>
 

@@ -1,4 +1,4 @@
-#include "EnvironmentTrace.h"
+#include "tests/support/EnvironmentTrace.h"
 
 #include <fcntl.h>
 #include <sys/ptrace.h>
@@ -14,7 +14,7 @@
 #include <sstream>
 #include <stdexcept>
 
-#include "Process.h"
+#include "tests/support/Process.h"
 
 namespace {
 

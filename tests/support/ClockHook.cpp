@@ -1,4 +1,4 @@
-#include "ClockHook.h"
+#include "tests/support/ClockHook.h"
 
 #include <sys/syscall.h>
 #include <unistd.h>

@@ -1,4 +1,4 @@
-#include "AllocationFailure.h"
+#include "tests/support/AllocationFailure.h"
 
 #include <atomic>
 #include <cerrno>
@@ -7,8 +7,8 @@
 #include <limits>
 #include <new>
 
-#include "AllocationCount.h"
-#include "Sanitizers.h"
+#include "tests/support/AllocationCount.h"
+#include "tests/support/Sanitizers.h"
 
 namespace {
 

@@ -1,11 +1,11 @@
-#include "AllocationCount.h"
+#include "tests/support/AllocationCount.h"
 
 #include <atomic>
 #include <cerrno>
 #include <cstddef>
 #include <cstdlib>
 
-#include "AllocationFailure.h"
+#include "tests/support/AllocationFailure.h"
 
 namespace {
 

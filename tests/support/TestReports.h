@@ -23,7 +23,7 @@
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMSafeParameter.h"
 #include "Shared/Logging/LUMSystemLogger.h"
-#include "tests/TestLoggers.h"
+#include "tests/support/TestLoggers.h"
 
 class TestReports {
  public:

@@ -25,7 +25,7 @@
 #include <string>
 #include <vector>
 
-#include "tests/Process.h"
+#include "tests/support/Process.h"
 
 class PlistlibTest : public testing::Test {
  protected:

@@ -1,4 +1,4 @@
-#include "PrivateJournal.h"
+#include "tests/support/PrivateJournal.h"
 
 #include <fcntl.h>
 #include <spawn.h>
@@ -20,8 +20,8 @@
 #include <string_view>
 #include <system_error>
 
-#include "PrivateRoot.h"
-#include "Process.h"
+#include "tests/support/PrivateRoot.h"
+#include "tests/support/Process.h"
 
 namespace {
 

@@ -18,7 +18,7 @@
 
 #include "Foundation/ZEBFileHandleLogWriter.h"
 #include "Foundation/ZEBLogger.h"
-#include "tests/PrivateDefaults.h"
+#include "tests/support/PrivateDefaults.h"
 
 // NOLINTNEXTLINE(bugprone-throwing-static-initialization): then there is nothing to test with
 inline const PrivateDefaults privateDefaults;

@@ -1,4 +1,4 @@
-#include "PrivateRoot.h"
+#include "tests/support/PrivateRoot.h"
 
 #include <fcntl.h>
 #include <grp.h>

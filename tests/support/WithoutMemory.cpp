@@ -1,4 +1,4 @@
-#include "WithoutMemory.h"
+#include "tests/support/WithoutMemory.h"
 
 #include <gtest/gtest.h>
 #include <sys/wait.h>
@@ -11,11 +11,11 @@
 #include <new>
 #include <thread>
 
-#include "AllocationCount.h"
-#include "AllocationFailure.h"
 #include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Queues/WorkerPool.h"
-#include "Sanitizers.h"
+#include "tests/support/AllocationCount.h"
+#include "tests/support/AllocationFailure.h"
+#include "tests/support/Sanitizers.h"
 
 #if RT_TEST_ADDRESS_SANITIZER
 #include <sanitizer/lsan_interface.h>

@@ -20,7 +20,7 @@
 #include "Shared/Logging/LUMLogLevel.h"
 #include "Shared/Logging/LUMLogMessage.h"
 #include "Shared/Logging/LUMSafeStringParameter.h"
-#include "tests/TestReports.h"
+#include "tests/support/TestReports.h"
 
 struct WholeReport {
   std::string file;

@@ -16,8 +16,8 @@
 #include <vector>
 
 #include "Runtime/SystemLog/SystemLog.h"
-#include "tests/PrivateJournal.h"
-#include "tests/StandardErrorPipe.h"
+#include "tests/support/PrivateJournal.h"
+#include "tests/support/StandardErrorPipe.h"
 
 inline constexpr const char* kJournalSocket = "/run/systemd/journal/socket";
 inline constexpr const char* kClassicSocket = "/dev/log";

@@ -9,8 +9,8 @@
 #include <string_view>
 #include <vector>
 
-#include "PrivateRoot.h"
-#include "Process.h"
+#include "tests/support/PrivateRoot.h"
+#include "tests/support/Process.h"
 
 /// Throws std::system_error with `errno` where a call has not succeeded.
 void require(bool succeeded);

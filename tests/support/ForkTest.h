@@ -11,7 +11,7 @@
 #include <thread>
 
 #include "Runtime/Base/ThreadSafety.h"
-#include "Sanitizers.h"
+#include "tests/support/Sanitizers.h"
 
 #if defined(__APPLE__)
 #define RT_TEST_IS_APPLE 1

@@ -16,8 +16,8 @@
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
-#include "tests/TestReports.h"
-#include "tests/WholeReports.h"
+#include "tests/support/TestReports.h"
+#include "tests/support/WholeReports.h"
 
 namespace TestServices {
 

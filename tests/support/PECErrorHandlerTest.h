@@ -12,7 +12,7 @@
 #include "Shared/Logging/LUMLogDropAllFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMSystemLogger.h"
-#include "tests/TestLoggers.h"
+#include "tests/support/TestLoggers.h"
 
 // The face of the banner, by its characters.
 inline constexpr const char* kFace = "\x3c\x28\xe2\x80\xa2\xcc\x80\x5f\xe2\x80\xa2\xcc\x81\x29\x3e";

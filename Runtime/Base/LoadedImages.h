@@ -30,7 +30,7 @@ void keepImage(const ImageState& state) noexcept;
 bool areAllImagesAnnounced() noexcept;
 
 /// Runs the load hooks announced so far if every image has announced what it has. Called by each image
-/// when it is done.
+/// when it is done. Defined where load hooks are kept (Runtime/Objects/LoadHook.cpp).
 void runLoadHooksWhenComplete() noexcept;
 
 }  // namespace rt::detail

@@ -67,7 +67,6 @@ class PropertyList {
   struct Value : std::variant<bool, std::int64_t, std::uint64_t, double, Date, Data, Text, Reference, Array,
                               Dictionary> {
     using variant::variant;
-    Value() = default;
     Value(Value&&) noexcept = default;
     Value& operator=(Value&&) noexcept = default;
   };

@@ -286,7 +286,7 @@ std::shared_ptr<SystemFileWatch> DefaultsStore::renewedWatch() noexcept {
     try {
       watch_ = std::make_shared<SystemFileWatch>(file_.path());
       return watch_;
-    } catch (const std::exception&) {  // NOLINT(bugprone-empty-catch): it has been reported; try again.
+    } catch (const std::exception&) {  // NOLINT(bugprone-empty-catch): reported when it began; try again.
     }
   }
 }

@@ -3,9 +3,12 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/resource.h>
+#include <unistd.h>
 
 #include <atomic>
+#include <cstddef>
 #include <cstdint>
+#include <fstream>
 #include <memory>
 #include <stdexcept>
 #include <string>
@@ -150,6 +153,44 @@ TEST_F(UserDefaults, PassExceptionsOfObserversOn) {
 }
 
 // Invariant: what has been removed is not running and never runs again.
+// Whether a thread of this process waits in the system.
+bool isAsleep(pid_t thread) {
+  std::ifstream file("/proc/self/task/" + std::to_string(thread) + "/stat");
+  std::string text;
+  std::getline(file, text);
+  const std::size_t name = text.rfind(") ");
+  return name != std::string::npos && text.substr(name + 2, 1) == "S";
+}
+
+// Who removes an observer may then destroy what the observer uses.
+TEST_F(UserDefaults, RemovalWaitsForAnObserverThatRuns) {
+  const auto defaults = this->defaults();
+  std::atomic<bool> isRunning = false;
+  std::atomic<bool> mayEnd = false;
+  std::atomic<bool> hasEnded = false;
+  auto observation = defaults->observe("key", Notify::kOnChange, [&] {
+    isRunning = true;
+    isRunning.notify_all();
+    mayEnd.wait(false);
+    hasEnded = true;
+  });
+  std::thread changer([&] { defaults->setInteger(1, "key"); });
+  isRunning.wait(false);
+  std::atomic<pid_t> remover = 0;
+  std::atomic<bool> isRemoved = false;
+  std::thread other([&] {
+    remover = gettid();
+    observation.remove();
+    EXPECT_TRUE(hasEnded);
+    isRemoved = true;
+  });
+  while (!isRemoved && (remover == 0 || !isAsleep(remover))) std::this_thread::yield();
+  mayEnd = true;
+  mayEnd.notify_all();
+  other.join();
+  changer.join();
+}
+
 TEST_F(UserDefaults, ConcurrentRemovalIsFinal) {
   const auto defaults = this->defaults();
   std::atomic<bool> isDone = false;

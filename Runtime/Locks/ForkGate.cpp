@@ -97,6 +97,7 @@ void pauseFork(int look) noexcept {
 // handlers, and those for the end of threads, as long as the process lives.
 template struct AnnouncedOnLoading<handlers>;
 
+// Called on macOS alone: on Linux, locks are freed in the child.
 void ForkGate::pass() noexcept {
   for (;;) {
     enter();

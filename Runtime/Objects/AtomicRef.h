@@ -96,7 +96,7 @@ class AtomicRef {
     while (objectIn(word) == &object && lentIn(word) >= count) {
       if (word_.compare_exchange_weak(word, word - count, std::memory_order_relaxed)) return;
     }
-    object.releaseTimes(count);  // Another reader has, or it was replaced.
+    object.releaseTimes(count);  // Meanwhile another reader has, or it was replaced: seldom seen.
   }
 
   mutable std::atomic<Word> word_ = 0;

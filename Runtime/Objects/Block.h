@@ -77,7 +77,7 @@ template <class Function, class Result, class... Arguments>
 class ConstantBlock final : public BlockBody<Result, Arguments...> {
  public:
   constexpr ConstantBlock() noexcept : BlockBody<Result, Arguments...>(Object::Immortal()) {}
-  constexpr ~ConstantBlock() override {}  // NOLINT(modernize-use-equals-default): g++ needs it written out
+  constexpr ~ConstantBlock() override {}  // NOLINT(modernize-use-equals-default): g++ needs it; never called
 
   Result call(Arguments... arguments) const override {
     return static_cast<Result>(Function()(std::forward<Arguments>(arguments)...));

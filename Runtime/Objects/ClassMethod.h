@@ -94,6 +94,7 @@ struct [[gnu::visibility("default")]] AddedClassMethod {
  private:
   static ClassMethod method() { return {selector.view(), function}; }
 
+  // Never called: what it mentions is there once it is instantiated.
   static void mention() { static_cast<void>(&detail::AnnouncedOnLoading<entry_>::run); }
 
   static constinit detail::ClassMethodEntry entry_;

@@ -42,6 +42,7 @@ struct [[gnu::visibility("default")]] LoadHook {
  private:
   static void run() { Class::load(); }
 
+  // Never called: what it mentions is there once it is instantiated.
   static void mention() {
     static_cast<void>(&detail::AnnouncedOnLoading<entry_>::run);
     static_cast<void>(classInfo<Class>());

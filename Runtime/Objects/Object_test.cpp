@@ -178,6 +178,13 @@ TEST(Object, IsDescribedByClassAndAddress) {
   EXPECT_EQ(point->description(), std::string_view(expected));
 }
 
+class Unnamed final : public rt::Object {};
+
+TEST(Object, HasTheRecordOfItsSuperclassWhereItHasNone) {
+  const Unnamed object;
+  EXPECT_EQ(&object.classInfo(), &rt::classInfo<rt::Object>());
+}
+
 TEST(Object, IsNeitherCountedNorDestroyedAsAConstant) {
   char bytes[sizeof(Constant)];
   std::memcpy(bytes, static_cast<const void*>(&kConstant), sizeof bytes);

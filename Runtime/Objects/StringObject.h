@@ -66,6 +66,7 @@ class RT_VISIBLE StringObject final : public Implements<StringObject, Object> {
 
  private:
   static void* operator new(std::size_t size, std::size_t length);
+  // Never called, since the constructors do not throw.
   static void operator delete(void* memory, std::size_t length) noexcept;
 
   explicit StringObject(std::size_t length) noexcept

@@ -97,6 +97,7 @@ String symbol(std::size_t number, std::uint64_t address, detail::SymbolTables& t
   }
   if (address != 0 && function.empty()) {
     if (std::optional<detail::SymbolTables::Symbol> symbol = tables.find(call)) {
+      // In a program that is linked statically, of which `dladdr` knows nothing.
       if (imageStart == 0) {
         image =
             symbol->image.empty() ? std::string(Process::name().view()) : lastElement(symbol->image.c_str());

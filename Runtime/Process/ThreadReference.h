@@ -39,8 +39,8 @@ class ThreadReference {
   }
 
  private:
-  // By a key of the thread library: for the destructor of a variable the C library needs memory, and ends the
-  // program where there is none.
+  // By a key of the thread library, which refuses where there is no memory: for the destructor of a variable
+  // the C library needs some, too, and ends the program where there is none.
   static void giveUpAtEnd() {
     static constinit Lazy<pthread_key_t> shared;
     const pthread_key_t key = shared.get([] {

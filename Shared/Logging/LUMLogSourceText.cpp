@@ -55,6 +55,7 @@ Found find(const char* text) noexcept {
       return {string, nullptr};
     }
   }
+  // Other texts have all of its places, of which a half is free when the most are kept.
   return {};
 }
 

@@ -105,6 +105,7 @@ void keepImage(const ImageState& state) noexcept {
   auto* const open = reinterpret_cast<Open*>(dlsym(RTLD_DEFAULT, "dlopen"));
   // The handle is kept, so that nobody's is the last one.
   if (open != nullptr && open(image.name, RTLD_LAZY | RTLD_NOLOAD | RTLD_NODELETE) != nullptr) return;
+  // The image is loaded, so that the loader refuses nothing but what has no memory.
   std::fprintf(stderr, "rt: \"%s\" cannot be kept from being unloaded; it must not be closed\n", image.name);
 }
 

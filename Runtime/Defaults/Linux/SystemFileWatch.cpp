@@ -66,7 +66,7 @@ void SystemFileWatch::arm() {
 bool SystemFileWatch::wait() {
   std::array<pollfd, 2> ready{{{events_.get(), POLLIN, 0}, {wake_.get(), POLLIN, 0}}};
   while (poll(ready.data(), ready.size(), -1) < 0) {
-    if (errno != EINTR) fail("poll");
+    if (errno != EINTR) fail("poll");  // The system has no memory.
   }
   if (isStopped_.load(std::memory_order_relaxed)) return false;
   // What has happened matters less than that something has: all of it is taken, and the file looked at.

@@ -24,7 +24,7 @@ int WakeDescriptor::open() {
   const int opened = newEvent();
   if (opened < 0)
     throw std::system_error(errno, std::generic_category(), "rt: no descriptor for the main queue");
-  if (!readEnd_.compare_exchange_strong(descriptor, opened)) {
+  if (!readEnd_.compare_exchange_strong(descriptor, opened)) {  // Another thread was faster.
     close(opened);
     return descriptor;
   }

@@ -51,7 +51,7 @@ class IdleWorker {
     }
     const auto start = std::chrono::steady_clock::now();
     for (;;) {
-      if (timeout == nullptr) {
+      if (timeout == nullptr) {  // Somebody is just telling it.
         waitAtAddress(state_, kAsleep);
       } else {
         const std::chrono::nanoseconds left = *timeout - (std::chrono::steady_clock::now() - start);
@@ -89,7 +89,7 @@ class Level {
 
   void tryAgain() noexcept {
     lock_.lock();
-    if (ready_.isEmpty()) {
+    if (ready_.isEmpty()) {  // A worker has become free meanwhile.
       lock_.unlock();
     } else {
       addThread();
@@ -136,6 +136,7 @@ class Level {
       lock_.unlock();
       return work;
     }
+    // In an ordinary user's process, whose threads the system refuses to make less nice.
     if (!mayBeIdle) {
       --threadCount_;
       lock_.unlock();

@@ -105,6 +105,7 @@ bool writeAll(int file, std::span<iovec> pieces) noexcept {
       written -= pieces.front().iov_len;
       pieces = pieces.subspan(1);
     }
+    // A file in memory takes all of it, or is out of memory in the middle of a page.
     if (!pieces.empty()) {
       pieces.front().iov_base = static_cast<char*>(pieces.front().iov_base) + written;
       pieces.front().iov_len -= written;

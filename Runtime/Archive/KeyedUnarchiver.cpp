@@ -85,16 +85,31 @@ bool KeyedUnarchiver::containsValueForKey(std::string_view key) const {
 
 Ref<Object> KeyedUnarchiver::decodeObjectOfClasses(std::span<const ClassInfo* const> classes,
                                                    std::string_view key) {
+  const std::size_t number = numberOf(classes);
+  return decode(key, {.classes = number, .elements = number});
+}
+
+Ref<Array> KeyedUnarchiver::decodeArrayOfObjectsOfClasses(std::initializer_list<const ClassInfo*> classes,
+                                                          std::string_view key) {
+  const ClassInfo* const array = &classInfo<Array>();
+  return cast<Array>(decode(key, {.classes = numberOf({&array, 1}),
+                                  .elements = numberOf(std::span(classes.begin(), classes.size()))}));
+}
+
+std::size_t KeyedUnarchiver::numberOf(std::span<const ClassInfo* const> classes) {
+  Classes allowed(classes.begin(), classes.end());
+  std::ranges::sort(allowed);
+  const auto known = std::ranges::find(classes_, allowed);
+  const auto number = static_cast<std::size_t>(known - classes_.begin());
+  if (known == classes_.end()) classes_.push_back(std::move(allowed));
+  return number;
+}
+
+Ref<Object> KeyedUnarchiver::decode(std::string_view key, Wanted wanted) {
   if (!error_.isNull()) return nullptr;
   const std::optional<Index> index = list_.find(container_, escaped(key));
   if (!index) return fail("there is nothing under the key " + quoted(key));
   if (depth_ == 0) sizeLimit_ = size_ + maximumSize_;
-
-  Classes allowed(classes.begin(), classes.end());
-  std::ranges::sort(allowed);
-  const auto known = std::ranges::find(classes_, allowed);
-  const Wanted wanted{static_cast<std::size_t>(known - classes_.begin()), false};
-  if (known == classes_.end()) classes_.push_back(std::move(allowed));
   return decodeReference(*index, wanted);
 }
 
@@ -146,7 +161,7 @@ Ref<Object> KeyedUnarchiver::decodeInstance(Index index, Wanted wanted) {
   if (info == nullptr || !isAllowed(*info, wanted)) return nullptr;
   const bool isCollection = info == &classInfo<Array>() || info == &classInfo<Dictionary>();
   // What may be in a collection depends on the classes that it was asked for with.
-  const std::uint64_t key = index | (isCollection ? std::uint64_t{wanted.classes + 1} << 32U : 0);
+  const std::uint64_t key = index | (isCollection ? std::uint64_t{wanted.elements + 1} << 32U : 0);
   if (const auto known = decoded_.find(key); known != decoded_.end()) {
     return grow(known->second.size) ? known->second.object : nullptr;
   }
@@ -175,7 +190,7 @@ Ref<Object> KeyedUnarchiver::decodeWithCoder(const ClassInfo& info) {
 }
 
 Ref<Object> KeyedUnarchiver::decodeCollection(Index index, const ClassInfo& info, Wanted wanted) {
-  wanted.isElement = true;
+  wanted = {.classes = wanted.elements, .elements = wanted.elements, .isElement = true};
   std::vector<Ref<Object>> elements;
   if (!decodeList(index, kElementsKey, wanted, elements)) return nullptr;
   if (&info == &classInfo<Array>()) return make<Array>(std::move(elements));

@@ -48,6 +48,8 @@
 
 namespace rt {
 
+class Array;
+
 class KeyedUnarchiver final {
  public:
   /// Over an archive, which is not needed any more when this returns. If it is none, there is an error.
@@ -77,6 +79,11 @@ class KeyedUnarchiver final {
     return cast<T>(decodeObjectOfClasses({&classInfo<T>()}, key));
   }
 
+  /// An array, whose elements are of `classes`, or strings or numbers: unlike with `decodeObjectOfClasses`,
+  /// an object of these classes that is no array is not made. With an error if there is another object.
+  Ref<Array> decodeArrayOfObjectsOfClasses(std::initializer_list<const ClassInfo*> classes,
+                                           std::string_view key);
+
   /// The same for a string.
   String decodeString(std::string_view key) {
     return String::from(decodeObjectOfClasses({&classInfo<StringObject>()}, key).get());
@@ -102,10 +109,11 @@ class KeyedUnarchiver final {
   class Level;
   // Classes that an object may be of; those that were asked for once have a number.
   using Classes = std::vector<const ClassInfo*>;
-  // What the object is wanted for.
+  // What the object is wanted for, by numbers of classes: it may be of these, and its elements of those.
   struct Wanted {
     std::size_t classes;
-    bool isElement;
+    std::size_t elements;
+    bool isElement = false;
   };
 
   struct Decoded {
@@ -113,7 +121,10 @@ class KeyedUnarchiver final {
     std::size_t size = 0;
   };
 
+  std::size_t numberOf(std::span<const ClassInfo* const> classes);
+
   // All of these yield null where they fail.
+  Ref<Object> decode(std::string_view key, Wanted wanted);
   const PropertyList::Array* archivedObjects();
   Ref<Object> decodeReference(Index reference, Wanted wanted);
   Ref<Object> decodeValue(Index index, Wanted wanted);

@@ -120,6 +120,36 @@ TEST(KeyedUnarchiver, RefusesObjectsOfOtherClasses) {
       KeyedUnarchiver::unarchivedObjectOfClass<rt::Array>(archive(rt::Array::of("t"_s, rt::Number::of(1)))));
 }
 
+TEST(KeyedUnarchiver, MakesNothingButAnArrayWhereOneIsAskedFor) {
+  const auto decode = [](const Ref<rt::Object>& root, std::initializer_list<const rt::ClassInfo*> classes,
+                         std::string& error) {
+    KeyedUnarchiver unarchiver(archive(root));
+    const Ref<rt::Array> array = unarchiver.decodeArrayOfObjectsOfClasses(classes, "root");
+    error = unarchiver.error().view();
+    return array;
+  };
+  std::string error;
+  const Ref<rt::Object> tag = rt::make<Tag>("t"_s);
+  EXPECT_TRUE(rt::isEqual(decode(rt::Array::of("a"_s, rt::Number::of(1)), {}, error),
+                          rt::Array::of("a"_s, rt::Number::of(1))));
+  EXPECT_TRUE(decode(rt::Array::of(tag), {&rt::classInfo<Tag>()}, error));
+  EXPECT_TRUE(decode(rt::Array::of(rt::Array::of(tag)), kAll, error));
+  EXPECT_EQ(error, "");
+
+  // Used to be made before it was found to be no array.
+  Tag::initialized = 0;
+  EXPECT_FALSE(decode(tag, kAll, error));
+  EXPECT_THAT(error, HasSubstr("an object of class \"Tag\" where one of class \"Array\" was asked for"));
+  EXPECT_FALSE(decode(rt::make<rt::Dictionary>(), kAll, error));
+  EXPECT_THAT(error, HasSubstr("where one of class \"Array\" was asked for"));
+  EXPECT_FALSE(decode("text"_s, kAll, error));
+  EXPECT_THAT(error, HasSubstr("where one of class \"Array\" was asked for"));
+  EXPECT_FALSE(decode(rt::Array::of(tag), {}, error));
+  EXPECT_FALSE(decode(rt::Array::of(rt::Array::of("a"_s)), {&rt::classInfo<Tag>()}, error));
+  EXPECT_THAT(error, HasSubstr("an object of class \"Array\" where one of class \"Tag\" was asked for"));
+  EXPECT_EQ(Tag::initialized, 0);
+}
+
 // Used to be possible in a first version: what was decoded once for more classes was there for fewer.
 TEST(KeyedUnarchiver, AsksAgainForOtherClasses) {
   const Ref<rt::Array> array = rt::Array::of(rt::make<Tag>("t"_s));

@@ -32,9 +32,7 @@ rt::Ref<SRLScopeTagSetCodableWrapper> SRLScopeTagSetCodableWrapper::initWithTagS
 
 rt::Ref<SRLScopeTagSetCodableWrapper> SRLScopeTagSetCodableWrapper::initWithCoder(
     rt::KeyedUnarchiver& coder) {
-  // The array's elements may be of any class that can be unarchived at all, which only all classes say.
-  return initWithTags(
-      rt::cast<rt::Array>(coder.decodeObjectOfClasses({&rt::classInfo<rt::Object>()}, kTagsKey)));
+  return initWithTags(coder.decodeArrayOfObjectsOfClasses({&rt::classInfo<rt::Object>()}, kTagsKey));
 }
 
 void SRLScopeTagSetCodableWrapper::encodeWithCoder(rt::KeyedArchiver& coder) const {

@@ -42,9 +42,10 @@ class RT_VISIBLE SRLScopeTagSetCodableWrapper final
   /// The same with the tags of `tagSet`.
   static rt::Ref<SRLScopeTagSetCodableWrapper> initWithTagSet(const SRLScopeTagSet& tagSet);
 
-  /// What is under "kTagsID" in an archive. Where that is no array, or contains what cannot be unarchived,
-  /// that there are no tags is reported, and yields null; what is wrong is the coder's `error`. Called by
-  /// rt::KeyedUnarchiver.
+  /// The array under "kTagsID" in an archive. Nothing else is made of what is there. The elements may be of
+  /// any class that can be unarchived, since hosts bring the classes of their tags. Where there is no array,
+  /// or an element cannot be unarchived, the absence of tags is reported, and null is returned. The coder's
+  /// `error` says what is wrong. Called by rt::KeyedUnarchiver.
   static rt::Ref<SRLScopeTagSetCodableWrapper> initWithCoder(rt::KeyedUnarchiver& coder);
 
   /// Archives the tags under "kTagsID". Throws what archiving them throws.

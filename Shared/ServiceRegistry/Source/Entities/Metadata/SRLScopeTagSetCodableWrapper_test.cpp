@@ -41,6 +41,7 @@ class AccountTag final : public rt::Implements<AccountTag, rt::Object, SRLScopeT
   explicit AccountTag(rt::String name) : name_(std::move(name)) {}
   void encodeWithCoder(KeyedArchiver& coder) const override { coder.encodeObject(name_, "name"); }
   static Ref<AccountTag> initWithCoder(KeyedUnarchiver& coder) {
+    ++decodedCount;
     const rt::String name = coder.decodeString("name");
     return name ? rt::make<AccountTag>(name) : nullptr;
   }
@@ -49,6 +50,8 @@ class AccountTag final : public rt::Implements<AccountTag, rt::Object, SRLScopeT
     return tag != nullptr && tag->name_ == name_;
   }
   std::uint64_t hash() const override { return name_.hash(); }
+
+  static inline int decodedCount = 0;
 
  private:
   const rt::String name_;
@@ -212,14 +215,20 @@ TEST(SRLScopeTagSetCodableWrapperArchive, YieldsNullWithAReportWithoutTags) {
   EXPECT_THAT(errorOf(forgedArchive("tags", rt::Array::of("a"_s))),
               HasSubstr("there is nothing under the key \"kTagsID\""));
   EXPECT_THAT(reports.texts(), ElementsAre(kNeedsTags));
-  // Another class, or null.
+  // Another class, of which nothing is made.
+  AccountTag::decodedCount = 0;
   const Ref<rt::Object> account = rt::make<AccountTag>("a"_s);
   for (const Ref<rt::Object>& other : {Ref<rt::Object>("text"_s), Ref<rt::Object>(rt::Number::of(1)), account,
-                                       Ref<rt::Object>(Wrapper::initWithTagSet({})), Ref<rt::Object>()}) {
+                                       Ref<rt::Object>(Wrapper::initWithTagSet({}))}) {
     EXPECT_THAT(errorOf(forgedArchive("kTagsID", other)),
-                HasSubstr("\"SRLScopeTagSetCodableWrapper\" refused what is archived for it"));
+                HasSubstr("where one of class \"Array\" was asked for"));
     EXPECT_THAT(reports.texts(), ElementsAre(kNeedsTags));
   }
+  EXPECT_EQ(AccountTag::decodedCount, 0);
+  // Null.
+  EXPECT_THAT(errorOf(forgedArchive("kTagsID", nullptr)),
+              HasSubstr("\"SRLScopeTagSetCodableWrapper\" refused what is archived for it"));
+  EXPECT_THAT(reports.texts(), ElementsAre(kNeedsTags));
   // A tag that cannot be unarchived.
   EXPECT_THAT(errorOf(forgedArchive("kTagsID", rt::Array::of(rt::make<LostTag>()))), testing::Not(IsEmpty()));
   EXPECT_THAT(reports.texts(), ElementsAre(kNeedsTags));

@@ -109,8 +109,13 @@ class String {
   constexpr StringObject* object() const noexcept { return const_cast<StringObject*>(object_); }
   operator Ref<Object>() const noexcept { return {object()}; }
 
-  constexpr bool isNull() const noexcept { return object_ == nullptr; }
-  constexpr explicit operator bool() const noexcept { return object_ != nullptr; }
+  constexpr bool isNull() const noexcept {
+    // With -fno-delete-null-pointer-checks, which goes with -fsanitize=undefined, g++ cannot compare the address
+    // of a literal with null while it compiles.
+    if (std::is_constant_evaluated() && !__builtin_constant_p(object_ == nullptr)) return false;
+    return object_ == nullptr;
+  }
+  constexpr explicit operator bool() const noexcept { return !isNull(); }
 
   /// Whether there are no characters: null has none either.
   constexpr bool isEmpty() const noexcept { return length() == 0; }
@@ -120,7 +125,7 @@ class String {
 
   /// The bytes, as long as the string lives. They need not end with NUL.
   constexpr std::string_view view() const noexcept {
-    return object_ != nullptr ? object_->view() : std::string_view();
+    return isNull() ? std::string_view() : object_->view();
   }
   constexpr operator std::string_view() const noexcept { return view(); }
 

@@ -110,8 +110,8 @@ class String {
   operator Ref<Object>() const noexcept { return {object()}; }
 
   constexpr bool isNull() const noexcept {
-    // With -fno-delete-null-pointer-checks, which goes with -fsanitize=undefined, g++ cannot compare the address
-    // of a literal with null while it compiles.
+    // With -fno-delete-null-pointer-checks, which goes with -fsanitize=undefined, g++ cannot compare the
+    // address of a literal with null while it compiles.
     if (std::is_constant_evaluated() && !__builtin_constant_p(object_ == nullptr)) return false;
     return object_ == nullptr;
   }
@@ -124,9 +124,7 @@ class String {
   constexpr std::size_t length() const noexcept { return view().size(); }
 
   /// The bytes, as long as the string lives. They need not end with NUL.
-  constexpr std::string_view view() const noexcept {
-    return isNull() ? std::string_view() : object_->view();
-  }
+  constexpr std::string_view view() const noexcept { return isNull() ? std::string_view() : object_->view(); }
   constexpr operator std::string_view() const noexcept { return view(); }
 
   /// A hash that suits `==`: the standard library's of the bytes. 0 for null.

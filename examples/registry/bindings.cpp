@@ -1,7 +1,7 @@
 // The bindings, as a generator writes them: constant records, a factory for each implementation, an injector
 // for each service, and a class method through which the registry finds them when the program is loaded.
 
-#include "examples/registry/bindings.h"
+#include "bindings.h"
 
 #include <iterator>
 #include <utility>

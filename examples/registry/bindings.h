@@ -5,7 +5,7 @@
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Values/Array.h"
-#include "examples/registry/services.h"
+#include "services.h"
 
 // The service for an account.
 rt::Ref<MessageStore> injectMessageStore(const rt::Ref<rt::Object>& account);

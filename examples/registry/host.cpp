@@ -9,7 +9,7 @@
 #include "Runtime/Objects/Weak.h"
 #include "Runtime/Text/Format.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
-#include "examples/registry/bindings.h"
+#include "bindings.h"
 
 using namespace rt::literals;
 

@@ -2,14 +2,7 @@
 # what was built and builds the programs beside this file with nothing else, as a stranger would. Each is called as
 # pkg-config calls the library that it uses, less "mount-point-", and prints 42.
 
-function(run)
-  execute_process(COMMAND ${ARGN} RESULT_VARIABLE result OUTPUT_VARIABLE output ERROR_VARIABLE errors)
-  if(NOT result EQUAL 0)
-    list(JOIN ARGN " " command)
-    message(FATAL_ERROR "${command}\nfailed with ${result}:\n${output}${errors}")
-  endif()
-  set(output "${output}" PARENT_SCOPE)
-endfunction()
+include("${CMAKE_CURRENT_LIST_DIR}/run.cmake")
 
 file(REMOVE_RECURSE "${WORK}")
 run("${CMAKE_COMMAND}" --install "${BUILD}" --component development --prefix "${WORK}/first")

@@ -5,7 +5,7 @@
 ///     logger->setFormatter(ZEBLogStandardFormatter::init());
 ///     logger->logFuncError("main", "%d left", 3);
 ///
-///     2026-11-21 08:04:20.123 importer[4711/0x7f3a5c0e2740] [lvl=3] main() 3 left
+///     | 2026-11-21 08:04:20.123 importer[4711/0x7f3a5c0e2740] [lvl=3] main() 3 left
 ///
 /// The time is the local one (Runtime/Text/LocalTimeFormatter.h); the thread is its handle. The process is
 /// the one in which the formatter was made, also in the child of a fork.

@@ -4,6 +4,7 @@
 ///
 ///     void importFile(const rt::String& file) {
 ///       ZEBLogError("%@ has %d entries"_s, file, 0);     // ... [lvl=3] importFile() first.txt has 0 entries
+///     }
 ///
 /// Each takes a literal format and its arguments, and is a statement. No argument is evaluated where there is
 /// no shared logger.

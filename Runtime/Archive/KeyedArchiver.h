@@ -2,6 +2,7 @@
 
 /// Turns objects, and all that they are made of, into bytes.
 ///
+///     rt::Ref<rt::Array> tags = rt::Array::of("Ann"_s, "the left window"_s);
 ///     rt::KeyedArchiver archiver;
 ///     archiver.encodeObject(tags, "kTagsID");
 ///     std::vector<std::byte> bytes = archiver.encodedData();

@@ -2,12 +2,12 @@
 
 /// Makes objects of the bytes that a `KeyedArchiver` made of objects, or that anyone says it did.
 ///
-///     rt::KeyedUnarchiver unarchiver(bytes);
+///     rt::KeyedUnarchiver unarchiver(archive);
 ///     rt::Ref<rt::Array> tags = unarchiver.decodeObjectOfClass<rt::Array>("kTagsID");
 ///     if (!tags) report(unarchiver.error());
 ///
 ///     rt::String error;
-///     rt::Ref<Tag> tag = rt::KeyedUnarchiver::unarchivedObjectOfClass<Tag>(bytes, &error);
+///     rt::Ref<Tag> tag = rt::KeyedUnarchiver::unarchivedObjectOfClass<Tag>(archive, &error);
 ///
 /// Who decodes says of which classes the object may be; an object of one that derives from one of these
 /// will do. Nothing of an object is made before its class has been found to be among them and to conform

@@ -2,9 +2,12 @@
 
 /// An annotation by which clang sees, while compiling, that a reference outlives what it refers into.
 ///
-///     T& operator*() const RT_LIFETIME_BOUND;
+///     class Account {
+///      public:
+///       const rt::Array& names() const RT_LIFETIME_BOUND;
+///     };
 ///
-///     for (const rt::Ref<rt::Object>& name : *names()) ...        // clang: the array is gone by then
+///     const rt::Array& names = Account().names();      // clang: the account is gone by then
 ///
 /// Elsewhere it is nothing.
 ///

@@ -2,9 +2,9 @@
 
 /// The text of a file of user defaults, one setting a line, as people write it and programs change it.
 ///
-///     # Written by the operator on call.
-///     ZEBVerboseLogging = YES
-///     greeting = "  two blanks before, one line\n after"   # a remark
+///     | # Written by the operator on call.
+///     | ZEBVerboseLogging = YES
+///     | greeting = "  two blanks before, one line\n after"   # a remark
 ///
 ///     rt::DefaultsText text = rt::DefaultsText::parsed(content);      // throws MalformedDefaults
 ///     text.find("ZEBVerboseLogging");                                 // "YES"

@@ -8,15 +8,15 @@
 ///
 ///     rt::UserDefaults::Observation observation = defaults->observe(
 ///         "ZEBVerboseLogging", rt::UserDefaults::Notify::kAlsoNow,
-///         [weak = rt::Weak<Filter>(this)] { if (auto filter = weak.lock()) filter->readAgain(); });
+///         [weak = rt::Weak<Account>(account)] { if (auto account = weak.lock()) account->readAgain(); });
 ///
 ///     defaults->setBool(true, "ZEBVerboseLogging");
 ///
 /// The settings are in one text file, one `key = value` a line (Runtime/Defaults/DefaultsText.h), which
 /// people may edit at any time:
 ///
-///     $XDG_CONFIG_HOME/APPLICATION/defaults.conf, where that is not set ~/.config/...
-///     ~/Library/Application Support/APPLICATION/defaults.conf on macOS
+///     | $XDG_CONFIG_HOME/APPLICATION/defaults.conf, where that is not set ~/.config/...
+///     | ~/Library/Application Support/APPLICATION/defaults.conf on macOS
 ///
 /// APPLICATION is the main bundle's identifier or, without one, the process's name. Each read sees what is
 /// in the file at that moment: it asks the system whether the file has changed, which takes about a

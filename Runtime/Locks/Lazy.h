@@ -2,9 +2,9 @@
 
 /// A value that is made when it is first asked for, once for the process, and never destroyed.
 ///
-///     const Ref<Clock>& Clock::shared() {
-///       static constinit rt::Lazy<Ref<Clock>> clock;
-///       return clock.get([] { return rt::make<Clock>(); });
+///     const rt::Ref<Clock>& Clock::shared() {
+///       static constinit rt::Lazy<rt::Ref<Clock>> clock;
+///       return clock.get([] { return rt::make<SystemClock>(); });
 ///     }
 ///
 /// Differs from a static variable of a function in two ways. Nothing runs at exit. In the child of a fork, a

@@ -4,7 +4,7 @@
 ///
 ///     rt::AtomicRef<Settings> settings_;
 ///     const rt::Ref<Settings> now = settings_.load();     // lasts, whatever is set meanwhile
-///     settings_.exchange(rt::make<Settings>(changed));
+///     settings_.exchange(rt::make<Settings>("dark"_s));
 ///
 /// Reading is one atomic operation, and no thread that reads ever waits for another. Who replaces waits for
 /// others who do. An object that is replaced goes with the last reference to it that was read.

@@ -2,13 +2,13 @@
 
 /// A function of a class that runs when the program is loaded.
 ///
-///     class SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
+///     class Catalogue : public rt::Implements<Catalogue, rt::Object> {
 ///      public:
 ///       static void load();
 ///       ...
 ///     };
 ///
-///     template struct rt::LoadHook<SRLRegistry>;       // in SRLRegistry.cpp, outside any namespace
+///     template struct rt::LoadHook<Catalogue>;         // in Catalogue.cpp, outside any namespace
 ///
 /// The hook runs once, before `main`, on the thread that loads the program, when every class, protocol
 /// and class method of the program and of all libraries that it links is known. Hooks run in the order

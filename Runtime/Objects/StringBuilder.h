@@ -5,7 +5,7 @@
 ///     rt::StringBuilder builder;
 ///     builder.append("{ ");
 ///     for (const Frame& frame : frames) builder.append(frame.name);
-///     return builder.string();                              // a rt::String
+///     rt::String trace = builder.string();
 ///
 /// What fits in `kInlineCapacity` bytes allocates once, for the string; longer texts grow on the heap. A
 /// builder is used by one thread at a time.

@@ -4,7 +4,7 @@
 ///
 ///     rt::Weak<Delegate> delegate_;                                  // a class or a protocol
 ///     delegate_ = delegate;
-///     if (rt::Ref<Delegate> delegate = delegate_.lock()) delegate->didLog(*this);
+///     if (rt::Ref<Delegate> delegate = delegate_.lock()) delegate->didLog("started"_s);
 ///
 /// An object that is being destroyed counts as gone: `lock` gives null, or a reference that keeps the
 /// object whole. Different `Weak` objects may be used by different threads at once; one `Weak` object

@@ -37,7 +37,7 @@ namespace rt::CallStack {
 /// A line for each of `addresses`: its number, from 0, the image it is in, the address, and the function
 /// with the distance from its start, as in
 ///
-///     0   mount-point                         0x000055d0c0de1234 main + 52
+///     | 0   mount-point                         0x000055d0c0de1234 main + 52
 ///
 /// C++ names are spelt out. The names of functions that an image does not export are read from the symbol
 /// table in its file, if that is there and still the same. "???" stands for an image that is not known; where

@@ -2,9 +2,9 @@
 
 /// A reference that each thread has for itself, given up when the thread ends.
 ///
-///     using CurrentHandler = rt::ThreadReference<AssertionHandler, struct CurrentHandlerTag>;
+///     using CurrentHandler = rt::ThreadReference<rt::AssertionHandler, struct CurrentHandlerTag>;
 ///     CurrentHandler::set(handler);
-///     if (AssertionHandler* handler = CurrentHandler::get()) ...
+///     if (rt::AssertionHandler* handler = CurrentHandler::get()) ...
 ///
 /// Reading is reading a variable. Null on every thread until it is set, and again where the thread still runs
 /// something after it has given the reference up; what is set then is given up at once. The main thread gives

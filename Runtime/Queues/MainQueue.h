@@ -9,8 +9,8 @@
 ///
 /// A host with an event loop of its own polls instead:
 ///
-///     struct pollfd ready[] = {{.fd = rt::MainQueue::fileDescriptor(), .events = POLLIN}, ...};
-///     while (poll(ready, count, -1) > 0) {
+///     pollfd ready[] = {{.fd = rt::MainQueue::fileDescriptor(), .events = POLLIN, .revents = 0}};
+///     while (poll(ready, std::size(ready), -1) > 0) {
 ///       if (ready[0].revents != 0) rt::MainQueue::drain();
 ///       ...
 ///     }

@@ -3,21 +3,21 @@
 /// One directive of a format, such as "%-5.*2$ld": the grammar that both the formatter and the check at
 /// compile time go by.
 ///
-///     %[POSITION$][FLAGS][WIDTH][.PRECISION][LENGTH]CONVERSION
-///
-///     POSITION    1 to 64: the argument, counted from 1; without one, the next
-///     FLAGS       any of - + space # 0 '
-///     WIDTH       a number, or * for an int argument, or *POSITION$
-///     PRECISION   the same; none after the dot is 0
-///     LENGTH      h hh l ll j z t q L, where the conversion can do with it
-///     CONVERSION  d i u o x X   integer: int, or 64 bits with l ll j z t q L
-///                 f F e E g G a A   double; long double with L
-///                 c, s          byte, and bytes that end with NUL; wide with l
-///                 C, S          wide character, and wide characters that end with NUL
-///                 p             pointer
-///                 @             object, or null
-///                 n             pointer, which is passed over: nothing is printed, nothing written
-///                 %             a percent sign; takes no argument
+///     | %[POSITION$][FLAGS][WIDTH][.PRECISION][LENGTH]CONVERSION
+///     |
+///     | POSITION    1 to 64: the argument, counted from 1; without one, the next
+///     | FLAGS       any of - + space # 0 '
+///     | WIDTH       a number, or * for an int argument, or *POSITION$
+///     | PRECISION   the same; none after the dot is 0
+///     | LENGTH      h hh l ll j z t q L, where the conversion can do with it
+///     | CONVERSION  d i u o x X   integer: int, or 64 bits with l ll j z t q L
+///     |             f F e E g G a A   double; long double with L
+///     |             c, s          byte, and bytes that end with NUL; wide with l
+///     |             C, S          wide character, and wide characters that end with NUL
+///     |             p             pointer
+///     |             @             object, or null
+///     |             n             pointer, which is passed over: nothing is printed, nothing written
+///     |             %             a percent sign; takes no argument
 ///
 /// Not for: callers of the formatter (Runtime/Text/Format.h).
 

@@ -7,8 +7,8 @@
 ///                 const Arguments&... arguments);
 ///
 ///     report("%@ has %d entries", name, 3);
-///     report("%@ has %d entries", name);                   // does not compile: tooFewArguments
-///     report("%@ has %d entries"_s, name, "three");        // does not compile: directiveTakesAnInteger
+///     // report("%@ has %d entries", name);                does not compile: tooFewArguments
+///     // report("%@ has %d entries"_s, name, "three");     does not compile: directiveTakesAnInteger
 ///
 /// The compiler refuses a mistake by saying that it cannot call one of the functions of
 /// `rt::formatMistake`, the names of which tell what is wrong. Signed and unsigned integers pass for each

@@ -9,10 +9,10 @@
 /// A pattern is made of these fields, of text between apostrophes ('T'; two apostrophes stand for one),
 /// and of any other characters but letters, which stand for themselves:
 ///
-///     yyyy  the year, at least four digits      HH  the hour, 00 to 23
-///     MM    the month, 01 to 12                 mm  the minute
-///     dd    the day of the month                ss  the second
-///                                               SSS the millisecond, cut off, not rounded
+///     | yyyy  the year, at least four digits      HH  the hour, 00 to 23
+///     | MM    the month, 01 to 12                 mm  the minute
+///     | dd    the day of the month                ss  the second
+///     |                                           SSS the millisecond, cut off, not rounded
 ///
 /// The zone is the one that the environment's TZ or the system's setting names at the time of the call:
 /// a change of TZ counts from the next call on, a change of the system's setting from the next second. As

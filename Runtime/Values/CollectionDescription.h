@@ -2,20 +2,20 @@
 
 /// How collections describe themselves. All of them, whatever holds them, go by one rule:
 ///
-///     (                            an array in parentheses, one element a line, in its order
-///         first,
-///         "second one",
-///         {                        a dictionary in braces, one entry a line, ordered by key
-///             count = 3;
-///             "full name" = "A \"B\"\n";
-///         },
-///         {(                       a set in both, one element a line, ordered
-///             1,
-///             10
-///         )},
-///         (                        an empty collection has no line of its own between its brackets
-///         )
-///     )
+///     | (                            an array in parentheses, one element a line, in its order
+///     |     first,
+///     |     "second one",
+///     |     {                        a dictionary in braces, one entry a line, ordered by key
+///     |         count = 3;
+///     |         "full name" = "A \"B\"\n";
+///     |     },
+///     |     {(                       a set in both, one element a line, ordered
+///     |         1,
+///     |         10
+///     |     )},
+///     |     (                        an empty collection has no line of its own between its brackets
+///     |     )
+///     | )
 ///
 /// An element is described by its `description`, and what follows a line end in it is indented by four
 /// blanks, so that collections nest. A string is written as it is if it is made of A-Z a-z 0-9 _ . / - only

@@ -3,7 +3,8 @@
 /// Lets pass what the environment asks for: from LUMLogLevelDebug on where OS_ACTIVITY_MODE is "debug", from
 /// LUMLogLevelInfo on where it is "info", else from LUMLogLevelError on.
 ///
-///     logger = LUMSystemLogger::initWithFilter(LUMDefaultMinimumLogLevelFilter::init());
+///     rt::Ref<LUMSystemLogger> logger =
+///         LUMSystemLogger::initWithFilter(LUMDefaultMinimumLogLevelFilter::init());
 ///
 /// The environment is read once in a process, the first time that any such filter is asked.
 ///

@@ -2,7 +2,7 @@
 
 /// Writes messages to the system's log (Runtime/SystemLog/SystemLog.h).
 ///
-///     $ journalctl SUBSYSTEM=com.example.host.Importer CATEGORY=network
+///     | $ journalctl SUBSYSTEM=com.example.host.Importer CATEGORY=network
 ///
 /// An entry's subsystem is the main bundle's identifier and, after a dot, the component in the message's
 /// metadata; a component that is "" is the subsystem itself. Its category is the one in the metadata. Levels

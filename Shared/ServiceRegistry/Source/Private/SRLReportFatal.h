@@ -2,9 +2,12 @@
 
 /// Reports after which nothing can go on, since generated code is wrong.
 ///
-///     default:
-///       SRLReportFatal({kFile, "SRLAPIRegistrationDataInstanceType"},
-///                      "APIs cannot be of an unknown type"_s);
+///     switch (api->instanceTypeKind) {
+///       ...
+///       default:
+///         SRLReportFatal({kFile, "SRLAPIRegistrationDataInstanceType"},
+///                        "APIs cannot be of an unknown type"_s);
+///     }
 ///
 /// Not for: what a program can do wrong while it runs (PECReport).
 

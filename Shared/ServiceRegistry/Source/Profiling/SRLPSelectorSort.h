@@ -2,8 +2,8 @@
 
 /// A list in the order that answers of 64 bits give, whatever they are.
 ///
-///     const auto difference = [](int receiver, int argument) -> std::int64_t { return receiver - argument;
-///     }; std::vector<int> sorted = SRLPSelectorSort(std::vector{3, 1, 2}, difference);
+///     const auto difference = [](int receiver, int argument) { return std::int64_t{receiver} - argument; };
+///     std::vector<int> sorted = SRLPSelectorSort(std::vector{3, 1, 2}, difference);      // 1, 2, 3
 ///
 /// An element is asked about another that stands behind it: over 0 puts it after that one, 0 leaves both as
 /// they stand, and less than 0 as well. Answers that make an order sort the list by it, and equal elements

@@ -4,7 +4,7 @@
 ///
 ///     constexpr _SRLBindingRegistrationData bindings[] = {{&clockAPI, clocks}, {&weatherAPI, weathers}};
 ///     static_assert(SRLAreBindingsSorted(bindings));
-///     constinit const SRLBindingsModuleData moduleData{
+///     constexpr SRLBindingsModuleData moduleData{
 ///         .bindingsBegin = std::begin(bindings), .bindingsEnd = std::end(bindings)};
 ///
 ///     const SRLBindingsModuleData* networkBindings() { return &moduleData; }

@@ -5,22 +5,26 @@
 ///
 ///     rt::Ref<rt::Object> makeClock(SRLScopeTagSet) { return rt::make<SystemClock>(); }
 ///
-///     constinit const SRLAPIRegistrationData clockAPI{
+///     constexpr SRLAPIRegistrationData clockAPI{
 ///         .identifier = "Clock",
 ///         .instanceType = {.names = {.protocolName = "Clock"}},
 ///         .identifierLength = 5,
 ///     };
-///     constinit const SRLImplementationRegistrationData systemClock{
+///     constexpr SRLImplementationRegistrationData systemClock{
 ///         .identifier = "SystemClock",
 ///         .instanceType = {.className = "SystemClock"},
 ///         .factory = makeClock,
 ///     };
-///     constinit const SRLImplementationRegistrationData* const clocks[] = {&systemClock, nullptr};
-///     constinit const _SRLBindingRegistrationData clockBinding{&clockAPI, clocks};
+///     constexpr const SRLImplementationRegistrationData* clocks[] = {&systemClock, nullptr};
+///     constexpr _SRLBindingRegistrationData bindings[] = {{&clockAPI, clocks}};
+///     static_assert(SRLAreBindingsSorted(bindings));              // SRLBindingsModuleData.h
 ///
 /// The records are constants of a fixed layout, with texts of UTF-8 that end with NUL, and live as long as
-/// the process: the registry keeps pointers to them, and their addresses stand for the API and the
-/// implementation. Any thread may read them.
+/// the process: the registry keeps pointers to them. Any thread may read them.
+///
+/// The registry knows an API and an implementation by the address of the record, not by the identifier. A
+/// copy of an API's record is another API, to which nothing is bound. So define each record once; in a
+/// header, as `inline constexpr`.
 ///
 /// Not for: people; what they write is turned into these.
 

@@ -20,7 +20,9 @@
 /// destructors of static objects queue. The program waits for tasks, but at most ten seconds altogether,
 /// and names the queues that it leaves. Not run are what is queued behind a task that itself calls `exit`
 /// and, where another than the main thread calls it, the main queue's. `_exit`, `quick_exit` and `abort`
-/// run nothing.
+/// run nothing. A static object that is initialized after the program's first `async` is destroyed before
+/// these tasks run. A task must not refer to one: capture a copy or a `Ref`, or call `barrierSync` in the
+/// object's destructor.
 ///
 /// Fork. Queued tasks are the parent's: in the child all queues are empty and start with a fresh set of
 /// threads. Where a task forks, the queue it runs on goes on in the child when the task returns; but a

@@ -155,6 +155,28 @@ TEST_F(QueueDeathTest, WhatStaticObjectsQueueInTheirDestructorsRunsToo) {
       testing::ExitedWithCode(0), "first words;last words;waited for;");
 }
 
+// Tasks that referred to such an object used it after its destructor.
+TEST_F(QueueDeathTest, AStaticObjectThatIsYoungerThanTheFirstTaskCanWaitForTasks) {
+  EXPECT_EXIT(
+      {
+        static std::atomic<bool> mayGoOn = false;
+        static Queue& queue = *new Queue("test"_s);
+        holdUntilExit(queue, mayGoOn);  // The first task.
+        struct Static {
+          ~Static() {
+            mayGoOn = true;
+            queue.barrierSync();
+            std::fprintf(stderr, "destroyed;");
+          }
+          const char* text = "whole";
+        };
+        static const Static younger;
+        queue.async([] { std::fprintf(stderr, "%s;", younger.text); });
+        std::exit(0);
+      },
+      testing::ExitedWithCode(0), "whole;destroyed;");
+}
+
 TEST_F(QueueDeathTest, ATaskMayExit) {
   EXPECT_EXIT(
       {

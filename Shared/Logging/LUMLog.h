@@ -19,7 +19,9 @@
 /// through, and what filters and loggers throw before the call returns (Shared/Logging/LUMLogMultiplexing.h);
 /// so does std::bad_alloc.
 ///
-/// Not for: text that was made beforehand and may hold a '%': log it as an argument of "%@".
+/// Not for: signal handlers, since logging allocates and takes locks, and deadlocks or ends the program where
+/// the signal interrupts a thread that holds one; text that was made beforehand and may hold a '%': log it as
+/// an argument of "%@".
 
 #include <concepts>
 #include <cstdarg>

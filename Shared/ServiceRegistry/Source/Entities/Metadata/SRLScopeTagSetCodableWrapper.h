@@ -14,6 +14,10 @@
 /// KeyedArchiver refuses, also of what was unarchived. The archive has them in an array, under the key
 /// "kTagsID".
 ///
+/// An archive of a wrapper without an array of tags is reported. Without an error callback the report throws
+/// an rt::InternalInconsistencyException, which passes through the unarchiver. So a host that unarchives
+/// foreign bytes sets a callback (PECErrorHandler), or catches this.
+///
 /// Owns its tags. Immutable: any thread may use it if the tags bear that.
 ///
 /// Not for: keys of tables, for which SRLScopeTagSet is smaller and quicker.

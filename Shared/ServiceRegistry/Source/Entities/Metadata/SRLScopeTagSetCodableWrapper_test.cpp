@@ -12,6 +12,7 @@
 #include <variant>
 #include <vector>
 
+#include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
 #include "Runtime/Archive/KeyedArchiver.h"
 #include "Runtime/Archive/KeyedUnarchiver.h"
 #include "Runtime/Archive/PropertyList.h"
@@ -235,6 +236,12 @@ TEST(SRLScopeTagSetCodableWrapperArchive, YieldsNullWithAReportWithoutTags) {
   // Another object altogether.
   EXPECT_THAT(errorOf(KeyedArchiver::archivedDataWithRootObject(account)), HasSubstr("was asked for"));
   EXPECT_THAT(reports.texts(), IsEmpty());
+}
+
+TEST(SRLScopeTagSetCodableWrapperArchive, ThrowsWithoutTagsWhereThereIsNoErrorCallback) {
+  const TestReports reports;
+  PECErrorHandler::sharedInstance()->setErrorHandlerBlock(nullptr);
+  EXPECT_THROW(read(forgedArchive("kTagsID", rt::Number::of(3))), rt::InternalInconsistencyException);
 }
 
 TEST(SRLScopeTagSetCodableWrapperArchive, MayBeTruncatedOrDamagedAnywhere) {

@@ -63,8 +63,8 @@ constexpr SRLAPIRegistrationData unboundAPI{
     .identifier = "Unbound", .instanceType = kType, .identifierLength = 7};
 constexpr SRLAPIRegistrationData manyAPI{
     .identifier = "Many", .instanceType = kType, .scopeType = 0b01, .identifierLength = 4, .isMultibound = 1};
-// Another record of the API.
-constexpr SRLAPIRegistrationData sameManyAPI = manyAPI;
+// Other records of the API.
+constexpr SRLAPIRegistrationData otherManyAPIs[] = {manyAPI, manyAPI};
 constexpr SRLAPIRegistrationData unknownAPI{
     .identifier = "Unknown", .instanceType = kType, .identifierLength = 7};
 constexpr SRLImplementationRegistrationData scoped{.identifier = "ScopedThing",
@@ -157,19 +157,19 @@ TEST(WithoutMemory, UndoesWhatItRegistersForAnotherRecord) {
         SRLRegistry& registry = *shared.registry;
         const Ref<rt::Object> account = "account"_s.object();
         const SRLScopeTagSet one{{account.get()}};
-        const auto askByOtherRecord = [&] {
+        const auto ask = [&](const SRLAPIRegistrationData& other) {
           try {
-            EXPECT_FALSE(registry.internalHasImplementationForService(&sameManyAPI));
+            EXPECT_FALSE(registry.internalHasImplementationForService(&other));
           } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): it is asked once
           }
         };
-        askByOtherRecord();
+        ask(otherManyAPIs[0]);
         const Ref<rt::Array> many =
             persistently([&] { return registry.internalMultiBoundService(&manyAPI, one); });
         ASSERT_TRUE(many);
         EXPECT_EQ(many->count(), 2U);
 
-        askByOtherRecord();
+        ask(otherManyAPIs[1]);
         const AllocationFailure::Pause pause;
         EXPECT_NE(registry.description().view().find("Many = "), std::string_view::npos);
       },

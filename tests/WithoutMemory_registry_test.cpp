@@ -63,6 +63,8 @@ constexpr SRLAPIRegistrationData unboundAPI{
     .identifier = "Unbound", .instanceType = kType, .identifierLength = 7};
 constexpr SRLAPIRegistrationData manyAPI{
     .identifier = "Many", .instanceType = kType, .scopeType = 0b01, .identifierLength = 4, .isMultibound = 1};
+// Other records of the API.
+constexpr SRLAPIRegistrationData otherManyAPIs[] = {manyAPI, manyAPI};
 constexpr SRLAPIRegistrationData unknownAPI{
     .identifier = "Unknown", .instanceType = kType, .identifierLength = 7};
 constexpr SRLImplementationRegistrationData scoped{.identifier = "ScopedThing",
@@ -142,6 +144,34 @@ TEST(WithoutMemory, RegistersBindings) {
         EXPECT_FALSE(knows(unknownAPI));
         EXPECT_TRUE(persistently([&] { return registry->mutableCopy(); }));
         EXPECT_TRUE(persistently([&] { return registry->description(); }));
+      },
+      kGrowth);
+}
+
+// What a request by another record of an API had begun to register used to stay: of many, the rest was
+// missing for ever. What was known before that request stays.
+TEST(WithoutMemory, UndoesWhatItRegistersForAnotherRecord) {
+  tryEachAllocation(
+      [] {
+        const Shared shared;
+        SRLRegistry& registry = *shared.registry;
+        const Ref<rt::Object> account = "account"_s.object();
+        const SRLScopeTagSet one{{account.get()}};
+        const auto ask = [&](const SRLAPIRegistrationData& other) {
+          try {
+            EXPECT_FALSE(registry.internalHasImplementationForService(&other));
+          } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): it is asked once
+          }
+        };
+        ask(otherManyAPIs[0]);
+        const Ref<rt::Array> many =
+            persistently([&] { return registry.internalMultiBoundService(&manyAPI, one); });
+        ASSERT_TRUE(many);
+        EXPECT_EQ(many->count(), 2U);
+
+        ask(otherManyAPIs[1]);
+        const AllocationFailure::Pause pause;
+        EXPECT_NE(registry.description().view().find("Many = "), std::string_view::npos);
       },
       kGrowth);
 }

@@ -170,26 +170,26 @@ bool SRLRegistry::multipleBindingsModulesAllowed() const {
 }
 
 bool SRLRegistry::lazilyRegisterBindingsForAPI(const SRLAPIRegistrationData* api) {
-  const std::string_view identifier = api->identifier;
-  const bool isNew =
-      ivars_->singleBindings.find(api) == nullptr && ivars_->multiBindings.find(api) == nullptr;
-  bool isKnown = false;
+  // Their APIs have the identifier of `api`, and may be other records.
+  std::vector<const _SRLBindingRegistrationData*> bindings = registrationDatasForAPI(api);
+  auto next = bindings.begin();
   try {
-    for (const SRLBindingsModuleData* module : ivars_->bindingsModules) {
-      const _SRLBindingRegistrationData* binding = bindingOf(*module, identifier);
-      if (binding == nullptr) continue;
-      isKnown = true;
-      registerBindings(*binding);
+    for (; next != bindings.end(); ++next) {
+      const _SRLBindingRegistrationData& binding = **next;
+      // Nothing is to be undone of an API that was known before.
+      if (ivars_->isKnown(binding.api)) *next = nullptr;
+      registerBindings(binding);
     }
   } catch (const std::bad_alloc&) {
     // The next request begins anew, rather than find that some are missing.
-    if (isNew) {
-      ivars_->singleBindings.erase(api);
-      ivars_->multiBindings.erase(api);
+    for (const auto* binding : std::span(bindings.begin(), next + 1)) {
+      if (binding == nullptr) continue;
+      ivars_->singleBindings.erase(binding->api);
+      ivars_->multiBindings.erase(binding->api);
     }
     throw;
   }
-  return isKnown;
+  return !bindings.empty();
 }
 
 std::vector<const _SRLBindingRegistrationData*> SRLRegistry::registrationDatasForAPI(
@@ -223,13 +223,11 @@ void SRLRegistry::registerBindings(const _SRLBindingRegistrationData& binding) {
           SRLImplementationRegistrationDataConfigInstanceType(record), record->isConfigurationRequired != 0);
     }
     rt::Ref<SRLInstanceType> instanceType = SRLImplementationRegistrationDataInstanceType(record);
-    SRLFactoryBlock factoryBlock =
-        scopedBlockForFactory(record->factory, record, api->scopeType, record->scopeType, record->lifetime);
+    const SRLScopedFactory scopedFactory{record->factory, record, api->scopeType, record->scopeType,
+                                         record->lifetime};
     const rt::Ref<SRLImplementation> implementation =
         SRLImplementation::initWithIdentifier(record->identifier, std::move(instanceType), record->lifetime,
-                                              record->scopeType, std::move(factoryBlock), configuration);
-    implementation->record_ = record;
-    implementation->apiScope_ = api->scopeType;
+                                              record->scopeType, scopedFactory, configuration);
     internalRegisterServiceAPI(api, implementation);
   }
 }

@@ -251,19 +251,15 @@ class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
   SRLMemoizingScope& openScope(const SRLScopeTagSet& tags) RT_REQUIRES(ivars_->lock);
   SRLMemoizingScope& newScope(const SRLScopeTagSet& tags) RT_REQUIRES(ivars_->lock);
 
-  // The tags of the scope of this registry that keeps an implementation's instance for a request with `tags`:
-  // these, or `masked`, which has become a part of them. Null where there is no such scope.
-  const SRLScopeTagSet* scopeTagsOf(const SRLImplementation& implementation, const SRLScopeTagSet& tags,
-                                    SRLScopeTagSet& masked) const RT_REQUIRES(ivars_->lock);
-
-  // The instance that a scope of this registry has already; null where there is none, or no telling.
-  rt::Ref<rt::Object> keptInstanceOf(const SRLImplementation& implementation,
-                                     const SRLScopeTagSet& tags) const RT_REQUIRES(ivars_->lock);
+  // The instance that a scope of this registry has already; null where there is none, or no telling. In the
+  // first case `scope` becomes the one that it is to be kept in, if there is one.
+  rt::Ref<rt::Object> keptInstanceOf(const SRLImplementation& implementation, const SRLScopeTagSet& tags,
+                                     rt::Ref<SRLMemoizingScope>& scope) RT_REQUIRES(ivars_->lock);
 
   // An instance of what the caller keeps, new or kept; null where its factory gives none. Where `scope` is
   // given, that is where it is kept.
   static rt::Ref<rt::Object> instanceOf(SRLImplementation& implementation, const SRLAPIRegistrationData* api,
-                                        const SRLScopeTagSet& tags, const rt::Ref<SRLMemoizingScope>& scope);
+                                        const SRLScopeTagSet& tags, rt::Ref<SRLMemoizingScope> scope);
 
   std::unique_ptr<SRLRegistryIvars> ivars_;
   const rt::Ref<SRLMemoizingScope> configScope_;

@@ -79,28 +79,17 @@ rt::String instanceTypeOf(const SRLImplementation& implementation) {
 
 }  // namespace
 
-// There is none where the tags do not fit, too: that is for the factory block to report.
-const SRLScopeTagSet* SRLRegistry::scopeTagsOf(const SRLImplementation& implementation,
-                                               const SRLScopeTagSet& tags, SRLScopeTagSet& masked) const {
-  const SRLImplementationRegistrationData* record = implementation.record_;
-  if (record == nullptr || record->lifetime != 0 || !isShared_.load(std::memory_order_relaxed))
-    return nullptr;
-  const SRLScopeType apiScope = implementation.apiScope_;
-  if (!SRLScopeTagSetDetail::hasOneTagForEachBit(tags, apiScope)) return nullptr;
-  if (record->scopeType == apiScope) [[likely]]
-    return &tags;
-  if ((record->scopeType & ~apiScope) != 0) return nullptr;
-  masked = SRLScopeTagSetMaskingWithScopes(tags, apiScope, record->scopeType);
-  return &masked;
-}
-
 rt::Ref<rt::Object> SRLRegistry::keptInstanceOf(const SRLImplementation& implementation,
-                                                const SRLScopeTagSet& tags) const {
+                                                const SRLScopeTagSet& tags,
+                                                rt::Ref<SRLMemoizingScope>& scope) {
   rt::Ref<rt::Object> instance;
+  const SRLScopedFactory* scoped = implementation.scopedFactory();
+  if (scoped == nullptr || !isShared_.load(std::memory_order_relaxed)) return instance;
   SRLScopeTagSet masked;
-  if (const SRLScopeTagSet* scopeTags = scopeTagsOf(implementation, tags, masked)) {
-    if (const SRLMemoizingScope* scope = ivars_->findScope(*scopeTags))
-      scope->findInstance(implementation.record_, instance);
+  if (const SRLScopeTagSet* scopeTags = scoped->scopeTags(tags, masked)) {
+    SRLMemoizingScope& open = openScope(*scopeTags);
+    open.findInstance(scoped->identifier, instance);
+    if (!instance) scope = &open;
   }
   return instance;
 }
@@ -108,17 +97,11 @@ rt::Ref<rt::Object> SRLRegistry::keptInstanceOf(const SRLImplementation& impleme
 // The caller keeps the implementation.
 rt::Ref<rt::Object> SRLRegistry::instanceOf(SRLImplementation& implementation,
                                             const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags,
-                                            const rt::Ref<SRLMemoizingScope>& scope) {
+                                            rt::Ref<SRLMemoizingScope> scope) {
   if (SRLPProfilingEnabled()) [[unlikely]]
     return measuredInstance(&implementation, api, tags);
-  // What the factory block would do, at one go.
-  const SRLImplementationRegistrationData* record = implementation.record_;
-  const auto make = [&] {
-    return record->factory(
-        SRLScopeTagSetMaskingWithScopes(tags, implementation.apiScope_, record->scopeType));
-  };
-  if (record != nullptr && record->lifetime == 1) return make();
-  if (scope) return scope->instanceForIdentifier(record, nullptr, make);
+  if (const SRLScopedFactory* scoped = implementation.scopedFactory())
+    return scoped->make(tags, nullptr, std::move(scope));
   bool instanceCreated = false;
   return implementation.factoryBlock().callKept(tags, &instanceCreated);
 }
@@ -127,13 +110,8 @@ SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SR
   Found found;
   const rt::Ref<SRLImplementation>* bound = boundTo(api);
   if (bound == nullptr || !*bound || !(*bound)->factoryBlock()) return found;
-  SRLScopeTagSet masked;
-  if (const SRLScopeTagSet* scopeTags = scopeTagsOf(**bound, tags, masked)) {
-    SRLMemoizingScope& scope = openScope(*scopeTags);
-    if (scope.findInstance((*bound)->record_, found.instance) && found.instance) return found;
-    found.scope = &scope;
-  }
-  found.implementation = *bound;
+  found.instance = keptInstanceOf(**bound, tags, found.scope);
+  if (!found.instance) found.implementation = *bound;
   return found;
 }
 
@@ -154,7 +132,7 @@ SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SR
     return all;
   }();
   if (found.instance || !found.implementation) return std::move(found.instance);
-  rt::Ref<rt::Object> instance = instanceOf(*found.implementation, api, scopeTags, found.scope);
+  rt::Ref<rt::Object> instance = instanceOf(*found.implementation, api, scopeTags, std::move(found.scope));
   if (!instance) [[unlikely]]
     reportNoInstance(kFunction, *found.implementation, api);
   return instance;
@@ -170,7 +148,7 @@ SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SR
     return all;
   }();
   if (found.instance || !found.implementation) return std::move(found.instance);
-  return instanceOf(*found.implementation, api, scopeTags, found.scope);
+  return instanceOf(*found.implementation, api, scopeTags, std::move(found.scope));
 }
 
 rt::Ref<SRLImplementation> SRLRegistry::implementationForSingleBoundService(
@@ -214,6 +192,7 @@ bool SRLRegistry::registersBindingsFor(const SRLAPIRegistrationData* api) {
   }
   rt::Ref<rt::Set> implementations;
   std::vector<rt::Ref<rt::Object>> instances;
+  rt::Ref<SRLMemoizingScope> scope;
   decltype(implementations->begin()) next;
   {
     const rt::LockGuard guard(ivars_->lock);
@@ -232,14 +211,16 @@ bool SRLRegistry::registersBindingsFor(const SRLAPIRegistrationData* api) {
     // Those that are there, up to the first that is to be made: its factory may do anything, such as end a
     // scope.
     for (next = implementations->begin(); next != implementations->end(); ++next) {
-      rt::Ref<rt::Object> kept = keptInstanceOf(static_cast<const SRLImplementation&>(**next), scopeTags);
+      rt::Ref<rt::Object> kept =
+          keptInstanceOf(static_cast<const SRLImplementation&>(**next), scopeTags, scope);
       if (!kept) break;
       instances.push_back(std::move(kept));
     }
   }
   for (; next != implementations->end(); ++next) {
     auto& implementation = static_cast<SRLImplementation&>(**next);
-    if (rt::Ref<rt::Object> instance = instanceOf(implementation, api, scopeTags, nullptr)) {
+    if (rt::Ref<rt::Object> instance =
+            instanceOf(implementation, api, scopeTags, std::exchange(scope, nullptr))) {
       instances.push_back(std::move(instance));
     } else {
       reportNoInstanceOfMany(kFunction, implementation, api);
@@ -379,17 +360,5 @@ SRLFactoryBlock SRLRegistry::scopedBlockForFactory(
     rt::Ref<rt::Object> (*factory)(SRLScopeTagSet tags),
     const SRLImplementationRegistrationData* implementationIdentifier, SRLScopeType apiScope,
     SRLScopeType implScope, std::uint64_t lifetime) {
-  if (lifetime == 1) {
-    return [=](const SRLScopeTagSet& tags, bool* instanceCreated) {
-      if (instanceCreated != nullptr) *instanceCreated = true;
-      return factory(SRLScopeTagSetMaskingWithScopes(tags, apiScope, implScope));
-    };
-  }
-  return [=](const SRLScopeTagSet& tags, bool* instanceCreated) -> rt::Ref<rt::Object> {
-    const SRLScopeTagSet masked = SRLScopeTagSetMaskingWithScopes(tags, apiScope, implScope);
-    const rt::Ref<SRLRegistry> registry = sharedInstance();
-    if (!registry) return nullptr;
-    return registry->scopeWithTags(masked)->instanceForIdentifier(implementationIdentifier, instanceCreated,
-                                                                  [&] { return factory(masked); });
-  };
+  return SRLScopedFactory{factory, implementationIdentifier, apiScope, implScope, lifetime};
 }

@@ -63,6 +63,11 @@ struct SRLRegistryIvars {
     return lastScope->second.get();
   }
 
+  /// Whether an API is in one of the tables of what is bound.
+  bool isKnown(const SRLAPIRegistrationData* api) const RT_REQUIRES(lock) {
+    return singleBindings.find(api) != nullptr || multiBindings.find(api) != nullptr;
+  }
+
   /// Whether it is known that no module knows an API.
   bool isUnknown(const SRLAPIRegistrationData* api) const RT_REQUIRES(lock) {
     return unknownAPIs.find(api) != nullptr;

@@ -22,7 +22,16 @@ rt::Ref<SRLImplementation> SRLImplementation::initWithIdentifier(
     const rt::Ref<SRLImplementationConfiguration>& configuration) {
   return rt::Ref<SRLImplementation>::adopt(new SRLImplementation(identifier, std::move(instanceType),
                                                                  lifetime, scope, std::move(factoryBlock),
-                                                                 rt::copy(configuration)));
+                                                                 std::nullopt, rt::copy(configuration)));
+}
+
+rt::Ref<SRLImplementation> SRLImplementation::initWithIdentifier(
+    std::string_view identifier, rt::Ref<SRLInstanceType> instanceType, std::uint64_t lifetime,
+    SRLScopeType scope, const SRLScopedFactory& scopedFactory,
+    const rt::Ref<SRLImplementationConfiguration>& configuration) {
+  return rt::Ref<SRLImplementation>::adopt(new SRLImplementation(identifier, std::move(instanceType),
+                                                                 lifetime, scope, scopedFactory,
+                                                                 scopedFactory, rt::copy(configuration)));
 }
 
 bool SRLImplementation::isEqual(const rt::Object* other) const {

@@ -11,6 +11,7 @@
 /// Not for: the instances, which are whatever the factory makes.
 
 #include <cstdint>
+#include <optional>
 #include <string_view>
 #include <utility>
 
@@ -24,6 +25,7 @@
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementationConfiguration.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeType.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLScopedFactory.h"
 
 class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementation, rt::Object> {
  public:
@@ -36,12 +38,23 @@ class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementati
       SRLScopeType scope, SRLFactoryBlock factoryBlock,
       const rt::Ref<SRLImplementationConfiguration>& configuration);
 
+  /// The same for a registry, with a block that does what `scopedFactory` does.
+  static rt::Ref<SRLImplementation> initWithIdentifier(
+      std::string_view identifier, rt::Ref<SRLInstanceType> instanceType, std::uint64_t lifetime,
+      SRLScopeType scope, const SRLScopedFactory& scopedFactory,
+      const rt::Ref<SRLImplementationConfiguration>& configuration);
+
   /// What the factory makes; may be null.
   const rt::Ref<SRLInstanceType>& instanceType() const noexcept { return instanceType_; }
   std::uint64_t lifetime() const noexcept { return lifetime_; }
   /// The scope in which an instance lives.
   SRLScopeType scopeType() const noexcept { return scopeType_; }
   const SRLFactoryBlock& factoryBlock() const noexcept { return factoryBlock_; }
+  /// What the factory block does, for a registry that looks first whether the instance is there; null where
+  /// the block is somebody's own.
+  const SRLScopedFactory* scopedFactory() const noexcept {
+    return scopedFactory_ ? &*scopedFactory_ : nullptr;
+  }
   /// What the implementation wants to be configured with; may be null.
   const rt::Ref<SRLImplementationConfiguration>& configuration() const noexcept { return configuration_; }
 
@@ -57,25 +70,21 @@ class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementati
  private:
   SRLImplementation(std::string_view identifier, rt::Ref<SRLInstanceType> instanceType,
                     std::uint64_t lifetime, SRLScopeType scope, SRLFactoryBlock factoryBlock,
+                    std::optional<SRLScopedFactory> scopedFactory,
                     rt::Ref<SRLImplementationConfiguration> configuration) noexcept
       : identifier_(identifier),
         scopeType_(scope),
         instanceType_(std::move(instanceType)),
         lifetime_(lifetime),
         factoryBlock_(std::move(factoryBlock)),
+        scopedFactory_(scopedFactory),
         configuration_(std::move(configuration)) {}
-
-  friend class SRLRegistry;
 
   const std::string_view identifier_;
   const SRLScopeType scopeType_;
   const rt::Ref<SRLInstanceType> instanceType_;
   const std::uint64_t lifetime_;
   const SRLFactoryBlock factoryBlock_;
+  const std::optional<SRLScopedFactory> scopedFactory_;
   const rt::Ref<SRLImplementationConfiguration> configuration_;
-
-  // What a registry has made it of, for an API of this scope: its factory block does nothing that the
-  // registry could not do at one go. Set before anybody else knows it.
-  const SRLImplementationRegistrationData* record_ = nullptr;
-  SRLScopeType apiScope_ = 0;
 };

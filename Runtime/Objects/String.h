@@ -112,7 +112,7 @@ class String {
   constexpr bool isNull() const noexcept {
     // With -fno-delete-null-pointer-checks, which goes with -fsanitize=undefined, g++ cannot compare the
     // address of a literal with null while it compiles.
-    if (std::is_constant_evaluated() && !__builtin_constant_p(object_ == nullptr)) return false;
+    if (std::is_constant_evaluated() && __builtin_constant_p(object_ == nullptr) == 0) return false;
     return object_ == nullptr;
   }
   constexpr explicit operator bool() const noexcept { return !isNull(); }

@@ -163,7 +163,7 @@ TEST(SRLScopeTagSetCodableWrapper, HashesAsItsTagSetDoes) {
   EXPECT_EQ(hash, SRLScopeTagSetHash(SRLScopeTagSetCreateWithTags(tags.get())));
   // A fifth, which no set has room for, counts too.
   const Ref<WindowTag> fifth = rt::make<WindowTag>();
-  EXPECT_EQ(Wrapper::initWithTags(rt::Array::of("a"_s, "b"_s, "c"_s, "d"_s, fifth))->hash(), hash * 41 + 5);
+  EXPECT_EQ(Wrapper::initWithTags(rt::Array::of("a"_s, "b"_s, "c"_s, "d"_s, fifth))->hash(), (hash * 41) + 5);
   EXPECT_EQ(Wrapper::initWithTags(rt::Array::of(fifth))->hash(), 88046829532U);  // 2147483647 * 41 + 5
 }
 

@@ -3,8 +3,8 @@
 /// How an implementation's instance is had for the tags of a request: from its factory each time, or from the
 /// scope that keeps it. Requests and factory blocks have it by the same function, `make`.
 ///
-///     const SRLScopedFactory factory{record->factory, record, api->scopeType, record->scopeType,
-///                                    record->lifetime};
+///     const SRLScopedFactory factory{systemClock.factory, &systemClock, clockAPI.scopeType,
+///                                    systemClock.scopeType, systemClock.lifetime};
 ///     rt::Ref<rt::Object> instance = factory.make(tags, /*instanceCreated=*/nullptr, /*scope=*/nullptr);
 ///     SRLFactoryBlock block = factory;
 ///

@@ -169,27 +169,31 @@ bool SRLRegistry::multipleBindingsModulesAllowed() const {
   });
 }
 
+// Does not ask `registrationDatasForAPI`, whose list would cost a first request a seventh.
 bool SRLRegistry::lazilyRegisterBindingsForAPI(const SRLAPIRegistrationData* api) {
-  // Their APIs have the identifier of `api`, and may be other records.
-  std::vector<const _SRLBindingRegistrationData*> bindings = registrationDatasForAPI(api);
-  auto next = bindings.begin();
+  const bool isNew = !ivars_->isKnown(api);
+  // What becomes known beside `api`: other records with its identifier.
+  std::vector<const SRLAPIRegistrationData*> others;
+  bool hasBindings = false;
   try {
-    for (; next != bindings.end(); ++next) {
-      const _SRLBindingRegistrationData& binding = **next;
-      // Nothing is to be undone of an API that was known before.
-      if (ivars_->isKnown(binding.api)) *next = nullptr;
-      registerBindings(binding);
+    for (const SRLBindingsModuleData* module : ivars_->bindingsModules) {
+      const _SRLBindingRegistrationData* binding = bindingOf(*module, api->identifier);
+      if (binding == nullptr) continue;
+      hasBindings = true;
+      if (binding->api != api && !ivars_->isKnown(binding->api)) others.push_back(binding->api);
+      registerBindings(*binding);
     }
   } catch (const std::bad_alloc&) {
     // The next request begins anew, rather than find that some are missing.
-    for (const auto* binding : std::span(bindings.begin(), next + 1)) {
-      if (binding == nullptr) continue;
-      ivars_->singleBindings.erase(binding->api);
-      ivars_->multiBindings.erase(binding->api);
-    }
+    const auto forget = [this](const SRLAPIRegistrationData* each) RT_NO_THREAD_SAFETY_ANALYSIS {
+      ivars_->singleBindings.erase(each);
+      ivars_->multiBindings.erase(each);
+    };
+    if (isNew) forget(api);
+    std::ranges::for_each(others, forget);
     throw;
   }
-  return !bindings.empty();
+  return hasBindings;
 }
 
 std::vector<const _SRLBindingRegistrationData*> SRLRegistry::registrationDatasForAPI(

@@ -2,7 +2,7 @@
 
 #include <utility>
 
-#include "Foundation/ZEBDropExceptions.h"
+#include "Foundation/Private/ZEBDropExceptions.h"
 
 ZEBFileHandleLogWriter::ZEBFileHandleLogWriter(rt::Ref<rt::FileHandle> fileHandle) noexcept
     : fileHandle_(std::move(fileHandle)) {}

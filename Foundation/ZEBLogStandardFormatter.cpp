@@ -7,6 +7,7 @@
 #include "Runtime/Objects/StringBuilder.h"
 #include "Runtime/Process/Process.h"
 #include "Runtime/Process/Thread.h"
+#include "Runtime/Text/Private/LocalTimeFormatter.h"
 
 using namespace rt::literals;
 
@@ -40,6 +41,8 @@ ZEBLogStandardFormatter::ZEBLogStandardFormatter(rt::Ref<rt::LocalTimeFormatter>
     : dateFormatter_(std::move(dateFormatter)),
       processName_(std::move(processName)),
       processIdentifier_(processIdentifier) {}
+
+ZEBLogStandardFormatter::~ZEBLogStandardFormatter() = default;
 
 rt::String ZEBLogStandardFormatter::stringForFunc(const rt::String& func, const rt::String& withFormat,
                                                   std::va_list valist, ZEBLogLevel level) {

@@ -7,7 +7,7 @@
 ///
 ///     | 2026-11-21 08:04:20.123 importer[4711/0x7f3a5c0e2740] [lvl=3] main() 3 left
 ///
-/// The time is the local one (Runtime/Text/LocalTimeFormatter.h); the thread is its handle. The process is
+/// The time is the local one; the thread is its handle. The process is
 /// the one in which the formatter was made, also in the child of a fork.
 ///
 /// Any thread may use it.
@@ -17,13 +17,17 @@
 #include "Foundation/ZEBLogBasicFormatter.h"
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Ref.h"
-#include "Runtime/Text/LocalTimeFormatter.h"
+
+namespace rt {
+class LocalTimeFormatter;
+}
 
 class RT_VISIBLE ZEBLogStandardFormatter
     : public rt::Implements<ZEBLogStandardFormatter, ZEBLogBasicFormatter> {
  public:
   /// A formatter for this process; null where its name or a formatter of dates cannot be had.
   static rt::Ref<ZEBLogStandardFormatter> init();
+  ~ZEBLogStandardFormatter() override;
 
   /// The line, never null: "(null)" stands for a message of which format or arguments are null. Throws what a
   /// description of an argument throws.

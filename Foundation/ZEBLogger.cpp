@@ -3,8 +3,8 @@
 #include <string_view>
 #include <utility>
 
+#include "Foundation/Private/ZEBDropExceptions.h"
 #include "Foundation/ZEBArrayCompositeLogWriter.h"
-#include "Foundation/ZEBDropExceptions.h"
 #include "Foundation/ZEBFileHandleLogWriter.h"
 #include "Foundation/ZEBLogBasicFormatter.h"
 #include "Foundation/ZEBLogLevelFilter.h"
@@ -12,7 +12,7 @@
 #include "Foundation/ZEBLogMininumLevelFilter.h"
 #include "Foundation/ZEBLogNoFilter.h"
 #include "Foundation/ZEBLogStandardFormatter.h"
-#include "Runtime/Locks/Lazy.h"
+#include "Runtime/Locks/Private/Lazy.h"
 
 using namespace rt::literals;
 

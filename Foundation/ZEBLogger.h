@@ -29,10 +29,10 @@
 #include "Foundation/ZEBLogWriter.h"
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Locks/RecursiveLock.h"
-#include "Runtime/Objects/AtomicRef.h"
+#include "Runtime/Objects/Private/AtomicRef.h"
 #include "Runtime/Objects/Ref.h"
-#include "Runtime/Text/FormatArguments.h"
 #include "Runtime/Text/FormatString.h"
+#include "Runtime/Text/Private/FormatArguments.h"
 
 class RT_VISIBLE ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLogWriter> {
  public:

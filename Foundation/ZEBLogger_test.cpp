@@ -17,7 +17,7 @@
 #include "Foundation/ZEBLogAllowedLevelFilter.h"
 #include "Foundation/ZEBLogBasicFormatter.h"
 #include "Foundation/ZEBLogNoFilter.h"
-#include "Runtime/Process/CallStack.h"
+#include "Runtime/Process/Private/CallStack.h"
 #include "Runtime/Text/Format.h"
 #include "tests/support/ZEBLoggerTest.h"
 

@@ -15,7 +15,7 @@
 #include <thread>
 
 #include "Comparison.h"
-#include "Runtime/Process/CallStack.h"
+#include "Runtime/Process/Private/CallStack.h"
 #include "Shared/Logging/LUMAsyncLogger.h"
 #include "Shared/Logging/LUMLog.h"
 #include "Shared/Logging/LUMLogMinimumLevelFilter.h"

@@ -7,8 +7,8 @@
 #include "Runtime/Objects/Ref.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementation.h"
-#include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingEnabled.h"
-#include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingMeasurement.h"
+#include "Shared/ServiceRegistry/Source/Profiling/Private/SRLPProfilingEnabled.h"
+#include "Shared/ServiceRegistry/Source/Profiling/Private/SRLPProfilingMeasurement.h"
 
 namespace {
 

@@ -19,7 +19,7 @@
 #include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Objects/ClassMethod.h"
 #include "Runtime/Objects/Ref.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 
 namespace {
 

@@ -20,9 +20,9 @@
 #include "Runtime/Objects/String.h"
 #include "Runtime/Values/Array.h"
 #include "Runtime/Values/Set.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLAPIIdentifier.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLTable.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 
 namespace {
 

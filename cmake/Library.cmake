@@ -29,16 +29,15 @@ function(mount_point_library name public_name)
   list(TRANSFORM library_LIBRARIES APPEND "-whole" OUTPUT_VARIABLE below)
   target_link_libraries(${name}-whole INTERFACE ${below})
 
-  install(TARGETS ${name} ${name}-whole EXPORT MountPoint
-    ARCHIVE DESTINATION "${CMAKE_INSTALL_LIBDIR}" COMPONENT development)
-  # Headers keep their folder. What differs by system is installed for this system only.
-  cmake_path(RELATIVE_PATH CMAKE_CURRENT_SOURCE_DIR BASE_DIRECTORY "${PROJECT_SOURCE_DIR}" OUTPUT_VARIABLE folder)
-  set(other_system Linux Darwin)
-  list(REMOVE_ITEM other_system ${CMAKE_SYSTEM_NAME})
-  install(DIRECTORY "${CMAKE_CURRENT_SOURCE_DIR}/" COMPONENT development
-    DESTINATION "${CMAKE_INSTALL_INCLUDEDIR}/mount-point/${folder}"
-    FILES_MATCHING PATTERN "*.h" PATTERN must-not-compile EXCLUDE PATTERN CMakeFiles EXCLUDE
-    PATTERN ${other_system} EXCLUDE)
+  # Both sets exist before `mount_point_headers` adds files to them. Headers keep their folder when installed.
+  target_sources(${name}
+    PUBLIC
+      FILE_SET HEADERS BASE_DIRS "${PROJECT_SOURCE_DIR}"
+      FILE_SET needed_headers TYPE HEADERS BASE_DIRS "${PROJECT_SOURCE_DIR}")
+  install(TARGETS ${name} ${name}-whole EXPORT MountPoint COMPONENT development
+    ARCHIVE DESTINATION "${CMAKE_INSTALL_LIBDIR}"
+    FILE_SET HEADERS DESTINATION "${CMAKE_INSTALL_INCLUDEDIR}/mount-point"
+    FILE_SET needed_headers DESTINATION "${CMAKE_INSTALL_INCLUDEDIR}/mount-point")
 
   # The prefix is told from where the file is, so that the whole may be moved. One word for what is
   # linked whole: pkg-config reorders words.
@@ -55,6 +54,17 @@ function(mount_point_library name public_name)
   configure_file("${PROJECT_SOURCE_DIR}/cmake/library.pc.in" "${PROJECT_BINARY_DIR}/${file}.pc" @ONLY)
   install(FILES "${PROJECT_BINARY_DIR}/${file}.pc" DESTINATION "${CMAKE_INSTALL_LIBDIR}/pkgconfig"
     COMPONENT development)
+endfunction()
+
+# mount_point_headers(NAME PUBLIC FILE… [NEEDED FILE…])
+#
+# Names headers of the library NAME, of this folder. PUBLIC ones are its interface: hosts include them. NEEDED ones lie
+# in folders called Private/: public headers include them, for templates and inline functions. Both are installed, and
+# nothing else is. `tests/check-headers` compares the lists with the includes.
+function(mount_point_headers name)
+  cmake_parse_arguments(PARSE_ARGV 1 headers "" "" "PUBLIC;NEEDED")
+  target_sources(${name} PUBLIC FILE_SET HEADERS FILES ${headers_PUBLIC})
+  target_sources(${name} PUBLIC FILE_SET needed_headers FILES ${headers_NEEDED})
 endfunction()
 
 # mount_point_install_package()

@@ -6,8 +6,8 @@
 #include <string>
 #include <string_view>
 
-#include "Runtime/Base/UTF8.h"
-#include "Runtime/Defaults/DefaultsText.h"
+#include "Runtime/Base/Private/UTF8.h"
+#include "Runtime/Defaults/Private/DefaultsText.h"
 
 namespace {
 

@@ -16,7 +16,7 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Base/UTF8.h"
+#include "Runtime/Base/Private/UTF8.h"
 #include "Runtime/Objects/String.h"
 #include "Runtime/Text/Format.h"
 

@@ -10,7 +10,7 @@
 #include "Runtime/Archive/Coding.h"
 #include "Runtime/Archive/KeyedArchiver.h"
 #include "Runtime/Archive/KeyedUnarchiver.h"
-#include "Runtime/Archive/PropertyList.h"
+#include "Runtime/Archive/Private/PropertyList.h"
 #include "Runtime/Objects/Exception.h"
 #include "Runtime/Values/Array.h"
 #include "Runtime/Values/Dictionary.h"

@@ -16,7 +16,7 @@
 #include <variant>
 #include <vector>
 
-#include "Runtime/Base/UTF8.h"
+#include "Runtime/Base/Private/UTF8.h"
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"

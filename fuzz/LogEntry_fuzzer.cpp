@@ -18,12 +18,12 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Base/UTF8.h"
-#include "Runtime/Locks/ThreadIdentifier.h"
-#include "Runtime/SystemLog/Linux/Journal.h"
-#include "Runtime/SystemLog/Linux/LogEntry.h"
-#include "Runtime/SystemLog/Linux/LogLines.h"
-#include "Runtime/SystemLog/Linux/Patience.h"
+#include "Runtime/Base/Private/UTF8.h"
+#include "Runtime/Locks/Private/ThreadIdentifier.h"
+#include "Runtime/SystemLog/Private/Linux/Journal.h"
+#include "Runtime/SystemLog/Private/Linux/LogEntry.h"
+#include "Runtime/SystemLog/Private/Linux/LogLines.h"
+#include "Runtime/SystemLog/Private/Linux/Patience.h"
 
 namespace {
 

@@ -12,7 +12,7 @@
 
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Object.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "fuzz/SRLRegistryRecords.h"
 
 using Reports = std::vector<std::string>;

@@ -11,7 +11,7 @@
 
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Object.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 
 using Tags = std::vector<std::string>;
 

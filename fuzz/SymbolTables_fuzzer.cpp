@@ -18,7 +18,7 @@
 #include <string_view>
 #include <vector>
 
-#include "Runtime/Process/SymbolTables.h"
+#include "Runtime/Process/Private/SymbolTables.h"
 
 namespace {
 

@@ -8,7 +8,7 @@
 #include <string_view>
 #include <unordered_set>
 
-#include "Runtime/Base/UTF8.h"
+#include "Runtime/Base/Private/UTF8.h"
 #include "Runtime/Objects/String.h"
 
 namespace {

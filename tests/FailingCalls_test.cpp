@@ -27,10 +27,10 @@
 #include <thread>
 #include <vector>
 
-#include "Runtime/Base/StandardError.h"
+#include "Runtime/Base/Private/StandardError.h"
 #include "Runtime/Defaults/UserDefaults.h"
-#include "Runtime/Process/CallStack.h"
 #include "Runtime/Process/FileHandle.h"
+#include "Runtime/Process/Private/CallStack.h"
 #include "Runtime/SystemLog/SystemLog.h"
 #include "tests/support/PrivateJournal.h"
 #include "tests/support/Process.h"

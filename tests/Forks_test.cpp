@@ -27,7 +27,7 @@
 #include "Shared/Logging/LUMLogDropAllFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMLogNoFilter.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "tests/support/ForkTest.h"
 #include "tests/support/TestServices.h"
 #include "tests/support/ZEBLoggerTest.h"

@@ -43,7 +43,7 @@
 #include "Runtime/SystemLog/SystemLog.h"
 #include "Shared/Logging/LUMLog.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "tests/support/ClockHook.h"
 #include "tests/support/ForkTest.h"
 #include "tests/support/PrivateJournal.h"

@@ -28,10 +28,10 @@
 #include "Foundation/ZEBLogger.h"
 #include "Libraries/Util/ErrorHandler/PECReport.h"
 #include "Runtime/Archive/Coding.h"
-#include "Runtime/Base/FileDescriptor.h"
-#include "Runtime/Locks/LongLock.h"
+#include "Runtime/Base/Private/FileDescriptor.h"
+#include "Runtime/Locks/Private/LongLock.h"
+#include "Runtime/Locks/Private/ThreadIdentifier.h"
 #include "Runtime/Locks/RecursiveLock.h"
-#include "Runtime/Locks/ThreadIdentifier.h"
 #include "Runtime/Objects/Weak.h"
 #include "Runtime/Process/AssertionHandler.h"
 #include "Runtime/Process/FileHandle.h"
@@ -39,8 +39,8 @@
 #include "Shared/Logging/LUMLogFormatter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMSyncLogger.h"
-#include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingMeasurement.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
+#include "Shared/ServiceRegistry/Source/Profiling/Private/SRLPProfilingMeasurement.h"
 
 namespace program {
 

@@ -4,7 +4,7 @@
 #include <limits>
 #include <utility>
 
-#include "Runtime/Archive/KeyedArchiveFormat.h"
+#include "Runtime/Archive/Private/KeyedArchiveFormat.h"
 #include "Runtime/Objects/Exception.h"
 #include "Runtime/Values/Array.h"
 #include "Runtime/Values/Dictionary.h"

@@ -16,7 +16,8 @@
 /// The size of what is under a key at the top must be at most 16 MiB more than 16 times that of the archive,
 /// if each object and each byte of a text is counted as often as it is reached: what is larger is not read.
 ///
-/// The bytes are a binary property list (Runtime/Archive/PropertyList.h): a dictionary of "$archiver",
+/// The bytes are a binary property list (Runtime/Archive/Private/PropertyList.h): a dictionary of
+/// "$archiver",
 /// "$version" 100000, "$top" with a reference for each key, and "$objects", to whose places references refer.
 /// Strings and numbers stand there as themselves and "$null" in the first place. All others are dictionaries,
 /// where "$class" refers to a class, a dictionary of "$classname" and "$classes", the names from the class up
@@ -36,7 +37,7 @@
 #include <vector>
 
 #include "Runtime/Archive/Coding.h"
-#include "Runtime/Archive/PropertyList.h"
+#include "Runtime/Archive/Private/PropertyList.h"
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"

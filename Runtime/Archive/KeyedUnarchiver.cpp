@@ -3,7 +3,7 @@
 #include <algorithm>
 #include <utility>
 
-#include "Runtime/Archive/KeyedArchiveFormat.h"
+#include "Runtime/Archive/Private/KeyedArchiveFormat.h"
 #include "Runtime/Objects/ClassMethod.h"
 #include "Runtime/Values/Array.h"
 #include "Runtime/Values/Dictionary.h"

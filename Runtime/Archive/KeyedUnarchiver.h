@@ -26,8 +26,8 @@
 ///
 /// An unarchiver is used by one thread at a time.
 ///
-/// Not for: archives of other programs, whose classes are not known here (Runtime/Archive/PropertyList.h
-/// reads those).
+/// Not for: archives of other programs, whose classes are not known here
+/// (Runtime/Archive/Private/PropertyList.h reads those).
 
 #include <cstddef>
 #include <cstdint>
@@ -40,7 +40,7 @@
 #include <vector>
 
 #include "Runtime/Archive/Coding.h"
-#include "Runtime/Archive/PropertyList.h"
+#include "Runtime/Archive/Private/PropertyList.h"
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"

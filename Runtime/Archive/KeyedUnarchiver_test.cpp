@@ -8,7 +8,7 @@
 #include <stdexcept>
 
 #include "Runtime/Archive/KeyedArchiver.h"
-#include "Runtime/Archive/PropertyList.h"
+#include "Runtime/Archive/Private/PropertyList.h"
 #include "Runtime/Values/Array.h"
 #include "Runtime/Values/Dictionary.h"
 #include "Runtime/Values/Number.h"

@@ -11,10 +11,10 @@
 #include <type_traits>
 #include <utility>
 
-#include "Runtime/Defaults/DefaultsStore.h"
-#include "Runtime/Defaults/FilePath.h"
-#include "Runtime/Defaults/SystemDefaultsFolder.h"
-#include "Runtime/Locks/Lazy.h"
+#include "Runtime/Defaults/Private/DefaultsStore.h"
+#include "Runtime/Defaults/Private/FilePath.h"
+#include "Runtime/Defaults/Private/SystemDefaultsFolder.h"
+#include "Runtime/Locks/Private/Lazy.h"
 #include "Runtime/Process/Bundle.h"
 #include "Runtime/Process/Process.h"
 

@@ -12,8 +12,8 @@
 ///
 ///     defaults->setBool(true, "ZEBVerboseLogging");
 ///
-/// The settings are in one text file, one `key = value` a line (Runtime/Defaults/DefaultsText.h), which
-/// people may edit at any time:
+/// The settings are in one text file, one `key = value` a line (Runtime/Defaults/Private/DefaultsText.h),
+/// which people may edit at any time:
 ///
 ///     | $XDG_CONFIG_HOME/APPLICATION/defaults.conf, where that is not set ~/.config/...
 ///     | ~/Library/Application Support/APPLICATION/defaults.conf on macOS

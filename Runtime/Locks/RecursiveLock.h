@@ -10,7 +10,7 @@
 ///
 /// It is let go when it has been unlocked as often as it was locked. Letting go a lock that another
 /// thread, or none, holds ends the program with a line on standard error. Otherwise as
-/// Runtime/Locks/LongLock.h, also where a fork is concerned.
+/// Runtime/Locks/Private/LongLock.h, also where a fork is concerned.
 ///
 /// Not for: code that can be arranged to take its lock once. The annotations see one function at a time,
 /// so a function that itself takes the lock twice does not compile with clang.
@@ -18,7 +18,7 @@
 #include <cstdint>
 
 #include "Runtime/Base/ThreadSafety.h"
-#include "Runtime/Locks/OwnerLock.h"
+#include "Runtime/Locks/Private/OwnerLock.h"
 #include "Runtime/Locks/UnfairLock.h"  // LockGuard
 
 namespace rt {

@@ -28,17 +28,18 @@
 /// that thread held.) A fork waits for about a second at most. A lock that is still held then is free in the
 /// child. What it guards is as its holder left it. On macOS it stays held then.
 ///
-/// Not for: what takes long, such as system calls that wait and code of others (Runtime/Locks/LongLock.h);
-/// locks that a thread takes again while it holds them (Runtime/Locks/RecursiveLock.h); waiting for a
-/// condition, for which a queue is better (Runtime/Queues/Queue.h).
+/// Not for: what takes long, such as system calls that wait and code of others
+/// (Runtime/Locks/Private/LongLock.h); locks that a thread takes again while it holds them
+/// (Runtime/Locks/RecursiveLock.h); waiting for a condition, for which a queue is better
+/// (Runtime/Queues/Queue.h).
 
 #include "Runtime/Base/ThreadSafety.h"
-#include "Runtime/Locks/ForkGate.h"
+#include "Runtime/Locks/Private/ForkGate.h"
 
 #if defined(__APPLE__)
-#include "Runtime/Locks/Darwin/SystemLock.h"
+#include "Runtime/Locks/Private/Darwin/SystemLock.h"
 #else
-#include "Runtime/Locks/Linux/SystemLock.h"
+#include "Runtime/Locks/Private/Linux/SystemLock.h"
 #endif
 
 namespace rt {

@@ -15,7 +15,7 @@
 #include <thread>
 #include <vector>
 
-#include "Runtime/Locks/ThreadIdentifier.h"
+#include "Runtime/Locks/Private/ThreadIdentifier.h"
 
 namespace {
 

@@ -23,7 +23,6 @@
 
 #include <concepts>
 #include <cstddef>
-#include <functional>
 #include <string_view>
 #include <type_traits>
 #include <utility>
@@ -65,7 +64,7 @@ class CapturingBlock final : public BlockBody<Result, Arguments...> {
   CapturingBlock(std::in_place_t, From&& function) : function_(std::forward<From>(function)) {}
 
   Result call(Arguments... arguments) const override {
-    return static_cast<Result>(std::invoke(function_, std::forward<Arguments>(arguments)...));
+    return static_cast<Result>(function_(std::forward<Arguments>(arguments)...));
   }
 
  private:
@@ -109,6 +108,7 @@ class Block<Result(Arguments...)> {
   /// copying `function` throws; neither if it is stateless.
   template <class Function>
     requires(!std::same_as<std::remove_cvref_t<Function>, Block> &&
+             !std::is_member_pointer_v<std::decay_t<Function>> &&
              std::is_invocable_r_v<Result, std::decay_t<Function>&, Arguments...>)
   Block(Function&& function) {
     using Stored = std::decay_t<Function>;
@@ -116,7 +116,7 @@ class Block<Result(Arguments...)> {
       body_ = &detail::kConstantBlock<Stored, Result, Arguments...>;
     } else {
       using Given = std::remove_cvref_t<Function>;
-      if constexpr (std::is_pointer_v<Given> || std::is_member_pointer_v<Given>) {
+      if constexpr (std::is_pointer_v<Given>) {
         if (function == nullptr) return;
       }
       body_ = Ref<const Body>::adopt(new detail::CapturingBlock<Stored, Result, Arguments...>(

@@ -39,8 +39,6 @@ TEST(Block, IsMadeFromWhatCanBeCalled) {
   EXPECT_EQ(fromFunction(21), 42);
   const rt::Block<int(int)> fromFunctionName = twice;
   EXPECT_EQ(fromFunctionName(21), 42);
-  const rt::Block<std::size_t(const std::string&)> fromMember = &std::string::size;
-  EXPECT_EQ(fromMember("four"), 4U);
   const rt::Block<int(int)> fromNullPointer = static_cast<int (*)(int)>(nullptr);
   EXPECT_FALSE(fromNullPointer);
 }

@@ -39,8 +39,8 @@
 #include <type_traits>
 
 #include "Runtime/Objects/ClassInfo.h"
-#include "Runtime/Objects/ClassRecord.h"
 #include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Private/ClassRecord.h"
 
 namespace rt {
 

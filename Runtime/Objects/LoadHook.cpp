@@ -2,7 +2,7 @@
 
 #include <utility>
 
-#include "Runtime/Base/LoadedImages.h"
+#include "Runtime/Base/Private/LoadedImages.h"
 #include "Runtime/Locks/UnfairLock.h"
 
 namespace rt::detail {

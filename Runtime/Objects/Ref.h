@@ -17,10 +17,10 @@
 
 #include <concepts>
 #include <cstddef>
-#include <functional>
+#include <string_view>  // std::hash
 #include <utility>
 
-#include "Runtime/Base/LifetimeBound.h"
+#include "Runtime/Base/Private/LifetimeBound.h"
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Object.h"
 

@@ -1,5 +1,6 @@
 #include "Runtime/Objects/String.h"
 
+#include <algorithm>
 #include <array>
 #include <cstring>
 #include <limits>

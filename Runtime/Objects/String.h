@@ -21,16 +21,14 @@
 ///
 /// Not for: bytes that are not text; building a text piece by piece (Runtime/Objects/StringBuilder.h).
 
-#include <algorithm>
 #include <compare>
 #include <cstddef>
 #include <cstdint>
-#include <functional>
 #include <string_view>
 #include <type_traits>
 #include <utility>
 
-#include "Runtime/Base/UTF8.h"
+#include "Runtime/Base/Private/UTF8.h"
 #include "Runtime/Objects/StringObject.h"
 
 namespace rt {
@@ -40,7 +38,9 @@ namespace detail {
 /// The characters of a literal, as an argument of a template.
 template <std::size_t size>
 struct StringLiteral {
-  consteval StringLiteral(const char (&text)[size]) { std::copy_n(text, size, characters); }
+  consteval StringLiteral(const char (&text)[size]) {
+    for (std::size_t index = 0; index < size; ++index) characters[index] = text[index];
+  }
 
   constexpr std::string_view view() const noexcept { return {characters, size - 1}; }
 

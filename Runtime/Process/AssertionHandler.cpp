@@ -3,9 +3,9 @@
 #include <chrono>
 #include <string>
 
-#include "Runtime/Base/StandardError.h"
+#include "Runtime/Base/Private/StandardError.h"
 #include "Runtime/Objects/Exception.h"
-#include "Runtime/Process/ThreadReference.h"
+#include "Runtime/Process/Private/ThreadReference.h"
 
 namespace rt {
 

@@ -1,7 +1,7 @@
 #include "Runtime/Process/Bundle.h"
 
 #include "Runtime/Locks/UnfairLock.h"
-#include "Runtime/Process/SystemBundle.h"
+#include "Runtime/Process/Private/SystemBundle.h"
 
 namespace rt::Bundle {
 

@@ -11,8 +11,8 @@
 #include <string>
 #include <system_error>
 
-#include "Runtime/Base/FileDescriptor.h"
-#include "Runtime/Locks/Lazy.h"
+#include "Runtime/Base/Private/FileDescriptor.h"
+#include "Runtime/Locks/Private/Lazy.h"
 #include "Runtime/Locks/UnfairLock.h"
 
 namespace rt {

@@ -18,7 +18,7 @@
 #include <string_view>
 
 #include "Runtime/Base/Visibility.h"
-#include "Runtime/Locks/LongLock.h"
+#include "Runtime/Locks/Private/LongLock.h"
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"

@@ -2,8 +2,8 @@
 
 #include <pthread.h>
 
-#include "Runtime/Process/SystemThreadName.h"
-#include "Runtime/Process/ThreadReference.h"
+#include "Runtime/Process/Private/SystemThreadName.h"
+#include "Runtime/Process/Private/ThreadReference.h"
 
 namespace rt::Thread {
 

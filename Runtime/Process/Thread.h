@@ -6,7 +6,8 @@
 ///     rt::Thread::currentName();        // "Importer"
 ///     rt::Thread::currentHandle();      // as "%p" prints it
 ///
-/// Not for: starting threads (std::thread); telling threads apart quickly (Runtime/Locks/ThreadIdentifier.h).
+/// Not for: starting threads (std::thread); telling threads apart quickly
+/// (Runtime/Locks/Private/ThreadIdentifier.h).
 
 #include "Runtime/Objects/String.h"
 

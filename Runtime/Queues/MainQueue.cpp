@@ -3,8 +3,8 @@
 #include <cstdio>
 #include <cstdlib>
 
-#include "Runtime/Locks/Lazy.h"
-#include "Runtime/Locks/ThreadIdentifier.h"
+#include "Runtime/Locks/Private/Lazy.h"
+#include "Runtime/Locks/Private/ThreadIdentifier.h"
 
 namespace rt {
 

@@ -24,8 +24,8 @@
 #include <atomic>
 #include <cstddef>
 
+#include "Runtime/Queues/Private/WakeDescriptor.h"
 #include "Runtime/Queues/Queue.h"
-#include "Runtime/Queues/WakeDescriptor.h"
 
 namespace rt {
 

@@ -14,7 +14,7 @@
 #include <thread>
 #include <vector>
 
-#include "Runtime/Locks/ThreadIdentifier.h"
+#include "Runtime/Locks/Private/ThreadIdentifier.h"
 #include "tests/support/Sanitizers.h"
 
 namespace {

@@ -6,7 +6,7 @@
 #include <exception>
 
 #include "Runtime/Queues/MainQueue.h"
-#include "Runtime/Queues/QueueRegistry.h"
+#include "Runtime/Queues/Private/QueueRegistry.h"
 
 namespace rt {
 

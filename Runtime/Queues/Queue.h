@@ -38,8 +38,6 @@
 #include <concepts>
 #include <cstddef>
 #include <cstdint>
-#include <functional>
-#include <memory>
 #include <optional>
 #include <type_traits>
 #include <utility>
@@ -51,9 +49,9 @@
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
+#include "Runtime/Queues/Private/QueueTask.h"
+#include "Runtime/Queues/Private/WorkerPool.h"
 #include "Runtime/Queues/QualityOfService.h"
-#include "Runtime/Queues/QueueTask.h"
-#include "Runtime/Queues/WorkerPool.h"
 
 namespace rt::detail {
 class QueueRegistry;

@@ -18,7 +18,7 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Locks/ThreadIdentifier.h"
+#include "Runtime/Locks/Private/ThreadIdentifier.h"
 #include "Runtime/Queues/MainQueue.h"
 #include "Runtime/Queues/Queue.h"
 #include "tests/support/AllocationCount.h"

@@ -13,7 +13,7 @@
 #include <thread>
 
 #include "Runtime/Queues/MainQueue.h"
-#include "Runtime/Queues/QueueRegistry.h"
+#include "Runtime/Queues/Private/QueueRegistry.h"
 #include "tests/support/QueueTest.h"
 #include "tests/support/Sanitizers.h"
 

@@ -22,9 +22,9 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Locks/ThreadIdentifier.h"
+#include "Runtime/Locks/Private/ThreadIdentifier.h"
 #include "Runtime/Process/Thread.h"
-#include "Runtime/Queues/WorkerPool.h"
+#include "Runtime/Queues/Private/WorkerPool.h"
 #include "tests/support/ClockHook.h"
 #include "tests/support/QueueTest.h"
 #include "tests/support/Sanitizers.h"

@@ -17,11 +17,11 @@
 /// are written out ("\n", "\x1b"). A packet on the classic socket has 1024 bytes at most, as daemons
 /// expect, so that a long entry becomes several.
 ///
-/// A daemon that is alive but takes nothing holds a caller up for `kLongestWait` at most. Once one has
-/// waited in vain, and nobody else's entry was taken meanwhile, entries are dropped at once until the daemon
-/// takes one again. What was dropped is counted, and the count is written in the place of what is missing:
-/// an error entry of subsystem "rt" with the number in the field DROPPED. What is left to tell when the
-/// program ends by `exit` is tried once more then, and otherwise goes to standard error.
+/// A daemon that is alive but takes nothing holds a caller up for `kLongestWaitMilliseconds` at most. Once
+/// one has waited in vain, and nobody else's entry was taken meanwhile, entries are dropped at once until the
+/// daemon takes one again. What was dropped is counted, and the count is written in the place of what is
+/// missing: an error entry of subsystem "rt" with the number in the field DROPPED. What is left to tell when
+/// the program ends by `exit` is tried once more then, and otherwise goes to standard error.
 ///
 /// The first entry opens a socket, closed on exec, which the process keeps. A daemon that is started anew
 /// is found again with the next entry. The child of a fork logs on, and begins to count anew.
@@ -30,7 +30,6 @@
 ///
 /// Not for: text that nobody but the user of a program reads; secrets, since entries are public.
 
-#include <chrono>
 #include <cstdint>
 #include <string_view>
 
@@ -44,7 +43,7 @@ class SystemLog {
   enum class Type : std::uint8_t { debug, info, error, fault };
 
   /// The longest that `write` waits for a daemon, all in all.
-  static constexpr std::chrono::milliseconds kLongestWait{250};
+  static constexpr int kLongestWaitMilliseconds = 250;
 
   /// A handle for the entries of `category` in `subsystem`; null counts as empty.
   SystemLog(String subsystem, String category) noexcept;

@@ -23,7 +23,7 @@
 #include <thread>
 #include <vector>
 
-#include "Runtime/Locks/ThreadIdentifier.h"
+#include "Runtime/Locks/Private/ThreadIdentifier.h"
 #include "tests/support/AllocationCount.h"
 #include "tests/support/PrivateJournal.h"
 #include "tests/support/PrivateRoot.h"

@@ -12,7 +12,7 @@
 #include <new>
 #include <optional>
 
-#include "Runtime/Base/UTF8.h"
+#include "Runtime/Base/Private/UTF8.h"
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/StringBuilder.h"
 

@@ -13,7 +13,7 @@
 ///     }
 ///
 /// The directives are those of C, with positions ("%2$d"), and print what snprintf prints; their grammar is
-/// in Runtime/Text/FormatDirective.h. Beyond C, or where C leaves it open:
+/// in Runtime/Text/Private/FormatDirective.h. Beyond C, or where C leaves it open:
 ///
 /// - "%@" prints an object's `description`; "(null)" for null and for a description that is null.
 ///   Flags, width and precision are as with "%s".
@@ -40,8 +40,8 @@
 #include <type_traits>
 
 #include "Runtime/Objects/String.h"
-#include "Runtime/Text/FormatArguments.h"
 #include "Runtime/Text/FormatString.h"
+#include "Runtime/Text/Private/FormatArguments.h"
 
 namespace rt {
 

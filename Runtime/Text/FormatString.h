@@ -24,8 +24,8 @@
 #include <string_view>
 
 #include "Runtime/Objects/String.h"
-#include "Runtime/Text/FormatArguments.h"
-#include "Runtime/Text/FormatDirective.h"
+#include "Runtime/Text/Private/FormatArguments.h"
+#include "Runtime/Text/Private/FormatDirective.h"
 
 namespace rt {
 

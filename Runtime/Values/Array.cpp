@@ -4,7 +4,7 @@
 #include <stdexcept>
 #include <utility>
 
-#include "Runtime/Values/CollectionDescription.h"
+#include "Runtime/Values/Private/CollectionDescription.h"
 
 namespace rt {
 

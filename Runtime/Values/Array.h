@@ -11,7 +11,7 @@
 ///     rt::Ref<rt::Array> array = rt::make<rt::Array>(std::move(elements));
 ///
 /// Holds no nulls. Two arrays are equal when their elements are, one by one. Any thread may use an array
-/// whose elements bear that. Its description is that of Runtime/Values/CollectionDescription.h.
+/// whose elements bear that. Its description is that of Runtime/Values/Private/CollectionDescription.h.
 ///
 /// Not for: lists that nobody needs as an object, which are std::vectors.
 

@@ -13,10 +13,10 @@
 /// Keys are strings, numbers, or any objects whose `isEqual` and `hash` never change; neither keys nor values
 /// are null. Two dictionaries are equal when they have equal values for equal keys. The order of a walk over
 /// the entries is not specified. Any thread may use a dictionary whose keys and values bear that. Its
-/// description is that of Runtime/Values/CollectionDescription.h.
+/// description is that of Runtime/Values/Private/CollectionDescription.h.
 ///
 /// Not for: tables that nobody needs as an object, which are std::unordered_maps
-/// (Runtime/Objects/ObjectHash.h).
+/// (Runtime/Objects/Private/ObjectHash.h).
 
 #include <cstddef>
 #include <cstdint>
@@ -27,7 +27,7 @@
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Object.h"
-#include "Runtime/Objects/ObjectHash.h"
+#include "Runtime/Objects/Private/ObjectHash.h"
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
 

@@ -11,10 +11,11 @@
 ///
 /// No two elements are equal, and none is null; their `isEqual` and `hash` must never change. Two sets are
 /// equal when they have equal elements. The order of a walk over the elements is not specified. Any thread
-/// may use a set whose elements bear that. Its description is that of Runtime/Values/CollectionDescription.h.
+/// may use a set whose elements bear that. Its description is that of
+/// Runtime/Values/Private/CollectionDescription.h.
 ///
 /// Not for: sets that nobody needs as an object, which are std::unordered_sets
-/// (Runtime/Objects/ObjectHash.h).
+/// (Runtime/Objects/Private/ObjectHash.h).
 
 #include <cstddef>
 #include <cstdint>
@@ -24,7 +25,7 @@
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Object.h"
-#include "Runtime/Objects/ObjectHash.h"
+#include "Runtime/Objects/Private/ObjectHash.h"
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
 

@@ -1,6 +1,6 @@
 #include "Shared/Logging/LUMDefaultMinimumLogLevelFilter.h"
 
-#include "Runtime/Locks/Lazy.h"
+#include "Runtime/Locks/Private/Lazy.h"
 #include "Runtime/Objects/String.h"
 #include "Runtime/Process/Process.h"
 #include "Shared/Logging/LUMLogLevel.h"

@@ -11,8 +11,8 @@
 #include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
-#include "Shared/Logging/LUMLogSourceText.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
+#include "Shared/Logging/Private/LUMLogSourceText.h"
 
 namespace {
 

@@ -31,9 +31,9 @@
 
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
-#include "Runtime/Process/CallStack.h"
-#include "Runtime/Text/FormatArguments.h"
+#include "Runtime/Process/Private/CallStack.h"
 #include "Runtime/Text/FormatString.h"
+#include "Runtime/Text/Private/FormatArguments.h"
 #include "Shared/Logging/LUMLogCallstack.h"
 #include "Shared/Logging/LUMLogLevel.h"
 #include "Shared/Logging/LUMLogMessage.h"

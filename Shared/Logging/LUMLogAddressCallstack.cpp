@@ -9,7 +9,7 @@
 #include <utility>
 
 #include "Runtime/Objects/StringBuilder.h"
-#include "Runtime/Process/CallStack.h"
+#include "Runtime/Process/Private/CallStack.h"
 #include "Runtime/Values/Number.h"
 
 rt::Ref<LUMLogAddressCallstack> LUMLogAddressCallstack::addressCallstackIgnoringFrameCount(

@@ -7,7 +7,7 @@
 #include <cstdlib>
 #include <new>
 
-#include "Runtime/Process/CallStack.h"
+#include "Runtime/Process/Private/CallStack.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
 #include "tests/support/Sanitizers.h"

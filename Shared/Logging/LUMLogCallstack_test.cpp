@@ -14,7 +14,7 @@
 #include <string>
 #include <vector>
 
-#include "Runtime/Process/CallStack.h"
+#include "Runtime/Process/Private/CallStack.h"
 #include "Runtime/Text/Format.h"
 #include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"

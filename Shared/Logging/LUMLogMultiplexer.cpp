@@ -6,8 +6,9 @@
 #include <utility>
 #include <vector>
 
-#include "Runtime/Locks/Lazy.h"
+#include "Runtime/Locks/Private/Lazy.h"
 #include "Runtime/Queues/QualityOfService.h"
+#include "Runtime/Queues/Queue.h"
 #include "Shared/Logging/LUMDefaultMinimumLogLevelFilter.h"
 
 namespace {

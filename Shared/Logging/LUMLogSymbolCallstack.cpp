@@ -5,7 +5,7 @@
 #include <span>
 #include <vector>
 
-#include "Runtime/Process/CallStack.h"
+#include "Runtime/Process/Private/CallStack.h"
 
 rt::Ref<LUMLogSymbolCallstack> LUMLogSymbolCallstack::symbolCallstackIgnoringFrameCount(
     std::uint64_t count) try {

@@ -31,7 +31,8 @@ class RT_VISIBLE LUMLogSymbolCallstack
   /// With `symbols`, strings; may be null. Throws std::bad_alloc.
   static rt::Ref<LUMLogSymbolCallstack> initWithSymbols(rt::Ref<rt::Array> symbols);
 
-  /// As given. The form of the lines is that of Runtime/Process/CallStack.h, where they are from there.
+  /// As given. The form of the lines is that of Runtime/Process/Private/CallStack.h, where they are from
+  /// there.
   const rt::Ref<rt::Array>& symbols() const noexcept { return symbols_; }
 
   /// Whether `other` is such a call stack with equal lines.

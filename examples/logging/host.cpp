@@ -5,16 +5,9 @@
 
 #include <utility>
 
-#include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
+#include "Libraries/Util/ErrorHandler/ErrorHandler.h"
 #include "Runtime/Process/FileHandle.h"
-#include "Runtime/Queues/Queue.h"
-#include "Runtime/Text/Format.h"
-#include "Runtime/Values/Number.h"
-#include "Shared/Logging/LUMAsyncLogger.h"
-#include "Shared/Logging/LUMLog.h"
-#include "Shared/Logging/LUMLogComponentFilter.h"
-#include "Shared/Logging/LUMLogMultiplexer.h"
-#include "Shared/Logging/LUMSafeNumberParameter.h"
+#include "Shared/Logging/Logging.h"
 
 using namespace rt::literals;
 

@@ -4,12 +4,8 @@
 
 #include <string_view>
 
-#include "Foundation/ZEBArrayCompositeLogWriter.h"
-#include "Foundation/ZEBLogger.h"
-#include "Foundation/ZEBLoggerMacroHelpers.h"
-#include "Runtime/Process/FileHandle.h"
-#include "Runtime/Text/Format.h"
-#include "Shared/Logging/LUMLogMultiplexer.h"
+#include "Foundation/OlderLogger.h"
+#include "Shared/Logging/Logging.h"
 #include "Shared/Logging/Shim/Classes/LUMLoggingReroutingZEBLogger.h"
 
 using namespace rt::literals;

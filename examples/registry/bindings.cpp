@@ -6,9 +6,7 @@
 #include <iterator>
 #include <utility>
 
-#include "Runtime/Objects/ClassMethod.h"
-#include "Runtime/Text/Format.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 
 using namespace rt::literals;
 

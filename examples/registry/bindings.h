@@ -2,9 +2,7 @@
 
 // The injectors, one for each service, as a generator writes them: what the program calls.
 
-#include "Runtime/Objects/Object.h"
-#include "Runtime/Objects/Ref.h"
-#include "Runtime/Values/Array.h"
+#include "Runtime/Runtime.h"
 #include "services.h"
 
 // The service for an account.

@@ -5,10 +5,7 @@
 #include <string>
 #include <vector>
 
-#include "Runtime/Objects/Class.h"
-#include "Runtime/Objects/Weak.h"
-#include "Runtime/Text/Format.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "bindings.h"
 
 using namespace rt::literals;

@@ -4,9 +4,7 @@
 
 #include <utility>
 
-#include "Runtime/Objects/Class.h"
-#include "Runtime/Objects/Ref.h"
-#include "Runtime/Objects/String.h"
+#include "Runtime/Runtime.h"
 
 // Where an account's messages are.
 struct MessageStore : rt::Protocol<MessageStore> {

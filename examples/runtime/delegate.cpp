@@ -2,11 +2,7 @@
 
 #include <cstdio>
 
-#include "Runtime/Objects/Class.h"
-#include "Runtime/Objects/Object.h"
-#include "Runtime/Objects/Ref.h"
-#include "Runtime/Objects/String.h"
-#include "Runtime/Objects/Weak.h"
+#include "Runtime/Runtime.h"
 
 using namespace rt::literals;
 

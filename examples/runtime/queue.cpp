@@ -1,13 +1,10 @@
 // A queue that guards an account: what only its tasks touch needs no lock, and what a task throws reaches
 // whoever waits for it.
 
-#include "Runtime/Queues/Queue.h"
-
 #include <cstdio>
 #include <stdexcept>
 
-#include "Runtime/Objects/Ref.h"
-#include "Runtime/Objects/String.h"
+#include "Runtime/Runtime.h"
 
 using namespace rt::literals;
 

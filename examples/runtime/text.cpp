@@ -3,11 +3,7 @@
 
 #include <cstdio>
 
-#include "Runtime/Objects/String.h"
-#include "Runtime/Text/Format.h"
-#include "Runtime/Values/Array.h"
-#include "Runtime/Values/Dictionary.h"
-#include "Runtime/Values/Number.h"
+#include "Runtime/Runtime.h"
 
 using namespace rt::literals;
 

@@ -1,5 +1,5 @@
 // A shared library that has the runtime, and uses it for its caller.
-#include "Runtime/Locks/ThreadIdentifier.h"
+#include "Runtime/Locks/Private/ThreadIdentifier.h"
 #include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Queues/Queue.h"
 

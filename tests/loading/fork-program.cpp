@@ -10,7 +10,7 @@
 #include <string_view>
 #include <thread>
 
-#include "Runtime/Locks/ThreadIdentifier.h"
+#include "Runtime/Locks/Private/ThreadIdentifier.h"
 #include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Queues/Queue.h"
 

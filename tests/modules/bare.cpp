@@ -4,7 +4,7 @@
 #include <string>
 
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "Shared/ServiceRegistry/Source/SRLStartUpHook.h"
 
 int main() {

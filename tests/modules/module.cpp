@@ -2,7 +2,7 @@
 // name to a class of that name. When it is asked for its configurations, it asks for its service, which is
 // too early.
 #include "Runtime/Objects/ClassMethod.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "Trace.h"
 
 #define TEXT(x) #x

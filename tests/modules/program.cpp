@@ -11,7 +11,7 @@
 
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
 #include "Runtime/Objects/ClassMethod.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "Shared/ServiceRegistry/Source/SRLStartUpHook.h"
 #include "Trace.h"
 

@@ -1,7 +1,7 @@
 // A program of somebody who has only what was installed. Hears of a mistake of its own.
 #include <cstdio>
 
-#include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
+#include "Libraries/Util/ErrorHandler/ErrorHandler.h"
 
 int main() {
   const PECErrorHandlerBlock block = [](const rt::Ref<PECErrorDescription>& error) {

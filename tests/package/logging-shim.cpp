@@ -1,7 +1,7 @@
 // A program of somebody who has only what was installed. Logs a number to the older logger, rerouted.
 #include <cstdio>
 
-#include "Shared/Logging/LUMLogMultiplexer.h"
+#include "Shared/Logging/Logging.h"
 #include "Shared/Logging/Shim/Classes/LUMLoggingReroutingZEBLogger.h"
 
 using namespace rt::literals;

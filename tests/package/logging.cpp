@@ -1,8 +1,7 @@
 // A program of somebody who has only what was installed. Logs a number to a logger of its own.
-#include <cstdio>
+#include "Shared/Logging/Logging.h"
 
-#include "Shared/Logging/LUMLog.h"
-#include "Shared/Logging/LUMLogMultiplexer.h"
+#include <cstdio>
 
 using namespace rt::literals;
 

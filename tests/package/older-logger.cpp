@@ -1,5 +1,5 @@
 // A program of somebody who has only what was installed. Logs a number.
-#include "Foundation/ZEBLogger.h"
+#include "Foundation/OlderLogger.h"
 
 using namespace rt::literals;
 

@@ -1,13 +1,7 @@
 // A program of somebody who has only what was installed. Prints the time that a class found by name knows.
-#include <cstdio>
+#include "Runtime/Runtime.h"
 
-#include "Runtime/Objects/Block.h"
-#include "Runtime/Objects/Class.h"
-#include "Runtime/Objects/ClassMethod.h"
-#include "Runtime/Objects/LoadHook.h"
-#include "Runtime/Objects/Ref.h"
-#include "Runtime/Objects/String.h"
-#include "Runtime/Objects/Weak.h"
+#include <cstdio>
 
 struct Clock : rt::Protocol<Clock> {
   virtual int now() const = 0;

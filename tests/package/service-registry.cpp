@@ -2,8 +2,7 @@
 #include <cstdio>
 #include <iterator>
 
-#include "Runtime/Objects/ClassMethod.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 
 struct Clock : rt::Protocol<Clock> {
   virtual int now() const = 0;

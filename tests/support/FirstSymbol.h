@@ -11,7 +11,7 @@
 #include <string>
 
 #include "Runtime/Objects/Class.h"
-#include "Runtime/Process/CallStack.h"
+#include "Runtime/Process/Private/CallStack.h"
 #include "Runtime/Values/Array.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogMessage.h"

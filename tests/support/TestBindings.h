@@ -18,11 +18,11 @@
 #include "Runtime/Objects/ClassInfo.h"
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLBindingsModuleData.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementation.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 
 struct TestClock : rt::Protocol<TestClock> {
  protected:

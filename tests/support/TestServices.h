@@ -15,7 +15,7 @@
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "tests/support/TestReports.h"
 #include "tests/support/WholeReports.h"
 

@@ -12,7 +12,7 @@
 #include <thread>
 
 #include "Runtime/Locks/UnfairLock.h"
-#include "Runtime/Queues/WorkerPool.h"
+#include "Runtime/Queues/Private/WorkerPool.h"
 #include "tests/support/AllocationCount.h"
 #include "tests/support/AllocationFailure.h"
 #include "tests/support/Sanitizers.h"

@@ -4,7 +4,7 @@
 #include <utility>
 
 #include "Libraries/Util/ErrorHandler/PECReport.h"
-#include "Runtime/Locks/Lazy.h"
+#include "Runtime/Locks/Private/Lazy.h"
 #include "Runtime/Objects/Exception.h"
 #include "Runtime/Process/AssertionHandler.h"
 #include "Runtime/Text/Format.h"

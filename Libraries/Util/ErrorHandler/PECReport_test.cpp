@@ -13,7 +13,7 @@
 
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
 #include "Runtime/Objects/Exception.h"
-#include "Runtime/Process/CallStack.h"
+#include "Runtime/Process/Private/CallStack.h"
 #include "Runtime/Values/Dictionary.h"
 #include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"

@@ -6,8 +6,8 @@
 #include <utility>
 
 #include "Libraries/Util/ErrorHandler/PECReport.h"
-#include "Runtime/Locks/Lazy.h"
-#include "Runtime/Locks/ThreadIdentifier.h"
+#include "Runtime/Locks/Private/Lazy.h"
+#include "Runtime/Locks/Private/ThreadIdentifier.h"
 #include "Runtime/Objects/ClassMethod.h"
 #include "Runtime/Objects/LoadHook.h"
 #include "Runtime/Queues/MainQueue.h"
@@ -15,7 +15,10 @@
 #include "Runtime/Values/Dictionary.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLAPIIdentifier.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLRegistryIvars.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLReportFatal.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLScopedFactory.h"
 #include "Shared/ServiceRegistry/Source/SRLStartUpHook.h"
 
 using namespace rt::literals;
@@ -88,7 +91,7 @@ rt::Ref<SRLRegistry> SRLRegistry::sharedInstance() {
   if (!isSharedInstanceMade) [[unlikely]] {
     const rt::Ref<SRLRegistry> made = initPrivate();
     made->retain();
-    made->isShared_.store(true, std::memory_order_relaxed);
+    made->unguarded().isShared.store(true, std::memory_order_relaxed);
     sharedRegistry = made.get();
     isSharedInstanceMade = true;
   }
@@ -99,8 +102,8 @@ rt::Ref<SRLRegistry> SRLRegistry::setSharedInstance(const rt::Ref<SRLRegistry>& 
   if (registry) registry->retain();
   const rt::LockGuard guard(sharedInstanceLock);
   isSharedInstanceMade = true;
-  if (sharedRegistry != nullptr) sharedRegistry->isShared_.store(false, std::memory_order_relaxed);
-  if (registry) registry->isShared_.store(true, std::memory_order_relaxed);
+  if (sharedRegistry != nullptr) sharedRegistry->unguarded().isShared.store(false, std::memory_order_relaxed);
+  if (registry) registry->unguarded().isShared.store(true, std::memory_order_relaxed);
   return rt::Ref<SRLRegistry>::adopt(std::exchange(sharedRegistry, registry.get()));
 }
 
@@ -109,10 +112,10 @@ rt::Ref<SRLRegistry> SRLRegistry::initPrivate() {
   return rt::Ref<SRLRegistry>::adopt(new SRLRegistry(std::make_unique_for_overwrite<SRLRegistryIvars>()));
 }
 
-SRLRegistry::SRLRegistry(std::unique_ptr<SRLRegistryIvars> ivars)
-    : ivars_(std::move(ivars)), configScope_(SRLMemoizingScope::init()) {}
+SRLRegistry::SRLRegistry(std::unique_ptr<SRLRegistryIvars> ivars) : ivars_(std::move(ivars)) {}
 
 SRLRegistry::~SRLRegistry() {
+  unguarded().configScope = nullptr;
   if (rt::isMainThread()) return;
   try {
     rt::Queue::main()->async([ivars = std::move(ivars_)] {});
@@ -121,8 +124,12 @@ SRLRegistry::~SRLRegistry() {
   }
 }
 
+const rt::Ref<SRLMemoizingScope>& SRLRegistry::configScope() const noexcept {
+  return unguarded().configScope;
+}
+
 rt::Ref<SRLRegistry> SRLRegistry::mutableCopy() const {
-  const rt::LockGuard guard(ivars_->lock);
+  const rt::LockGuard guard(lock_);
   return rt::Ref<SRLRegistry>::adopt(new SRLRegistry(std::make_unique<SRLRegistryIvars>(*ivars_)));
 }
 
@@ -130,7 +137,7 @@ rt::String SRLRegistry::description() const {
   rt::Dictionary::Builder singles;
   rt::Dictionary::Builder multis;
   {
-    const rt::LockGuard guard(ivars_->lock);
+    const rt::LockGuard guard(lock_);
     for (const auto& [api, implementation] : ivars_->singleBindings.entries()) {
       singles.set(SRLAPIIdentifier(api), implementation);
     }
@@ -144,27 +151,28 @@ rt::String SRLRegistry::description() const {
 }
 
 void SRLRegistry::internalRegisterBindings(std::span<const SRLBindingsModuleData* const> modules) {
-  if (ivars_->bindingsState != SRLBindingsState::kNone) {
+  SRLRegistryIvars& ivars = unguarded();
+  if (ivars.bindingsState != SRLBindingsState::kNone) {
     SRLReportFatal({kFile, "-[SRLRegistry internalRegisterBindings:]"},
                    "Trying to register bindings module data twice. This is likely caused by loading multiple "
                    "bindings modules in the same app or test. "
                    "See docs/registry.md#registering-bindings-module-twice."_s);
   }
-  ivars_->bindingsState = SRLBindingsState::kInProgress;
+  ivars.bindingsState = SRLBindingsState::kInProgress;
   for (const SRLBindingsModuleData* module : modules) {
     if (module->addConfigurationFactories == nullptr) continue;
     SRLConfigurationFactories factories;
     module->addConfigurationFactories(factories);
-    ivars_->configFactories.merge(factories);
+    ivars.configFactories.merge(factories);
   }
-  ivars_->bindingsModules.insert(ivars_->bindingsModules.end(), modules.begin(), modules.end());
-  ivars_->bindingsState = SRLBindingsState::kRegistered;
+  ivars.bindingsModules.insert(ivars.bindingsModules.end(), modules.begin(), modules.end());
+  ivars.bindingsState = SRLBindingsState::kRegistered;
 }
 
 bool SRLRegistry::multipleBindingsModulesAllowed() const {
   static constinit rt::Lazy<bool> isAllowed;
   return isAllowed.get([&] {
-    return std::ranges::all_of(ivars_->bindingsModules,
+    return std::ranges::all_of(unguarded().bindingsModules,
                                [](const auto* module) { return module->allowsMultipleModules != 0; });
   });
 }
@@ -207,7 +215,7 @@ std::vector<const _SRLBindingRegistrationData*> SRLRegistry::registrationDatasFo
 }
 
 void SRLRegistry::registerBindings(const _SRLBindingRegistrationData& binding) {
-  ivars_->lock.assertOwner();
+  lock_.assertOwner();
   const SRLAPIRegistrationData* api = binding.api;
   if (*binding.implementations == nullptr) {
     if (api->isMultibound == 0) {
@@ -308,13 +316,14 @@ void SRLRegistry::internalRegisterImplementation(const rt::Ref<SRLImplementation
 }
 
 rt::Ref<rt::Object> SRLRegistry::internalImplementationConfigForIdentifier(const void* identifier) {
-  const auto found = ivars_->configFactories.find(identifier);
-  if (found == ivars_->configFactories.end()) return nullptr;
-  return configScope_->instanceForIdentifier(identifier, nullptr, found->second);
+  const SRLConfigurationFactories& factories = unguarded().configFactories;
+  const auto found = factories.find(identifier);
+  if (found == factories.end()) return nullptr;
+  return configScope()->instanceForIdentifier(identifier, nullptr, found->second);
 }
 
 const SRLAPIRegistrationData* SRLRegistry::apiIdentifierForProtocol(const rt::ProtocolInfo* protocol) const {
-  ivars_->lock.assertOwner();
+  lock_.assertOwner();
   if (protocol == nullptr) return nullptr;
   for (const SRLBindingsModuleData* module : ivars_->bindingsModules) {
     for (const _SRLBindingRegistrationData& binding : module->bindings()) {
@@ -336,9 +345,9 @@ const SRLAPIRegistrationData* SRLRegistry::apiIdentifierFromString(
     return nullptr;
   }
   const std::string_view identifier = apiIdentifierString.view();
-  const auto& apisByIdentifier = ivars_->apisByIdentifier;
+  const auto& apisByIdentifier = unguarded().apisByIdentifier;
   if (const auto* known = apisByIdentifier.find(identifier)) return known->second;
-  const rt::LockGuard guard(ivars_->lock);
+  const rt::LockGuard guard(lock_);
   for (const SRLBindingsModuleData* module : ivars_->bindingsModules) {
     for (const _SRLBindingRegistrationData& binding : module->bindings()) {
       const std::string_view bytes = SRLIdentifierBytes(*binding.api);
@@ -352,7 +361,7 @@ const SRLAPIRegistrationData* SRLRegistry::apiIdentifierFromString(
 
 rt::Ref<rt::Set> SRLRegistry::registeredAPIIdentifiers() const {
   rt::Set::Builder identifiers;
-  const rt::LockGuard guard(ivars_->lock);
+  const rt::LockGuard guard(lock_);
   for (const SRLBindingsModuleData* module : ivars_->bindingsModules) {
     for (const _SRLBindingRegistrationData& binding : module->bindings()) {
       identifiers.add(SRLAPIIdentifier(binding.api).object());

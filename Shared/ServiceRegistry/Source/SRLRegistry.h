@@ -1,133 +1,132 @@
 #pragma once
 
-/// The service registry: finds, for a service interface (an API), what implements it, and hands out
-/// instances, one for each scope or a new one each time.
+/// The service registry. It knows which implementation is bound to a service interface (an API), and returns
+/// instances of it.
 ///
 ///     rt::Ref<Clock> injectClock(const SRLScopeTagSet& tags) {             // as a generator writes it
 ///       return rt::cast<Clock>(SRLRegistry::sharedInstance()->internalService(&clockAPI, tags));
 ///     }
 ///     ...
-///     SRLRegistry::sharedInstance()->removeScopesWithTag(account);         // the account is logged out
+///     SRLRegistry::sharedInstance()->removeScopesWithTag(account);         // the account has logged out
 ///
-/// What is bound to what is said by constant records in bindings modules (SRLBindingsModuleData.h). The
-/// shared registry knows all modules of the program, and of the libraries that it links, before `main`; those
-/// of a library that is opened later it never sees. It looks into an API's bindings, and checks them, when
-/// the API is first asked for.
+/// Bindings are constant records in bindings modules (SRLBindingsModuleData.h). The shared registry collects
+/// the modules of the program, and of the libraries that it links, before `main`. It never sees the modules
+/// of a library that is opened later. It registers and checks the bindings of an API at the first request for
+/// it.
 ///
-/// Any thread may use a registry. Its lock, which is not recursive, is never held while an instance is made
-/// or destroyed or the delegate is told, so that factories may ask for other services. It is held while tags
-/// are hashed and compared, while an API's bindings are looked at for the first time, with its generated
-/// functions and instance types, while an implementation that was bound by hand is given up for another, and
-/// during some reports. What these ask the registry for then ends the program. Error callbacks, log filters
-/// and loggers must not ask a registry for anything at any time (SRLUnfairLock.h).
+/// An API is identified by the address of its record, not by the record's content.
 ///
-/// Misuse is reported (PECErrorHandler) and yields null, false or nothing. Throughout, an API is named by the
-/// address of its record, and what is thrown is what the error callback, the factories, the generated
-/// functions, the delegate, tags and instance types throw, and std::bad_alloc. The registry is usable then;
-/// but of an API whose bindings were being looked at, some may be bound and the others not, and the instance
-/// for a scope whose factory has thrown stays pending as long as the scope is there: whoever waits for it, or
-/// asks for it later, gets a report and null. After std::bad_alloc, an API's bindings are looked at anew by
-/// the next request, and all of them are bound.
+/// Threads: all operations are thread-safe. The registry's lock is not recursive (SRLUnfairLock.h). It is not
+/// held while a factory runs, while an instance is destroyed, or while the delegate is called. So a factory
+/// may ask for other services. The lock is held
 ///
-/// Not for: what a constructor's argument can do.
+///     | while tags are hashed and compared,
+///     | while the bindings of an API are registered, which calls generated functions and instance types,
+///     | while an implementation that was bound by hand is replaced,
+///     | and during some reports.
+///
+/// Code that runs then must not call the registry: that ends the program. Error callbacks, log filters and
+/// loggers must never call a registry.
+///
+/// Errors: misuse is reported (PECErrorHandler.h), and the operation returns null, false or nothing.
+/// Exceptions from error callbacks, factories, generated functions, the delegate, tags and instance types
+/// pass to the caller, as does std::bad_alloc. The registry stays usable. After an exception:
+///
+///     | Some bindings of an API that was being registered may be missing. After std::bad_alloc, the next
+///     | request registers all of them again.
+///     | If the factory of an instance in a scope has thrown, that instance stays pending until the scope
+///     ends. | Threads that wait for it, and later requests for it, get a report and null.
+///
+/// Not for: dependencies that a constructor argument can carry.
 
-#include <atomic>
 #include <cstdint>
 #include <memory>
 #include <span>
 #include <vector>
 
 #include "Runtime/Base/Visibility.h"
-#include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
-#include "Runtime/Objects/Weak.h"
-#include "Runtime/Values/Array.h"
-#include "Runtime/Values/Set.h"
-#include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLBindingsModuleData.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLFactoryBlock.h"
-#include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementation.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSet.h"
-#include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSetCodableWrapper.h"
-#include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope.h"
-#include "Shared/ServiceRegistry/Source/Private/SRLRegistryIvars.h"
-#include "Shared/ServiceRegistry/Source/SRLScopeLifecycleDelegate.h"
+#include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeType.h"
 #include "Shared/ServiceRegistry/Source/SRLUnfairLock.h"
+
+namespace rt {
+class Set;
+}
+
+class SRLImplementation;
+class SRLMemoizingScope;
+class SRLScopeTagSetCodableWrapper;
+struct SRLBindingsModuleData;
+struct SRLRegistryIvars;
+struct SRLScopeLifecycleDelegate;
 
 class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
  public:
-  /// @name The shared registry
+  /// @name For hosts
   /// @{
 
-  /// The load hook: has the class initialised.
-  static void load();
-
-  /// Hands all bindings modules to the shared registry, those whose class methods' selectors begin with
-  /// "srl_bindings" and do not end there, in the order of the selectors. A method of another type is passed
-  /// over, as is one that returns null. Does nothing where `receiver` is a subclass. The second time in a
-  /// process ends it.
-  static void initialize(const rt::ClassInfo& receiver);
-
-  /// The registry that injectors ask; made when it is first asked for. Null where null was set.
+  /// Returns the registry that injectors use. The first call makes it. Null if null was set.
   static rt::Ref<SRLRegistry> sharedInstance();
 
-  /// Makes `registry`, which may be null, the shared one, and returns the one that was. Without one, services
-  /// that live in scopes are null. For tests.
+  /// Replaces the shared registry by `registry`, which may be null, and returns the previous one. Without a
+  /// shared registry, requests for instances in scopes return null. For tests.
   static rt::Ref<SRLRegistry> setSharedInstance(const rt::Ref<SRLRegistry>& registry);
 
-  /// @}
-  /// @name Life
-  /// @{
-
-  /// A registry that knows nothing.
+  /// Returns a new registry without modules and bindings.
   static rt::Ref<SRLRegistry> initPrivate();
 
-  /// Bindings and scopes are released on the main thread: at once there, by way of the main queue elsewhere
-  /// (here only where there is no memory for a task). Configurations are released at once, anywhere.
-  ~SRLRegistry() override;
-
-  /// A registry with the same modules, bindings and configuration factories, which change independently of
-  /// this one's. It has neither scopes nor delegate. (Instances that live in scopes are shared nevertheless:
-  /// all registries keep them in those of the shared one.)
+  /// Returns a registry with the same modules, bindings and configuration factories. Later changes to either
+  /// registry do not affect the other. The copy has no scopes and no delegate. Instances in scopes are still
+  /// shared: every registry keeps them in the scopes of the shared registry.
   rt::Ref<SRLRegistry> mutableCopy() const;
 
-  /// "<SRLRegistry: ADDRESS>", and the implementations of the APIs that are known so far.
+  /// Returns "<SRLRegistry: ADDRESS>" and the implementations of all APIs registered so far.
   rt::String description() const override;
 
+  /// Ends every scope that has a tag equal to `tag`. These scopes release their instances, and the delegate
+  /// is called. Errors: reports a null `tag`.
+  void removeScopesWithTag(const rt::Ref<rt::Object>& tag);
+
+  /// The delegate is called when scopes end. Null for none. Ownership: not retained.
+  rt::Ref<SRLScopeLifecycleDelegate> scopeLifecycleDelegate() const;
+  void setScopeLifecycleDelegate(const rt::Ref<SRLScopeLifecycleDelegate>& delegate);
+
+  /// Returns the identifiers, as strings, of all APIs in the modules, requested so far or not.
+  rt::Ref<rt::Set> registeredAPIIdentifiers() const;
+
   /// @}
-  /// @name Services
+  /// @name For generated code
   /// @{
 
-  /// An instance of what is bound to `api`, not null, for the scope `scopeTags`. That nothing is bound is
-  /// reported, as is a factory that returns null; both yield null.
+  /// Returns an instance of the implementation that is bound to `api`, for the scope given by `scopeTags`.
+  /// Precondition: `api` is not null. Errors: reports an API without a binding, and a factory that returns
+  /// null; both return null.
   rt::Ref<rt::Object> internalService(const SRLAPIRegistrationData* api, const SRLScopeTagSet& scopeTags);
 
-  /// The same for an API that may have no implementation, and for a factory that may return null. Only a
-  /// request while modules are being registered is reported.
+  /// Like `internalService`, but the API may have no implementation, and its factory may return null. Errors:
+  /// reports only a request made while modules are being registered.
   rt::Ref<rt::Object> internalOptionalService(const SRLAPIRegistrationData* api,
                                               const SRLScopeTagSet& scopeTags);
 
-  /// An instance of each implementation of `api`, which may have many, in no particular order; null where no
-  /// module knows the API. Reported: a null `api`, a request while modules are being registered (both yield
-  /// null), and a factory that returns null (which is left out).
+  /// Returns an instance of each implementation of `api`, a multi-bound API, in unspecified order. Returns
+  /// null if no module has the API. Errors: reports a null `api`, and a request made while modules are being
+  /// registered; both return null. Reports a factory that returns null, and omits its instance.
   rt::Ref<rt::Array> internalMultiBoundService(const SRLAPIRegistrationData* api,
                                                const SRLScopeTagSet& scopeTags);
 
-  /// Whether an implementation is bound to `api`; false for an API that may have many. Null is reported.
+  /// Returns whether `api` has an implementation. False for a multi-bound API. Errors: reports a null `api`.
   bool internalHasImplementationForService(const SRLAPIRegistrationData* api);
 
-  /// What is bound to `api`, which may have one implementation; null where that is nothing. Null is reported.
-  /// The caller holds the lock.
-  rt::Ref<SRLImplementation> implementationForSingleBoundService(const SRLAPIRegistrationData* api)
-      RT_REQUIRES(ivars_->lock);
-
-  /// The four for those who have the API's identifier only, and the tags as an object. Reported: null
-  /// `scopeTags`, which yields null; a null identifier; and an identifier that no module knows, where a
-  /// service is required or asked about. To those who ask for optional ones the latter is null, and for many
-  /// an empty array.
+  /// The same four operations for a caller that has the API's identifier and the tags as an object. Errors:
+  /// all report a null `identifier`. The first three report null `scopeTags` and return null. The first and
+  /// the last report an identifier that no module has. For such an identifier, the second returns null and
+  /// the third an empty array, without a report.
   rt::Ref<rt::Object> eg_internalService(const rt::String& identifier,
                                          const rt::Ref<SRLScopeTagSetCodableWrapper>& scopeTags);
   rt::Ref<rt::Object> eg_internalOptionalService(const rt::String& identifier,
@@ -136,135 +135,135 @@ class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
                                                   const rt::Ref<SRLScopeTagSetCodableWrapper>& scopeTags);
   bool eg_internalHasImplementationForService(const rt::String& identifier);
 
-  /// @}
-  /// @name Scopes
-  /// @{
+  /// Returns the configuration for the address `identifier`. The first call makes it. Null if no module has a
+  /// factory for it.
+  rt::Ref<rt::Object> internalImplementationConfigForIdentifier(const void* identifier);
 
-  /// The scope with these tags, opened if there is none. No tags make a scope, too.
+  /// Returns the scope with these tags, and opens it if there is none. A set without tags is a scope, too.
+  /// What a scope can do is declared in Private/SRLMemoizingScope.h.
   rt::Ref<SRLMemoizingScope> scopeWithTags(const SRLScopeTagSet& tags);
 
-  /// Ends the scopes among whose tags is one that equals `tag`: they give up their instances, and the
-  /// delegate is told. Null is reported.
-  void removeScopesWithTag(const rt::Ref<rt::Object>& tag);
+  /// Returns the scope of the registry's configurations. It never ends.
+  const rt::Ref<SRLMemoizingScope>& configScope() const noexcept;
 
-  /// The scope in which configurations are kept. It never ends.
-  const rt::Ref<SRLMemoizingScope>& configScope() const noexcept { return configScope_; }
-
-  /// Who is told of scopes that end; null for nobody. Not retained.
-  rt::Ref<SRLScopeLifecycleDelegate> scopeLifecycleDelegate() const;
-  void setScopeLifecycleDelegate(const rt::Ref<SRLScopeLifecycleDelegate>& delegate);
-
-  /// How an instance is got for the tags of a request: with a `lifetime` of 1, from `factory`, which is given
-  /// those of the tags that belong to `implScope`, a part of `apiScope`; with any other, from the shared
-  /// registry's scope with those tags, where `factory` makes it once.
+  /// Returns a block that makes instances with `factory`. The block passes on those tags of a request that
+  /// belong to `implScope`, a subset of `apiScope`. With a `lifetime` of 1, it calls `factory` each time.
+  /// With any other, it keeps one instance in the shared registry's scope with those tags.
   SRLFactoryBlock scopedBlockForFactory(rt::Ref<rt::Object> (*factory)(SRLScopeTagSet tags),
                                         const SRLImplementationRegistrationData* implementationIdentifier,
                                         SRLScopeType apiScope, SRLScopeType implScope,
                                         std::uint64_t lifetime);
 
   /// @}
-  /// @name Bindings
+  /// @name For tools and tests, which may hold the lock
   /// @{
 
-  /// Takes the program's modules, none of them null, when the program is loaded. The second call is reported,
-  /// and ends the program. Of two configurations for one address the first module's counts.
+  /// The load hook. It calls `initialize`.
+  static void load();
+
+  /// Passes all bindings modules to the shared registry. These are the non-null results of the class methods
+  /// whose selector begins with "srl_bindings" and is longer, in the order of the selectors. Methods of
+  /// another signature are ignored. Does nothing if `receiver` is a subclass. A second call ends the process.
+  static void initialize(const rt::ClassInfo& receiver);
+
+  /// Adds `modules`, none of them null. If two modules have a configuration factory for one address, the
+  /// first one is used. Errors: a second call is reported and ends the process. Threads: call it while the
+  /// program is loaded, before it has a second thread.
   void internalRegisterBindings(std::span<const SRLBindingsModuleData* const> modules);
 
-  /// Whether modules may be many: all of them say so. The first answer that any registry gives is that of
-  /// all.
+  /// Returns whether every module allows other modules beside it. The first answer, of any registry, is kept
+  /// for the process.
   bool multipleBindingsModulesAllowed() const;
 
-  /// Registers what the modules bind to `api`, not null. Returns whether a module knows the API. The caller
-  /// holds the lock.
-  bool lazilyRegisterBindingsForAPI(const SRLAPIRegistrationData* api) RT_REQUIRES(ivars_->lock);
-
-  /// Each module's binding of the API with the identifier of `api`, not null. The caller holds the lock.
-  std::vector<const _SRLBindingRegistrationData*> registrationDatasForAPI(
-      const SRLAPIRegistrationData* api) const RT_REQUIRES(ivars_->lock);
-
-  /// Binds the implementations of a binding. Where there are none, the API is known from now on, and a single
-  /// implementation that it had is bound no more. Ends the program unless the caller holds the lock.
-  void registerBindings(const _SRLBindingRegistrationData& binding) RT_REQUIRES(ivars_->lock);
-
-  /// Binds an implementation to an API. Reported, with nothing bound: that either is null; that the class of
-  /// the implementation is not of the API's type; that the implementation has a scope that the API has not;
-  /// and what the functions below report. The caller holds the lock.
-  void internalRegisterServiceAPI(const SRLAPIRegistrationData* api,
-                                  const rt::Ref<SRLImplementation>& implementation) RT_REQUIRES(ivars_->lock);
-
-  /// Binds an implementation, not null, to an API for one. Reported, with nothing changed: an API for many;
-  /// and one that has an implementation already, unless `allowOverridingExistingBinding`. The caller holds
-  /// the lock.
-  void internalRegisterImplementation(const rt::Ref<SRLImplementation>& implementation,
-                                      const SRLAPIRegistrationData* forSingleboundAPI,
-                                      bool allowOverridingExistingBinding) RT_REQUIRES(ivars_->lock);
-
-  /// Binds an implementation, not null, to an API for many, unless it has an equal one. An API for one is
-  /// reported. The caller holds the lock.
-  void internalRegisterImplementation(const rt::Ref<SRLImplementation>& implementation,
-                                      const SRLAPIRegistrationData* forMultiboundAPI)
-      RT_REQUIRES(ivars_->lock);
-
-  /// The configuration for an address, made when it is first asked for; null where no module has one.
-  rt::Ref<rt::Object> internalImplementationConfigForIdentifier(const void* identifier);
-
-  /// The API that is given by the name of `protocol` and no class; null where no module knows one. Ends the
-  /// program unless the caller holds the lock. Looks at one binding after another: for tools.
-  const SRLAPIRegistrationData* apiIdentifierForProtocol(const rt::ProtocolInfo* protocol) const
-      RT_REQUIRES(ivars_->lock);
-
-  /// The API with this identifier; null where no module knows one. Null is reported. Where the identifier has
-  /// not been found before, it looks at one binding after another, and ends the program if the caller holds
-  /// the lock.
+  /// Returns the API whose record has this identifier. Null if no module has one. Errors: reports null. The
+  /// first search for an identifier looks at one binding after another and takes the lock: the program ends
+  /// if the caller holds it.
   const SRLAPIRegistrationData* apiIdentifierFromString(const rt::String& apiIdentifierString) const;
 
-  /// The identifiers of all APIs that the modules know, as strings, whether they have been asked for or not.
-  rt::Ref<rt::Set> registeredAPIIdentifiers() const;
+  /// Returns the lock. It lives as long as the registry. The caller must hold it for all operations below.
+  SRLUnfairLock* lock() const noexcept RT_RETURN_CAPABILITY(lock_) { return &lock_; }
 
-  /// The registry's lock, for as long as the registry is there.
-  SRLUnfairLock* lock() const noexcept RT_RETURN_CAPABILITY(ivars_->lock) { return &ivars_->lock; }
+  /// Returns the implementation that is bound to `api`, a single-bound API. Null if there is none. Errors:
+  /// reports a null `api`.
+  rt::Ref<SRLImplementation> implementationForSingleBoundService(const SRLAPIRegistrationData* api)
+      RT_REQUIRES(lock_);
+
+  /// Registers all bindings of `api` in the modules. Returns whether a module has the API. Precondition:
+  /// `api` is not null.
+  bool lazilyRegisterBindingsForAPI(const SRLAPIRegistrationData* api) RT_REQUIRES(lock_);
+
+  /// Returns each module's binding whose API has the identifier of `api`. Precondition: `api` is not null.
+  std::vector<const _SRLBindingRegistrationData*> registrationDatasForAPI(
+      const SRLAPIRegistrationData* api) const RT_REQUIRES(lock_);
+
+  /// Registers the implementations of `binding`. A binding without implementations makes the API known, and
+  /// removes the implementation of a single-bound API. Ends the program if the caller does not hold the lock.
+  void registerBindings(const _SRLBindingRegistrationData& binding) RT_REQUIRES(lock_);
+
+  /// Binds `implementation` to `api`. Errors: does nothing but report if either is null, if the
+  /// implementation's class is not of the API's type, if the implementation has a scope that the API does not
+  /// have, and what the two operations below report.
+  void internalRegisterServiceAPI(const SRLAPIRegistrationData* api,
+                                  const rt::Ref<SRLImplementation>& implementation) RT_REQUIRES(lock_);
+
+  /// Binds `implementation`, not null, to a single-bound API. Errors: does nothing but report if the API is
+  /// multi-bound, or if it has an implementation and `allowOverridingExistingBinding` is false.
+  void internalRegisterImplementation(const rt::Ref<SRLImplementation>& implementation,
+                                      const SRLAPIRegistrationData* forSingleboundAPI,
+                                      bool allowOverridingExistingBinding) RT_REQUIRES(lock_);
+
+  /// Adds `implementation`, not null, to a multi-bound API, unless that has an equal one. Errors: does
+  /// nothing but report if the API is single-bound.
+  void internalRegisterImplementation(const rt::Ref<SRLImplementation>& implementation,
+                                      const SRLAPIRegistrationData* forMultiboundAPI) RT_REQUIRES(lock_);
+
+  /// Returns the API whose type is the name of `protocol` and no class. Null if no module has one. Looks at
+  /// one binding after another. Ends the program if the caller does not hold the lock.
+  const SRLAPIRegistrationData* apiIdentifierForProtocol(const rt::ProtocolInfo* protocol) const
+      RT_REQUIRES(lock_);
 
   /// @}
+
+  /// Releases bindings and scopes on the main thread: at once there, and by the main queue from other
+  /// threads. Without memory for a task they are released on the calling thread. Configurations are released
+  /// at once, on the calling thread.
+  ~SRLRegistry() override;
 
  protected:
   explicit SRLRegistry(std::unique_ptr<SRLRegistryIvars> ivars);
 
  private:
-  // For a request: an instance that is there already; or else what is bound to the API, and the scope that
-  // its instance is to be kept in, where that is one of this registry.
-  struct Found {
-    rt::Ref<rt::Object> instance;
-    rt::Ref<SRLImplementation> implementation;
-    rt::Ref<SRLMemoizingScope> scope;
-  };
-  Found find(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) RT_REQUIRES(ivars_->lock);
+  struct Found;
 
-  // What is bound to an API for one, which may be null; null where no module knows it. A null API is
-  // reported.
-  const rt::Ref<SRLImplementation>* boundTo(const SRLAPIRegistrationData* api) RT_REQUIRES(ivars_->lock);
-  // The same for one that is not in the table yet.
-  const rt::Ref<SRLImplementation>* newlyBound(const SRLAPIRegistrationData* api) RT_REQUIRES(ivars_->lock);
+  // Searches for an instance that a scope keeps already, and else for the implementation that makes it.
+  Found find(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) RT_REQUIRES(lock_);
 
-  // `lazilyRegisterBindingsForAPI`, after which it is known where no module knows the API.
-  bool registersBindingsFor(const SRLAPIRegistrationData* api) RT_REQUIRES(ivars_->lock);
+  // Returns the table's entry for a single-bound API, whose implementation may be null. Null if no module has
+  // the API. Reports a null API.
+  const rt::Ref<SRLImplementation>* boundTo(const SRLAPIRegistrationData* api) RT_REQUIRES(lock_);
+  // Does this for an API that is not in the table yet.
+  const rt::Ref<SRLImplementation>* newlyBound(const SRLAPIRegistrationData* api) RT_REQUIRES(lock_);
 
-  SRLMemoizingScope& openScope(const SRLScopeTagSet& tags) RT_REQUIRES(ivars_->lock);
-  SRLMemoizingScope& newScope(const SRLScopeTagSet& tags) RT_REQUIRES(ivars_->lock);
+  // Calls `lazilyRegisterBindingsForAPI`, and remembers an API that no module has.
+  bool registersBindingsFor(const SRLAPIRegistrationData* api) RT_REQUIRES(lock_);
 
-  // The instance that a scope of this registry has already; null where there is none, or no telling. In the
-  // first case `scope` becomes the one that it is to be kept in, if there is one.
+  SRLMemoizingScope& openScope(const SRLScopeTagSet& tags) RT_REQUIRES(lock_);
+  SRLMemoizingScope& newScope(const SRLScopeTagSet& tags) RT_REQUIRES(lock_);
+
+  // Returns the instance that a scope of this registry keeps. If there is none, returns null and sets `scope`
+  // to the scope that is to keep it, if any.
   rt::Ref<rt::Object> keptInstanceOf(const SRLImplementation& implementation, const SRLScopeTagSet& tags,
-                                     rt::Ref<SRLMemoizingScope>& scope) RT_REQUIRES(ivars_->lock);
+                                     rt::Ref<SRLMemoizingScope>& scope) RT_REQUIRES(lock_);
 
-  // An instance of what the caller keeps, new or kept; null where its factory gives none. Where `scope` is
-  // given, that is where it is kept.
+  // Returns an instance, new or kept. Null if the factory returns null. The caller retains `implementation`.
+  // `scope` is the scope that keeps the instance, if the caller knows it.
   static rt::Ref<rt::Object> instanceOf(SRLImplementation& implementation, const SRLAPIRegistrationData* api,
                                         const SRLScopeTagSet& tags, rt::Ref<SRLMemoizingScope> scope);
 
-  std::unique_ptr<SRLRegistryIvars> ivars_;
-  const rt::Ref<SRLMemoizingScope> configScope_;
-  // Written with the shared registry itself.
-  std::atomic<bool> isShared_{false};
-  mutable rt::UnfairLock delegateLock_;
-  rt::Weak<SRLScopeLifecycleDelegate> scopeLifecycleDelegate_ RT_GUARDED_BY(delegateLock_);
+  // The state that needs no lock: members that are written before the program has a second thread, and those
+  // with a lock of their own.
+  SRLRegistryIvars& unguarded() const noexcept RT_NO_THREAD_SAFETY_ANALYSIS { return *ivars_; }
+
+  std::unique_ptr<SRLRegistryIvars> ivars_ RT_POINTER_GUARDED_BY(lock_);
+  mutable SRLUnfairLock lock_;
 };

@@ -5,9 +5,16 @@
 #include <vector>
 
 #include "Libraries/Util/ErrorHandler/PECReport.h"
+#include "Runtime/Values/Array.h"
+#include "Runtime/Values/Set.h"
+#include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementation.h"
+#include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSetCodableWrapper.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLAPIIdentifier.h"
-#include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingEnabled.h"
-#include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingMeasurement.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLRegistryIvars.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLScopedFactory.h"
+#include "Shared/ServiceRegistry/Source/Profiling/Private/SRLPProfilingEnabled.h"
+#include "Shared/ServiceRegistry/Source/Profiling/Private/SRLPProfilingMeasurement.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 
 using namespace rt::literals;
@@ -84,7 +91,7 @@ rt::Ref<rt::Object> SRLRegistry::keptInstanceOf(const SRLImplementation& impleme
                                                 rt::Ref<SRLMemoizingScope>& scope) {
   rt::Ref<rt::Object> instance;
   const SRLScopedFactory* scoped = implementation.scopedFactory();
-  if (scoped == nullptr || !isShared_.load(std::memory_order_relaxed)) return instance;
+  if (scoped == nullptr || !ivars_->isShared.load(std::memory_order_relaxed)) return instance;
   SRLScopeTagSet masked;
   if (const SRLScopeTagSet* scopeTags = scoped->scopeTags(tags, masked)) {
     SRLMemoizingScope& open = openScope(*scopeTags);
@@ -106,6 +113,14 @@ rt::Ref<rt::Object> SRLRegistry::instanceOf(SRLImplementation& implementation,
   return implementation.factoryBlock().callKept(tags, &instanceCreated);
 }
 
+// For a request: an instance that is there already; or else the implementation, and the scope that is to keep
+// its instance, if that is a scope of this registry.
+struct SRLRegistry::Found {
+  rt::Ref<rt::Object> instance;
+  rt::Ref<SRLImplementation> implementation;
+  rt::Ref<SRLMemoizingScope> scope;
+};
+
 SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) {
   Found found;
   const rt::Ref<SRLImplementation>* bound = boundTo(api);
@@ -120,7 +135,7 @@ SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SR
                                                                   const SRLScopeTagSet& scopeTags) {
   constexpr const char* kFunction = "-[SRLRegistry internalService:scopeTags:]";
   Found found = [&] {
-    const rt::LockGuard guard(ivars_->lock);
+    const rt::LockGuard guard(lock_);
     Found all = find(api, scopeTags);
     if (!all.instance && !all.implementation) [[unlikely]] {
       if (ivars_->bindingsState == SRLBindingsState::kRegistered) {
@@ -141,7 +156,7 @@ SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SR
 [[gnu::flatten]] rt::Ref<rt::Object> SRLRegistry::internalOptionalService(const SRLAPIRegistrationData* api,
                                                                           const SRLScopeTagSet& scopeTags) {
   Found found = [&] {
-    const rt::LockGuard guard(ivars_->lock);
+    const rt::LockGuard guard(lock_);
     Found all = find(api, scopeTags);
     if (!all.instance && !all.implementation && ivars_->bindingsState == SRLBindingsState::kInProgress)
       reportEarlyRequest("-[SRLRegistry internalOptionalService:scopeTags:]", api);
@@ -195,7 +210,7 @@ bool SRLRegistry::registersBindingsFor(const SRLAPIRegistrationData* api) {
   rt::Ref<SRLMemoizingScope> scope;
   decltype(implementations->begin()) next;
   {
-    const rt::LockGuard guard(ivars_->lock);
+    const rt::LockGuard guard(lock_);
     if (const auto* known = ivars_->multiBindings.find(api)) {
       implementations = known->second;
     } else if (!ivars_->isUnknown(api) && registersBindingsFor(api)) {
@@ -235,7 +250,7 @@ bool SRLRegistry::internalHasImplementationForService(const SRLAPIRegistrationDa
               "|apiIdentifier| cannot be nil!"_s);
     return false;
   }
-  const rt::LockGuard guard(ivars_->lock);
+  const rt::LockGuard guard(lock_);
   return implementationForSingleBoundService(api) != nullptr;
 }
 
@@ -292,7 +307,7 @@ bool SRLRegistry::eg_internalHasImplementationForService(const rt::String& ident
 }
 
 rt::Ref<SRLMemoizingScope> SRLRegistry::scopeWithTags(const SRLScopeTagSet& tags) {
-  const rt::LockGuard guard(ivars_->lock);
+  const rt::LockGuard guard(lock_);
   return &openScope(tags);
 }
 
@@ -326,7 +341,7 @@ void SRLRegistry::removeScopesWithTag(const rt::Ref<rt::Object>& tag) {
       std::vector<SRLRegistryIvars::Scopes::Entries::node_type> entries;
     } removed;
     std::vector<SRLRegistryIvars::Scopes::Entries::const_iterator> entries;
-    const rt::LockGuard guard(ivars_->lock);
+    const rt::LockGuard guard(lock_);
     const auto& scopes = ivars_->scopes.entries();
     for (auto entry = scopes.begin(); entry != scopes.end(); ++entry) {
       if (!SRLScopeTagSetContainsTag(entry->first.tags, keptTag.get())) continue;
@@ -344,14 +359,16 @@ void SRLRegistry::removeScopesWithTag(const rt::Ref<rt::Object>& tag) {
 }
 
 rt::Ref<SRLScopeLifecycleDelegate> SRLRegistry::scopeLifecycleDelegate() const {
-  const rt::LockGuard guard(delegateLock_);
-  return scopeLifecycleDelegate_.lock();
+  SRLRegistryIvars& ivars = unguarded();
+  const rt::LockGuard guard(ivars.delegateLock);
+  return ivars.scopeLifecycleDelegate.lock();
 }
 
 void SRLRegistry::setScopeLifecycleDelegate(const rt::Ref<SRLScopeLifecycleDelegate>& delegate) {
   rt::Weak<SRLScopeLifecycleDelegate> weak = delegate;
-  const rt::LockGuard guard(delegateLock_);
-  scopeLifecycleDelegate_ = std::move(weak);
+  SRLRegistryIvars& ivars = unguarded();
+  const rt::LockGuard guard(ivars.delegateLock);
+  ivars.scopeLifecycleDelegate = std::move(weak);
 }
 
 // Asked of a registry, whichever registry the instances are to live in.

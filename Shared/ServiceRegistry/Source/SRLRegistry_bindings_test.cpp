@@ -5,8 +5,8 @@
 
 #include <string>
 
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLProtocolType.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "tests/support/TestBindings.h"
 #include "tests/support/WholeReports.h"
 

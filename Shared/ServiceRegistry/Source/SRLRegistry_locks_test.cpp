@@ -13,7 +13,7 @@
 
 #include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Queues/MainQueue.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 
 namespace {
 

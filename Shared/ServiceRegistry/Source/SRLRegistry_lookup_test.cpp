@@ -12,7 +12,7 @@
 #include <vector>
 
 #include "Runtime/Queues/MainQueue.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "tests/support/TestBindings.h"
 #include "tests/support/WholeReports.h"
 

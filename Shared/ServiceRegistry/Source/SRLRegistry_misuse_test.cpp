@@ -10,7 +10,7 @@
 #include <string>
 #include <thread>
 
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "tests/support/TestBindings.h"
 #include "tests/support/TestLoggers.h"
 #include "tests/support/TestReports.h"

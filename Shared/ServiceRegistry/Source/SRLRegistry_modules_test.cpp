@@ -14,7 +14,7 @@
 #include <utility>
 #include <vector>
 
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "tests/support/TestBindings.h"
 #include "tests/support/WholeReports.h"
 

@@ -7,12 +7,12 @@
 #include <cstddef>
 
 #include "Runtime/Values/Number.h"
-#include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingMeasurement.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
+#include "Shared/ServiceRegistry/Source/Profiling/Private/SRLPProfilingMeasurement.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingSwitch.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationEvent.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationNewInstanceEvent.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLProfilingStorage.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "tests/support/TestServices.h"
 
 bool SRLPProfilingSwitch() {

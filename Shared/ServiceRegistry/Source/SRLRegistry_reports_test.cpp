@@ -8,7 +8,7 @@
 #include <vector>
 
 #include "Runtime/Locks/UnfairLock.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "tests/support/TestServices.h"
 
 namespace {

@@ -11,8 +11,8 @@
 
 #include "Runtime/Objects/Weak.h"
 #include "Runtime/Values/Number.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "tests/support/TestServices.h"
 
 namespace {

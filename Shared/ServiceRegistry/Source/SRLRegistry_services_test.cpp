@@ -12,8 +12,8 @@
 
 #include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Values/Number.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 #include "tests/support/AllocationCount.h"
 #include "tests/support/TestServices.h"
 

@@ -1,8 +1,6 @@
 // The registry as an object: the shared one, copies, what it says of itself, and its end. What is in it is
 // in the other SRLRegistry_*_test.cpp.
 
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
-
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
@@ -11,8 +9,9 @@
 #include <thread>
 #include <utility>
 
-#include "Runtime/Locks/ThreadIdentifier.h"
+#include "Runtime/Locks/Private/ThreadIdentifier.h"
 #include "Runtime/Queues/MainQueue.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "tests/support/TestBindings.h"
 #include "tests/support/WholeReports.h"
 

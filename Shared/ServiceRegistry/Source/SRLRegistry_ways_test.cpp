@@ -17,7 +17,8 @@
 #include <utility>
 #include <vector>
 
-#include "Shared/ServiceRegistry/Source/SRLRegistry.h"
+#include "Shared/ServiceRegistry/ServiceRegistry.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLRegistryIvars.h"
 #include "tests/support/TestBindings.h"
 #include "tests/support/TestReports.h"
 
@@ -60,7 +61,7 @@ class OpenRegistry final : public rt::Implements<OpenRegistry, SRLRegistry> {
 
   // What is bound to an API for many; null where no module knows it.
   Ref<rt::Set> manyBoundTo(const SRLAPIRegistrationData& api) RT_NO_THREAD_SAFETY_ANALYSIS {
-    const rt::LockGuard guard(known_->lock);
+    const rt::LockGuard guard(*lock());
     const bool isKnown = known_->multiBindings.find(&api) != nullptr;
     return isKnown || lazilyRegisterBindingsForAPI(&api) ? known_->multiBindings[&api] : nullptr;
   }

@@ -2,10 +2,10 @@
 
 #include <cstdint>
 
-#include "Foundation/ZEBDropExceptions.h"
+#include "Foundation/Private/ZEBDropExceptions.h"
 #include "Foundation/ZEBLogMininumLevelFilter.h"
 #include "Runtime/Process/AssertionHandler.h"
-#include "Runtime/Process/CallStack.h"
+#include "Runtime/Process/Private/CallStack.h"
 #include "Runtime/Text/Format.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogAppControl.h"

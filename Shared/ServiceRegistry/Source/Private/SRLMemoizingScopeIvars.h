@@ -11,7 +11,7 @@
 #include <unordered_map>
 
 #include "Runtime/Base/Visibility.h"
-#include "Runtime/Locks/LongLock.h"
+#include "Runtime/Locks/Private/LongLock.h"
 #include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Object.h"

@@ -1,20 +1,17 @@
 #pragma once
 
-/// What an SRLRegistry knows.
-///
-///     SRLRegistryIvars ivars;
-///     const rt::LockGuard guard(ivars.lock);
-///     ivars.singleBindings[&clockAPI] = implementation;
-///
-/// Not for: anything but the registry.
+// The state of an SRLRegistry. The registry owns it, and guards most of it with its lock.
 
+#include <atomic>
 #include <cstddef>
 #include <cstdint>
 #include <string_view>
 #include <variant>
 #include <vector>
 
+#include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/Weak.h"
 #include "Runtime/Values/Set.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLBindingsModuleData.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementation.h"
@@ -23,13 +20,13 @@
 #include "Shared/ServiceRegistry/Source/Private/SRLAPIIdentifier.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLTable.h"
-#include "Shared/ServiceRegistry/Source/SRLUnfairLock.h"
+#include "Shared/ServiceRegistry/Source/SRLScopeLifecycleDelegate.h"
 
-/// How far the registration of bindings modules is.
+/// The progress of the registration of bindings modules.
 enum class SRLBindingsState : std::uint8_t { kNone = 0, kInProgress = 1, kRegistered = 2 };
 
 struct SRLRegistryIvars {
-  /// The key of a scope: its tags, whose hash is asked for once.
+  /// The key of a scope: its tags, and their hash, which is computed once.
   struct ScopeKey {
     explicit ScopeKey(const SRLScopeTagSet& set) : tags(set), hash(SRLScopeTagSetHash(set)) {}
 
@@ -47,13 +44,13 @@ struct SRLRegistryIvars {
   using Scopes = SRLTable<ScopeKey, rt::Ref<SRLMemoizingScope>, ScopeKeyHash, ScopeKeyEqual>;
 
   SRLRegistryIvars() = default;
-  /// The same bindings and modules, and no scopes.
-  SRLRegistryIvars(const SRLRegistryIvars& other) RT_REQUIRES(other.lock);
+  /// Copies bindings and modules, but no scopes and no delegate.
+  SRLRegistryIvars(const SRLRegistryIvars& other);
   SRLRegistryIvars& operator=(const SRLRegistryIvars&) = delete;
   ~SRLRegistryIvars();
 
-  /// The scope with these tags; null where there is none.
-  SRLMemoizingScope* findScope(const SRLScopeTagSet& tags) RT_REQUIRES(lock) {
+  /// Returns the scope with these tags. Null if there is none.
+  SRLMemoizingScope* findScope(const SRLScopeTagSet& tags) {
     if (lastScope == nullptr || lastTags != tags.tags || !SRLScopeTagSetEqual(lastScope->first.tags, tags)) {
       const Scopes::Entry* found = scopes.find(ScopeKey(tags));
       if (found == nullptr) return nullptr;
@@ -63,39 +60,46 @@ struct SRLRegistryIvars {
     return lastScope->second.get();
   }
 
-  /// Whether an API is in one of the tables of what is bound.
-  bool isKnown(const SRLAPIRegistrationData* api) const RT_REQUIRES(lock) {
+  /// Returns whether an API is in one of the tables of bindings.
+  bool isKnown(const SRLAPIRegistrationData* api) const {
     return singleBindings.find(api) != nullptr || multiBindings.find(api) != nullptr;
   }
 
-  /// Whether it is known that no module knows an API.
-  bool isUnknown(const SRLAPIRegistrationData* api) const RT_REQUIRES(lock) {
-    return unknownAPIs.find(api) != nullptr;
-  }
+  /// Returns whether an earlier search has found that no module has the API.
+  bool isUnknown(const SRLAPIRegistrationData* api) const { return unknownAPIs.find(api) != nullptr; }
 
-  /// The implementation of each API that is known; null where it has none.
-  SRLTable<const SRLAPIRegistrationData*, rt::Ref<SRLImplementation>> singleBindings RT_GUARDED_BY(lock);
-  /// The implementations of each API that is known; null where not even a set has been made. A set is never
-  /// changed but replaced, so that whoever looks at one needs no lock.
-  SRLTable<const SRLAPIRegistrationData*, rt::Ref<rt::Set>> multiBindings RT_GUARDED_BY(lock);
-  /// A key has retained its tags.
-  Scopes scopes RT_GUARDED_BY(lock);
-  // Written when the program is loaded, before it has a second thread.
+  // Guarded by the registry's lock.
+
+  /// The implementation of each single-bound API that is known. Null if it has none.
+  SRLTable<const SRLAPIRegistrationData*, rt::Ref<SRLImplementation>> singleBindings;
+  /// The implementations of each multi-bound API that is known. Null if no set has been made yet. A set is
+  /// never changed but replaced, so that it can be read without the lock.
+  SRLTable<const SRLAPIRegistrationData*, rt::Ref<rt::Set>> multiBindings;
+  /// Each key retains its tags.
+  Scopes scopes;
+  // The next three remember results of earlier requests. They are not copied.
+  /// The scope of the latest request, if it has not ended.
+  const Scopes::Entry* lastScope = nullptr;
+  /// The tags of that request, which may be gone. A request with the same tags most likely wants the same
+  /// scope.
+  decltype(SRLScopeTagSet::tags) lastTags{};
+  /// The APIs that no module has. Filled only after all modules are registered, which then never change.
+  SRLTable<const SRLAPIRegistrationData*, std::monostate> unknownAPIs;
+
+  // Written when the program is loaded, before it has a second thread. Read without the lock.
+
   std::vector<const SRLBindingsModuleData*> bindingsModules;
   SRLConfigurationFactories configFactories;
   SRLBindingsState bindingsState = SRLBindingsState::kNone;
-  SRLUnfairLock lock;
 
-  // What requests have found out, so that the next ones need not. No copy has it.
+  // Read without the lock.
 
-  /// The scope that was asked for last, if it is still there.
-  const Scopes::Entry* lastScope RT_GUARDED_BY(lock) = nullptr;
-  /// The tags that it was asked for with, which may be gone. A request with the same ones most likely wants
-  /// the same scope.
-  decltype(SRLScopeTagSet::tags) lastTags RT_GUARDED_BY(lock){};
-  /// The APIs that no module knows, asked for when all modules were registered, which never change.
-  SRLTable<const SRLAPIRegistrationData*, std::monostate> unknownAPIs RT_GUARDED_BY(lock);
-  /// The APIs that were asked for by identifier, which is in their records. Changed under the lock, and
-  /// looked into without it.
+  /// The APIs found so far by identifier. Keys are the identifiers in their records. Written under the lock.
   SRLTable<std::string_view, const SRLAPIRegistrationData*, SRLIdentifierHash> apisByIdentifier;
+  /// Null once the registry is being destroyed.
+  rt::Ref<SRLMemoizingScope> configScope = SRLMemoizingScope::init();
+  /// Written together with the shared registry itself.
+  std::atomic<bool> isShared = false;
+  rt::UnfairLock delegateLock;
+  rt::Weak<SRLScopeLifecycleDelegate> scopeLifecycleDelegate RT_GUARDED_BY(delegateLock);
 };

@@ -4,7 +4,7 @@
 
 #include <gtest/gtest.h>
 
-#include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingEnabled.h"
+#include "Shared/ServiceRegistry/Source/Profiling/Private/SRLPProfilingEnabled.h"
 
 namespace {
 

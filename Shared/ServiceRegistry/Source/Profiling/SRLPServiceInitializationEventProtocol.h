@@ -23,7 +23,7 @@ struct RT_VISIBLE SRLPServiceInitializationEventProtocol
   virtual const rt::String& apiDescription() const = 0;
   /// The implementation, described in full.
   virtual const rt::String& implDescription() const = 0;
-  /// When the making began, by the clock of Runtime/Base/MonotonicClock.h.
+  /// When the making began, by the clock of Runtime/Base/Private/MonotonicClock.h.
   virtual std::uint64_t monotonicRawClockStartTime() const = 0;
   /// How long it took, with what was made meanwhile.
   virtual std::uint64_t durationNs() const = 0;

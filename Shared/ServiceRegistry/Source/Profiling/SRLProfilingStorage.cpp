@@ -2,8 +2,8 @@
 
 #include <utility>
 
-#include "Runtime/Locks/Lazy.h"
-#include "Shared/ServiceRegistry/Source/Profiling/SRLPSelectorSort.h"
+#include "Runtime/Locks/Private/Lazy.h"
+#include "Shared/ServiceRegistry/Source/Profiling/Private/SRLPSelectorSort.h"
 
 namespace {
 

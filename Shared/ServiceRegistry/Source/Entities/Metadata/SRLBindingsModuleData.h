@@ -15,7 +15,6 @@
 ///
 /// Not for: people; what they write is turned into these.
 
-#include <algorithm>
 #include <cstddef>
 #include <cstdint>
 #include <span>
@@ -66,14 +65,12 @@ constexpr bool SRLIsIdentifierBefore(std::string_view first, std::string_view se
 /// Whether a module's bindings are in order, each API once, and every API's identifier as long as it says.
 /// For a static_assert beside the bindings, since the registry finds nothing reliably where this is false.
 constexpr bool SRLAreBindingsSorted(std::span<const _SRLBindingRegistrationData> bindings) noexcept {
-  constexpr auto identifier = [](const _SRLBindingRegistrationData& binding) {
-    return std::string_view(binding.api->identifier);
-  };
-  return std::ranges::all_of(bindings,
-                             [identifier](const auto& binding) {
-                               return binding.api->identifierLength == identifier(binding).size();
-                             }) &&
-         std::ranges::adjacent_find(bindings, [identifier](const auto& first, const auto& second) {
-           return !SRLIsIdentifierBefore(identifier(first), identifier(second));
-         }) == bindings.end();
+  std::string_view previous;
+  for (const _SRLBindingRegistrationData& binding : bindings) {
+    const std::string_view identifier = binding.api->identifier;
+    if (binding.api->identifierLength != identifier.size()) return false;
+    if (&binding != bindings.data() && !SRLIsIdentifierBefore(previous, identifier)) return false;
+    previous = identifier;
+  }
+  return true;
 }

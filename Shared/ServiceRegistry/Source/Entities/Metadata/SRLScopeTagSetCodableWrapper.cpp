@@ -3,6 +3,8 @@
 #include <string_view>
 
 #include "Libraries/Util/ErrorHandler/PECReport.h"
+#include "Runtime/Archive/KeyedArchiver.h"
+#include "Runtime/Archive/KeyedUnarchiver.h"
 #include "Runtime/Text/Format.h"
 
 using namespace rt::literals;

@@ -26,8 +26,6 @@
 #include <utility>
 
 #include "Runtime/Archive/Coding.h"
-#include "Runtime/Archive/KeyedArchiver.h"
-#include "Runtime/Archive/KeyedUnarchiver.h"
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Object.h"

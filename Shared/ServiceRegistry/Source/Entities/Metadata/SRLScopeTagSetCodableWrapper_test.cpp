@@ -15,7 +15,7 @@
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
 #include "Runtime/Archive/KeyedArchiver.h"
 #include "Runtime/Archive/KeyedUnarchiver.h"
-#include "Runtime/Archive/PropertyList.h"
+#include "Runtime/Archive/Private/PropertyList.h"
 #include "Runtime/Objects/Exception.h"
 #include "Runtime/Objects/String.h"
 #include "Runtime/Values/Array.h"

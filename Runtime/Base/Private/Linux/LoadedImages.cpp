@@ -1,0 +1,116 @@
+#include "Runtime/Base/Private/LoadedImages.h"
+
+#include <dlfcn.h>
+#include <link.h>
+
+#include <algorithm>
+#include <bit>
+#include <cstddef>
+#include <cstdint>
+#include <cstdio>
+#include <cstring>
+
+// A program that was linked statically need have none. Neither is `dlopen` named below: the linker warns of
+// that in such a program.
+#pragma weak dlsym
+
+namespace rt::detail {
+
+namespace {
+
+/// An image by an address that is in it. Its name stays where it is as long as the image is loaded.
+struct NamedImage {
+  std::uintptr_t address;
+  const char* name = nullptr;
+};
+
+/// 0 to go on with the next image, another value to end.
+int findImage(dl_phdr_info* image, std::size_t /*size*/, void* context) {
+  NamedImage& wanted = *static_cast<NamedImage*>(context);
+  for (std::size_t i = 0; i < image->dlpi_phnum; ++i) {
+    const ElfW(Phdr)& segment = image->dlpi_phdr[i];
+    if (segment.p_type != PT_LOAD) continue;
+    if (wanted.address - image->dlpi_addr - segment.p_vaddr >= segment.p_memsz) continue;
+    wanted.name = image->dlpi_name;
+    return 1;
+  }
+  return 0;
+}
+
+constexpr std::size_t aligned(std::size_t size, std::size_t alignment) {
+  return (size + alignment - 1) / alignment * alignment;
+}
+
+/// What the first mark among the notes from `note` to `end` leads to, or null. All marks of an image lead to
+/// the same.
+const ImageState* stateIn(const std::byte* note, const std::byte* end, std::size_t alignment) noexcept {
+  auto left = static_cast<std::size_t>(end - note);
+  while (left >= sizeof(ElfW(Nhdr))) {
+    ElfW(Nhdr) header;
+    std::memcpy(&header, note, sizeof header);
+    const std::size_t descriptionAt = aligned(sizeof header + header.n_namesz, alignment);
+    const std::size_t size = descriptionAt + header.n_descsz;
+    // What other tools have written may be cut off.
+    if (size > left) break;
+    std::int64_t distance = 0;
+    if (header.n_type == kImageMarkType && header.n_namesz == sizeof kImageMarkName &&
+        header.n_descsz == sizeof distance &&
+        std::memcmp(note + sizeof header, kImageMarkName, sizeof kImageMarkName) == 0) {
+      const std::byte* const description = note + descriptionAt;
+      std::memcpy(&distance, description, sizeof distance);
+      return reinterpret_cast<const ImageState*>(description + distance);
+    }
+    // The last need not be padded.
+    const std::size_t paddedSize = std::min(aligned(size, alignment), left);
+    note += paddedSize;
+    left -= paddedSize;
+  }
+  return nullptr;
+}
+
+/// 0 to go on with the next image, another value to end.
+int inspect(dl_phdr_info* image, std::size_t /*size*/, void* /*context*/) {
+  for (std::size_t i = 0; i < image->dlpi_phnum; ++i) {
+    const ElfW(Phdr)& segment = image->dlpi_phdr[i];
+    if (segment.p_type != PT_NOTE) continue;
+    // NOLINTNEXTLINE(performance-no-int-to-ptr): the system says so
+    const auto* notes = reinterpret_cast<const std::byte*>(image->dlpi_addr + segment.p_vaddr);
+    const ImageState* const state = stateIn(notes, notes + segment.p_memsz, segment.p_align == 8 ? 8 : 4);
+    if (state != nullptr && !state->isAnnounced) return 1;
+  }
+  return 0;
+}
+
+}  // namespace
+
+void announce(ImageState& state, const std::int32_t* begin, const std::int32_t* end) noexcept {
+  if (state.isAnnounced) return;
+  for (const std::int32_t* distance = begin; distance != end; ++distance) {
+    const std::uintptr_t address =
+        reinterpret_cast<std::uintptr_t>(distance) + static_cast<std::uintptr_t>(std::intptr_t{*distance});
+    reinterpret_cast<void (*)()>(address)();  // NOLINT(performance-no-int-to-ptr): the linker says so
+  }
+  state.isAnnounced = true;
+  keepImage(state);
+  runLoadHooksWhenComplete();
+}
+
+void keepImage(const ImageState& state) noexcept {
+  if (dlsym == nullptr) return;
+  NamedImage image{.address = std::bit_cast<std::uintptr_t>(&state)};
+  dl_iterate_phdr(&findImage, &image);
+  // The program itself has no name.
+  if (image.name == nullptr || *image.name == '\0') return;
+  using Open = void*(const char*, int);
+  auto* const open = reinterpret_cast<Open*>(dlsym(RTLD_DEFAULT, "dlopen"));
+  // The handle is kept, so that nobody's is the last one.
+  if (open != nullptr && open(image.name, RTLD_LAZY | RTLD_NOLOAD | RTLD_NODELETE) != nullptr) return;
+  // The image is loaded, so that the loader refuses nothing but what has no memory.
+  std::fprintf(stderr, "rt: \"%s\" cannot be kept from being unloaded; it must not be closed\n", image.name);
+}
+
+bool areAllImagesAnnounced() noexcept {
+  return dl_iterate_phdr(&inspect, nullptr) == 0;
+}
+
+}  // namespace rt::detail

@@ -1,0 +1,97 @@
+#include "Runtime/Base/Private/StandardError.h"
+
+#include <poll.h>
+#include <sys/stat.h>
+#include <sys/uio.h>
+#include <unistd.h>
+
+#include <algorithm>
+#include <cerrno>
+#include <climits>
+#include <csignal>
+
+namespace rt::StandardError {
+
+namespace {
+
+using Clock = std::chrono::steady_clock;
+
+// Keeps SIGPIPE from the calling thread, the one that it raises itself and no other.
+class BrokenPipeIgnored {
+ public:
+  BrokenPipeIgnored() noexcept {
+    sigemptyset(&brokenPipe_);
+    sigaddset(&brokenPipe_, SIGPIPE);
+    wasPending_ = isPending();
+    pthread_sigmask(SIG_BLOCK, &brokenPipe_, &previous_);
+  }
+  BrokenPipeIgnored(const BrokenPipeIgnored&) = delete;
+  BrokenPipeIgnored& operator=(const BrokenPipeIgnored&) = delete;
+  ~BrokenPipeIgnored() {
+    if (!wasPending_ && isPending()) {
+      int ignored = 0;
+      sigwait(&brokenPipe_, &ignored);
+    }
+    pthread_sigmask(SIG_SETMASK, &previous_, nullptr);
+  }
+
+ private:
+  static bool isPending() noexcept {
+    sigset_t pending;
+    sigpending(&pending);
+    return sigismember(&pending, SIGPIPE) == 1;
+  }
+
+  sigset_t brokenPipe_;
+  sigset_t previous_;
+  bool wasPending_;
+};
+
+// Waits until there is room, or a reason why there will be none, which the next write tells; returns whether
+// there is.
+bool awaitRoom(Clock::time_point end) noexcept {
+  for (;;) {
+    const auto left = std::chrono::ceil<std::chrono::milliseconds>(end - Clock::now());
+    pollfd stream{STDERR_FILENO, POLLOUT, 0};
+    const int ready = poll(&stream, 1, static_cast<int>(std::max<long long>(left.count(), 0)));
+    if (ready < 0 && errno == EINTR) continue;
+    return ready > 0;
+  }
+}
+
+// Writes what there is room for: another writer may have taken what there was a moment before.
+ssize_t writeWithoutWaiting(std::string_view text) noexcept {
+#ifdef __linux__
+  const iovec piece{const_cast<char*>(text.data()), text.size()};
+  const ssize_t count = pwritev2(STDERR_FILENO, &piece, 1, -1, RWF_NOWAIT);
+  if (count >= 0 || errno != EOPNOTSUPP) return count;
+#endif
+  return ::write(STDERR_FILENO, text.data(), text.size());
+}
+
+}  // namespace
+
+bool write(std::string_view text, std::chrono::milliseconds longestWait) noexcept {
+  const BrokenPipeIgnored guard;
+  const Clock::time_point end = Clock::now() + longestWait;
+  // A file takes all of it at once. What anything else says it has room for is a piece of this length.
+  struct stat status{};
+  const bool isFile = fstat(STDERR_FILENO, &status) == 0 && S_ISREG(status.st_mode);
+  while (!text.empty()) {
+    ssize_t count = 0;
+    if (isFile) {
+      count = ::write(STDERR_FILENO, text.data(), text.size());
+    } else {
+      if (!awaitRoom(end)) return false;
+      count = writeWithoutWaiting(text.substr(0, PIPE_BUF));
+    }
+    if (count > 0) {
+      text.remove_prefix(static_cast<std::size_t>(count));
+    } else if (count == 0 || (errno != EINTR && (errno != EAGAIN || Clock::now() >= end))) {
+      return false;
+    }
+  }
+  return true;
+}
+
+}  // namespace rt::StandardError

@@ -1,0 +1,313 @@
+// Forks while other threads hold, take and wait for locks.
+#include "Runtime/Locks/Private/ForkGate.h"
+
+#include <gtest/gtest.h>
+#include <pthread.h>
+#include <sys/wait.h>
+#include <unistd.h>
+
+#include <array>
+#include <atomic>
+#include <cerrno>
+#include <climits>
+#include <cstdint>
+#include <set>
+#include <thread>
+#include <vector>
+
+#include "Runtime/Locks/UnfairLock.h"
+#include "tests/support/ForkTest.h"
+
+namespace {
+
+using rt::LockGuard;
+using rt::UnfairLock;
+
+// What a lock guards: two numbers that are the same whenever it is free.
+struct Pair {
+  UnfairLock lock;
+  int first RT_GUARDED_BY(lock) = 0;
+  int second RT_GUARDED_BY(lock) = 0;
+
+  void change() {
+    const LockGuard guard(lock);
+    ++first;
+    std::this_thread::yield();
+    ++second;
+  }
+
+  bool isWhole() {
+    const LockGuard guard(lock);
+    return first == second;
+  }
+};
+
+// A lock inside of which others are taken, as a registry's is.
+struct Nest {
+  UnfairLock lock;
+  std::array<Pair, 2> pairs;
+
+  void change() {
+    const LockGuard guard(lock);
+    for (Pair& each : pairs) each.change();
+  }
+};
+
+std::uint32_t heldLocks() {
+  return rt::detail::ForkGate::heldLocks();
+}
+
+// Invariant: whatever the other threads were doing, all locks are free in the child, and what they guard is
+// whole.
+TEST(ForkGate, LeavesNoLockHeldInTheChildAndNoDataHalfChanged) {
+  std::array<Pair, 3> pairs;
+  Nest nest;
+  std::atomic<bool> isEnding = false;
+  std::vector<std::thread> threads;
+  for (int i = 0; i < 4; ++i) {
+    threads.emplace_back([&, i] {
+      while (!isEnding) {
+        // Two threads for one of them, so that some wait for each other.
+        pairs.at(static_cast<std::size_t>(i / 2)).change();
+        nest.change();
+      }
+    });
+  }
+  int status = 0;
+  for (int i = 0; i < 200 && status == 0; ++i) {
+    status = statusOfChild([&] {
+      bool isWhole = true;
+      for (Pair& each : pairs) isWhole = each.isWhole() && isWhole;
+      for (Pair& each : nest.pairs) isWhole = each.isWhole() && isWhole;
+      for (Pair& each : pairs) each.change();  // The last is used by children alone.
+      nest.change();
+      // In a child of the child, too.
+      const bool isUsableInGrandchild = statusOfChild([&] {
+                                          nest.change();
+                                          return 0;
+                                        }) == 0;
+      return isWhole && isUsableInGrandchild && heldLocks() == 0 ? 0 : 1;
+    });
+  }
+  isEnding = true;
+  for (std::thread& thread : threads) thread.join();
+  EXPECT_EQ(status, 0);
+  for (Pair& each : pairs) EXPECT_TRUE(each.isWhole());
+  EXPECT_EQ(heldLocks(), 0U);
+}
+
+// A lock that a fork finds held for longer than it waits is free in the child nevertheless.
+TEST(ForkGate, WaitsForALockNoLongerThanItSays) {
+  if (RT_TEST_IS_APPLE) GTEST_SKIP() << "the system's lock stays held";
+  UnfairLock lock;
+  const HeldElsewhere holder(lock);
+  EXPECT_EQ(statusOfChild([&]() RT_NO_THREAD_SAFETY_ANALYSIS {
+              if (!lock.tryLock()) return 1;
+              lock.unlock();
+              const LockGuard guard(lock);
+              return 0;
+            }),
+            0);
+  EXPECT_FALSE([&]() RT_NO_THREAD_SAFETY_ANALYSIS { return lock.tryLock(); }())
+      << "the parent's is still held";
+}
+
+// The same for one that a thread of the child waits for, and which several threads there want.
+TEST(ForkGate, AnAbandonedLockKeepsThreadsApartInTheChild) {
+  if (RT_TEST_IS_APPLE || RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "no new threads in the child here";
+  Pair pair;
+  std::atomic<bool> isWaiting = false;
+  const HeldElsewhere holder(pair.lock);
+  // Its bit for those who wait is set, too.
+  std::thread waiter([&] {
+    isWaiting = true;
+    const LockGuard guard(pair.lock);
+  });
+  while (!isWaiting) std::this_thread::yield();
+  EXPECT_EQ(statusOfChild([&] {
+              std::array<std::thread, 3> threads;
+              for (std::thread& each : threads) {
+                each = std::thread([&] {
+                  for (int i = 0; i < 1000; ++i) pair.change();
+                });
+              }
+              for (std::thread& each : threads) each.join();
+              const LockGuard guard(pair.lock);
+              return pair.first == 3000 && pair.second == 3000 ? 0 : 1;
+            }),
+            0);
+  holder.letGo();
+  waiter.join();
+}
+
+// Two threads that fork at once, each with a lock of its own that the other's fork waits for.
+TEST(ForkGate, LetsThreadsForkAtOnce) {
+  std::array<Pair, 2> pairs;
+  std::array<std::thread, 2> threads;
+  std::atomic<int> failures = 0;
+  for (std::size_t i = 0; i < 2; ++i) {
+    threads.at(i) = std::thread([&, i] {
+      for (int round = 0; round < 50; ++round) {
+        pairs.at(i).change();
+        const int status = statusOfChild([&] { return pairs[0].isWhole() && pairs[1].isWhole() ? 0 : 1; });
+        if (status != 0) ++failures;
+      }
+    });
+  }
+  for (std::thread& each : threads) each.join();
+  EXPECT_EQ(failures, 0);
+}
+
+TEST(ForkGate, AThreadThatForksWithALockHasItInTheChild) {
+  Pair pair;
+  const LockGuard guard(pair.lock);
+  EXPECT_EQ(heldLocks(), 1U);
+  EXPECT_EQ(statusOfChild([] { return heldLocks() == 1 ? 0 : 1; }), 0);
+  EXPECT_EQ(heldLocks(), 1U);
+}
+
+// Threads come and go, and what they use at their end takes locks, while others fork.
+TEST(ForkGate, CountsThreadsUntilTheyHaveEnded) {
+  static constinit Pair pair;
+  struct AtEnd {
+    ~AtEnd() { pair.change(); }
+  };
+  pthread_key_t key{};
+  ASSERT_EQ(pthread_key_create(&key, [](void*) { pair.change(); }), 0);
+  std::atomic<bool> isEnding = false;
+  std::array<std::thread, 2> starters;
+  for (std::thread& each : starters) {
+    each = std::thread([&] {
+      while (!isEnding) {
+        std::thread([&] {
+          static thread_local const AtEnd atEnd;
+          static_cast<void>(&atEnd);
+          pthread_setspecific(key, &pair);
+        }).join();
+      }
+    });
+  }
+  int status = 0;
+  for (int i = 0; i < 200 && status == 0; ++i) {
+    status = statusOfChild([] { return pair.isWhole() ? 0 : 1; });
+  }
+  isEnding = true;
+  for (std::thread& each : starters) each.join();
+  EXPECT_EQ(status, 0);
+  pthread_key_delete(key);
+}
+
+// Used to follow a list into the memory of threads that had ended, for ever.
+TEST(ForkGate, LooksAtNoThreadThatHasEndedHoweverLateItsFirstLockCame) {
+  if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer allows no new threads in the child";
+  static constinit UnfairLock lock;
+  static constinit pthread_key_t key{};
+  // In the last round of destructors that the system makes, and in those before it.
+  const auto end = [](void* value) {
+    const auto rounds = reinterpret_cast<std::intptr_t>(value);
+    if (rounds > 1) {
+      pthread_setspecific(key, reinterpret_cast<void*>(rounds - 1));  // NOLINT(performance-no-int-to-ptr)
+    } else {
+      const LockGuard guard(lock);
+    }
+  };
+  ASSERT_EQ(pthread_key_create(&key, end), 0);
+  EXPECT_EQ(statusOfChild([] {
+              for (std::intptr_t rounds = 1; rounds <= PTHREAD_DESTRUCTOR_ITERATIONS; ++rounds) {
+                for (int i = 0; i < 3; ++i) {
+                  // NOLINTNEXTLINE(performance-no-int-to-ptr)
+                  std::thread([&] { pthread_setspecific(key, reinterpret_cast<void*>(rounds)); }).join();
+                }
+              }
+              return statusOfChild([] { return 0; });
+            }),
+            0);
+  pthread_key_delete(key);
+}
+
+TEST(ForkGate, ThreadsCountOneAfterAnotherInTheSamePlace) {
+  static constinit UnfairLock lock;
+  std::set<const void*> places;
+  for (int i = 0; i < 100; ++i) {
+    std::thread([&] {
+      const LockGuard guard(lock);
+      places.insert(rt::detail::currentThread.lockCount.load());
+    }).join();
+  }
+  EXPECT_EQ(places.size(), 1U);
+}
+
+// More than the places that need no memory.
+TEST(ForkGate, WaitsForTheLocksOfManyThreads) {
+  std::vector<Pair> pairs(200);
+  std::atomic<bool> isEnding = false;
+  std::atomic<std::size_t> started = 0;
+  std::vector<std::thread> threads;
+  threads.reserve(pairs.size());
+  for (Pair& each : pairs) {
+    threads.emplace_back([&] {
+      each.change();
+      for (++started; !isEnding;) each.change();
+    });
+  }
+  while (started < pairs.size()) std::this_thread::yield();
+  int status = 0;
+  for (int i = 0; i < 20 && status == 0; ++i) {
+    status = statusOfChild([&] {
+      bool isWhole = true;
+      for (Pair& each : pairs) isWhole = each.isWhole() && isWhole;
+      return isWhole ? 0 : 1;
+    });
+  }
+  isEnding = true;
+  for (std::thread& each : threads) each.join();
+  EXPECT_EQ(status, 0);
+}
+
+// A handler that was registered before the gate's, so that it runs while the gate is shut.
+constinit std::atomic<std::atomic<bool>*> forkWaitsFor = nullptr;
+constinit std::atomic<bool> isForkWaiting = false;
+
+[[gnu::constructor(101)]] void registerEarlyHandler() {
+  pthread_atfork(
+      [] {
+        const std::atomic<bool>* const event = forkWaitsFor.load();
+        if (event == nullptr) return;
+        isForkWaiting = true;
+        isForkWaiting.notify_all();
+        event->wait(false);
+      },
+      nullptr, nullptr);
+}
+
+// Used to deadlock: the handler waits for a thread that waits at the gate.
+TEST(ForkGate, OpensForAThreadThatTheForkItselfWaitsFor) {
+  if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer allows no new threads in the child";
+  EXPECT_EQ(statusOfChild([] {
+              static constinit UnfairLock lock;
+              static constinit std::atomic<bool> hasLocked = false;
+              forkWaitsFor = &hasLocked;
+              std::thread thread([] {
+                isForkWaiting.wait(false);
+                for (int i = 0; i < 1000; ++i) {
+                  const LockGuard guard(lock);
+                }
+                hasLocked = true;
+                hasLocked.notify_all();
+              });
+              const int status = statusOfChild([] {
+                const LockGuard guard(lock);
+                return 0;
+              });
+              thread.join();
+              return status;
+            }),
+            0);
+}
+
+TEST(ForkGate, LeavesErrnoAlone) {
+  errno = E2BIG;
+  EXPECT_EQ(statusOfChild([] { return errno == E2BIG ? 0 : 1; }), 0);
+}
+
+}  // namespace

@@ -1,0 +1,75 @@
+#pragma once
+
+// A lock in one word: the token of the thread that holds it and a bit for the threads that sleep until it is
+// let go. What the locks of this room are made of.
+//
+// Since the token says which thread it is, misuse is caught, and so is a lock that a fork has left held: its
+// owner's thread is not there in the child. Who wants it finds that out when it is about to wait, and takes
+// it over. So no list of locks is needed, and a lock that is free costs nothing more.
+
+#include <atomic>
+#include <cstdint>
+
+#include "Runtime/Locks/Private/ThreadIdentifier.h"
+
+namespace rt::detail {
+
+class OwnerLock {
+ public:
+  constexpr OwnerLock() noexcept = default;
+
+  /// `isCounted` is whether the caller has counted the lock for forks (Runtime/Locks/Private/ForkGate.h).
+  [[gnu::always_inline]] void lock(bool isCounted = false) noexcept {
+    const ThreadToken self = currentThreadToken();
+    if (!take(self)) [[unlikely]]
+      lockSlow(self, isCounted);
+  }
+
+  [[gnu::always_inline]] bool tryLock() noexcept {
+    const ThreadToken self = currentThreadToken();
+    return take(self) || takeOver(self);
+  }
+
+  [[gnu::always_inline]] void unlock() noexcept {
+    // Looked at before it is let go: nobody gets into what another thread guards.
+    if (!isHeldByCaller()) [[unlikely]]
+      failOwner("unlocked");
+    if ((state_.exchange(0, std::memory_order_release) & kHasWaiters) != 0) [[unlikely]]
+      wakeOne();
+  }
+
+  [[gnu::always_inline]] void assertOwner() const noexcept {
+    if (!isHeldByCaller()) [[unlikely]]
+      failOwner("needed");
+  }
+
+  bool isHeldByCaller() const noexcept {
+    return (state_.load(std::memory_order_relaxed) & ~kHasWaiters) == currentThreadToken();
+  }
+
+  /// Whether a thread holds it that a fork has left behind in another process.
+  bool isAbandoned() const noexcept { return isAbandoned(state_.load(std::memory_order_relaxed)); }
+
+ private:
+  static constexpr std::uint32_t kHasWaiters = 0x80000000;
+
+  static bool isAbandoned(std::uint32_t state) noexcept {
+    return state != 0 && isThreadGone(state & ~kHasWaiters);
+  }
+
+  [[gnu::always_inline]] bool take(ThreadToken self) noexcept {
+    std::uint32_t expected = 0;
+    // The release order is for the fork gate.
+    return state_.compare_exchange_strong(expected, self, std::memory_order_acq_rel,
+                                          std::memory_order_relaxed);
+  }
+
+  [[gnu::cold]] void lockSlow(ThreadToken self, bool isCounted) noexcept;
+  [[gnu::cold]] bool takeOver(ThreadToken self) noexcept;
+  [[gnu::cold]] void wakeOne() noexcept;
+  [[noreturn, gnu::cold]] void failOwner(const char* verb) const noexcept;
+
+  std::atomic<std::uint32_t> state_ = 0;
+};
+
+}  // namespace rt::detail

@@ -1,0 +1,33 @@
+#include "Runtime/Locks/Private/ThreadIdentifier.h"
+
+#include "Runtime/Locks/Private/ForkGate.h"
+
+namespace rt {
+
+namespace detail {
+
+constinit thread_local ThreadState currentThread;
+
+ThreadToken learnThreadToken() noexcept {
+  ThreadState& self = currentThread;
+  const ThreadIdentifier identifier = systemThreadIdentifier();
+  self.isMain = systemIsMainThread();
+  self.token = ForkGate::tokenOf(systemThreadNumber());
+  // Kept only where it cannot go stale; the next call asks the system again otherwise.
+  if (ForkGate::registerHandlers()) self.identifier = identifier;
+  return self.token;
+}
+
+ThreadIdentifier learnThreadIdentifier() noexcept {
+  currentThreadToken();
+  const ThreadIdentifier known = currentThread.identifier;
+  return known != 0 ? known : systemThreadIdentifier();
+}
+
+}  // namespace detail
+
+bool isThreadGone(ThreadToken token) noexcept {
+  return detail::ForkGate::isGone(token);
+}
+
+}  // namespace rt

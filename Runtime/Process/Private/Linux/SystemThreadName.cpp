@@ -1,0 +1,63 @@
+#include "Runtime/Process/Private/SystemThreadName.h"
+
+#include <fcntl.h>
+#include <sys/prctl.h>
+#include <unistd.h>
+
+#include <array>
+#include <cerrno>
+#include <string_view>
+
+#include "Runtime/Locks/Private/Lazy.h"
+
+namespace rt::detail {
+
+namespace {
+
+// The kernel keeps 15 bytes and a NUL.
+constexpr std::size_t kCapacity = 16;
+using Text = std::array<char, kCapacity>;
+
+// The name of the main thread, which new threads inherit until they are given another: the process's own.
+Text processName() noexcept {
+  Text text{};
+  const int file = open("/proc/self/comm", O_RDONLY | O_CLOEXEC);
+  if (file < 0) {
+    // What the kernel named the process by, as good as always.
+    std::string_view(program_invocation_short_name).copy(text.data(), kCapacity - 1);
+    return text;
+  }
+  const ssize_t length = read(file, text.data(), text.size());
+  close(file);
+  // The kernel ends the line.
+  text[length > 0 ? static_cast<std::size_t>(length) - 1 : 0] = '\0';
+  return text;
+}
+
+// What the process was called before its main thread was given a name, which is then the process's, too.
+const Text& firstProcessName() noexcept {
+  static constinit Lazy<Text> name;
+  return name.get(processName);
+}
+
+}  // namespace
+
+// A thread bears its creator's name until it is given one, and the main thread the process's. What the system
+// knows it by does not tell whether it was.
+String systemThreadName() {
+  return nullptr;
+}
+
+void setSystemThreadName(const String& name) noexcept {
+  const Text& unnamed = firstProcessName();
+  const std::string_view text = name.isNull() ? std::string_view(unnamed.data()) : name.view();
+  std::size_t length = text.size() < kCapacity ? text.size() : kCapacity - 1;
+  // A byte of the form 10xxxxxx goes on with a character that must not be cut in two.
+  while (length > 0 && length < text.size() && (static_cast<unsigned char>(text[length]) & 0xC0U) == 0x80U)
+    --length;
+  Text shortened{};
+  text.copy(shortened.data(), length);
+  prctl(PR_SET_NAME, shortened.data());
+}
+
+}  // namespace rt::detail

@@ -1,0 +1,13 @@
+#pragma once
+
+// The journal, spoken to in its native protocol. Inside of the system log.
+
+#include "Runtime/SystemLog/Private/Linux/LogEntry.h"
+#include "Runtime/SystemLog/Private/Linux/Patience.h"
+
+namespace rt::detail {
+
+/// Writes `entry` to the journal. Allocates nothing.
+Delivery writeToJournal(const LogEntry& entry, const Patience& patience) noexcept;
+
+}  // namespace rt::detail

@@ -10,15 +10,15 @@
 #include <cstdio>
 #include <cstring>
 
-// A program that was linked statically need have none. Neither is `dlopen` named below: the linker warns of
-// that in such a program.
+// The symbol is weak, since a statically linked program need not have it. `dlopen` is found by its name,
+// since the linker of such a program warns of a call.
 #pragma weak dlsym
 
 namespace rt::detail {
 
 namespace {
 
-/// An image by an address that is in it. Its name stays where it is as long as the image is loaded.
+// The name of the image that has an address. The name stays valid as long as the image is loaded.
 struct NamedImage {
   std::uintptr_t address;
   const char* name = nullptr;
@@ -41,8 +41,8 @@ constexpr std::size_t aligned(std::size_t size, std::size_t alignment) {
   return (size + alignment - 1) / alignment * alignment;
 }
 
-/// What the first mark among the notes from `note` to `end` leads to, or null. All marks of an image lead to
-/// the same.
+/// Returns the state that the first mark among the notes from `note` to `end` leads to, or null. All marks of
+/// an image lead to the same state.
 const ImageState* stateIn(const std::byte* note, const std::byte* end, std::size_t alignment) noexcept {
   auto left = static_cast<std::size_t>(end - note);
   while (left >= sizeof(ElfW(Nhdr))) {
@@ -50,7 +50,7 @@ const ImageState* stateIn(const std::byte* note, const std::byte* end, std::size
     std::memcpy(&header, note, sizeof header);
     const std::size_t descriptionAt = aligned(sizeof header + header.n_namesz, alignment);
     const std::size_t size = descriptionAt + header.n_descsz;
-    // What other tools have written may be cut off.
+    // Notes that other tools have written may be cut off.
     if (size > left) break;
     std::int64_t distance = 0;
     if (header.n_type == kImageMarkType && header.n_namesz == sizeof kImageMarkName &&
@@ -60,7 +60,7 @@ const ImageState* stateIn(const std::byte* note, const std::byte* end, std::size
       std::memcpy(&distance, description, sizeof distance);
       return reinterpret_cast<const ImageState*>(description + distance);
     }
-    // The last need not be padded.
+    // The last note need not be padded.
     const std::size_t paddedSize = std::min(aligned(size, alignment), left);
     note += paddedSize;
     left -= paddedSize;
@@ -99,13 +99,13 @@ void keepImage(const ImageState& state) noexcept {
   if (dlsym == nullptr) return;
   NamedImage image{.address = std::bit_cast<std::uintptr_t>(&state)};
   dl_iterate_phdr(&findImage, &image);
-  // The program itself has no name.
+  // The name of the program itself is empty.
   if (image.name == nullptr || *image.name == '\0') return;
   using Open = void*(const char*, int);
   auto* const open = reinterpret_cast<Open*>(dlsym(RTLD_DEFAULT, "dlopen"));
-  // The handle is kept, so that nobody's is the last one.
+  // The handle is never closed, so that no other handle is the last one.
   if (open != nullptr && open(image.name, RTLD_LAZY | RTLD_NOLOAD | RTLD_NODELETE) != nullptr) return;
-  // The image is loaded, so that the loader refuses nothing but what has no memory.
+  // The image is loaded already, so the loader refuses only if it has no memory.
   std::fprintf(stderr, "rt: \"%s\" cannot be kept from being unloaded; it must not be closed\n", image.name);
 }
 

@@ -4,10 +4,10 @@
 ///
 ///     rt::StandardError::write("rt: the queue is full\n", std::chrono::seconds(1));
 ///
-/// If the reader is gone, only the line is lost: no SIGPIPE is raised. A non-blocking stream is waited for. A
-/// blocking stream does not hold the caller up for longer than the caller allows.
+/// If the reader is gone, only the line is lost: no SIGPIPE is raised. Writing waits for room in the stream,
+/// also if the stream is non-blocking. It waits no longer than the caller allows, also if the stream blocks.
 ///
-/// Not for: the output of a program to its user.
+/// Not for: a program's output to its user.
 
 #include <chrono>
 #include <string_view>

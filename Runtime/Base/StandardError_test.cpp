@@ -19,7 +19,7 @@ namespace {
 using std::chrono::milliseconds;
 namespace StandardError = rt::StandardError;
 
-// The wait for streams that have a reader. The reader may be slow on a busy machine.
+// A limit for waits that end early, since the stream has a reader. It is long, since the machine may be busy.
 constexpr std::chrono::minutes kLong{5};
 
 TEST(StandardError, WritesEveryByte) {

@@ -49,7 +49,7 @@ TEST(UTF8, EncodesInvalidCharactersAsTheReplacement) {
 }
 
 // Only encodings of characters are valid. The test compares all sequences of one and two bytes, and many of
-// three. Of four bytes, it compares the first two.
+// three. Of sequences of four bytes, it compares the first two.
 TEST(UTF8, AcceptsExactlyTheEncodingsOfCharacters) {
   std::set<std::string> characters;
   std::set<std::string> beginnings;
@@ -99,7 +99,8 @@ TEST(UTF8, TellsABrokenSequenceFromATruncatedOne) {
   EXPECT_EQ(rt::nextUTF8("").length, 0U);
 }
 
-// The bytes before an invalid byte count, wherever it stands. This includes the words that are read at once.
+// Puts an invalid byte at every position, also within and between the words that are read at once. The bytes
+// before it count as valid.
 TEST(UTF8, FindsAnInvalidByteAnywhere) {
   for (std::size_t length = 1; length < 40; ++length) {
     for (std::size_t i = 0; i < length; ++i) {

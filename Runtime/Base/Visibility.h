@@ -1,8 +1,8 @@
 #pragma once
 
 /// Makes a class the same in a program and in all shared libraries. Without it, a library that is compiled
-/// with -fvisibility=hidden has a class of its own. Elsewhere, the library's objects then do not count as
-/// objects of that class.
+/// with -fvisibility=hidden has a class of its own. Then other images do not recognise the library's objects
+/// as objects of their class.
 ///
 ///     class RT_VISIBLE Account final : public rt::Implements<Account, rt::Object> { ... };
 ///

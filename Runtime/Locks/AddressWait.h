@@ -15,7 +15,7 @@
 
 namespace rt::detail {
 
-/// Tells the processor that the caller reads a word again and again.
+// Tells the processor that the caller reads a word again and again.
 inline void spinPause() noexcept {
 #if defined(__x86_64__) || defined(__i386__)
   __builtin_ia32_pause();

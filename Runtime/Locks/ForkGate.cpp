@@ -21,21 +21,21 @@ namespace {
 constexpr int kNumberBits = 22;
 constexpr std::uint32_t kGenerations = 1U << 9;
 
-// How often a fork looks whether the locks are free. The first looks follow each other at once. The others
-// are a millisecond apart. The limit is a number of looks, not a time. A process that is stopped, or gets no
-// processor, has had no time to release its locks.
+// How often a fork looks whether the locks are free. It only yields the processor between the first looks.
+// The later looks are a millisecond apart. The limit is a number of looks, not a time: a process that is
+// stopped, or gets no processor, has had no time to release its locks.
 constexpr int kQuickLooks = 100;
 constexpr int kLooks = kQuickLooks + 1000;
 
-// How many milliseconds a thread waits at the gate, counted in the same way. The thread waits longer than the
-// fork waits for the thread.
+// How many milliseconds a thread waits at the gate, counted in the same way. That is longer than a fork waits
+// for locks.
 constexpr int kPauses = 2 * kLooks;
 
 }  // namespace
 
 struct ForkGate::Forks {
-  // A fork holds this lock from before it waits until its end, in both processes. Registering the handlers
-  // holds it, too. It is a lock of the system, since ours use the gate.
+  // A fork holds this lock from its beginning to its end, in both processes. Registering the handlers holds
+  // it, too. It is a lock of the system, since ours use the gate.
   pthread_mutex_t lock = PTHREAD_MUTEX_INITIALIZER;
   std::atomic<bool> areHandlersRegistered = false;
   // The thread-specific key of the thread's place. The place is given back when the thread ends.
@@ -79,8 +79,8 @@ struct Handlers {};
 constinit Handlers handlers;
 
 // Has the fork handlers registered while the program is loaded. A fork that has already begun does not see
-// handlers that are registered meanwhile. Early registration also lets the handlers of others find the gate
-// open. Of the handlers that prepare a fork, the first registered is called last.
+// handlers that are registered meanwhile. Early registration also lets the fork handlers of others find the
+// gate open. The reason is that the prepare handler that was registered first is called last.
 void announce(Handlers& /*handlers*/) noexcept {
   currentThreadToken();
 }
@@ -206,9 +206,9 @@ void ForkGate::giveBack(Place& place, std::atomic<std::uint32_t>* next) noexcept
   place.isTaken.store(false, std::memory_order_release);
 }
 
-// A thread that takes a lock after this call takes a place again, and the system calls this function again.
-// In the last round of destructors the system does not. Then the place is never given back, but its count is
-// 0.
+// A later destructor of the thread may take a lock. The thread then takes a place again, and the system calls
+// this function again. After its last round of destructors the system does not. Then the place is never given
+// back, but its count is 0.
 void ForkGate::threadEnds(void* place) noexcept {
   giveBack(*static_cast<Place*>(place), heldLocks() != 0 ? &currentThread.unseenLockCount : nullptr);
 }

@@ -1,6 +1,6 @@
 #pragma once
 
-// Keeps the data that locks guard whole across a fork. For Runtime/Locks/UnfairLock.h and
+// Keeps the data that locks guard whole across a fork. Used by Runtime/Locks/UnfairLock.h and
 // Runtime/Locks/ThreadIdentifier.h.
 //
 // The child of a fork has one thread and a copy of the memory. A lock that another thread held stays held
@@ -9,7 +9,7 @@
 // Every thread counts the locks that it holds, in a place of its own. A fork shuts the gate and waits until
 // the counts of all other threads are 0. Afterwards it opens the gate, in both processes. While the gate is
 // shut, a thread that wants its first lock waits. A thread that holds a lock may take more, so that it can
-// finish. A thread that sleeps until its first lock is free does not count.
+// finish. A thread that sleeps until its first lock is free is not counted.
 //
 // This costs each lock two writes to the thread's place, and a read of a variable that hardly ever changes.
 // The alternative is a list of all locks. It would need a place in each lock and a lock of its own, and locks
@@ -19,11 +19,11 @@
 // The child knows that the lock's holder is gone (Runtime/Locks/OwnerLock.h).
 //
 // A thread waits at the gate for about two seconds at most, and then opens it. The fork may be waiting for
-// that thread. The host may have registered a fork handler before the gate's handler was registered. The
-// host's handler runs while the gate is shut, and may need something that the thread has.
+// that thread. An example is a host that registered a fork handler before the gate did. That handler runs
+// while the gate is shut, and may need something that the thread has.
 //
-// A program and a shared library may both contain this file. They may share its variables, which are all
-// external. Then the one that is loaded first registers the fork handlers for both. Otherwise each has its
+// A program and a shared library may both contain this code. Its variables are all external, so the two may
+// share them. Then the one that is loaded first registers the fork handlers for both. Otherwise each has its
 // own gate, and a fork shuts one after the other. A fork and a thread with locks of both may then wait for
 // each other until one of them gives up.
 
@@ -65,7 +65,8 @@ class ForkGate {
   // even for a moment.
   static void pass() noexcept;
 
-  // Returns when the gate is open or has been opened once. Precondition: the caller holds no counted lock.
+  // Returns once the gate is open, or has been opened since the call. Precondition: the caller holds no
+  // counted lock.
   [[gnu::cold]] static void wait() noexcept;
 
   // Returns how many locks the calling thread has counted.
@@ -101,7 +102,7 @@ class ForkGate {
   static void continueInParent() noexcept;
   static void continueInChild() noexcept;
 
-  // The number of the fork that is being made, from the moment when it starts to wait. 0 if there is no fork.
+  // The number of the fork that is being made, from when it starts to wait. 0 if no fork is being made.
   static constinit std::atomic<std::uint32_t> shutFor_;
   // The number of forks between the first process and this one, modulo 2^9.
   static constinit std::atomic<std::uint32_t> generation_;

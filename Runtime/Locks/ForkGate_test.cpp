@@ -112,13 +112,14 @@ TEST(ForkGate, FreesALockThatIsHeldForTooLongInTheChild) {
       << "the parent's is still held";
 }
 
-// The same for a lock that a thread of the parent waits for, and that several threads of the child want.
+// A lock that stays held is free in the child even if a thread of the parent waits for it. Several threads of
+// the child want it.
 TEST(ForkGate, AnAbandonedLockKeepsThreadsApartInTheChild) {
   if (RT_TEST_IS_APPLE || RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "no new threads in the child here";
   Pair pair;
   std::atomic<bool> isWaiting = false;
   const HeldElsewhere holder(pair.lock);
-  // Sets the lock's bit for waiting threads, too.
+  // The waiting thread sets the lock's bit for waiting threads.
   std::thread waiter([&] {
     isWaiting = true;
     const LockGuard guard(pair.lock);

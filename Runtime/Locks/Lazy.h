@@ -1,6 +1,6 @@
 #pragma once
 
-/// `rt::Lazy` is a value that is made when it is first asked for, once for the process, and is never
+/// `rt::Lazy` is a value that is made when it is first asked for. It is made once for the process and never
 /// destroyed.
 ///
 ///     const rt::Ref<Clock>& Clock::shared() {
@@ -36,7 +36,7 @@ class Lazy {
   Lazy(const Lazy&) = delete;
   Lazy& operator=(const Lazy&) = delete;
 
-  /// Returns the value. The first call makes it of what `make` returns. Other threads that ask meanwhile
+  /// Returns the value. The first call makes it from the result of `make`. Other threads that ask meanwhile
   /// wait. `make` must not ask for the same value, which ends the program. Throws what `make` throws. The
   /// next call then tries again.
   template <class Make>

@@ -13,9 +13,9 @@
 /// wait for it. In the child it is free, unless the thread that forked holds it. That thread may unlock it
 /// there.
 ///
-/// Other threads may have left their work under the lock half done in the child. So the lock keeps threads
-/// apart, but the data that it guards must tolerate half a change. A change that has to be whole is made
-/// under an `UnfairLock`, or published by one write.
+/// In the child, the work that another thread was doing under the lock may be half done. So the lock keeps
+/// threads apart, but the data that it guards must tolerate half a change. Make a change that has to be whole
+/// under an `UnfairLock`, or publish it by one write.
 ///
 /// Not for: guarding data for a moment (Runtime/Locks/UnfairLock.h).
 

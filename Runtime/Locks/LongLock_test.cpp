@@ -96,8 +96,8 @@ TEST(LongLock, TheForkingThreadKeepsItThroughGenerations) {
   lock.assertOwner();
 }
 
-// In the child, the forking thread holds the lock, so no other thread can take it. If such a thread forks,
-// the lock's holder is gone in its child.
+// In the child, the forking thread holds the lock, so no other thread can take it. If another thread of the
+// child forks, the holder does not exist in the grandchild.
 TEST(LongLock, IsFreeInAGrandchildIfItsHolderIsGone) {
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer allows no new threads in the child";
   LongLock lock;

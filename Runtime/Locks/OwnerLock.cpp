@@ -31,8 +31,8 @@ void OwnerLock::lockSlow(ThreadToken self, bool isCounted) noexcept {
   }
   // A fork need not wait for a thread that sleeps and holds no lock.
   const bool isUncountedAsleep = isCounted && ForkGate::heldLocks() == 1;
-  // From here on the lock is taken with the bit set. Other threads may still sleep, and the new holder must
-  // wake one of them when it releases the lock.
+  // From here on the lock is taken with the bit kHasWaiters set. Other threads may still sleep, and the new
+  // holder must wake one of them when it releases the lock.
   for (;;) {
     state = state_.load(std::memory_order_relaxed);
     if (state == 0 || isAbandoned(state)) {

@@ -1,6 +1,6 @@
 #pragma once
 
-/// `rt::RecursiveLock` is a lock that the thread which holds it may take again.
+/// `rt::RecursiveLock` is a lock that its holder may take again.
 ///
 ///     void Switchboard::replace(Logger* logger) {
 ///       rt::LockGuard guard(lock_);      // a rt::RecursiveLock

@@ -119,7 +119,7 @@ TEST(RecursiveLock, TheForkingThreadHoldsItInTheChild) {
   EXPECT_EQ(forkWithTheLock(), 0);
 }
 
-// The lock's depth is left over from the other thread, too.
+// In the child, the lock's depth is left over from the other thread, too.
 TEST(RecursiveLock, IsFreeInAForkedChildIfAnotherThreadHeldIt) {
   RecursiveLock lock;
   struct Twice {

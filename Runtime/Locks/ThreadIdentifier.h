@@ -1,6 +1,6 @@
 #pragma once
 
-/// Numbers that identify the calling thread, at the price of reading a variable.
+/// Numbers that identify the calling thread. Asking for one costs as much as reading a variable.
 ///
 ///     std::printf("thread %u\n", rt::currentThreadIdentifier());
 ///     if (owner_ == rt::currentThreadToken()) ...
@@ -8,8 +8,9 @@
 /// The identifier is the number that the system's tools show. It is not 0 and is below 2^31. It differs
 /// between the living threads of a process.
 ///
-/// The token is for what is kept in memory. A thread that forks has the same token in the child. There the
-/// tokens of all other threads are known to be gone. The numbers may be reused after a thread has ended.
+/// The token is for data that is kept in memory, which a fork copies. A thread that forks has the same token
+/// in the child. There, `isThreadGone` is true for the tokens of all other threads. Both numbers may be
+/// reused after a thread has ended.
 ///
 /// The first call on a thread asks the system. No call allocates.
 ///
@@ -48,8 +49,8 @@ extern constinit thread_local ThreadState currentThread [[gnu::tls_model("initia
 [[gnu::cold]] ThreadIdentifier learnThreadIdentifier() noexcept;
 [[gnu::cold]] ThreadToken learnThreadToken() noexcept;
 
-// What the system says of the calling thread. Each system has its own version. The number is below 2^22, and
-// no other living thread of the process has it.
+// What the system says about the calling thread. Each system has its own version. The number is below 2^22,
+// and no other living thread of the process has it.
 ThreadIdentifier systemThreadIdentifier() noexcept;
 std::uint32_t systemThreadNumber() noexcept;
 bool systemIsMainThread() noexcept;

@@ -17,26 +17,25 @@
 /// A waiting thread spins for a moment and then sleeps. Waiting threads get the lock in no defined order. A
 /// thread that unlocks it and locks it again at once may well get it first.
 ///
-/// A thread ends the program if it locks a lock that it holds, or unlocks a lock that it does not hold. A
-/// line on standard error names the lock and the thread. (On macOS the crash report gives the reason.)
+/// A thread ends the program if it locks a lock that it holds, or unlocks a lock that it does not hold. On
+/// Linux a line on standard error names the lock and the thread. On macOS the crash report gives the reason.
 ///
-/// The lock itself needs no memory. With its first lock, a thread asks the thread library to tell of its end.
-/// This allocates in a process with many thread-specific keys.
+/// The lock itself needs no memory. A thread that takes its first lock registers with the thread library,
+/// which then tells when the thread ends. Registering allocates if the process has many thread-specific keys.
 ///
 /// The lock is constant-initialised. At namespace scope it is ready before anything runs, and nothing runs
 /// for it at exit.
 ///
 /// Fork: a fork waits until no other thread holds a lock of this kind. So all of them are free in the child,
-/// except those of the thread that forked. The data that they guard is whole. (On macOS the child cannot
+/// except those that the forking thread holds. The data that they guard is whole. (On macOS the child cannot
 /// unlock what that thread held.)
 ///
 /// A fork waits for about a second at most. A lock that is still held then is free in the child. Its data is
 /// as the holder left it. (On macOS the lock stays held.)
 ///
-/// Not for: sections that take long, such as system calls that block and code of others
-/// (Runtime/Locks/LongLock.h); locks that a thread takes again while it holds them
-/// (Runtime/Locks/RecursiveLock.h); waiting for a condition, for which a queue is better
-/// (Runtime/Queues/Queue.h).
+/// Not for: sections that take long, such as blocking system calls and callbacks (Runtime/Locks/LongLock.h);
+/// locks that a thread takes again while it holds them (Runtime/Locks/RecursiveLock.h); waiting for a
+/// condition, for which a queue is better (Runtime/Queues/Queue.h).
 
 #include "Runtime/Base/ThreadSafety.h"
 #include "Runtime/Locks/ForkGate.h"

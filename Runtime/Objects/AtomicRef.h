@@ -11,10 +11,12 @@
 /// that do so. A replaced object lives until the last reference that was read is released.
 ///
 /// Reading the pointer first and retaining the object afterwards would be too late. The object might be gone
-/// in between. So the object is retained in advance, for a lot of many readers. One atomic word holds the
-/// pointer and the number of counts that have been lent from the lot. A reader keeps the count that it was
-/// lent. When the object is replaced, the counts that are left are released. A reader that finds half of the
-/// lot lent adds new counts to it.
+/// in between. So the object is retained many times in advance. These counts are called the lot, and each
+/// reader is lent one of them. One atomic word holds the pointer and the number of counts that have been
+/// lent.
+///
+/// A reader keeps its count. When the object is replaced, the counts that are left in the lot are released. A
+/// reader that finds half of the lot lent adds new counts to it.
 ///
 /// In the child of a fork, counts lent to threads that are gone are lost. An object that they were reading is
 /// never destroyed there.

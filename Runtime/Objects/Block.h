@@ -38,7 +38,7 @@ namespace rt {
 
 namespace detail {
 
-/// The class of the objects that blocks refer to.
+// The class of the objects that blocks refer to.
 class RT_VISIBLE BlockObject : public Implements<BlockObject, Object> {
  public:
   static constexpr std::string_view kClassName = "Block";
@@ -58,7 +58,7 @@ class BlockBody : public BlockObject {
   constexpr BlockBody() noexcept = default;
 };
 
-/// A block with a function object of its own.
+// A block with a function object of its own.
 template <class Function, class Result, class... Arguments>
 class CapturingBlock final : public BlockBody<Result, Arguments...> {
  public:
@@ -73,8 +73,8 @@ class CapturingBlock final : public BlockBody<Result, Arguments...> {
   mutable Function function_;
 };
 
-/// A block of a function object without state. It is a constant, since all objects of such a type do the
-/// same.
+// A block of a function object without state. It is a constant, since all objects of such a type do the
+// same.
 template <class Function, class Result, class... Arguments>
 class ConstantBlock final : public BlockBody<Result, Arguments...> {
  public:
@@ -106,9 +106,10 @@ class Block<Result(Arguments...)> {
   constexpr Block() noexcept = default;
   constexpr Block(std::nullptr_t) noexcept {}
 
-  /// Makes a block that moves or copies `function` and calls it with the block's arguments. The block may be
-  /// `const`. Null if `function` is a null pointer. Throws std::bad_alloc and what moving or copying
-  /// `function` throws. Throws nothing if `function` has no state.
+  /// Makes a block that calls `function` with the block's arguments. Moves or copies `function` into the
+  /// block. Calls may change its state, also through a `const` block. Null if `function` is a null pointer.
+  /// Throws std::bad_alloc and what moving or copying `function` throws. Throws nothing if `function` has no
+  /// state.
   template <class Function>
     requires(!std::same_as<std::remove_cvref_t<Function>, Block> &&
              std::is_invocable_r_v<Result, std::decay_t<Function>&, Arguments...>)

@@ -1,7 +1,7 @@
 #pragma once
 
-/// Classes and protocols. A protocol is an abstract class without data. It names itself. A class names
-/// itself, its superclass and its protocols.
+/// Classes and protocols. A protocol is an abstract class without data. It names itself as a template
+/// argument of its base. A class likewise names itself, its superclass and its protocols.
 ///
 ///     struct Clock : rt::Protocol<Clock> {
 ///       virtual Time now() const = 0;
@@ -159,7 +159,7 @@ constexpr const ProtocolInfo& protocolInfo() noexcept {
 
 namespace detail {
 
-/// Returns the object behind `pointer`, which is not null and points to a class or a protocol.
+// Returns the object behind `pointer`, which is not null and points to a class or a protocol.
 template <class T>
 Object* objectOf(const T* pointer) noexcept {
   if constexpr (std::derived_from<T, Object>) {

@@ -34,7 +34,7 @@ namespace rt {
 
 namespace detail {
 
-/// Has one address for each type. It is not constant, since linkers may fold constants of equal value.
+// Has one address for each type. It is not constant, since linkers may fold constants of equal value.
 template <class>
 [[gnu::visibility("default")]] inline constinit char typeIdentity = 0;
 

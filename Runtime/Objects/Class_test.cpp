@@ -222,8 +222,8 @@ TEST(Cast, AllocatesNothing) {
   EXPECT_EQ(count.allocations(), 0);
 }
 
-// This happens when several images of a program have the same class, and the loader uses one of the records
-// for all.
+// A class is announced again when several images of a program have it and the loader uses one record for all
+// of them.
 TEST(Class, MayBeAnnouncedAgain) {
   static constinit rt::detail::NamedEntry<rt::ClassInfo> entry{&rt::classInfo<Watch>(),
                                                                rt::detail::nameHash("Watch")};

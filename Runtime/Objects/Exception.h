@@ -1,7 +1,7 @@
 #pragma once
 
-/// Exceptions that the runtime and the libraries on it throw. An exception has a name, which tells the kind
-/// of failure, and a reason for people.
+/// Exceptions that the runtime and the libraries built on it throw. An exception has a name, which tells the
+/// kind of failure, and a reason for people.
 ///
 ///     throw rt::Exception("Assertion Failed!"_s, "Expected block to report an error!"_s);
 ///

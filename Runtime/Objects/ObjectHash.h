@@ -1,6 +1,6 @@
 #pragma once
 
-/// Function objects that put objects into the standard library's hash tables by their `isEqual` and `hash`.
+/// Function objects with which the standard library's hash tables compare objects by `isEqual` and `hash`.
 /// Such a table may be searched by pointer, without a reference.
 ///
 ///     std::unordered_set<rt::Ref<rt::Object>, rt::ObjectHash, rt::ObjectEqual> objects;

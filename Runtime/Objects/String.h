@@ -39,7 +39,7 @@ namespace rt {
 
 namespace detail {
 
-/// Holds the characters of a literal, as an argument of a template.
+// Holds the characters of a literal, as an argument of a template.
 template <std::size_t size>
 struct StringLiteral {
   consteval StringLiteral(const char (&text)[size]) { std::copy_n(text, size, characters); }
@@ -49,7 +49,7 @@ struct StringLiteral {
   char characters[size];
 };
 
-/// The object that all literals with these characters share.
+// The object that all literals with these characters share.
 template <StringLiteral literal>
 inline constexpr StringObject kStringLiteral{literal.characters, literal.view().size()};
 

@@ -38,8 +38,8 @@ class RT_VISIBLE StringObject final : public Implements<StringObject, Object> {
   /// Returns a copy of `text`, which is valid UTF-8, in one allocation. Throws std::bad_alloc.
   static Ref<StringObject> copyOf(std::string_view text);
 
-  /// Returns an object with room for `length` bytes. The caller fills `bytes` before anyone else sees the
-  /// object. Throws std::bad_alloc.
+  /// Returns an object with room for `length` bytes, to which `bytes` then points. The caller fills the room
+  /// before anyone else sees the object. Throws std::bad_alloc.
   static Ref<StringObject> make(std::size_t length, char*& bytes);
 
   /// Returns an object over `text`, which is valid UTF-8 and outlives the object. Copies nothing. Throws

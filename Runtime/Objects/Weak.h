@@ -31,21 +31,21 @@ namespace rt {
 
 namespace detail {
 
-/// The state that all weak references to one object share. It lives until the object and all of these
-/// references are gone.
+// The state that all weak references to one object share. It lives until the object and all of these
+// references are gone.
 class WeakCell {
  public:
-  /// Returns the cell of `object` with a reference for the caller. Makes the cell if there is none. Null if
-  /// the object is being destroyed. Throws std::bad_alloc.
+  // Returns the cell of `object` with a reference for the caller. Makes the cell if there is none. Null if
+  // the object is being destroyed. Throws std::bad_alloc.
   static WeakCell* of(const Object& object);
 
   void retain() noexcept { count_.fetch_add(1, std::memory_order_relaxed); }
   void release() noexcept;
 
-  /// Retains the object and returns true. Returns false if the object is gone.
+  // Retains the object and returns true. Returns false if the object is gone.
   bool retainObject() noexcept;
 
-  /// Notes that the object is gone. Waits if another thread is in `retainObject`.
+  // Notes that the object is gone. Waits if another thread is in `retainObject`.
   void clear() noexcept;
 
  private:

@@ -21,8 +21,8 @@ inline constexpr char kImageMarkName[] = "rt-image";
 inline constexpr unsigned kImageMarkType = 1;
 
 // The list of functions that announce what an image has. Each entry is the distance from the entry to a
-// function, so that loading the image writes nothing. The linker joins the entries and names both ends of the
-// list.
+// function, so that loading the image needs no relocation. The linker joins the entries and names both ends
+// of the list.
 [[gnu::weak,
   gnu::visibility("hidden")]] extern const std::int32_t announcementsBegin[] asm("__start_rt_announcements");
 [[gnu::weak,

@@ -10,21 +10,21 @@
 #include <cstdio>
 #include <cstring>
 
-// The symbol is weak, since a statically linked program need not have it. `dlopen` is found by its name,
-// since the linker of such a program warns of a call.
+// `dlsym` is weak, since a statically linked program need not have it. `dlopen` is found through `dlsym`,
+// since the linker of such a program warns of a direct call.
 #pragma weak dlsym
 
 namespace rt::detail {
 
 namespace {
 
-// The name of the image that has an address. The name stays valid as long as the image is loaded.
+// An image, found by an address in it. Its name stays valid as long as the image is loaded.
 struct NamedImage {
   std::uintptr_t address;
   const char* name = nullptr;
 };
 
-/// 0 to go on with the next image, another value to end.
+// A callback. Returns 0 to go on with the next image, another value to stop.
 int findImage(dl_phdr_info* image, std::size_t /*size*/, void* context) {
   NamedImage& wanted = *static_cast<NamedImage*>(context);
   for (std::size_t i = 0; i < image->dlpi_phnum; ++i) {
@@ -41,8 +41,8 @@ constexpr std::size_t aligned(std::size_t size, std::size_t alignment) {
   return (size + alignment - 1) / alignment * alignment;
 }
 
-/// Returns the state that the first mark among the notes from `note` to `end` leads to, or null. All marks of
-/// an image lead to the same state.
+// Returns the state that the first mark among the notes from `note` to `end` leads to, or null. All marks of
+// an image lead to the same state.
 const ImageState* stateIn(const std::byte* note, const std::byte* end, std::size_t alignment) noexcept {
   auto left = static_cast<std::size_t>(end - note);
   while (left >= sizeof(ElfW(Nhdr))) {
@@ -68,7 +68,7 @@ const ImageState* stateIn(const std::byte* note, const std::byte* end, std::size
   return nullptr;
 }
 
-/// 0 to go on with the next image, another value to end.
+// A callback. Returns 0 to go on with the next image, another value to stop.
 int inspect(dl_phdr_info* image, std::size_t /*size*/, void* /*context*/) {
   for (std::size_t i = 0; i < image->dlpi_phnum; ++i) {
     const ElfW(Phdr)& segment = image->dlpi_phdr[i];

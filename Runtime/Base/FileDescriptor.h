@@ -27,6 +27,7 @@ class FileDescriptor {
   /// Takes ownership of `descriptor`. -1 stands for no descriptor.
   explicit FileDescriptor(int descriptor) noexcept : descriptor_(descriptor) {}
   FileDescriptor(FileDescriptor&& other) noexcept : descriptor_(std::exchange(other.descriptor_, -1)) {}
+  /// Swaps the descriptors. `other` closes the previous one at its end.
   FileDescriptor& operator=(FileDescriptor&& other) noexcept {
     std::swap(descriptor_, other.descriptor_);
     return *this;

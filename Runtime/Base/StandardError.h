@@ -15,12 +15,12 @@
 namespace rt::StandardError {
 
 /// Writes `text`, which may be any bytes. Returns whether all of it was written. Waits for room for
-/// `longestWait` at most, all in all. A file always has room. On a terminal, another program that writes at
-/// the same moment may make the wait longer. Leaves `errno` undefined.
+/// `longestWait` at most, all in all. A file always has room. On a terminal, and on macOS on any stream,
+/// another writer at the same moment may make the wait longer. Leaves `errno` undefined.
 ///
 /// Threads: any thread may call this. It takes no lock and allocates nothing. The texts of several threads
-/// stay apart if standard error is a file, or if no text is longer than a pipe takes in one piece (4096 bytes
-/// on Linux).
+/// stay apart if standard error is a file. Otherwise each text may be only as long as a pipe takes in one
+/// piece (4096 bytes on Linux).
 bool write(std::string_view text, std::chrono::milliseconds longestWait) noexcept;
 
 }  // namespace rt::StandardError

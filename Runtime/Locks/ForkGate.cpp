@@ -22,7 +22,7 @@ constexpr int kNumberBits = 22;
 constexpr std::uint32_t kGenerations = 1U << 9;
 
 // How often a fork looks whether the locks are free. It only yields the processor between the first looks.
-// The later looks are a millisecond apart. The limit is a number of looks, not a time: a process that is
+// The later looks are a millisecond apart. The limit is a number of looks, not a time. A process that is
 // stopped, or gets no processor, has had no time to release its locks.
 constexpr int kQuickLooks = 100;
 constexpr int kLooks = kQuickLooks + 1000;

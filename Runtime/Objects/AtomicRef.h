@@ -8,7 +8,7 @@
 ///
 /// Threads: reading is one atomic operation. It is repeated if another thread changed the reference
 /// meanwhile. A reader never waits for another thread. A thread that replaces the reference waits for others
-/// that do so. A replaced object lives until the last reference that was read is released.
+/// that replace it. A replaced object lives until the last reference that was read is released.
 ///
 /// Reading the pointer first and retaining the object afterwards would be too late. The object might be gone
 /// in between. So the object is retained many times in advance. These counts are called the lot, and each

@@ -96,7 +96,7 @@ struct [[gnu::visibility("default")]] AddedClassMethod {
  private:
   static ClassMethod method() { return {selector.view(), function}; }
 
-  // Never called. Instantiating it instantiates what it mentions.
+  // Never called. It exists so that what it mentions is instantiated.
   static void mention() { static_cast<void>(&detail::AnnouncedOnLoading<entry_>::run); }
 
   static constinit detail::ClassMethodEntry entry_;

@@ -43,7 +43,7 @@ struct [[gnu::visibility("default")]] LoadHook {
  private:
   static void run() { Class::load(); }
 
-  // Never called. Instantiating it instantiates what it mentions.
+  // Never called. It exists so that what it mentions is instantiated.
   static void mention() {
     static_cast<void>(&detail::AnnouncedOnLoading<entry_>::run);
     static_cast<void>(classInfo<Class>());

@@ -31,7 +31,7 @@ class StringBuilder {
   StringBuilder& operator=(const StringBuilder&) = delete;
   ~StringBuilder();
 
-  /// Appends bytes. All bytes appended should be UTF-8 together: see `string`. Throws std::bad_alloc, and
+  /// Appends bytes. All appended bytes together should be UTF-8: see `string`. Throws std::bad_alloc, and
   /// then appends nothing.
   void append(std::string_view bytes) {
     if (bytes.empty()) return;

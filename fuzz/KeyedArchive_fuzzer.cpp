@@ -1,5 +1,5 @@
-// Reads keyed archives, writes the result, and reads that again, which must give the same archive. Writing
-// may fail in one case only: a shorter archive may not refer to its objects as often.
+// Reads keyed archives, writes the objects, and reads them again, which must give the same archive. Writing
+// may fail only if the new archive is so short that its objects are referred to too often.
 #include <cstddef>
 #include <cstdint>
 #include <cstdlib>

@@ -1,5 +1,5 @@
-// Reads archives of tag sets, writes the result, and reads that again, which must give an equal tag set.
-// Writing may fail in one case only: a shorter archive may not refer to its objects as often.
+// Reads archives of tag sets, writes the tag set, and reads it again, which must give an equal one. Writing
+// may fail only if the new archive is so short that its objects are referred to too often.
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>

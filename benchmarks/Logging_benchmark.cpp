@@ -303,7 +303,7 @@ void errorOurs(benchmark::State& state, bool capture) {
   for (auto _ : state) LUMLogAt(LUMLogLevelError, "%s has %d entries"_s, kName, ++i);
 }
 
-// The time that the unwinder takes of an error with a call stack.
+// Measures the unwinder alone, which is a part of logging an error with a call stack.
 void unwinder(benchmark::State& state) {
   std::array<std::uint64_t, 128> addresses{};
   for (auto _ : state) benchmark::DoNotOptimize(rt::CallStack::capture(addresses));

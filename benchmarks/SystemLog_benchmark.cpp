@@ -94,7 +94,7 @@ void measure(benchmark::State& state, bool isDaemon, void (*send)()) {
   }
 }
 
-// Makes a new SystemLog for each entry, as a logger does that does not store one.
+// Makes a new SystemLog for each entry, as a logger without a stored one does.
 void sendOurs() {
   const rt::SystemLog log("com.example.Importer"_s, "files"_s);
   if (log.isEnabled(rt::SystemLog::Type::error)) log.write(rt::SystemLog::Type::error, kText);

@@ -1,4 +1,4 @@
-// Reads files of user defaults. A readable file is kept as it is, and a changed file can be read again.
+// Reads files of user defaults. An unchanged file must keep its text. A changed file must be readable again.
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>

@@ -1,7 +1,7 @@
 #pragma once
 
-/// Handles programming errors. Each thread has a handler, which is called for each assertion that fails
-/// there.
+/// Handles programming errors. Each thread has a handler, which is called when an assertion fails on that
+/// thread.
 ///
 ///     if (writer != nullptr) {
 ///       rt::AssertionHandler::currentHandler()->handleFailureInFunction(

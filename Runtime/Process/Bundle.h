@@ -3,7 +3,7 @@
 /// The main bundle's identifier. It identifies the host program in the system log and among the files of user
 /// defaults.
 ///
-/// Linux has no bundles. There a host defines its identifier in any of its source files:
+/// On Linux, which has no bundles, a host defines its identifier in any of its source files:
 ///
 ///     extern "C" const char kMainBundleIdentifier[] = "com.example.Importer";
 ///

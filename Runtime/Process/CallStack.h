@@ -1,6 +1,6 @@
 #pragma once
 
-/// Captures the calls that lead to the present place, and turns their addresses into text.
+/// Captures the call stack as addresses, and turns addresses into text.
 ///
 ///     std::array<std::uint64_t, 64> addresses;
 ///     const std::size_t count = rt::CallStack::capture(addresses);
@@ -27,8 +27,8 @@ namespace rt::CallStack {
 /// set.
 ///
 /// Outer frames that do not fit are left out. So if all of `addresses` is set, the stack may be longer. The
-/// capture ends at a frame that cannot be unwound. A function that is inlined, or whose last act is the call,
-/// has no frame of its own.
+/// capture ends at a frame that cannot be unwound. A function that is inlined, or that has made a tail call,
+/// has no frame.
 [[gnu::noinline]] std::size_t capture(std::span<std::uint64_t> addresses) noexcept;
 
 /// Keeps the frame of a function that would otherwise end in a tail call. Call it after the function's last

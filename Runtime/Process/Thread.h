@@ -12,7 +12,7 @@
 
 namespace rt::Thread {
 
-/// Returns the last name that `setCurrentName` gave to the calling thread, or null. Reads a variable.
+/// Returns the last name that `setCurrentName` gave to the calling thread, or null. It only reads a variable.
 ///
 /// On macOS the first call on a thread without such a name takes over the system's name of the thread. On
 /// Linux the system's name does not count, since a thread inherits it from its creator.

@@ -7,9 +7,9 @@
 ///     if (rt::AssertionHandler* handler = CurrentHandler::get()) ...
 ///
 /// `get` reads a variable. The reference is null on every thread until it is set. It is null again in code
-/// that an ending thread runs after it has released the object. An object set then is released at once. The
-/// main thread releases its object only if it ends before the process. `Tag` distinguishes several references
-/// to one class.
+/// that an ending thread runs after it has released the object. An object that is set then is released at
+/// once. The main thread releases its object only if it ends before the process. `Tag` distinguishes several
+/// references to one class.
 ///
 /// Not for: values that are not objects; values that other threads read.
 

@@ -49,7 +49,7 @@ TEST(Thread, DistinguishesAnEmptyNameFromNoName) {
   });
 }
 
-TEST(Thread, LosesItsNameByANullName) {
+TEST(Thread, LosesItsNameWhenItIsSetToNull) {
   onNewThread([] {
     const std::string before = systemName();
     rt::Thread::setCurrentName("Importer"_s);
@@ -61,7 +61,7 @@ TEST(Thread, LosesItsNameByANullName) {
 
 // On Linux the main thread's name is the process's. Naming the main thread used to give other threads the
 // process's former name.
-TEST(Thread, HasNoNameWhenTheMainThreadGetsOne) {
+TEST(Thread, HasNoNameAfterTheMainThreadIsNamed) {
   const std::string before = systemName();
   std::binary_semaphore isNamed(0);
   std::thread older([&] {

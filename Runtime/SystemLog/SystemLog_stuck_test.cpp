@@ -27,9 +27,9 @@ namespace {
 
 using Type = rt::SystemLog::Type;
 
-// Replaces the clock that the log reads. Each send advances it by the longest time that the send may wait,
-// and nothing else advances it. So the tests measure the waits that the log allows, and not the load of the
-// machine. At most one object may exist at a time.
+// Replaces the clock that the log reads. Only sends that may wait advance it, as if they had waited. So the
+// tests measure the waits that the log allows, and not the load of the machine. At most one object may exist
+// at a time.
 class WorstCase {
  public:
   WorstCase() {

@@ -23,12 +23,12 @@
 /// - Some directives are printed as they stand and take no argument: unknown ones, incomplete ones, and
 ///   those whose conversion does not allow their length.
 /// - "%n" takes its argument and does nothing.
-/// - A larger width than `kMaximumFieldWidth` counts as `kMaximumFieldWidth`, and so does a larger precision
-///   of a number. So a result exceeds its arguments' text by less than 700 bytes for each byte of the format.
+/// - A width over `kMaximumFieldWidth` counts as `kMaximumFieldWidth`. So does such a precision of a number.
+///   A result thus exceeds its arguments' text by less than 700 bytes for each byte of the format.
 /// - The first directive that takes an argument decides whether the format goes by positions. Directives of
 ///   the other sort are printed as they stand.
 /// - A directive is printed as it stands if its position is out of range, or has another type in an earlier
-///   directive. The same holds if some lower position is used by no directive: its type is unknown.
+///   directive. So it is if no directive uses some lower position: the type of that argument is unknown.
 /// - The result is valid UTF-8. Invalid bytes of "%s", of "%c" or of the format become U+FFFD.
 ///
 /// A result of up to `StringBuilder::kInlineCapacity` bytes allocates once.

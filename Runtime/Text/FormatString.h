@@ -11,8 +11,8 @@
 ///     // report("%@ has %d entries"_s, name, "three");     does not compile: directiveTakesAnInteger
 ///
 /// A mistake does not compile: the compiler says that it cannot call a function of `rt::formatMistake`. The
-/// name of the function says what is wrong. A directive for signed integers takes unsigned ones, and the
-/// reverse. As in C, the size of an integer must fit.
+/// name of the function says what is wrong. Signed and unsigned integers are interchangeable. As in C, the
+/// size of an integer must fit.
 ///
 /// A format made from `"..."_s` returns that string without allocating. A format made from a plain literal
 /// allocates each time `string()` is called.

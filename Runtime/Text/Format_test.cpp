@@ -294,7 +294,7 @@ TEST(Format, LongResultsGrow) {
 
 // Text between directives is copied word by word, and may end in the middle of a word. Some bytes of this
 // text differ from '%' in one bit.
-TEST(Format, TextOfAnyLengthStandsBetweenDirectives) {
+TEST(Format, CopiesTextOfAnyLengthBetweenDirectives) {
   const std::string text = "\u00a5$&\x05'e\u20ac5-\u00e5!\x7f\u0425 tail of it all";
   for (std::size_t before = 0; before < text.size(); ++before) {
     for (std::size_t after = 0; after < text.size(); ++after) {
@@ -375,7 +375,7 @@ TEST(Format, AllocatesOnceForAResultOfExactlyTheInlineCapacity) {
 }
 
 // Compares random directives with snprintf, one at a time.
-TEST(Format, PrintsWhatCPrints) {
+TEST(Format, PrintsWhatSnprintfPrints) {
   std::mt19937_64 random(1234);
   const auto oneOf = [&](std::string_view choices) { return choices[random() % choices.size()]; };
   const auto directive = [&](std::string_view flags, bool hasPrecision, std::string_view length,

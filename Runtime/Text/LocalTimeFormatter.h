@@ -14,8 +14,9 @@
 ///     | dd    the day of the month                ss  the second
 ///     |                                           SSS the millisecond, cut off, not rounded
 ///
-/// The environment variable TZ names the zone, otherwise the system's setting does. A change of TZ takes
-/// effect at the next call. A change of the system's setting takes effect with the next second.
+/// If the environment variable TZ is set, it names the zone. Otherwise the system's setting does. A change of
+/// TZ takes effect at the next call. A change of the system's setting takes effect at the next call with a
+/// time in another second.
 ///
 /// A formatter keeps the text of the last second, so formatting often within a second costs little.
 ///

@@ -63,13 +63,13 @@ TEST_F(LocalTimeFormatterTest, FillsInEveryField) {
   EXPECT_EQ(text(951'782'400), "2000-02-29 00:00:00.000");
 }
 
-TEST_F(LocalTimeFormatterTest, CutsOffWhatIsLessThanAMillisecond) {
+TEST_F(LocalTimeFormatterTest, TruncatesToMilliseconds) {
   setenv("TZ", "UTC0", 1);
   const Time time = at(59) + std::chrono::nanoseconds(999'999'999);
   EXPECT_EQ(formatter_->stringFromTime(time), "1970-01-01 00:00:59.999");
 }
 
-TEST_F(LocalTimeFormatterTest, CountsForwardBefore1970) {
+TEST_F(LocalTimeFormatterTest, RoundsDownBefore1970) {
   setenv("TZ", "UTC0", 1);
   EXPECT_EQ(text(0, -1), "1969-12-31 23:59:59.999");
   EXPECT_EQ(text(-1), "1969-12-31 23:59:59.000");

@@ -2,14 +2,14 @@
 
 /// Describes collections as text. All collections use one layout:
 ///
-///     | (                            an array has parentheses and one element a line, in order
+///     | (                            an array has parentheses, and one element a line, in order
 ///     |     first,
 ///     |     "second one",
-///     |     {                        a dictionary has braces and one entry a line, sorted by key
+///     |     {                        a dictionary has braces, and one entry a line, sorted by key
 ///     |         count = 3;
 ///     |         "full name" = "A \"B\"\n";
 ///     |     },
-///     |     {(                       a set has both and one element a line, sorted
+///     |     {(                       a set has both brackets, and one element a line, sorted
 ///     |         1,
 ///     |         10
 ///     |     )},
@@ -19,8 +19,8 @@
 ///
 /// An element appears as its `description`. Each further line of it is indented by four blanks, so that
 /// collections nest. A string appears as it is if it is not empty and consists of A-Z a-z 0-9 _ . / - only.
-/// Other strings are in double quotes. They have \" \\ \n \r \t for these characters, and \xNN for other
-/// control characters.
+/// Other strings are in double quotes. In them \" and \\ stand for a quote and a backslash, and \n \r \t and
+/// \xNN for control characters.
 ///
 /// The keys of dictionaries and the elements of sets are sorted. Numbers come first, by value, then strings,
 /// by their bytes, then other objects, by their descriptions. So equal collections of strings and numbers

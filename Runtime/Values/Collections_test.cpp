@@ -145,7 +145,7 @@ TEST(Dictionary, ComparesItsEntries) {
   EXPECT_FALSE(dictionary->isEqual(nullptr));
 }
 
-TEST(Dictionary, BehavesLikeTheModel) {
+TEST(Dictionary, BehavesLikeAMap) {
   std::mt19937 random(5);
   rt::Dictionary::Builder builder;
   std::map<int, int> model;

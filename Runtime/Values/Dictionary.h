@@ -70,8 +70,8 @@ class RT_VISIBLE Dictionary final : public Implements<Dictionary, Object> {
   /// Makes a dictionary of `entries`. Precondition: no key and no value is null.
   explicit Dictionary(Entries entries) noexcept : entries_(std::move(entries)) {}
 
-  /// Returns a dictionary that is built by calling `Builder::set` for each entry in order. So the last of
-  /// several equal keys counts, and a null value removes its key. Throws what `Builder::set` throws.
+  /// Returns a dictionary that is built by calling `Builder::set` for each entry in order. So the last value
+  /// for a key counts, and a null value removes the key. Throws what `Builder::set` throws.
   static Ref<Dictionary> of(std::initializer_list<std::pair<Ref<Object>, Ref<Object>>> entries);
 
   std::size_t count() const noexcept { return entries_.size(); }

@@ -71,7 +71,7 @@ class RT_VISIBLE Number final : public Implements<Number, Object> {
   std::uint64_t hash() const override;
 
   /// Returns the value as a decimal without an exponent, such as "-3" or "0.1". Reading it back gives the
-  /// same value. True and false give "1" and "0". The other values are "nan", "inf" and "-inf".
+  /// same value. True and false give "1" and "0". Values that are not finite give "nan", "inf" and "-inf".
   String description() const override;
 
  private:

@@ -89,7 +89,7 @@ std::optional<SymbolTables::Symbol> SymbolTables::find(std::uint64_t address) {
     std::uint64_t lowest = ~std::uint64_t{0};
     bool contains = false;
     for (const Elf64_Phdr& header : headers) {
-      // `dlpi_addr` may be wrong for a statically linked program. Where its headers lie tells the true bias.
+      // `dlpi_addr` may be wrong for a statically linked program. The address of its headers gives the bias.
       if (header.p_type == PT_PHDR)
         found.bias = std::bit_cast<std::uint64_t>(info->dlpi_phdr) - header.p_vaddr;
     }

@@ -23,7 +23,7 @@ Text processName() noexcept {
   Text text{};
   const int file = open("/proc/self/comm", O_RDONLY | O_CLOEXEC);
   if (file < 0) {
-    // The kernel nearly always named the process after this.
+    // The kernel nearly always takes the process's name from this one.
     std::string_view(program_invocation_short_name).copy(text.data(), kCapacity - 1);
     return text;
   }

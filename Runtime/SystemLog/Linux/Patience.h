@@ -15,7 +15,7 @@ class Patience {
   /// three times `kWait`.
   static constexpr std::chrono::milliseconds kWait{50};
 
-  /// Makes a patience that is over already.
+  /// Makes an object whose time is over already, so that no send waits.
   constexpr Patience() noexcept = default;
 
   static Patience fromNow() noexcept { return Patience(now() + kWait); }

@@ -40,7 +40,8 @@ class RT_VISIBLE AssertionHandler : public Implements<AssertionHandler, Object> 
   /// description of several lines is written as it is. "<Unknown Function>" and "<Unknown File>" replace
   /// null.
   ///
-  /// The exception is also thrown if standard error is closed, has no reader, or takes nothing for a second.
+  /// The exception is also thrown if standard error is closed, has no reader, or does not take everything.
+  /// The call waits for standard error for a second at most.
   ///
   /// An override may return. The code that found the failure then continues, as its own contract says.
   /// Threads: several threads may share a handler and call it at the same time.

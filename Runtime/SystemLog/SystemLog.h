@@ -58,7 +58,7 @@ class SystemLog {
 
   /// Writes the entry `text`, which should be UTF-8. If a journal listens, takes no lock and allocates
   /// nothing. Preserves `errno`. May also be called while the program is being loaded, and after `main`.
-  /// Threads: thread-safe. Threads do not wait for each other.
+  /// Threads: thread-safe. Threads do not wait for each other's entries.
   /// Errors: drops and counts an entry that cannot be written, as described above.
   void write(Type type, std::string_view text) const noexcept;
 

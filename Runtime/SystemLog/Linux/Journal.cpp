@@ -32,7 +32,7 @@ class Fields {
   Fields(const Fields&) = delete;
   Fields& operator=(const Fields&) = delete;
 
-  // Adds a field. Precondition: there are less than `kMostFields` fields.
+  // Adds a field. Precondition: there are fewer than `kMostFields` fields.
   void add(std::string_view name, std::string_view value) noexcept {
     copy(name);
     if (value.find('\n') == std::string_view::npos) {

@@ -11,7 +11,7 @@ namespace rt::detail {
 Delivery writeToSyslog(const LogEntry& entry, const Patience& patience);
 
 /// Writes `entry` as one line to standard error. Returns `refused` if standard error is closed, has no
-/// reader, or takes nothing in time. Throws std::bad_alloc.
+/// reader, or does not take the whole line in time. Throws std::bad_alloc.
 /// Threads: thread-safe. Lines of different threads do not mix in a file. In a pipe they do not mix up to
 /// 4096 bytes, which it takes in one piece.
 Delivery writeToStandardError(const LogEntry& entry, const Patience& patience);

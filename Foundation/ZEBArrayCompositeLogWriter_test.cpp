@@ -21,7 +21,7 @@ using testing::ElementsAre;
 
 using Lines = std::vector<std::string>;
 
-// Writes its name and the line into a list.
+// Adds its name and the line to a list.
 class Recorder final : public rt::Implements<Recorder, rt::Object, ZEBLogWriter> {
  public:
   Recorder(Lines& lines, std::string name) : lines_(lines), name_(std::move(name)) {}
@@ -94,7 +94,7 @@ TEST(ZEBArrayCompositeLogWriter, PassesWhatAWriterThrowsAndGoesOnWithTheNextLine
   const auto writer = ZEBArrayCompositeLogWriter::of(rt::make<Recorder>(lines, "a"), rt::make<Throwing>(),
                                                      rt::make<Recorder>(lines, "b"));
   EXPECT_THROW(writer->logMessage("one"_s, 3), std::runtime_error);
-  // The lock is free again, for others too.
+  // The lock is free again, for other threads too.
   std::thread([&] { EXPECT_THROW(writer->logMessage("two"_s, 3), std::runtime_error); }).join();
   EXPECT_THAT(lines, ElementsAre("a3 one", "a3 two"));
 }
@@ -123,7 +123,7 @@ class Yielding final : public rt::Implements<Yielding, rt::Object, ZEBLogWriter>
   }
 };
 
-// Invariant: no writer gets a line before all have got the one before it. The recorders have no lock of their
+// Invariant: no writer gets a line before all have got the previous one. The recorders have no lock of their
 // own.
 TEST(ZEBArrayCompositeLogWriter, KeepsLinesOfThreadsApart) {
   constexpr int kThreads = 8;

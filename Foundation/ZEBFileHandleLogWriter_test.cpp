@@ -80,7 +80,7 @@ TEST_F(ZEBFileHandleLogWriterTest, IsSilentAboutAFullDisk) {
   ASSERT_TRUE(writer);
   writer->logMessage("lost"_s, 3);
   writer->logMessage("lost, too"_s, 3);
-  // Once there is room, it goes on.
+  // It writes again as soon as there is room.
   const int descriptor = writer->fileHandle()->descriptor();
   const int other = ::open(path().c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC, 0600);
   ASSERT_GE(other, 0);
@@ -114,7 +114,7 @@ TEST_F(ZEBFileHandleLogWriterTest, GoesOnWritingAFileThatWasRemoved) {
 }
 
 TEST_F(ZEBFileHandleLogWriterTest, KeepsLinesOfSeveralWritersOverOneHandleWhole) {
-  // Two writers over one handle.
+  // Two writers share a handle.
   const auto first = open();
   const auto second = ZEBFileHandleLogWriter::initWithFileHandle(first->fileHandle());
   const rt::String line = rt::String::fromUTF8(std::string(3000, 'x'));

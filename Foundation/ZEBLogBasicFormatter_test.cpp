@@ -16,7 +16,7 @@ rt::String format(const rt::String* withFormat, ...) {
   std::va_list arguments;
   va_start(arguments, withFormat);
   const rt::String first = formatter->stringForFunc("func"_s, *withFormat, arguments, 3);
-  // The list is left where it is.
+  // The list has not been advanced.
   const rt::String second = formatter->stringForFunc(nullptr, *withFormat, arguments, 0);
   va_end(arguments);
   EXPECT_EQ(first, second);

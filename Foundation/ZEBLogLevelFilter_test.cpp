@@ -23,7 +23,7 @@ using namespace rt::literals;
 
 constexpr const char* kSetting = "ZEBVerboseLogging";
 
-// NOLINTNEXTLINE(bugprone-throwing-static-initialization): then there is nothing to test with
+// NOLINTNEXTLINE(bugprone-throwing-static-initialization): without it no test can run
 const PrivateDefaults privateDefaults;
 
 class ZEBLogLevelFilterTest : public testing::Test {
@@ -95,7 +95,7 @@ TEST_F(ZEBLogLevelFilterTest, LetsTheEnvironmentOverruleTheUserDefault) {
   filter->willDetachFromLogger();
 }
 
-// The environment counts at the time of reading, as the user default does.
+// The variable's value at the time of reading counts, as for the user default.
 TEST_F(ZEBLogLevelFilterTest, ReadsTheEnvironmentAgainWhenItIsAttached) {
   const auto filter = ZEBLogLevelFilter::init();
   set("yes");
@@ -119,7 +119,7 @@ TEST_F(ZEBLogLevelFilterTest, FollowsTheUserDefaultFromAttachmentToDetachment) {
   defaults->setBool(true, kSetting);
   EXPECT_TRUE(filter->verboseLoggingEnabled());
   filter->willDetachFromLogger();
-  // Nobody tells it any more.
+  // The filter is no longer told of changes.
   defaults->remove(kSetting);
   EXPECT_TRUE(filter->verboseLoggingEnabled());
   filter->didAttachToLogger();
@@ -152,7 +152,7 @@ TEST_F(ZEBLogLevelFilterTest, IsDetachedOnceHoweverOftenItWasAttached) {
 TEST_F(ZEBLogLevelFilterTest, HearsOfAChangeByAnotherProcess) {
   const auto filter = ZEBLogLevelFilter::init();
   const auto logger = ZEBLogger::loggerWithWriter(nullptr, nullptr, filter);
-  // Observers are called in their order: when this one is, the filter has been.
+  // Observers are called in the order of their registration. So the filter has been called before this one.
   std::counting_semaphore<> changes(0);
   const auto observation = rt::UserDefaults::standardUserDefaults()->observe(
       kSetting, rt::UserDefaults::Notify::kOnChange, [&] { changes.release(); });
@@ -168,7 +168,7 @@ TEST_F(ZEBLogLevelFilterTest, HearsOfAChangeByAnotherProcess) {
   EXPECT_FALSE(filter->verboseLoggingEnabled());
 }
 
-// Attaching, detaching, changing and asking at once: at the end the filter knows the last value.
+// Attaches, detaches, changes the default and asks, all at once. At the end the filter knows the last value.
 TEST_F(ZEBLogLevelFilterTest, MayBeUsedByManyThreads) {
   const auto defaults = rt::UserDefaults::standardUserDefaults();
   const auto filter = ZEBLogLevelFilter::init();
@@ -222,7 +222,7 @@ TEST_F(ZEBLogLevelFilterTest, FailsAnAssertionWhereItGoesWithoutHavingBeenDetach
   EXPECT_EQ(failure.file, "Foundation/ZEBLogger"_s);
   EXPECT_EQ(failure.lineNumber, 544U);
   EXPECT_EQ(failure.description, kDescription);
-  // Where the handler returns, the filter watches nothing any more all the same.
+  // If the handler returns, the filter still stops observing.
   rt::UserDefaults::standardUserDefaults()->setBool(true, kSetting);
 }
 
@@ -244,7 +244,7 @@ TEST_F(ZEBLogLevelFilterTest, GoesInPeaceWhereItWasDetachedOrNeverAttached) {
   EXPECT_TRUE(recorder->failures.empty());
 }
 
-// The default handler throws, which nothing can do out of a destruction.
+// The default handler throws, and no exception can leave a destructor.
 TEST(ZEBLogLevelFilterDeathTest, EndsTheProgramByTheDefaultHandler) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   const auto destroyAttached = [] {

@@ -1,4 +1,4 @@
-// The loggers that the factories make, and the one that all share.
+// Tests the factories' loggers and the shared logger.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
@@ -68,8 +68,8 @@ TEST_F(ZEBLoggerTest, SplitsItsLinesToBothStreams) {
               MatchesRegex(std::string(kErrorLine) + "\n[^\n]*\\[lvl=4\\] \\(unknown\\) assert\n"));
 }
 
-// What the filter lets pass of levels that no operation logs at: 0 comes out nowhere, as a logger is a writer
-// for four levels only.
+// Uses levels that pass the filter but that no operation logs at. Level 0 is written nowhere, because a
+// logger used as a writer takes only four levels.
 TEST_F(ZEBLoggerTest, SplitsNoLinesOfLevelsThatNoOperationLogsAt) {
   const auto logger = ZEBLogger::standardLoggerWithStdoutAndStderr();
   const auto log = [&](ZEBLogLevel level, ...) {
@@ -143,7 +143,7 @@ TEST_F(ZEBLoggerTest, LetsWhoHasTheSharedLoggerGoOnWithIt) {
   EXPECT_THAT(recorder_->lines(), ElementsAre("3 still there"));
 }
 
-// Would wait for ever, if the old one went under the class's lock.
+// This would deadlock if the old logger were released under the class's lock.
 TEST_F(ZEBLoggerTest, LetsTheOldSharedLoggerGoUnderNoLock) {
   const auto filter = rt::make<FunctionFilter>();
   filter->detaching = [&] { std::thread([] { ZEBLogger::sharedLogger(); }).join(); };
@@ -151,8 +151,8 @@ TEST_F(ZEBLoggerTest, LetsTheOldSharedLoggerGoUnderNoLock) {
   ZEBLogger::setSharedLogger(recordingLogger());
 }
 
-// The report of a malformed file of user defaults is made as the first shared logger is, and may log itself.
-// In a process of its own: in this one, a thread that watches that file may report first.
+// Making the first shared logger may report a malformed file of user defaults, and the report may log. The
+// test needs a process of its own, because in this one another thread that watches the file may report first.
 TEST(ZEBLoggerDeathTest, MayBeAskedForWhileTheSharedLoggerIsBeingMade) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   const auto ask = [] {

@@ -26,7 +26,7 @@ namespace {
 using namespace rt::literals;
 using testing::ElementsAre;
 
-// Shows what a formatter is asked.
+// Makes a line that shows what the formatter was given.
 class ShowingFormatter final : public rt::Implements<ShowingFormatter, ZEBLogBasicFormatter> {
  public:
   rt::String stringForFunc(const rt::String& func, const rt::String& withFormat, std::va_list valist,
@@ -125,7 +125,7 @@ TEST_F(ZEBLoggerTest, KeepsTheOldFilterThatThrowsAsItIsToGo) {
   EXPECT_THROW(logger->setFilter(nullptr), std::runtime_error);
   EXPECT_EQ(logger->filter(), filter);
   filter->detaching = [] {};
-  // The lock is free again, for others too.
+  // The lock is free again, for other threads too.
   std::thread([&] { logger->setFilter(nullptr); }).join();
   EXPECT_TRUE(isA<ZEBLogNoFilter>(logger->filter()));
 }
@@ -145,13 +145,13 @@ TEST_F(ZEBLoggerTest, IsNoneWhereItsMakingThrows) {
   filter->attached = [] { throw std::runtime_error("not here"); };
   filter->detaching = [&] { ++detached; };
   EXPECT_FALSE(ZEBLogger::loggerWithWriter(recorder_, nullptr, filter));
-  // It was in the logger all the same.
+  // The filter was attached even so.
   EXPECT_EQ(detached, 1);
   EXPECT_THROW(ZEBLogger::initWithWriter(recorder_, nullptr, filter), std::runtime_error);
   EXPECT_EQ(detached, 2);
 }
 
-// Would wait for ever, if a logging waited for a setter.
+// This would deadlock if logging waited for a setter.
 TEST_F(ZEBLoggerTest, LogsWhileAFilterIsBeingTold) {
   const auto logger = recordingLogger();
   const auto filter = rt::make<FunctionFilter>();
@@ -171,7 +171,7 @@ TEST_F(ZEBLoggerTest, LetsAFilterExchangePiecesAsItComes) {
   logger->setFilter(nullptr);
 }
 
-// Would wait for ever, if an old piece went under a lock of the logger's.
+// This would deadlock if an old piece were released under the logger's lock.
 TEST_F(ZEBLoggerTest, LetsOldPiecesGoUnderNoLock) {
   struct Going {
     explicit Going(std::function<void()> function) : run(std::move(function)) {}
@@ -332,13 +332,13 @@ TEST_F(ZEBLoggerTest, LetsAThreadBeCancelledInAWriter) {
   void* result = nullptr;
   ASSERT_EQ(pthread_join(thread, &result), 0);
   EXPECT_EQ(result, PTHREAD_CANCELED);
-  // All was let go on the way.
+  // The cancellation has released everything that the writer's call held.
   logger->setWriter(recorder_);
   logger->logError("next"_s);
   EXPECT_THAT(recorder_->lines(), ElementsAre("3 next"));
 }
 
-// What has no pieces and takes everything at one place.
+// A subclass without pieces, which takes all lines in one place.
 class Rerouting final : public rt::Implements<Rerouting, ZEBLogger> {
  public:
   rt::Ref<ZEBLogWriter> writer() const override { return nullptr; }
@@ -370,11 +370,11 @@ TEST_F(ZEBLoggerTest, LetsASubclassTakeEverything) {
   logger->logMessage("text"_s, 3);
   logger->logMessage("dropped"_s, 0);
   EXPECT_THAT(rerouting->lines, ElementsAre("1 none|%d|1", "2 f|%d|2", "3 none|%@|text"));
-  // What it throws is its own affair.
+  // The base class does not drop what a subclass throws.
   EXPECT_THROW(logger->logAssert("line"_s), std::runtime_error);
 }
 
-// Notes the calls that led to it.
+// Records the call stack at `logInternalFunc`.
 class CallRecorder final : public rt::Implements<CallRecorder, ZEBLogger> {
  public:
   [[gnu::noinline]] void logInternalFunc(const char* /*func*/, const rt::String& /*format*/,
@@ -393,7 +393,7 @@ template <class Log>
   return reinterpret_cast<std::uint64_t>(__builtin_return_address(0));
 }
 
-// Whoever captures call stacks leaves these two frames out.
+// Code that captures call stacks leaves these two frames out.
 TEST_F(ZEBLoggerTest, HasTwoFramesOfItsOwnBelowTheCodeThatLogs) {
   const auto recorder = rt::make<CallRecorder>();
   ZEBLogger& logger = *recorder;

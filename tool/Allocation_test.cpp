@@ -1,6 +1,6 @@
-// The command's own allocator: the file that is linked into the command, with its functions under other
-// names, so that this program keeps its own. Every call takes some of one piece of memory for good, so
-// whatever needs to know how much is left runs in a process of its own.
+// Tests the object file of the command's allocator. Its functions have other names here, so that this program
+// keeps its own allocator. Every call uses up memory for good. Tests that need to know how much is left
+// therefore run in a process of their own.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -77,7 +77,7 @@ TEST(AllocationTest, GivesZeroesForEachOfManyObjects) {
   EXPECT_NE(command_calloc(SIZE_MAX, 0), nullptr);
 }
 
-// The product of these is 2, as numbers of this size go.
+// As a number of this size, their product is 2.
 TEST(AllocationTest, RefusesMoreObjectsThanCanBeCounted) {
   errno = 0;
   EXPECT_EQ(command_calloc(SIZE_MAX / 2 + 2, 2), nullptr);
@@ -87,7 +87,7 @@ TEST(AllocationTest, RefusesMoreObjectsThanCanBeCounted) {
 TEST(AllocationTest, CopiesWhatFitsWhenABlockIsResized) {
   void* const block = command_malloc(48);
   fill(block, 48, 7);
-  fill(command_malloc(48), 48, 8);  // what a copy that goes too far would find
+  fill(command_malloc(48), 48, 8);  // a copy that goes too far would find this
 
   void* const larger = command_realloc(block, 200);
   ASSERT_NE(larger, nullptr);
@@ -144,7 +144,7 @@ TEST(AllocationTest, RefusesSizesAndAlignmentsThatNothingHolds) {
   for (std::size_t alignment = std::size_t{1} << 63; alignment >= 2 * kPiece; alignment /= 2) {
     errno = 0;
     void* const block = command_aligned_alloc(alignment, 1);
-    // By chance the piece may lie where such an alignment is to be had.
+    // The memory may happen to lie at such an alignment.
     if (block != nullptr) continue;
     EXPECT_EQ(errno, ENOMEM) << alignment;
   }
@@ -158,7 +158,7 @@ TEST(AllocationTest, LeavesABlockAloneThatCannotBeResized) {
   EXPECT_THAT(bytes(block, 10), Each(7));
 }
 
-// Exits with 0 where the first block begins and the last one ends with the piece.
+// Exits with 0 if the first block begins at the start of the memory and the last one ends at its end.
 [[noreturn]] void takeAll() {
   auto* const first = static_cast<unsigned char*>(command_malloc(0));
   std::size_t size = kPiece;
@@ -172,7 +172,7 @@ TEST(AllocationTest, LeavesABlockAloneThatCannotBeResized) {
 }
 
 TEST(AllocationDeathTest, GivesAllOfItsPieceAndNoMore) {
-  // As its own program from the start, so that nothing has been taken yet.
+  // The test program is started anew, so that no memory has been taken yet.
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   EXPECT_EXIT(takeAll(), testing::ExitedWithCode(0), "");
 }

@@ -1,5 +1,5 @@
-// What the environment is asked for once in a process takes a process for each answer: every death test here
-// is one, started anew, that has asked nothing.
+// A process reads the environment once, so each answer needs a process of its own. Every death test here is a
+// new process that has not read it.
 
 #include "Shared/Logging/LUMDefaultMinimumLogLevelFilter.h"
 
@@ -32,7 +32,8 @@ class LUMDefaultMinimumLogLevelFilterDeathTest : public testing::Test {
     }
   }
 
-  // The lowest level that passes, if all above it do and none below it.
+  // Returns the lowest level that passes, if all levels above it pass too. Otherwise returns which levels
+  // pass.
   static std::string threshold() {
     const Ref<LUMDefaultMinimumLogLevelFilter> filter = LUMDefaultMinimumLogLevelFilter::init();
     std::string passed;
@@ -44,7 +45,7 @@ class LUMDefaultMinimumLogLevelFilterDeathTest : public testing::Test {
     return passed.find('n', lowest) == std::string::npos ? std::to_string(lowest) : passed;
   }
 
-  // Writes the threshold of this process, in which `mode` is the first, and ends it.
+  // Prints the threshold of this process, which must not have read another mode before, and exits.
   [[noreturn]] static void tellThreshold(const char* mode) {
     setMode(mode);
     std::fprintf(stderr, "threshold %s.\n", threshold().c_str());

@@ -1,4 +1,4 @@
-// Both classes of call stacks.
+// Tests both classes of call stacks.
 
 #include "Shared/Logging/LUMLogCallstack.h"
 
@@ -55,7 +55,7 @@ std::vector<std::string> linesOf(const LUMLogSymbolCallstack& stack) {
   return lines;
 }
 
-// Functions with frames of their own.
+// These functions have frames of their own.
 
 [[gnu::noinline]] rt::Ref<LUMLogAddressCallstack> innerTakesAddresses(std::uint64_t count) {
   auto stack = LUMLogAddressCallstack::addressCallstackIgnoringFrameCount(count);
@@ -87,7 +87,7 @@ std::vector<std::string> linesOf(const LUMLogSymbolCallstack& stack) {
   return stack;
 }
 
-/// Calls `function` with `depth` frames of its own below.
+// Calls `function` below `depth` frames of this function.
 [[gnu::noinline]] void descend(int depth, const std::function<void()>& function) {
   if (depth > 0) {
     descend(depth - 1, function);
@@ -125,7 +125,7 @@ TEST(LUMLogAddressCallstack, IsNullWhereNothingIsLeft) {
 TEST(LUMLogAddressCallstack, TakesStacksOfAnyDepth) {
   std::uint64_t depth = 0;
   descend(0, [&] { depth = innerTakesAddresses(0)->frameCount(); });
-  // One below, at and above each size of the buffer that it is taken into: 128, 256, 512.
+  // One below, at and above each size of the capture's buffer: 128, 256, 512.
   for (const int size : {127, 128, 129, 255, 256, 257, 511, 512, 513, 3000}) {
     const int added = size - static_cast<int>(depth);
     descend(added, [&] { EXPECT_EQ(innerTakesAddresses(0)->frameCount(), std::uint64_t(size)); });
@@ -202,7 +202,7 @@ TEST(LUMLogSymbolCallstack, LeavesOutTheFramesAtItsInnerEnd) {
   ASSERT_GT(all.size(), 2U);
   EXPECT_THAT(all[0], HasSubstr("innerTakesSymbols"));
   EXPECT_THAT(all[1], HasSubstr("outerTakesSymbols"));
-  // The lines are those of the whole stack, the first of which is left out.
+  // The lines are numbered in the whole stack, whose first line is left out.
   EXPECT_THAT(all[0], testing::StartsWith("1 "));
 
   const std::vector<std::string> fewer = linesOf(*outerTakesSymbols(1));
@@ -214,7 +214,8 @@ TEST(LUMLogSymbolCallstack, LeavesOutTheFramesAtItsInnerEnd) {
 TEST(LUMLogSymbolCallstack, IsNullWhereThereAreTooFewFrames) {
   const std::uint64_t depth = outerTakesSymbols(0)->symbols()->count();
   EXPECT_EQ(outerTakesSymbols(depth - 1)->symbols()->count(), 1U);
-  // As many as there are, with the one that takes it: nothing is left, which is no failure.
+  // With the frame that captures it, the stack has exactly this many frames. None is left, which is no
+  // failure.
   ASSERT_TRUE(outerTakesSymbols(depth));
   EXPECT_TRUE(outerTakesSymbols(depth)->symbols()->isEmpty());
   EXPECT_FALSE(outerTakesSymbols(depth + 1));

@@ -1,4 +1,4 @@
-// The stock filters but the one that asks the environment, which has a test of its own.
+// Tests all filters except the one that reads the environment, which has its own test.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -31,7 +31,7 @@ constexpr std::uint64_t kHighest = std::numeric_limits<std::uint64_t>::max();
 
 const std::vector<LUMLogLevel> kLevels = {0, 1, 2, 3, 4, 5, kHighest};
 
-// Of the levels above, those that `filter` lets pass.
+// Returns which of the levels above `filter` lets pass.
 std::vector<LUMLogLevel> levelsThrough(const LUMLogFilter& filter) {
   std::vector<LUMLogLevel> passed;
   for (const LUMLogLevel level : kLevels) {
@@ -56,7 +56,7 @@ TEST(LUMLogMinimumLevelFilter, LetsTheLevelPassAndThoseAboveIt) {
               ElementsAre(4, 5, kHighest));
 }
 
-// All 64 bits count, and none of them is a sign.
+// All 64 bits count, and none is a sign.
 TEST(LUMLogMinimumLevelFilter, ComparesWithoutSign) {
   EXPECT_THAT(levelsThrough(*LUMLogMinimumLevelFilter::initWithMinimumLevel(kHighest)),
               ElementsAre(kHighest));
@@ -107,7 +107,7 @@ TEST(LUMLogComponentFilter, OfNoComponentRefusesAll) {
       *messageWith(LUMLogLevelInfo, "x"_s, LUMLogMetadata::metadataWithComponent(""_s))));
 }
 
-// What filters answer to one message, and which of them were asked.
+// Records which filters were asked about one message.
 class LogicalFilterTest : public testing::Test {
  protected:
   Ref<LUMLogFilter> answering(const char* name, bool answer) {
@@ -144,7 +144,7 @@ TEST_F(LUMLogLogicalAndFilterTest, StopsAtTheFirstRefusal) {
   EXPECT_THAT(trace_.events(), ElementsAre("a", "b"));
 }
 
-// Unlike the "and" of logic, on purpose.
+// Deliberately unlike the "and" of logic.
 TEST_F(LUMLogLogicalAndFilterTest, OfNoFiltersRefuses) {
   EXPECT_FALSE(allOf(Array::of()));
   EXPECT_FALSE(allOf(nullptr));

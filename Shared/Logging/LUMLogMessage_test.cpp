@@ -17,7 +17,7 @@ namespace {
 
 using namespace rt::literals;
 
-/// The fields of a message, to be changed one by one.
+// The fields of a message, which tests change one by one.
 struct Fields {
   LUMLogLevel level = 3;
   rt::String format = "%@ entries"_s;
@@ -83,7 +83,7 @@ TEST(LUMLogMessage, TellsTheThreadThatMadeIt) {
     EXPECT_FALSE(messageOf(nullptr, nullptr)->dispatchQueueLabel().isNull());
     rt::Thread::setCurrentName("Importer"_s);
     EXPECT_EQ(messageOf(nullptr, nullptr)->threadName(), "Importer");
-    // What is given goes before, also when it is empty.
+    // A given name takes precedence, even an empty one.
     EXPECT_EQ(messageOf(""_s, nullptr)->threadName(), "");
     EXPECT_EQ(messageOf("Other"_s, nullptr)->threadName(), "Other");
   }).join();
@@ -99,7 +99,7 @@ TEST(LUMLogMessage, TellsTheQueueThatMadeIt) {
   EXPECT_EQ(messageOf(nullptr, nullptr)->dispatchQueueLabel(), "");
 }
 
-/// A call stack of a host's that changes.
+// A host's own call stack, which is mutable.
 class HostCallstack final : public rt::Implements<HostCallstack, rt::Object, LUMLogCallstack> {
  public:
   rt::Ref<rt::Object> copy() const override { return rt::make<HostCallstack>(); }

@@ -8,7 +8,7 @@ namespace {
 
 using namespace rt::literals;
 
-/// An object that changes, and whose copies do not.
+// A mutable object. Changes of it do not change its copies.
 class Box final : public rt::Implements<Box, rt::Object> {
  public:
   explicit Box(int given) : value(given) {}
@@ -82,7 +82,7 @@ TEST(LUMLogMetadata, IsMadeOfWhatIsGiven) {
          {{idKey, id}, {componentKey, "c"_s}, {causeKey, cause}});
   expect(LUMLogMetadata::metadataWithObfuscatedKiriID(id, "c"_s, "t"_s, cause),
          {{idKey, id}, {componentKey, "c"_s}, {categoryKey, "t"_s}, {causeKey, cause}});
-  // What is null is left out, and "" is not null.
+  // A null property is left out, but "" is not null.
   expect(LUMLogMetadata::metadataWithObfuscatedKiriID(nullptr, nullptr, nullptr, nullptr), {});
   expect(LUMLogMetadata::metadataWithComponent(nullptr), {});
   expect(LUMLogMetadata::metadataWithComponent(""_s), {{componentKey, ""_s}});

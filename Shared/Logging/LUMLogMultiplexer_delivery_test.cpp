@@ -1,4 +1,4 @@
-// What goes to whom, when, and in which order, one message at a time.
+// Tests what is delivered to which logger, when and in which order, one message at a time.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -22,7 +22,7 @@ using testing::ElementsAre;
 using testing::IsEmpty;
 using testing::UnorderedElementsAre;
 
-// Filters for all.
+// The multiplexer's filters.
 
 TEST_F(LUMLogMultiplexerTest, HandsOnTheMessageItself) {
   const Ref<LUMLogMessage> message = messageWith(LUMLogLevelInfo, "x"_s);
@@ -175,8 +175,8 @@ TEST_F(LUMLogMultiplexerTest, AsksAsyncLoggersWhereTheirAnswersAreWanted) {
               ElementsAre("filter here", "mode here", "queue here", "filter on its queue", "logged"));
 }
 
-// The filter's word counts when the logger is called; that it refused before means only that the mode was
-// not asked for.
+// The second answer decides whether the logger runs. A refusal at the first question only skips the question
+// for the mode.
 TEST_F(LUMLogMultiplexerTest, AsksTheFilterOfAnAsyncLoggerAgainWhenItsTurnComes) {
   std::vector<bool> answers;
   const auto asking = rt::make<TestFilter>([&](const LUMLogMessage&) {
@@ -221,7 +221,7 @@ TEST_F(LUMLogMultiplexerTest, TakesEveryModeButOneForAsynchronous) {
     multiplexer_->addAsyncLogger(logger);
     std::latch mayGoOn(1);
     queue_->async([&] { mayGoOn.wait(); });
-    log();  // Would not return if it waited for the queue.
+    log();  // This would not return if it waited for the queue.
     EXPECT_THAT(trace_.events(), IsEmpty());
     mayGoOn.count_down();
     drain();
@@ -245,7 +245,7 @@ TEST_F(LUMLogMultiplexerTest, CallsABlockingLoggerBeforeItReturnsAndOnce) {
   EXPECT_THAT(trace_.events(), IsEmpty());
 }
 
-// A mode is for one message.
+// A mode applies to one message.
 TEST_F(LUMLogMultiplexerTest, AsksForTheModeOfEachMessage) {
   const auto logger = rt::make<TestAsyncLogger>(queue_, tracing("logged", true));
   logger->dispatchMode_ = [](const LUMLogMessage& message) {
@@ -275,10 +275,10 @@ TEST_F(LUMLogMultiplexerTest, GivesAnAsyncLoggerMessagesInTheirOrder) {
   EXPECT_EQ(trace_.events(), expected);
 }
 
-// The order of kinds.
+// The order of the kinds of loggers.
 
-// What is queued first has been delivered when a synchronous logger waits for it, and blocking loggers come
-// last.
+// The queued message has been delivered by the time when the synchronous logger has waited for it. Blocking
+// loggers come last.
 TEST_F(LUMLogMultiplexerTest, QueuesThenCallsThenBlocks) {
   const auto other = rt::make<Queue>("other"_s);
   multiplexer_->addAsyncLogger(async("async"));
@@ -319,7 +319,7 @@ TEST_F(LUMLogMultiplexerTest, WaitsForNeitherQueueWhereNothingBlocks) {
   log();
   EXPECT_THAT(trace_.events(), IsEmpty());
   mayFanOut.count_down();
-  multiplexer_->waitForLogging();  // Nor does this wait for the logger's queue.
+  multiplexer_->waitForLogging();  // This does not wait for the logger's queue either.
   EXPECT_THAT(trace_.events(), IsEmpty());
   mayLog.count_down();
   queue_->barrierSync();

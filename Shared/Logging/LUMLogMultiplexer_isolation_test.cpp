@@ -1,4 +1,4 @@
-// What filters and loggers may do while a message is delivered: come and go, log, wait, throw.
+// Tests what filters and loggers may do during a delivery: be added and removed, log, wait and throw.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -94,7 +94,7 @@ TEST_F(LUMLogMultiplexerTest, KeepsAliveWhomItDeliversToAndNobodyElse) {
   mayFanOut.count_down();
   drain();
   EXPECT_THAT(trace_.events(), ElementsAre("async"));
-  // The tasks that delivered are gone when the queues have run once more.
+  // The second run of the queues shows that the delivering tasks are gone.
   drain();
   EXPECT_EQ(weak.lock(), nullptr);
 }
@@ -120,7 +120,7 @@ TEST_F(LUMLogMultiplexerTest, AnAsyncLoggerMayLogFromWithin) {
   EXPECT_THAT(trace_.events(), ElementsAre("x", "from within"));
 }
 
-// No lock is held while anything of the user's runs: another thread gets through meanwhile.
+// No lock is held while the user's code runs, so another thread can use the multiplexer meanwhile.
 
 TEST_F(LUMLogMultiplexerTest, HoldsNoLockWhileFiltersAndLoggersRun) {
   std::atomic<int> count = 0;
@@ -159,7 +159,7 @@ TEST_F(LUMLogMultiplexerTest, HoldsNoLockWhileFiltersAndLoggersRun) {
   EXPECT_EQ(count, 2 * (1 + 2 + 5));
 }
 
-// What is thrown.
+// Exceptions.
 
 TEST_F(LUMLogMultiplexerTest, PassesOnWhatAFilterThrowsAndDeliversToNobody) {
   const auto throwing = rt::make<TestFilter>([](const LUMLogMessage&) -> bool { throw Thrown(); });
@@ -188,7 +188,7 @@ TEST_F(LUMLogMultiplexerTest, PassesOnWhatAnAsyncLoggerThrowsWhenItIsAskedAndDel
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("sync", "async"));
 }
 
-// What is queued by then is delivered, what would come later is not.
+// Messages queued before the exception are delivered. Later steps are not done.
 TEST_F(LUMLogMultiplexerTest, PassesOnWhatASyncLoggerThrows) {
   multiplexer_->addAsyncLogger(async("async"));
   multiplexer_->addAsyncLogger(blocking("blocking"));
@@ -215,7 +215,7 @@ TEST_F(LUMLogMultiplexerTest, PassesOnWhatABlockingLoggerThrows) {
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("sync", "async"));
 }
 
-// Later there is nobody to throw to.
+// An exception in a later call has no caller to reach.
 
 TEST_F(LUMLogMultiplexerDeathTest, EndsTheProgramByWhatAnAsyncLoggerThrowsLater) {
   const auto logTo = [&](const Ref<TestAsyncLogger>& logger) {
@@ -237,7 +237,7 @@ TEST_F(LUMLogMultiplexerDeathTest, EndsTheProgramByWhatAnAsyncLoggerThrowsLater)
   EXPECT_DEATH(logTo(withoutQueue), line + "\"LUMLogMultiplexer\": by its queue");
 }
 
-// The labels of the queues that had a task which threw.
+// The labels of the queues in which a task threw.
 Trace uncaught;
 
 class LUMLogMultiplexerUncaughtTest : public LUMLogMultiplexerTest {
@@ -250,7 +250,7 @@ class LUMLogMultiplexerUncaughtTest : public LUMLogMultiplexerTest {
 };
 
 TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereAnAsyncLoggerThrowsLater) {
-  bool throws = true;  // Touched by tasks of the queue only.
+  bool throws = true;  // Used by tasks of the queue only.
   multiplexer_->addAsyncLogger(rt::make<TestAsyncLogger>(queue_, [&](const Ref<LUMLogMessage>& message) {
     if (std::exchange(throws, false)) throw Thrown();
     trace_.add(text(*message));
@@ -264,7 +264,7 @@ TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereAnAsyncLoggerThrowsLater) {
 }
 
 TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereTheFilterOfAnAsyncLoggerThrowsLater) {
-  bool throws = true;  // Touched by tasks of the queue only.
+  bool throws = true;  // Used by tasks of the queue only.
   multiplexer_->addAsyncLogger(async("async", rt::make<TestFilter>([&](const LUMLogMessage&) {
                                        if (queue_->isCurrent() && std::exchange(throws, false)) {
                                          throw Thrown();
@@ -279,10 +279,10 @@ TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereTheFilterOfAnAsyncLoggerThrowsL
   EXPECT_THAT(uncaught.events(), IsEmpty());
 }
 
-// Those that come after it miss the message, whichever these are.
+// The loggers that come after it miss the message. Their order is unspecified.
 TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereAnAsyncLoggerThrowsWhenItIsAskedForItsQueue) {
   Trace asked;
-  bool throws = true;  // Touched by tasks of the multiplexer's queue only.
+  bool throws = true;  // Used by tasks of the multiplexer's queue only.
   const auto add = [&](const std::string& name, bool isThrowing) {
     const Ref<TestAsyncLogger> logger = async(name);
     logger->operationQueue_ = [&, name, isThrowing] {
@@ -307,7 +307,7 @@ TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereAnAsyncLoggerThrowsWhenItIsAske
   EXPECT_THAT(uncaught.events(), IsEmpty());
 }
 
-// One that blocks holds up its own caller only.
+// A logger that waits delays only the thread that called it.
 TEST_F(LUMLogMultiplexerTest, ALoggerThatBlocksHoldsNobodyElseUp) {
   std::latch isBlocked(1);
   std::latch mayGoOn(1);
@@ -338,7 +338,7 @@ TEST_F(LUMLogMultiplexerTest, ALoggerThatRemovesItselfHearsNoMore) {
   Ref<LUMSyncLogger> leaving;
   leaving = rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>&) {
     multiplexer_->removeSyncLogger(leaving);
-    leaving = nullptr;  // The last reference but the one that the delivery has.
+    leaving = nullptr;  // The last reference apart from the delivery's own.
     trace_.add("leaving");
   });
   multiplexer_->addSyncLogger(leaving);

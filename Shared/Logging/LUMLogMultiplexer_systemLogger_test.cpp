@@ -1,4 +1,4 @@
-// Which system logger takes the place of which.
+// Tests which system logger replaces which.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -34,7 +34,7 @@ TEST_F(LUMLogMultiplexerSystemLoggerTest, TheFirstThatIsAddedTakesThePlaceOfTheF
   EXPECT_THAT(heard(), ElementsAre("second"));
 }
 
-// On purpose: only the one from the start is replaced.
+// Deliberate: only the original is replaced.
 TEST_F(LUMLogMultiplexerSystemLoggerTest, TheNextThatIsAddedJoinsTheOneBefore) {
   systemMultiplexer_->addSyncLogger(system("second"));
   systemMultiplexer_->addSyncLogger(system("third"));

@@ -1,6 +1,7 @@
-// What a multiplexer is, and who belongs to it. How messages are delivered is in
-// LUMLogMultiplexer_delivery_test.cpp and LUMLogMultiplexer_isolation_test.cpp, system loggers are in
-// LUMLogMultiplexer_systemLogger_test.cpp, many threads at once in LUMLogMultiplexer_threads_test.cpp.
+// Tests what a multiplexer consists of, and how filters and loggers are added and removed. Other files test
+// the rest: LUMLogMultiplexer_delivery_test.cpp and LUMLogMultiplexer_isolation_test.cpp how messages are
+// delivered, LUMLogMultiplexer_systemLogger_test.cpp the system loggers, LUMLogMultiplexer_threads_test.cpp
+// many threads.
 
 #include "Shared/Logging/LUMLogMultiplexer.h"
 
@@ -29,7 +30,7 @@ using testing::ElementsAre;
 using testing::IsEmpty;
 using testing::UnorderedElementsAre;
 
-// What is equal to another where the names are equal, and does something when it is compared.
+// Compares equal to an object with the same name, and calls `whenCompared` at each comparison.
 class Name {
  public:
   explicit Name(rt::String name) : name_(std::move(name)) {}
@@ -110,7 +111,7 @@ class NamedAsyncLogger final : public rt::Implements<NamedAsyncLogger, rt::Objec
   const TestSyncLogger::Action action_;
 };
 
-// What it is made of.
+// The parts of a multiplexer.
 
 TEST_F(LUMLogMultiplexerTest, HasASerialQueueOfItsOwn) {
   EXPECT_EQ(multiplexer_->loggingQueue()->label(), "LUMLogMultiplexer");
@@ -177,7 +178,7 @@ TEST_F(LUMLogMultiplexerDeathTest, SharesOneInstanceThatAllThreadsMakeAtOnce) {
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "");
 }
 
-// Used at exit by whoever logs there, so it is not destroyed.
+// Never destroyed, because code may log at exit.
 TEST_F(LUMLogMultiplexerDeathTest, DeliversUntilTheProcessIsGone) {
   const auto body = [] {
     std::atexit([] {
@@ -207,7 +208,7 @@ TEST_F(LUMLogMultiplexerDeathTest, DeliversWhatIsQueuedWhenTheProcessExits) {
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "heard 18\\.heard 19\\.");
 }
 
-// Nothing.
+// Null, absent and duplicate objects.
 
 TEST_F(LUMLogMultiplexerTest, IgnoresNull) {
   multiplexer_->addLogFilter(nullptr);
@@ -290,7 +291,7 @@ TEST_F(LUMLogMultiplexerTest, TakesEqualFiltersAndLoggersForOne) {
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("other filter", "other sync", "other async"));
 }
 
-// What compares loggers is the loggers' code, which may use the multiplexer; no change is lost.
+// Comparing loggers runs their code, which may use the multiplexer. No change is lost.
 TEST_F(LUMLogMultiplexerTest, MayBeUsedWhileLoggersAreCompared) {
   multiplexer_->addSyncLogger(rt::make<NamedSyncLogger>("a"_s, tracing("a")));
   const auto logger = rt::make<NamedSyncLogger>("b"_s, tracing("b"));
@@ -313,7 +314,7 @@ TEST_F(LUMLogMultiplexerTest, HoldsNoLockWhenItGivesUpFiltersAndLoggers) {
       inAnotherThread([&] { multiplexer_->removeLogFilter(LUMLogNoFilter::init()); });
     });
   };
-  // Nobody but the multiplexer has these.
+  // Only the multiplexer retains these.
   multiplexer_->addLogFilter(
       rt::make<NamedFilter>("a"_s, [end = ending()](const LUMLogMessage&) { return true; }));
   multiplexer_->addSyncLogger(
@@ -328,7 +329,7 @@ TEST_F(LUMLogMultiplexerTest, HoldsNoLockWhenItGivesUpFiltersAndLoggers) {
   multiplexer_->removeAsyncLogger(rt::make<NamedAsyncLogger>("a"_s, queue_, nullptr));
   EXPECT_EQ(count, 3);
 
-  // The system logger that another takes the place of, too.
+  // The same holds for the system logger that another one replaces.
   const auto multiplexer = LUMLogMultiplexer::initWithSystemLogger(
       rt::make<TestSystemLogger>([end = AtEnd([&] {
                                     ++count;
@@ -347,7 +348,7 @@ TEST_F(LUMLogMultiplexerTest, ChangesNothingWhereComparingThrows) {
   EXPECT_THROW(multiplexer->removeSyncLogger(rt::make<NamedSyncLogger>("hostile"_s, nullptr)), Thrown);
   multiplexer->logWithMessage(messageWith(LUMLogLevelInfo));
   EXPECT_THAT(trace_.events(), UnorderedElementsAre("first system", "hostile"));
-  // Which system logger is to be replaced is not forgotten.
+  // The multiplexer still knows which system logger to replace.
   hostile->name.whenCompared = nullptr;
   multiplexer->addSyncLogger(system("second system"));
   multiplexer->logWithMessage(messageWith(LUMLogLevelInfo));

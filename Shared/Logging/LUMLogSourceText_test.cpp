@@ -44,7 +44,7 @@ TEST(LUMLogSourceText, NoticesThatATextHasChanged) {
   EXPECT_EQ(LUMLogSourceText(text), "first text");
 }
 
-// It was taken for the text that it begins with.
+// Such a text used to be taken for its own beginning.
 TEST(LUMLogSourceText, NoticesThatATextHasGrown) {
   static char text[] = "first\0text";
   EXPECT_EQ(LUMLogSourceText(text), "first");
@@ -62,7 +62,7 @@ TEST(LUMLogSourceText, RemembersNoLongTexts) {
   EXPECT_NE(LUMLogSourceText(longer.c_str()).object(), first.object());
 }
 
-// However many texts there are, each comes out as it is, on all threads.
+// However many texts there are, each comes out unchanged, on all threads.
 TEST(LUMLogSourceText, IsRightBeyondWhatIsRemembered) {
   std::vector<std::string> texts;
   for (std::size_t i = 0; i < 2 * kLUMLogSourceTextCount; ++i) texts.push_back("text " + std::to_string(i));

@@ -1,4 +1,4 @@
-// The two safe parameters, side by side: what holds for one holds for the other.
+// Tests both safe parameters together, since the same rules hold for both.
 
 #include "Shared/Logging/LUMSafeParameter.h"
 
@@ -85,7 +85,7 @@ TEST(LUMSafeParameter, HashesTypeAndValue) {
   EXPECT_EQ(text(nullptr, 3)->hash(), 3U);
   EXPECT_EQ(number(5, 3)->hash(), 3 + rt::Number::of(5)->hash());
   EXPECT_EQ(LUMSafeNumberParameter::parameterWithNumber(nullptr, 3)->hash(), 3U);
-  // The sum goes round.
+  // The sum wraps around.
   EXPECT_EQ(text("a"_s, kLargestType)->hash(), "a"_s.hash() - 1);
 }
 

@@ -1,5 +1,5 @@
-// What is in the journal when messages have gone through the system logger: the machine's own journald, run
-// in a private root, is asked. The suite runs as root and as an ordinary user.
+// Reads in the journal what the system logger has written. The journal is the machine's own journald in a
+// private root. The suite runs as root and as an ordinary user.
 
 #include "Shared/Logging/LUMSystemLogger.h"
 
@@ -44,7 +44,7 @@ using rt::Ref;
 using testing::ElementsAre;
 using testing::IsEmpty;
 
-// Why there is no private journal; empty when there is one.
+// The reason why there is no private journal; empty if there is one.
 std::string refusal;
 
 Ref<LUMLogMessage> messageIn(const rt::String& function, const rt::String& text) {
@@ -82,11 +82,11 @@ class LUMSystemLoggerTest : public testing::Test {
     return LUMSystemLogger::initWithFilter(nullptr, rt::make<TestFormatter>(std::move(making)));
   }
 
-  // Everything that this program has written and its children have.
+  // Returns all entries of this program and its children.
   std::vector<PrivateJournal::Entry> entries() const {
     return journal_->entries("SYSLOG_IDENTIFIER=LUMSystemLogger_test");
   }
-  // One field of each of these.
+  // Returns one field of each of these entries.
   std::vector<std::string> fields(const char* name) const {
     std::vector<std::string> values;
     for (PrivateJournal::Entry& entry : entries()) values.push_back(entry[name]);
@@ -94,7 +94,7 @@ class LUMSystemLoggerTest : public testing::Test {
   }
   std::vector<std::string> messages() const { return fields("MESSAGE"); }
 
-  // Runs `body` in a child, in which nobody has asked for the environment or the shared multiplexer.
+  // Runs `body` in a child process that has not yet used the environment or the shared multiplexer.
   static void inChild(const std::function<void()>& body) {
     const pid_t child = fork();
     if (child == 0) {
@@ -128,7 +128,7 @@ TEST_F(LUMSystemLoggerTest, WritesUnderTheBundleAndTheComponent) {
   write(nullptr);
   write(LUMLogMetadata::init());
   write(LUMLogMetadata::metadataWithComponent("Importer"_s));
-  // Not the bundle: what is empty stands alone.
+  // An empty component makes an empty subsystem, without the bundle.
   write(LUMLogMetadata::metadataWithComponent(""_s));
   write(LUMLogMetadata::metadataWithCause("a cause"_s));
   write(LUMLogMetadata::init()->messageWithKey(LUMLogMetadata::kComponentKey, rt::Number::of(1)));
@@ -200,7 +200,7 @@ TEST_F(LUMSystemLoggerTest, WritesWhatItsFormatterMakes) {
   EXPECT_THAT(messages(), ElementsAre("by its formatter"));
 }
 
-// The formatter is asked before the level is looked at.
+// The formatter is called before the level is examined.
 TEST_F(LUMSystemLoggerTest, AsksItsFormatterAboutLevelsThatAreNotWrittenToo) {
   std::vector<LUMLogLevel> asked;
   const Ref<LUMSystemLogger> logger = loggerWith([&](const LUMLogMessage& message) {
@@ -229,7 +229,7 @@ TEST_F(LUMSystemLoggerTest, WritesNothingWhereItsFormatterThrows) {
   EXPECT_THAT(messages(), ElementsAre("the next one"));
 }
 
-// Whoever holds up a cancellation ends the program.
+// A program ends if it stops the cancellation of a thread.
 TEST_F(LUMSystemLoggerTest, LetsAThreadBeCancelledInItsFormatter) {
   bool cancels = true;
   const Ref<LUMSystemLogger> logger = loggerWith([&](const LUMLogMessage&) {
@@ -255,7 +255,7 @@ TEST_F(LUMSystemLoggerTest, LetsAThreadBeCancelledInItsFormatter) {
   EXPECT_THAT(messages(), ElementsAre("the next one"));
 }
 
-// The multiplexer asks the filter; the logger has been asked already when it is called.
+// The multiplexer asks the filter. The logger itself does not ask it again.
 TEST_F(LUMSystemLoggerTest, HasAFilterAndDoesNotAskIt) {
   const Ref<LUMLogFilter> filter = LUMLogDropAllFilter::init();
   const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(filter);
@@ -295,8 +295,8 @@ TEST_F(LUMSystemLoggerTest, TakesForeignTextInItsFieldsAsItIs) {
   EXPECT_THAT(messages(), ElementsAre("x"));
 }
 
-// Invariant: every message is written, once, but for those that a machine too busy to run the journal drops
-// and counts.
+// Invariant: every message is written once, except those that are dropped and counted because the machine is
+// too busy to run the journal.
 TEST_F(LUMSystemLoggerTest, IsUsedByAllThreadsAtOnce) {
   const std::uint64_t droppedBefore = rt::SystemLog::droppedCount();
   const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
@@ -315,19 +315,19 @@ TEST_F(LUMSystemLoggerTest, IsUsedByAllThreadsAtOnce) {
   }
   for (std::thread& thread : threads) thread.join();
   for (PrivateJournal::Entry& entry : entries()) {
-    if (entry["SUBSYSTEM"] == "rt") continue;  // The count.
+    if (entry["SUBSYSTEM"] == "rt") continue;  // The count of dropped entries.
     EXPECT_EQ(sent.erase(entry["MESSAGE"]), 1U) << entry["MESSAGE"];
     EXPECT_EQ("com.example.host." + entry["MESSAGE"].substr(0, 9), entry["SUBSYSTEM"]);
   }
   EXPECT_EQ(sent.size(), rt::SystemLog::droppedCount() - droppedBefore);
 }
 
-// By way of the shared multiplexer, as a program begins.
+// Through the shared multiplexer, as it is when a program starts.
 
 class LUMSystemLoggerAtTheStartTest : public LUMSystemLoggerTest {
  protected:
-  // What is written of a message of each level from 0 to 5, in a program that begins in the mode, and has a
-  // logger without a filter besides, which hears all of them.
+  // Returns what is written for messages of the levels 0 to 5 in a program that starts in `mode`. A second
+  // logger, without a filter, gets all of them.
   std::vector<std::string> writtenInMode(const char* mode) {
     inChild([mode] {
       if (mode != nullptr) {
@@ -405,7 +405,7 @@ void becomeOrdinaryUser() {
   if (geteuid() != 0)
     throw std::runtime_error("an ordinary user already; the other run of this suite was its");
   require(setgroups(0, nullptr) == 0 && setgid(kGroup) == 0 && setuid(kUser) == 0, "another user");
-  // Who changes identity loses the say over its own /proc entries, in which namespaces are set up.
+  // A process that changes its identity may no longer use its own /proc entries, which namespaces need.
   require(prctl(PR_SET_DUMPABLE, 1) == 0, "PR_SET_DUMPABLE");
 }
 

@@ -1,4 +1,4 @@
-// What tests of a host's use to see whether errors are reported: counts and expectations.
+// Tests how a host's tests check whether errors are reported: by counts and expectations.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -28,7 +28,7 @@ TEST_F(PECErrorHandlerTest, ForgetsCallbackAndCountAfterATest) {
   PECErrorHandler::resetAfterTest();
   EXPECT_FALSE(handler_->errorHandlerBlock());
   EXPECT_EQ(handler_->errorCount(), 0);
-  handler_->registerErrorHandlerBlock(tracing());  // As the first.
+  handler_->registerErrorHandlerBlock(tracing());  // Accepted as the first callback.
   EXPECT_EQ(handler_->errorCount(), 0);
 }
 
@@ -80,7 +80,7 @@ TEST_F(PECErrorHandlerTest, CountsOverTheEndOfTheNumbers) {
             std::numeric_limits<std::int32_t>::max());
 }
 
-// On purpose: what a block throws leaves the callback that does nothing behind.
+// Deliberate: if a block throws, the callback that does nothing stays set.
 TEST_F(PECErrorHandlerTest, PutsNothingBackWhereABlockThrows) {
   struct Thrown {};
   handler_->setErrorHandlerBlock(tracing());
@@ -95,7 +95,7 @@ TEST_F(PECErrorHandlerTest, PutsNothingBackWhereABlockThrows) {
   EXPECT_TRUE(handler_->errorHandlerBlock());
 }
 
-// Counting waits for nobody: a callback that is running holds up only those that report.
+// Counting does not wait. A running callback delays only the threads that report.
 TEST_F(PECErrorHandlerTest, CountsWhileACallbackRuns) {
   std::latch isRunning(1);
   std::latch mayReturn(1);
@@ -110,7 +110,7 @@ TEST_F(PECErrorHandlerTest, CountsWhileACallbackRuns) {
   reporter.join();
 }
 
-// The name and the reason of what `body` throws.
+// Returns the name and the reason of the exception that `body` throws.
 template <class Body>
 std::pair<std::string, std::string> thrownBy(Body body) {
   try {
@@ -143,7 +143,7 @@ TEST_F(PECErrorHandlerTest, AssertsThatABlockReportsNoError) {
   EXPECT_FALSE(handler_->errorHandlerBlock());
 }
 
-// A count that has gone down is neither no error nor some.
+// A count that has decreased meets both expectations.
 TEST_F(PECErrorHandlerTest, AssertsNothingWhereABlockCountsDown) {
   EXPECT_NO_THROW(PECErrorHandler::assertBlockReportsError([&] { handler_->setErrorCount(-1); }));
   EXPECT_NO_THROW(PECErrorHandler::assertBlockDoesNotReportError([&] { handler_->setErrorCount(-2); }));

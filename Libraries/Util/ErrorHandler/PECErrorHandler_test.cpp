@@ -1,5 +1,5 @@
-// What the handler is told, whom it tells, and what it counts. What needs a process in which nothing was
-// reported yet is a death test, which is started anew.
+// Tests what the handler receives, passes on and counts. Tests that need a process without any report so far
+// are death tests, which start a new process.
 
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
 
@@ -42,7 +42,7 @@ Ref<LUMLogMessage> errorMessage(const rt::String& file = "a/b/c.m"_s) {
                                       17, nullptr, nullptr, nullptr, nullptr, nullptr);
 }
 
-// Keeps the assertions that fail, and returns.
+// Records failed assertions and returns.
 class Recorder final : public rt::Implements<Recorder, rt::AssertionHandler> {
  public:
   struct Failure {
@@ -79,7 +79,7 @@ TEST(PECErrorDescription, HasWhatIsSet) {
   EXPECT_EQ(error->errorMessage(), "d");
 }
 
-// A handler.
+// A handler by itself.
 
 TEST_F(PECErrorHandlerTest, BeginsWithoutCallbackAndErrors) {
   const Ref<PECErrorHandler> handler = PECErrorHandler::init();
@@ -116,7 +116,7 @@ TEST_F(PECErrorHandlerTest, DescribesTheMessage) {
   EXPECT_NE(told, first);
 }
 
-// Callbacks nest, and may throw; others' threads do not count.
+// Callbacks may nest and throw. The callbacks of other threads do not count.
 TEST_F(PECErrorHandlerTest, KnowsWhetherTheThreadRunsACallback) {
   struct Thrown {};
   std::vector<bool> during;
@@ -175,7 +175,7 @@ TEST_F(PECErrorHandlerTest, PassesOnWhatTheCallbackThrowsAndDoesNotCountIt) {
   EXPECT_THROW(logError(), Thrown);
   EXPECT_THROW(LUMLogAt(LUMLogLevelFault, "wrong"_s), Thrown);
   EXPECT_EQ(handler_->errorCount(), 0);
-  // Nobody is locked out by it.
+  // The exception has released the lock.
   handler_->setErrorHandlerBlock(tracing());
   std::thread([] { logError("in another thread"_s); }).join();
   EXPECT_THAT(trace_.events(), ElementsAre("in another thread"));
@@ -195,11 +195,11 @@ TEST_F(PECErrorHandlerTest, ACallbackMayLogErrorsItself) {
   EXPECT_EQ(handler_->errorCount(), 4);
 }
 
-// Invariant: the callback is never run by two threads at once, and every error is counted.
+// Invariant: the callback never runs on two threads at once, and every error is counted.
 TEST_F(PECErrorHandlerTest, TellsOfOneErrorAfterAnother) {
   constexpr int kThreads = 8;
   constexpr int kErrors = 500;
-  int running = 0;  // Not atomic: what the handler promises is all that keeps it whole.
+  int running = 0;  // Deliberately not atomic: only the handler's promise protects it.
   int highest = 0;
   int told = 0;
   handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>& error) {
@@ -217,12 +217,12 @@ TEST_F(PECErrorHandlerTest, TellsOfOneErrorAfterAnother) {
     });
   }
   for (std::thread& thread : threads) thread.join();
-  EXPECT_EQ(highest, 2);  // Only within itself.
+  EXPECT_EQ(highest, 2);  // The callback was only nested in itself.
   EXPECT_EQ(told, kThreads * kErrors * 11 / 10);
   EXPECT_EQ(handler_->errorCount(), told);
 }
 
-// Whoever installs a callback waits for the one that runs, also where that has taken itself away.
+// Installing a callback waits for a running one, even if that one has removed itself.
 TEST_F(PECErrorHandlerTest, InstallsACallbackWhileNoneRuns) {
   std::latch isTold(1);
   handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>&) {
@@ -250,11 +250,11 @@ TEST_F(PECErrorHandlerTest, FailsAnAssertionWithoutACallback) {
   EXPECT_EQ(failure.function, "-[PECErrorHandler defaultErrorHandlerBlock]_block_invoke");
   EXPECT_EQ(failure.file, "Libraries/Util/ErrorHandler/PECErrorHandler");
   EXPECT_EQ(failure.lineNumber, 64U);
-  // The format, not what was made of it.
+  // The format, not the formatted text.
   EXPECT_EQ(string(failure.description), std::string("\n\n\n   <<< ERROR!    ") + kFace +
                                              "    ERROR! >>>\n\n   in c.m\n   in -[A b]\n"
                                              "   Line 17 says:\n\n   %@ is wrong\n\n\n");
-  // A handler of one's own may return: then the error was handled.
+  // A host's assertion handler may return. The error then counts as handled.
   EXPECT_EQ(handler_->errorCount(), 1);
 }
 
@@ -300,7 +300,7 @@ TEST_F(PECErrorHandlerTest, RaisesWithoutACallbackAndCountsNothing) {
   EXPECT_THAT(testing::internal::GetCapturedStderr(), testing::HasSubstr(kFace));
   EXPECT_TRUE(isRaised);
   EXPECT_EQ(handler_->errorCount(), 0);
-  // Nobody is locked out by it.
+  // The exception has released the lock.
   handler_->setErrorHandlerBlock(tracing());
   std::thread([] { logError(); }).join();
   EXPECT_EQ(handler_->errorCount(), 1);
@@ -318,7 +318,7 @@ TEST_F(PECErrorHandlerTest, HasOneCallbackForWhereThereIsNone) {
   EXPECT_EQ(handler_->errorCount(), 0);
 }
 
-// Installing a callback.
+// Registering a callback.
 
 TEST_F(PECErrorHandlerTest, InstallsACallback) {
   const PECErrorHandlerBlock block = tracing();
@@ -342,7 +342,7 @@ TEST_F(PECErrorHandlerTest, KeepsTheFirstCallbackAndTellsItOfTheSecond) {
   EXPECT_EQ(errors[0]->rawFormatString(), "An ErrorHandlerBlock was already set!.");
   EXPECT_EQ(errors[0]->errorMessage(), "An ErrorHandlerBlock was already set!.");
   EXPECT_EQ(handler_->errorCount(), 1);
-  handler_->registerErrorHandlerBlock(first);  // The same one again is a second one, too.
+  handler_->registerErrorHandlerBlock(first);  // Registering the same callback again is an error too.
   EXPECT_EQ(errors.size(), 2U);
   EXPECT_THAT(trace_.events(), IsEmpty());
 }
@@ -391,7 +391,7 @@ TEST_F(PECErrorHandlerTest, MessagesWithoutMetadataAndArgumentsTellOfABadCallbac
   }
 }
 
-// A hostile callback: it installs another, from within, which is an error to tell it of.
+// A hostile callback registers another one while it runs, and is then told of that error.
 TEST_F(PECErrorHandlerTest, ACallbackMayInstallACallback) {
   bool isFirst = true;
   handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>& error) {
@@ -403,7 +403,7 @@ TEST_F(PECErrorHandlerTest, ACallbackMayInstallACallback) {
   EXPECT_EQ(handler_->errorCount(), 2);
 }
 
-// Installing of all threads at once: one callback is installed, and is told of all others.
+// All threads register at once. One callback is accepted, and receives an error for each of the others.
 TEST_F(PECErrorHandlerTest, InstallsOneOfTheCallbacksThatThreadsInstallAtOnce) {
   constexpr std::int32_t kThreads = 8;
   std::latch mayStart(kThreads);
@@ -441,14 +441,14 @@ TEST_F(PECErrorHandlerTest, CountsOnFromWhatIsSet) {
   EXPECT_EQ(handler_->errorCount(), -3);
   logError();
   EXPECT_EQ(handler_->errorCount(), -2);
-  // It has 32 bits and a sign.
+  // The count is a signed 32-bit number.
   handler_->setErrorCount(std::numeric_limits<std::int32_t>::max());
   logError();
   EXPECT_EQ(handler_->errorCount(), std::numeric_limits<std::int32_t>::min());
 }
 
-// A callback that takes itself away lives until it returns. What it captured used to be destroyed with the
-// handler's lock held.
+// A callback that removes itself lives until it returns. Its captures used to be destroyed with the handler's
+// lock held.
 TEST_F(PECErrorHandlerTest, GivesUpACallbackWithoutALock) {
   bool hasReturned = false;
   int ended = 0;
@@ -510,13 +510,13 @@ TEST_F(PECErrorHandlerTest, SurvivesLoggersThatThrowLogAndLeave) {
   EXPECT_THAT(trace_.events(), ElementsAre("afterwards"));
 }
 
-// A process in which nothing was reported yet.
+// A process without any report so far.
 
 class PECErrorHandlerAtTheStartDeathTest : public testing::Test {
  protected:
   PECErrorHandlerAtTheStartDeathTest() { GTEST_FLAG_SET(death_test_style, "threadsafe"); }
 
-  // Ends the process, with what `isTrue` says as its status.
+  // Ends the process with status 0 if `isTrue`, else 1.
   [[noreturn]] static void conclude(bool isTrue) { std::exit(isTrue ? 0 : 1); }
 };
 
@@ -536,7 +536,7 @@ TEST_F(PECErrorHandlerAtTheStartDeathTest, HearsNothingUntilSomethingIsReported)
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "");
 }
 
-// Who takes the handler away has taken it away for good.
+// A handler that was removed from the multiplexer is not added again.
 TEST_F(PECErrorHandlerAtTheStartDeathTest, IsRegisteredOnce) {
   const auto body = [] {
     silenceSystemLog();
@@ -571,7 +571,7 @@ TEST_F(PECErrorHandlerAtTheStartDeathTest, IsMadeAndRegisteredByAllThreadsAtOnce
         if (!first.compare_exchange_strong(none, own) && none != own) isTheSame = false;
         own->setErrorHandlerBlock([](const Ref<PECErrorDescription>&) {});
         PECErrorHandler::register_();
-        logError();  // Heard, since the handler is registered when `register_` returns.
+        logError();  // Received, because the handler is registered when `register_` returns.
       });
     }
     for (std::thread& thread : threads) thread.join();
@@ -580,7 +580,7 @@ TEST_F(PECErrorHandlerAtTheStartDeathTest, IsMadeAndRegisteredByAllThreadsAtOnce
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "");
 }
 
-// Both mistakes with callbacks are heard although nothing was registered before.
+// Mistakes with callbacks are reported even if no report has registered the handler before.
 TEST_F(PECErrorHandlerAtTheStartDeathTest, RegistersItselfToTellOfASecondCallback) {
   const auto body = [] {
     silenceSystemLog();

@@ -1,4 +1,4 @@
-// What a report makes of its line: the message that is logged, and what the error handler is told.
+// Tests the message that a report logs, and what the error handler receives.
 
 #include "Libraries/Util/ErrorHandler/PECReport.h"
 
@@ -36,7 +36,7 @@ constexpr const char* kFile = "Libraries/Util/ErrorHandler/PECReport_test";
 class PECReportTest : public testing::Test {
  protected:
   static void SetUpTestSuite() {
-    // The system's log would only repeat what is reported here.
+    // The system's log would only repeat the reports.
     LUMLogMultiplexer::sharedInstance()->addSyncLogger(
         LUMSystemLogger::initWithFilter(LUMLogDropAllFilter::init()));
   }
@@ -54,7 +54,7 @@ class PECReportTest : public testing::Test {
 
   const LUMLogMessage& message() const { return *messages_.at(0); }
 
-  // The safe parameter at a place, as what it is.
+  // Returns the safe parameter at an index, cast to its class.
   template <class Parameter>
   const Parameter* parameterAt(std::int32_t place) const {
     return rt::cast<Parameter>(message().safeParameters()->objectForKey(rt::Number::of(place).get()));
@@ -126,14 +126,14 @@ TEST_F(PECReportTest, PrintsNoTextAsNone) {
   EXPECT_EQ(message().safeParameters()->count(), 2U);
 }
 
-// A text with directives in it is printed as it is.
+// Directives in a parameter are printed unchanged.
 TEST_F(PECReportTest, PrintsForeignTextAsItIs) {
   PECReport({kFile, "f"}, "100 %% of %@"_s, "%@%s%n"_s);
   EXPECT_EQ(message().formattedString(), "100 % of %@%s%n");
   EXPECT_EQ(message().format(), "100 %% of %@");
 }
 
-// What these report is the last thing that they do.
+// Reporting is the last thing that these functions do.
 [[gnu::noinline]] void functionThatReports() {
   PECReport({kFile, "f"}, "wrong"_s);
 }

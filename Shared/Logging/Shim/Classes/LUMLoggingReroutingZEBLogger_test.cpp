@@ -36,7 +36,7 @@ class Recorder final : public rt::Implements<Recorder, rt::Object, LUMSyncLogger
   std::vector<rt::Ref<LUMLogMessage>> messages;
 };
 
-/// Notes what it is asked.
+// Records the questions that it is asked.
 class StackFilter final : public rt::Implements<StackFilter, rt::Object, ZEBLogFilter> {
  public:
   bool filterAllowsMessage(const rt::String& message, ZEBLogLevel level) override {
@@ -112,7 +112,7 @@ TEST_F(ReroutingTest, LosesNoUnknownLevel) {
     logAt(level);
     EXPECT_EQ(last().level(), LUMLogLevelFault) << level;
   }
-  // The base class has dropped these before.
+  // The base class drops these before they get here.
   const std::size_t count = recorder_->messages.size();
   logger_->logMessage("text"_s, 0);
   logger_->logMessage("text"_s, 5);
@@ -156,7 +156,7 @@ TEST_F(ReroutingTest, TakesCallStacksFromTheLevelErrorOn) {
   EXPECT_TRUE(rt::cast<LUMLogAddressCallstack>(last().callstack()));
   logger_->logAssert("text");
   EXPECT_TRUE(rt::cast<LUMLogAddressCallstack>(last().callstack()));
-  // The filter is asked with the level as it was given: 0 is not promoted for it, and 7 is no level of its.
+  // The filter gets the level as given: 0 is not promoted for it, and 7 is not one of its levels.
   logAt(0);
   EXPECT_FALSE(last().callstack());
   logAt(7);
@@ -186,7 +186,7 @@ TEST_F(ReroutingTest, AsksItsFilterForCallStacks) {
   EXPECT_FALSE(last().callstack());
 }
 
-/// Takes messages and has no switches.
+// A multiplexer without switches for call stacks.
 class PlainMultiplexer final : public rt::Implements<PlainMultiplexer, rt::Object, LUMLogMultiplexing> {
  public:
   void logWithMessage(const rt::Ref<LUMLogMessage>& message) override { messages.push_back(message); }
@@ -231,7 +231,7 @@ TEST_F(ReroutingTest, HasNoPieces) {
   EXPECT_FALSE(logger_->filter());
 }
 
-/// Notes a failure, and lets the program go on.
+// Records a failure and lets the program go on.
 class Notes final : public rt::Implements<Notes, rt::AssertionHandler> {
  public:
   void handleFailureInFunction(const rt::String& function, const rt::String& file, std::uint64_t lineNumber,
@@ -261,7 +261,7 @@ TEST_F(ReroutingTest, FailsAnAssertionWhereAPieceIsSet) {
   EXPECT_FALSE(logger_->writer());
   EXPECT_FALSE(logger_->formatter());
   EXPECT_FALSE(logger_->filter());
-  // By default it raises.
+  // The default handler throws.
   EXPECT_THROW(logger_->setWriter(ZEBLogger::logger()), rt::InternalInconsistencyException);
 }
 

@@ -77,7 +77,7 @@ class ZEBLogStandardFormatterTest : public testing::Test {
   std::string zone_;
 };
 
-TEST_F(ZEBLogStandardFormatterTest, SaysWhenWhichProcessAndThreadWhatLevelWhereAndWhat) {
+TEST_F(ZEBLogStandardFormatterTest, ShowsTimeProcessThreadLevelFunctionAndMessage) {
   setenv("TZ", "UTC0", 1);
   const std::time_t before = now();
   const std::string text = line();
@@ -101,7 +101,7 @@ TEST_F(ZEBLogStandardFormatterTest, MakesWhatItsFormatWouldMake) {
   }
 }
 
-TEST_F(ZEBLogStandardFormatterTest, NamesTheThreadThatLogs) {
+TEST_F(ZEBLogStandardFormatterTest, ShowsTheThreadThatLogs) {
   std::string text;
   std::string expected;
   std::thread([&] {
@@ -112,20 +112,20 @@ TEST_F(ZEBLogStandardFormatterTest, NamesTheThreadThatLogs) {
   EXPECT_NE(text, rest());
 }
 
-TEST_F(ZEBLogStandardFormatterTest, MakesALineOfALongMessage) {
+TEST_F(ZEBLogStandardFormatterTest, FormatsALongMessage) {
   const rt::String message = rt::String::fromUTF8(std::string(100'000, 'x'));
   const rt::String format = "%@"_s;
   const std::string text = ::line(*formatter_, nullptr, 1, &format, message.object());
   EXPECT_TRUE(text.ends_with("[lvl=1] (unknown) " + std::string(message.view())));
 }
 
-TEST_F(ZEBLogStandardFormatterTest, HasALineForNoMessage) {
+TEST_F(ZEBLogStandardFormatterTest, ShowsAMissingMessageAsNull) {
   const rt::String none;
   EXPECT_TRUE(::line(*formatter_, nullptr, 4, &none).ends_with(" [lvl=4] (unknown) (null)"));
   EXPECT_TRUE(formatter_->stringForFunc("f"_s, "text"_s, nullptr, 4).hasSuffix(" [lvl=4] f() (null)"));
 }
 
-TEST_F(ZEBLogStandardFormatterTest, PassesWhatADescriptionThrows) {
+TEST_F(ZEBLogStandardFormatterTest, ThrowsWhatADescriptionThrows) {
   class Throwing final : public rt::Implements<Throwing, rt::Object> {
    public:
     rt::String description() const override { throw std::runtime_error("no description"); }
@@ -136,7 +136,7 @@ TEST_F(ZEBLogStandardFormatterTest, PassesWhatADescriptionThrows) {
   EXPECT_TRUE(line().ends_with("7 left"));
 }
 
-TEST_F(ZEBLogStandardFormatterTest, TellsTheTimeOfTheZoneOfTheMoment) {
+TEST_F(ZEBLogStandardFormatterTest, UsesTheCurrentTimeZone) {
   // Tries again if the second changes in the middle.
   for (int attempt = 0; attempt < 100; ++attempt) {
     setenv("TZ", "UTC0", 1);
@@ -157,7 +157,7 @@ TEST_F(ZEBLogStandardFormatterTest, TellsTheTimeOfTheZoneOfTheMoment) {
 
 // Uses a zone whose summer time begins in a moment, and logs until it has begun. Tries again if no line came
 // before the change, because the process was held up.
-TEST_F(ZEBLogStandardFormatterTest, GoesOnAcrossTheBeginningOfSummerTime) {
+TEST_F(ZEBLogStandardFormatterTest, FollowsTheBeginningOfSummerTime) {
   for (int attempt = 0, lines = 0; lines == 0; ++attempt) {
     ASSERT_LT(attempt, 20);
     const std::time_t change = now() + 2;
@@ -182,7 +182,7 @@ TEST_F(ZEBLogStandardFormatterTest, GoesOnAcrossTheBeginningOfSummerTime) {
 }
 
 // All threads share a formatter. The time in a line is never a mixture of two.
-TEST_F(ZEBLogStandardFormatterTest, ServesManyThreads) {
+TEST_F(ZEBLogStandardFormatterTest, IsThreadSafe) {
   setenv("TZ", "UTC0", 1);
   std::vector<std::thread> threads;
   threads.reserve(8);

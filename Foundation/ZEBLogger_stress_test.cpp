@@ -86,7 +86,7 @@ TEST_F(ZEBLoggerTest, KeepsLinesOfProcessesWhole) {
 }
 
 // Invariant: whatever pieces are set meanwhile, each line reaches one of the two writers.
-TEST_F(ZEBLoggerTest, LosesNoLineWhilePiecesAreExchanged) {
+TEST_F(ZEBLoggerTest, LosesNoLineWhilePiecesAreReplaced) {
   constexpr int kThreads = 4;
   constexpr int kLines = 2000;
   const auto other = rt::make<Recorder>();
@@ -132,7 +132,7 @@ TEST_F(ZEBLoggerTest, LosesNoLineWhileTheSharedLoggerIsReplaced) {
 
 // Two threads set filters at once. Each filter that is told of its attachment is told of its detachment,
 // once.
-TEST_F(ZEBLoggerTest, TellsFiltersInTurnWhenSettersCompete) {
+TEST_F(ZEBLoggerTest, AttachesAndDetachesEachFilterOnceWhenSettersCompete) {
   std::atomic<int> attached = 0;
   std::atomic<int> wrong = 0;
   rt::Ref<ZEBLogger> logger = recordingLogger();
@@ -158,7 +158,7 @@ TEST_F(ZEBLoggerTest, TellsFiltersInTurnWhenSettersCompete) {
 
 // A system that refuses to write.
 
-TEST_F(ZEBLoggerTest, GoesOnAfterAFullDiskAClosedDescriptorAndARemovedFile) {
+TEST_F(ZEBLoggerTest, RecoversFromAFullDiskAClosedDescriptorAndARemovedFile) {
   if (!fs::exists("/dev/full")) GTEST_SKIP() << "no /dev/full here";
   const auto logger = ZEBLogger::standardLoggerWithPath("/dev/full"_s);
   ASSERT_TRUE(logger);

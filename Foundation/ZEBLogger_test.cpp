@@ -42,7 +42,7 @@ struct Undescribed final : public rt::Implements<Undescribed, rt::Object> {
 
 // Pieces.
 
-TEST_F(ZEBLoggerTest, WritesMessagesAloneToStandardOutputUnlessToldOtherwise) {
+TEST_F(ZEBLoggerTest, WritesPlainMessagesToStandardOutputByDefault) {
   for (const auto& logger :
        {ZEBLogger::logger(), ZEBLogger::init(), ZEBLogger::loggerWithWriter(nullptr, nullptr, nullptr),
         ZEBLogger::initWithWriter(nullptr, nullptr, nullptr)}) {
@@ -55,7 +55,7 @@ TEST_F(ZEBLoggerTest, WritesMessagesAloneToStandardOutputUnlessToldOtherwise) {
   }
 }
 
-TEST_F(ZEBLoggerTest, KeepsThePiecesThatItIsGiven) {
+TEST_F(ZEBLoggerTest, UsesTheGivenPieces) {
   const rt::Ref<ZEBLogFormatter> formatter = rt::make<ShowingFormatter>();
   const rt::Ref<ZEBLogFilter> filter = ZEBLogAllowedLevelFilter::init();
   const auto logger = ZEBLogger::loggerWithWriter(recorder_, formatter, filter);
@@ -64,7 +64,7 @@ TEST_F(ZEBLoggerTest, KeepsThePiecesThatItIsGiven) {
   EXPECT_EQ(logger->filter(), filter);
 }
 
-TEST_F(ZEBLoggerTest, TakesNullForTheUsualPiece) {
+TEST_F(ZEBLoggerTest, NullSetsTheDefaultPiece) {
   const auto logger =
       ZEBLogger::loggerWithWriter(recorder_, rt::make<ShowingFormatter>(), ZEBLogAllowedLevelFilter::init());
   logger->setWriter(nullptr);
@@ -75,7 +75,7 @@ TEST_F(ZEBLoggerTest, TakesNullForTheUsualPiece) {
   EXPECT_TRUE(isA<ZEBLogNoFilter>(logger->filter()));
 }
 
-TEST_F(ZEBLoggerTest, TellsFiltersThatTheyComeAndGo) {
+TEST_F(ZEBLoggerTest, TellsFiltersOfAttachmentAndDetachment) {
   std::vector<std::string> events;
   rt::Ref<ZEBLogger> logger = recordingLogger();
   const auto filterNamed = [&](const std::string& name) {
@@ -106,7 +106,7 @@ TEST_F(ZEBLoggerTest, TellsFiltersThatTheyComeAndGo) {
   EXPECT_THAT(events, ElementsAre("first detaching?"));
 }
 
-TEST_F(ZEBLoggerTest, DropsWhatAFilterThrowsAsItsLoggerGoes) {
+TEST_F(ZEBLoggerTest, DropsWhatAFilterThrowsWhenTheLoggerIsDestroyed) {
   const auto filter = rt::make<FunctionFilter>();
   int calls = 0;
   filter->detaching = [&] {
@@ -117,7 +117,7 @@ TEST_F(ZEBLoggerTest, DropsWhatAFilterThrowsAsItsLoggerGoes) {
   EXPECT_EQ(calls, 1);
 }
 
-TEST_F(ZEBLoggerTest, KeepsTheOldFilterThatThrowsAsItIsToGo) {
+TEST_F(ZEBLoggerTest, KeepsAFilterThatThrowsWhenDetached) {
   const auto logger = recordingLogger();
   const auto filter = rt::make<FunctionFilter>();
   logger->setFilter(filter);
@@ -130,7 +130,7 @@ TEST_F(ZEBLoggerTest, KeepsTheOldFilterThatThrowsAsItIsToGo) {
   EXPECT_TRUE(isA<ZEBLogNoFilter>(logger->filter()));
 }
 
-TEST_F(ZEBLoggerTest, HasTheNewFilterThatThrowsAsItComes) {
+TEST_F(ZEBLoggerTest, SetsAFilterThatThrowsWhenAttached) {
   const auto logger = recordingLogger();
   const auto filter = rt::make<FunctionFilter>();
   filter->attached = [] { throw 7; };
@@ -139,7 +139,7 @@ TEST_F(ZEBLoggerTest, HasTheNewFilterThatThrowsAsItComes) {
   std::thread([&] { logger->setFilter(nullptr); }).join();
 }
 
-TEST_F(ZEBLoggerTest, IsNoneWhereItsMakingThrows) {
+TEST_F(ZEBLoggerTest, IsNullIfMakingItThrows) {
   const auto filter = rt::make<FunctionFilter>();
   int detached = 0;
   filter->attached = [] { throw std::runtime_error("not here"); };
@@ -152,7 +152,7 @@ TEST_F(ZEBLoggerTest, IsNoneWhereItsMakingThrows) {
 }
 
 // This would deadlock if logging waited for a setter.
-TEST_F(ZEBLoggerTest, LogsWhileAFilterIsBeingTold) {
+TEST_F(ZEBLoggerTest, LogsWhileAFilterIsBeingAttachedOrDetached) {
   const auto logger = recordingLogger();
   const auto filter = rt::make<FunctionFilter>();
   filter->attached = filter->detaching = [&] { std::thread([&] { logger->logInfo("meanwhile"_s); }).join(); };
@@ -161,7 +161,7 @@ TEST_F(ZEBLoggerTest, LogsWhileAFilterIsBeingTold) {
   EXPECT_THAT(recorder_->lines(), ElementsAre("2 meanwhile", "2 meanwhile"));
 }
 
-TEST_F(ZEBLoggerTest, LetsAFilterExchangePiecesAsItComes) {
+TEST_F(ZEBLoggerTest, AFilterMaySetOtherPiecesWhenAttached) {
   const auto logger = ZEBLogger::logger();
   const auto filter = rt::make<FunctionFilter>();
   filter->attached = [&] { logger->setWriter(recorder_); };
@@ -172,7 +172,7 @@ TEST_F(ZEBLoggerTest, LetsAFilterExchangePiecesAsItComes) {
 }
 
 // This would deadlock if an old piece were released under the logger's lock.
-TEST_F(ZEBLoggerTest, LetsOldPiecesGoUnderNoLock) {
+TEST_F(ZEBLoggerTest, ReleasesOldPiecesWithoutALock) {
   struct Going {
     explicit Going(std::function<void()> function) : run(std::move(function)) {}
     Going(const Going&) = delete;
@@ -215,7 +215,7 @@ TEST_F(ZEBLoggerTest, LogsAtFourLevels) {
                                               "4 (null)|d%.1f %s|4|d0.5 text"));
 }
 
-TEST_F(ZEBLoggerTest, LogsTheNamesOfFunctions) {
+TEST_F(ZEBLoggerTest, LogsFunctionNames) {
   const auto logger = ZEBLogger::loggerWithWriter(recorder_, rt::make<ShowingFormatter>(), nullptr);
   logger->logFuncDebug("f", "a"_s);
   logger->logFuncInfo("größe", "b%d"_s, 1);
@@ -226,7 +226,7 @@ TEST_F(ZEBLoggerTest, LogsTheNamesOfFunctions) {
                                               "4 (null)|not UTF-8|4|not UTF-8"));
 }
 
-TEST_F(ZEBLoggerTest, TakesFormatsOfTheMomentAndLevelsOfAnySort) {
+TEST_F(ZEBLoggerTest, TakesRuntimeFormatsAndAnyLevel) {
   const auto logger = ZEBLogger::loggerWithWriter(recorder_, rt::make<ShowingFormatter>(), nullptr);
   const auto log = [&](const char* func, const rt::String* format, ZEBLogLevel level, ...) {
     std::va_list arguments;
@@ -253,7 +253,7 @@ TEST_F(ZEBLoggerTest, IsAWriterForFourLevels) {
                           "4 (null)|%@|4|100%@", "3 (null)|%@|3|(null)"));
 }
 
-TEST_F(ZEBLoggerTest, ShowsTheFilterTheFinishedLineAndFormatsDroppedOnesToo) {
+TEST_F(ZEBLoggerTest, FormatsEveryLineBeforeItAsksTheFilter) {
   int formatted = 0;
   std::vector<std::string> seen;
   const auto filter = rt::make<FunctionFilter>();
@@ -270,7 +270,7 @@ TEST_F(ZEBLoggerTest, ShowsTheFilterTheFinishedLineAndFormatsDroppedOnesToo) {
   EXPECT_THAT(recorder_->lines(), ElementsAre("3 line 2"));
 }
 
-TEST_F(ZEBLoggerTest, WritesNothingWhereTheFormatterMakesNone) {
+TEST_F(ZEBLoggerTest, WritesNothingIfTheFormatterReturnsNull) {
   bool isAsked = false;
   const auto filter = rt::make<FunctionFilter>();
   filter->allows = [&](const rt::String&, ZEBLogLevel) { return isAsked = true; };
@@ -284,7 +284,7 @@ TEST_F(ZEBLoggerTest, WritesNothingWhereTheFormatterMakesNone) {
   EXPECT_THAT(recorder_->lines(), ElementsAre("3 "));
 }
 
-TEST_F(ZEBLoggerTest, DropsALineInWhichSomethingThrowsAndWritesTheNext) {
+TEST_F(ZEBLoggerTest, DropsALineIfSomethingThrowsAndWritesTheNext) {
   const auto logger = recordingLogger();
   const auto undescribed = rt::make<Undescribed>();
   logger->logError("%@"_s, undescribed);
@@ -357,7 +357,7 @@ class Rerouting final : public rt::Implements<Rerouting, ZEBLogger> {
   std::vector<std::string> lines;
 };
 
-TEST_F(ZEBLoggerTest, LetsASubclassTakeEverything) {
+TEST_F(ZEBLoggerTest, ASubclassMayTakeEverything) {
   const auto rerouting = rt::make<Rerouting>();
   const rt::Ref<ZEBLogger> logger = rerouting;
   logger->setWriter(nullptr);
@@ -394,7 +394,7 @@ template <class Log>
 }
 
 // Code that captures call stacks leaves these two frames out.
-TEST_F(ZEBLoggerTest, HasTwoFramesOfItsOwnBelowTheCodeThatLogs) {
+TEST_F(ZEBLoggerTest, AddsTwoFramesBelowTheCodeThatLogs) {
   const auto recorder = rt::make<CallRecorder>();
   ZEBLogger& logger = *recorder;
   EXPECT_EQ(returnAddressOf([&]() __attribute__((always_inline)) { logger.logInfo("line"_s); }),

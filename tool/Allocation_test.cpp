@@ -40,7 +40,7 @@ bool isAligned(const void* block, std::size_t alignment) {
   return reinterpret_cast<std::uintptr_t>(block) % alignment == 0;
 }
 
-TEST(AllocationTest, GivesBlocksThatAreAlignedAndApart) {
+TEST(AllocationTest, ReturnsAlignedBlocksThatDoNotOverlap) {
   std::array<void*, 40> blocks{};
   for (std::size_t size = 0; size < blocks.size(); ++size) {
     blocks[size] = command_malloc(size);
@@ -53,7 +53,7 @@ TEST(AllocationTest, GivesBlocksThatAreAlignedAndApart) {
   }
 }
 
-TEST(AllocationTest, KeepsABlockThatWasGivenBack) {
+TEST(AllocationTest, DoesNotReuseAFreedBlock) {
   void* const block = command_malloc(100);
   fill(block, 100, 7);
   command_free(block);
@@ -62,7 +62,7 @@ TEST(AllocationTest, KeepsABlockThatWasGivenBack) {
   EXPECT_THAT(bytes(block, 100), Each(7));
 }
 
-TEST(AllocationTest, GivesZeroesForEachOfManyObjects) {
+TEST(AllocationTest, CallocClearsEveryObject) {
   void* const before = command_malloc(1000);
   fill(before, 1000, 0xff);
   command_free(before);
@@ -78,13 +78,13 @@ TEST(AllocationTest, GivesZeroesForEachOfManyObjects) {
 }
 
 // As a number of this size, their product is 2.
-TEST(AllocationTest, RefusesMoreObjectsThanCanBeCounted) {
+TEST(AllocationTest, CallocDetectsOverflow) {
   errno = 0;
   EXPECT_EQ(command_calloc(SIZE_MAX / 2 + 2, 2), nullptr);
   EXPECT_EQ(errno, ENOMEM);
 }
 
-TEST(AllocationTest, CopiesWhatFitsWhenABlockIsResized) {
+TEST(AllocationTest, ReallocCopiesWhatFits) {
   void* const block = command_malloc(48);
   fill(block, 48, 7);
   fill(command_malloc(48), 48, 8);  // a copy that goes too far would find this
@@ -102,7 +102,7 @@ TEST(AllocationTest, CopiesWhatFitsWhenABlockIsResized) {
   EXPECT_THAT(bytes(larger, 48), Each(7));
 }
 
-TEST(AllocationTest, KnowsTheSizeOfEachBlockThatIsResized) {
+TEST(AllocationTest, ReallocKnowsTheSizeOfEachBlock) {
   void* const zeroes = command_calloc(4, 12);
   void* const aligned = command_aligned_alloc(256, 48);
   for (void* const block : {zeroes, aligned, command_realloc(zeroes, 48)}) {
@@ -114,13 +114,13 @@ TEST(AllocationTest, KnowsTheSizeOfEachBlockThatIsResized) {
   }
 }
 
-TEST(AllocationTest, GivesANewBlockWhereThereIsNoneToResize) {
+TEST(AllocationTest, ReallocOfNullReturnsANewBlock) {
   void* const block = command_realloc(nullptr, 100);
   ASSERT_NE(block, nullptr);
   EXPECT_THAT(bytes(block, 100), Each(0));
 }
 
-TEST(AllocationTest, AlignsAsIsAskedAndNeverLessThanEver) {
+TEST(AllocationTest, AlignsAsRequestedAndAtLeastAsUsual) {
   for (std::size_t alignment = 1; alignment <= 4096; alignment *= 2) {
     void* const before = command_malloc(1);
     fill(before, 1, 5);
@@ -133,7 +133,7 @@ TEST(AllocationTest, AlignsAsIsAskedAndNeverLessThanEver) {
   }
 }
 
-TEST(AllocationTest, RefusesSizesAndAlignmentsThatNothingHolds) {
+TEST(AllocationTest, RefusesSizesAndAlignmentsThatDoNotFit) {
   for (const std::size_t size : {SIZE_MAX, SIZE_MAX - kHeader, SIZE_MAX / 2, kPiece + 1, kPiece}) {
     errno = 0;
     EXPECT_EQ(command_malloc(size), nullptr) << size;
@@ -151,7 +151,7 @@ TEST(AllocationTest, RefusesSizesAndAlignmentsThatNothingHolds) {
   EXPECT_NE(command_malloc(1), nullptr);
 }
 
-TEST(AllocationTest, LeavesABlockAloneThatCannotBeResized) {
+TEST(AllocationTest, ReallocKeepsABlockThatItCannotResize) {
   void* const block = command_malloc(10);
   fill(block, 10, 7);
   EXPECT_EQ(command_realloc(block, SIZE_MAX), nullptr);
@@ -171,7 +171,7 @@ TEST(AllocationTest, LeavesABlockAloneThatCannotBeResized) {
   std::_Exit(isWhole && isExhausted ? 0 : 1);
 }
 
-TEST(AllocationDeathTest, GivesAllOfItsPieceAndNoMore) {
+TEST(AllocationDeathTest, HandsOutAllOfItsMemoryAndNoMore) {
   // The test program is started anew, so that no memory has been taken yet.
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   EXPECT_EXIT(takeAll(), testing::ExitedWithCode(0), "");

@@ -53,15 +53,15 @@ class LUMDefaultMinimumLogLevelFilterDeathTest : public testing::Test {
   }
 };
 
-TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsDebugPassWhereTheModeIsDebug) {
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsDebugPassIfTheModeIsDebug) {
   EXPECT_EXIT(tellThreshold("debug"), testing::ExitedWithCode(0), "threshold 1\\.");
 }
 
-TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsInfoPassWhereTheModeIsInfo) {
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsInfoPassIfTheModeIsInfo) {
   EXPECT_EXIT(tellThreshold("info"), testing::ExitedWithCode(0), "threshold 2\\.");
 }
 
-TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsErrorPassWhereTheModeIsNotSet) {
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsErrorPassIfTheModeIsNotSet) {
   EXPECT_EXIT(tellThreshold(nullptr), testing::ExitedWithCode(0), "threshold 3\\.");
 }
 
@@ -73,7 +73,7 @@ TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsErrorPassInEveryOtherMode) 
   EXPECT_EXIT(tellThreshold("1"), testing::ExitedWithCode(0), "threshold 3\\.");
 }
 
-TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, AsksOnceForAllFiltersOfTheProcess) {
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, ReadsTheEnvironmentOncePerProcess) {
   const auto body = [] {
     setMode("info");
     const std::string first = threshold();
@@ -84,7 +84,7 @@ TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, AsksOnceForAllFiltersOfTheProce
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "threshold 2, then 2\\.");
 }
 
-TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, AsksWhenAMessageComesAndNotWhenAFilterIsMade) {
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, ReadsTheEnvironmentAtTheFirstMessage) {
   const auto body = [] {
     setMode("info");
     const Ref<LUMDefaultMinimumLogLevelFilter> filter = LUMDefaultMinimumLogLevelFilter::init();
@@ -93,7 +93,7 @@ TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, AsksWhenAMessageComesAndNotWhen
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "threshold 1\\.");
 }
 
-TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, TellsAllThreadsTheSameWhenTheyAskAtOnce) {
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, GivesTheSameAnswerOnAllThreads) {
   const auto body = [] {
     setMode("debug");
     constexpr int kThreads = 8;

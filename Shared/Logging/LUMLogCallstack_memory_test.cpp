@@ -131,13 +131,13 @@ class LUMLogCallstackMemoryTest : public testing::Test {
 
 // One failure is that of the object. The others are those of the buffers, which hold 128 addresses and
 // double.
-TEST_F(LUMLogCallstackMemoryTest, IsMissedAsAStackOfAddressesIs) {
+TEST_F(LUMLogCallstackMemoryTest, AddressCallstackIsNullWithoutMemory) {
   EXPECT_EQ(failuresAtDepth(0), FAILS_MALLOC ? 2 : 1);
   EXPECT_EQ(failuresAtDepth(150), FAILS_MALLOC ? 3 : 1);
   EXPECT_EQ(failuresAtDepth(300), FAILS_MALLOC ? 4 : 1);
 }
 
-TEST_F(LUMLogCallstackMemoryTest, IsMissedAsAStackOfNamesIs) {
+TEST_F(LUMLogCallstackMemoryTest, SymbolCallstackIsNullWithoutMemory) {
   EXPECT_GE(failuresOf([] { return LUMLogSymbolCallstack::symbolCallstackIgnoringFrameCount(0); }), 3);
 }
 

@@ -45,7 +45,7 @@ rt::Ref<LUMLogMessage> messageOf(const rt::String& threadName, const rt::String&
   return fields.message();
 }
 
-TEST(LUMLogMessage, HasItsFields) {
+TEST(LUMLogMessage, HoldsItsFields) {
   const Fields fields;
   const rt::Ref<LUMLogMessage> message = fields.message();
   EXPECT_EQ(message->level(), 3U);
@@ -61,7 +61,7 @@ TEST(LUMLogMessage, HasItsFields) {
   EXPECT_EQ(message->logMetadata(), fields.logMetadata);
 }
 
-TEST(LUMLogMessage, MayHaveNothing) {
+TEST(LUMLogMessage, FieldsMayBeNull) {
   const rt::Ref<LUMLogMessage> message = LUMLogMessage::initWithLevel(
       0, nullptr, nullptr, nullptr, nullptr, 0, ""_s, ""_s, nullptr, nullptr, nullptr);
   EXPECT_EQ(message->level(), 0U);
@@ -75,7 +75,7 @@ TEST(LUMLogMessage, MayHaveNothing) {
   EXPECT_EQ(message->hash(), ""_s.hash() + ""_s.hash());
 }
 
-TEST(LUMLogMessage, TellsTheThreadThatMadeIt) {
+TEST(LUMLogMessage, RecordsTheThreadThatMadeIt) {
   std::thread([] {
     EXPECT_EQ(messageOf(nullptr, nullptr)->threadName(), "");
     EXPECT_EQ(messageOf(nullptr, nullptr)->dispatchQueueLabel(), "");
@@ -89,7 +89,7 @@ TEST(LUMLogMessage, TellsTheThreadThatMadeIt) {
   }).join();
 }
 
-TEST(LUMLogMessage, TellsTheQueueThatMadeIt) {
+TEST(LUMLogMessage, RecordsTheQueueThatMadeIt) {
   const rt::Ref<rt::Queue> queue = rt::make<rt::Queue>("Letters"_s);
   queue->sync([] {
     EXPECT_EQ(messageOf(nullptr, nullptr)->dispatchQueueLabel(), "Letters");
@@ -122,7 +122,7 @@ class SubMessage final : public rt::Implements<SubMessage, LUMLogMessage> {
                    fields.safeParameters, fields.logMetadata) {}
 };
 
-TEST(LUMLogMessage, IsEqualByAllFields) {
+TEST(LUMLogMessage, ComparesAllFields) {
   const rt::Ref<LUMLogMessage> message = Fields().message();
   EXPECT_TRUE(message->isEqual(message.get()));
   EXPECT_TRUE(rt::isEqual(message, Fields().message()));
@@ -169,7 +169,7 @@ TEST(LUMLogMessage, HashesTheSumOfItsFields) {
                 fields.safeParameters->hash() + fields.logMetadata->hash());
 }
 
-TEST(LUMLogMessage, IsItsOwnCopy) {
+TEST(LUMLogMessage, CopyReturnsTheSameObject) {
   const rt::Ref<LUMLogMessage> message = Fields().message();
   EXPECT_EQ(message->copy(), message);
 }

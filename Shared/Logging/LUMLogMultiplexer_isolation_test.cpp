@@ -24,7 +24,7 @@ using testing::UnorderedElementsAre;
 
 // Snapshots.
 
-TEST_F(LUMLogMultiplexerTest, AMessageGoesToThoseThatWereThereWhenItCame) {
+TEST_F(LUMLogMultiplexerTest, DeliversToThosePresentWhenTheMessageWasLogged) {
   const auto first = filter("first", true);
   const auto added = sync("added");
   const auto addedAsync = async("added async");
@@ -39,7 +39,7 @@ TEST_F(LUMLogMultiplexerTest, AMessageGoesToThoseThatWereThereWhenItCame) {
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("added filter", "added", "added async"));
 }
 
-TEST_F(LUMLogMultiplexerTest, ThoseThatAreRemovedMeanwhileStillGetTheMessage) {
+TEST_F(LUMLogMultiplexerTest, DeliversToLoggersRemovedMeanwhile) {
   const auto asyncLogger = async("async");
   const auto blockingLogger = blocking("blocking");
   std::vector<Ref<LUMSyncLogger>> syncLoggers;
@@ -65,7 +65,7 @@ TEST_F(LUMLogMultiplexerTest, ThoseThatAreRemovedMeanwhileStillGetTheMessage) {
   EXPECT_THAT(logAndDrain(), IsEmpty());
 }
 
-TEST_F(LUMLogMultiplexerTest, FiltersThatRemoveEachOtherAreAllAsked) {
+TEST_F(LUMLogMultiplexerTest, AsksAllFiltersEvenIfTheyRemoveEachOther) {
   std::vector<Ref<LUMLogFilter>> filters;
   filters.reserve(3);
   for (int i = 0; i < 3; ++i) {
@@ -80,7 +80,7 @@ TEST_F(LUMLogMultiplexerTest, FiltersThatRemoveEachOtherAreAllAsked) {
   EXPECT_THAT(logAndDrain(), IsEmpty());
 }
 
-TEST_F(LUMLogMultiplexerTest, KeepsAliveWhomItDeliversToAndNobodyElse) {
+TEST_F(LUMLogMultiplexerTest, RetainsARemovedLoggerUntilItHasTheMessage) {
   rt::Weak<TestAsyncLogger> weak;
   std::latch mayFanOut(1);
   {
@@ -99,7 +99,7 @@ TEST_F(LUMLogMultiplexerTest, KeepsAliveWhomItDeliversToAndNobodyElse) {
   EXPECT_EQ(weak.lock(), nullptr);
 }
 
-TEST_F(LUMLogMultiplexerTest, ALoggerMayLogFromWithin) {
+TEST_F(LUMLogMultiplexerTest, ASyncLoggerMayLog) {
   multiplexer_->addSyncLogger(rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) {
     trace_.add(text(*message));
     if (text(*message) == "x") log("from within"_s);
@@ -109,7 +109,7 @@ TEST_F(LUMLogMultiplexerTest, ALoggerMayLogFromWithin) {
   EXPECT_THAT(trace_.events(), ElementsAre("x", "from within", "end of from within", "end of x"));
 }
 
-TEST_F(LUMLogMultiplexerTest, AnAsyncLoggerMayLogFromWithin) {
+TEST_F(LUMLogMultiplexerTest, AnAsyncLoggerMayLog) {
   multiplexer_->addAsyncLogger(rt::make<TestAsyncLogger>(queue_, [&](const Ref<LUMLogMessage>& message) {
     trace_.add(text(*message));
     if (text(*message) == "x") log("from within"_s);
@@ -161,7 +161,7 @@ TEST_F(LUMLogMultiplexerTest, HoldsNoLockWhileFiltersAndLoggersRun) {
 
 // Exceptions.
 
-TEST_F(LUMLogMultiplexerTest, PassesOnWhatAFilterThrowsAndDeliversToNobody) {
+TEST_F(LUMLogMultiplexerTest, ThrowsWhatAFilterThrowsAndDeliversNothing) {
   const auto throwing = rt::make<TestFilter>([](const LUMLogMessage&) -> bool { throw Thrown(); });
   multiplexer_->addLogFilter(throwing);
   multiplexer_->addSyncLogger(sync("sync"));
@@ -173,7 +173,7 @@ TEST_F(LUMLogMultiplexerTest, PassesOnWhatAFilterThrowsAndDeliversToNobody) {
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("sync", "async"));
 }
 
-TEST_F(LUMLogMultiplexerTest, PassesOnWhatAnAsyncLoggerThrowsWhenItIsAskedAndDeliversToNobody) {
+TEST_F(LUMLogMultiplexerTest, ThrowsWhatAnAsyncLoggerThrowsWhenAskedAndDeliversNothing) {
   multiplexer_->addSyncLogger(sync("sync"));
   multiplexer_->addAsyncLogger(async("async"));
   const auto throwing = async("throwing");
@@ -189,7 +189,7 @@ TEST_F(LUMLogMultiplexerTest, PassesOnWhatAnAsyncLoggerThrowsWhenItIsAskedAndDel
 }
 
 // Messages queued before the exception are delivered. Later steps are not done.
-TEST_F(LUMLogMultiplexerTest, PassesOnWhatASyncLoggerThrows) {
+TEST_F(LUMLogMultiplexerTest, ThrowsWhatASyncLoggerThrows) {
   multiplexer_->addAsyncLogger(async("async"));
   multiplexer_->addAsyncLogger(blocking("blocking"));
   const auto throwing = rt::make<TestSyncLogger>([](const Ref<LUMLogMessage>&) { throw Thrown(); });
@@ -202,7 +202,7 @@ TEST_F(LUMLogMultiplexerTest, PassesOnWhatASyncLoggerThrows) {
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("async", "sync", "blocking"));
 }
 
-TEST_F(LUMLogMultiplexerTest, PassesOnWhatABlockingLoggerThrows) {
+TEST_F(LUMLogMultiplexerTest, ThrowsWhatABlockingLoggerThrows) {
   multiplexer_->addSyncLogger(sync("sync"));
   multiplexer_->addAsyncLogger(async("async"));
   const auto throwing = rt::make<TestAsyncLogger>(queue_, [](const Ref<LUMLogMessage>&) { throw Thrown(); });
@@ -217,7 +217,7 @@ TEST_F(LUMLogMultiplexerTest, PassesOnWhatABlockingLoggerThrows) {
 
 // An exception in a later call has no caller to reach.
 
-TEST_F(LUMLogMultiplexerDeathTest, EndsTheProgramByWhatAnAsyncLoggerThrowsLater) {
+TEST_F(LUMLogMultiplexerDeathTest, EndsTheProgramIfAnAsyncLoggerThrowsLater) {
   const auto logTo = [&](const Ref<TestAsyncLogger>& logger) {
     multiplexer_->addAsyncLogger(logger);
     log();
@@ -249,7 +249,7 @@ class LUMLogMultiplexerUncaughtTest : public LUMLogMultiplexerTest {
   ~LUMLogMultiplexerUncaughtTest() override { rt::Queue::setUncaughtExceptionHandler(nullptr); }
 };
 
-TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereAnAsyncLoggerThrowsLater) {
+TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnAfterAnAsyncLoggerThrowsLater) {
   bool throws = true;  // Used by tasks of the queue only.
   multiplexer_->addAsyncLogger(rt::make<TestAsyncLogger>(queue_, [&](const Ref<LUMLogMessage>& message) {
     if (std::exchange(throws, false)) throw Thrown();
@@ -263,7 +263,7 @@ TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereAnAsyncLoggerThrowsLater) {
   EXPECT_THAT(uncaught.events(), ElementsAre("logger"));
 }
 
-TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereTheFilterOfAnAsyncLoggerThrowsLater) {
+TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnAfterTheFilterOfAnAsyncLoggerThrowsLater) {
   bool throws = true;  // Used by tasks of the queue only.
   multiplexer_->addAsyncLogger(async("async", rt::make<TestFilter>([&](const LUMLogMessage&) {
                                        if (queue_->isCurrent() && std::exchange(throws, false)) {
@@ -280,7 +280,7 @@ TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereTheFilterOfAnAsyncLoggerThrowsL
 }
 
 // The loggers that come after it miss the message. Their order is unspecified.
-TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereAnAsyncLoggerThrowsWhenItIsAskedForItsQueue) {
+TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnAfterAnAsyncLoggerThrowsInOperationQueue) {
   Trace asked;
   bool throws = true;  // Used by tasks of the multiplexer's queue only.
   const auto add = [&](const std::string& name, bool isThrowing) {
@@ -308,7 +308,7 @@ TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereAnAsyncLoggerThrowsWhenItIsAske
 }
 
 // A logger that waits delays only the thread that called it.
-TEST_F(LUMLogMultiplexerTest, ALoggerThatBlocksHoldsNobodyElseUp) {
+TEST_F(LUMLogMultiplexerTest, ALoggerThatWaitsDelaysOnlyItsOwnCaller) {
   std::latch isBlocked(1);
   std::latch mayGoOn(1);
   multiplexer_->addSyncLogger(rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) {
@@ -334,7 +334,7 @@ TEST_F(LUMLogMultiplexerTest, ALoggerThatBlocksHoldsNobodyElseUp) {
   EXPECT_THAT(trace_.events(), ElementsAre("unblocked"));
 }
 
-TEST_F(LUMLogMultiplexerTest, ALoggerThatRemovesItselfHearsNoMore) {
+TEST_F(LUMLogMultiplexerTest, ALoggerThatRemovesItselfGetsNoMoreMessages) {
   Ref<LUMSyncLogger> leaving;
   leaving = rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>&) {
     multiplexer_->removeSyncLogger(leaving);

@@ -113,7 +113,7 @@ class NamedAsyncLogger final : public rt::Implements<NamedAsyncLogger, rt::Objec
 
 // The parts of a multiplexer.
 
-TEST_F(LUMLogMultiplexerTest, HasASerialQueueOfItsOwn) {
+TEST_F(LUMLogMultiplexerTest, HasItsOwnSerialQueue) {
   EXPECT_EQ(multiplexer_->loggingQueue()->label(), "LUMLogMultiplexer");
   EXPECT_EQ(multiplexer_->loggingQueue()->qualityOfService(), rt::QualityOfService::kUtility);
   EXPECT_EQ(multiplexer_->loggingQueue()->relativePriority(), 0);
@@ -121,7 +121,7 @@ TEST_F(LUMLogMultiplexerTest, HasASerialQueueOfItsOwn) {
   EXPECT_NE(multiplexer_->loggingQueue(), LUMLogMultiplexer::init()->loggingQueue());
 }
 
-TEST_F(LUMLogMultiplexerTest, CapturesAddressesUnlessToldOtherwise) {
+TEST_F(LUMLogMultiplexerTest, CapturesAddressesByDefault) {
   for (const Ref<LUMLogMultiplexer>& multiplexer : {multiplexer_, LUMLogMultiplexer::init()}) {
     auto& control = *rt::cast<LUMLogAppControl>(multiplexer.get());
     EXPECT_TRUE(control.captureCallStack());
@@ -145,18 +145,18 @@ TEST_F(LUMLogMultiplexerTest, CapturesAddressesUnlessToldOtherwise) {
   }
 }
 
-TEST_F(LUMLogMultiplexerTest, IsMultiplexingAndAppControl) {
+TEST_F(LUMLogMultiplexerTest, ConformsToMultiplexingAndAppControl) {
   rt::Object* const object = LUMLogMultiplexer::sharedInstance().get();
   EXPECT_NE(rt::cast<LUMLogMultiplexing>(object), nullptr);
   EXPECT_NE(rt::cast<LUMLogAppControl>(object), nullptr);
 }
 
-TEST_F(LUMLogMultiplexerTest, BeginsWithTheSystemLoggerThatItIsGiven) {
+TEST_F(LUMLogMultiplexerTest, StartsWithTheGivenSystemLogger) {
   LUMLogMultiplexer::initWithSystemLogger(system("system"))->logWithMessage(messageWith(1));
   EXPECT_THAT(trace_.events(), ElementsAre("system"));
 }
 
-TEST_F(LUMLogMultiplexerDeathTest, SharesOneInstanceThatAllThreadsMakeAtOnce) {
+TEST_F(LUMLogMultiplexerDeathTest, GivesAllThreadsTheSameSharedInstance) {
   const auto body = [] {
     constexpr int kThreads = 8;
     std::latch mayStart(kThreads);
@@ -179,7 +179,7 @@ TEST_F(LUMLogMultiplexerDeathTest, SharesOneInstanceThatAllThreadsMakeAtOnce) {
 }
 
 // Never destroyed, because code may log at exit.
-TEST_F(LUMLogMultiplexerDeathTest, DeliversUntilTheProcessIsGone) {
+TEST_F(LUMLogMultiplexerDeathTest, DeliversUntilTheProcessEnds) {
   const auto body = [] {
     std::atexit([] {
       LUMLogMultiplexer::sharedInstance()->logWithMessage(messageWith(LUMLogLevelInfo, "at exit"_s));
@@ -193,7 +193,7 @@ TEST_F(LUMLogMultiplexerDeathTest, DeliversUntilTheProcessIsGone) {
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "heard at exit\\.");
 }
 
-TEST_F(LUMLogMultiplexerDeathTest, DeliversWhatIsQueuedWhenTheProcessExits) {
+TEST_F(LUMLogMultiplexerDeathTest, DeliversQueuedMessagesAtExit) {
   const auto body = [] {
     const auto queue = rt::make<Queue>("logger"_s);
     const auto multiplexer = LUMLogMultiplexer::initWithSystemLogger(nullptr);
@@ -234,7 +234,7 @@ TEST_F(LUMLogMultiplexerTest, IgnoresNull) {
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("filter", "sync", "async"));
 }
 
-TEST_F(LUMLogMultiplexerTest, RemovesWhatIsNotThere) {
+TEST_F(LUMLogMultiplexerTest, IgnoresRemovingWhatIsNotPresent) {
   multiplexer_->removeLogFilter(filter("filter", false));
   multiplexer_->removeSyncLogger(sync("sync"));
   multiplexer_->removeAsyncLogger(async("async"));
@@ -245,7 +245,7 @@ TEST_F(LUMLogMultiplexerTest, RemovesWhatIsNotThere) {
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("another sync", "another async"));
 }
 
-TEST_F(LUMLogMultiplexerTest, AddsOnceWhatIsThere) {
+TEST_F(LUMLogMultiplexerTest, IgnoresAddingWhatIsPresent) {
   const auto passing = filter("filter", true);
   const auto syncLogger = sync("sync");
   const auto asyncLogger = async("async");
@@ -261,7 +261,7 @@ TEST_F(LUMLogMultiplexerTest, AddsOnceWhatIsThere) {
   EXPECT_THAT(logAndDrain(), IsEmpty());
 }
 
-TEST_F(LUMLogMultiplexerTest, TakesEqualFiltersAndLoggersForOne) {
+TEST_F(LUMLogMultiplexerTest, TreatsEqualFiltersAndLoggersAsOne) {
   const auto filterCalled = [&](const char* name, const char* event) {
     return rt::make<NamedFilter>(rt::String::fromUTF8(name), [this, event](const LUMLogMessage&) {
       trace_.add(event);
@@ -306,7 +306,7 @@ TEST_F(LUMLogMultiplexerTest, MayBeUsedWhileLoggersAreCompared) {
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("a", "b", "c"));
 }
 
-TEST_F(LUMLogMultiplexerTest, HoldsNoLockWhenItGivesUpFiltersAndLoggers) {
+TEST_F(LUMLogMultiplexerTest, HoldsNoLockWhenItReleasesFiltersAndLoggers) {
   int count = 0;
   const auto ending = [&] {
     return AtEnd([&] {
@@ -339,7 +339,7 @@ TEST_F(LUMLogMultiplexerTest, HoldsNoLockWhenItGivesUpFiltersAndLoggers) {
   EXPECT_EQ(count, 4);
 }
 
-TEST_F(LUMLogMultiplexerTest, ChangesNothingWhereComparingThrows) {
+TEST_F(LUMLogMultiplexerTest, ChangesNothingIfComparingThrows) {
   const auto multiplexer = LUMLogMultiplexer::initWithSystemLogger(system("first system"));
   const auto hostile = rt::make<NamedSyncLogger>("hostile"_s, tracing("hostile"));
   multiplexer->addSyncLogger(hostile);

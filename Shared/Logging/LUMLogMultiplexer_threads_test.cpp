@@ -99,7 +99,7 @@ class LUMLogMultiplexerThreadsTest : public testing::Test {
   const Ref<Queue> queue_ = rt::make<Queue>("logger"_s);
 };
 
-TEST_F(LUMLogMultiplexerThreadsTest, LosesNothingWhileFiltersAndLoggersComeAndGo) {
+TEST_F(LUMLogMultiplexerThreadsTest, LosesNoMessageWhileFiltersAndLoggersChange) {
   std::mutex mutex;
   Received bySync;
   Received byAsync;  // Used by tasks of the queue only.
@@ -156,7 +156,7 @@ TEST_F(LUMLogMultiplexerThreadsTest, LosesNothingWhileFiltersAndLoggersComeAndGo
 }
 
 // One logger logs another message for every tenth that it gets.
-TEST_F(LUMLogMultiplexerThreadsTest, LosesNothingOfWhatLoggersLogFromWithin) {
+TEST_F(LUMLogMultiplexerThreadsTest, LosesNoMessageThatLoggersLog) {
   std::atomic<std::uint64_t> bySync = 0;
   std::uint64_t byAsync = 0;  // Used by tasks of the queue only.
   std::uint64_t byAsyncFromWithin = 0;
@@ -235,7 +235,7 @@ TEST_F(LUMLogMultiplexerThreadsTest, GivesABlockingLoggerEachMessageOnce) {
 }
 
 // Changes that threads make at once are all kept.
-TEST_F(LUMLogMultiplexerThreadsTest, KeepsEveryChange) {
+TEST_F(LUMLogMultiplexerThreadsTest, KeepsConcurrentChanges) {
   constexpr std::uint64_t kEach = 50;
   std::atomic<std::uint64_t> asked = 0;
   std::atomic<std::uint64_t> heard = 0;

@@ -92,7 +92,7 @@ TEST_F(LUMLogTest, LogsTheMessageThatItReturns) {
   EXPECT_EQ(message->logMetadata(), metadata);
 }
 
-TEST_F(LUMLogTest, ReturnsTheMessageThatAFilterRefuses) {
+TEST_F(LUMLogTest, ReturnsAMessageThatAFilterRefuses) {
   const rt::Ref<LUMLogFilter> filter = LUMLogDropAllFilter::init();
   multiplexer_->addLogFilter(filter);
   const rt::Ref<LUMLogMessage> message = LUMLogAt(LUMLogLevelError, "%d entries", 3);
@@ -103,7 +103,7 @@ TEST_F(LUMLogTest, ReturnsTheMessageThatAFilterRefuses) {
   EXPECT_TRUE(recorder_->messages.empty());
 }
 
-TEST_F(LUMLogTest, TellsWhereItIsCalled) {
+TEST_F(LUMLogTest, RecordsItsCallSite) {
   const unsigned line = __LINE__ + 1;
   const rt::Ref<LUMLogMessage> message = LUMLogAt(LUMLogLevelInfo, "%@ has %d entries", "a"_s, 3);
   EXPECT_EQ(message->format(), "%@ has %d entries");
@@ -122,7 +122,7 @@ TEST_F(LUMLogTest, TakesMetadataBeforeTheFormat) {
   EXPECT_EQ(message->file(), __FILE__);
 }
 
-TEST_F(LUMLogTest, SaysWhoIsLogging) {
+TEST_F(LUMLogTest, RecordsThreadAndQueue) {
   std::thread([] {
     rt::Thread::setCurrentName("Importer"_s);
     EXPECT_EQ(LUMLogAt(LUMLogLevelInfo, "text")->threadName(), "Importer");
@@ -133,7 +133,7 @@ TEST_F(LUMLogTest, SaysWhoIsLogging) {
   });
 }
 
-TEST_F(LUMLogTest, KeepsSafeParametersByTheirPlaceAmongAllArguments) {
+TEST_F(LUMLogTest, StoresSafeParametersByTheirIndexAmongAllArguments) {
   const rt::Ref<rt::Object> safe = LUMSafeStringParameter::parameterWithString("a"_s, 1);
   const rt::Ref<LUMLogMessage> first = log({1, 0}, "%@ %d"_s, object(safe), 7);
   EXPECT_EQ(first->formattedString(), "a 7");
@@ -175,7 +175,7 @@ TEST_F(LUMLogTest, ReadsEachKindOfArgument) {
   EXPECT_EQ(place(log({7, 0, 0xFFFFFFFF, 1}, "%d %@"_s, 1, object(safe))), 3);
 }
 
-TEST_F(LUMLogTest, LooksAtNoMoreArgumentsThanItIsTold) {
+TEST_F(LUMLogTest, ReadsNoMoreArgumentsThanTheCount) {
   const rt::Ref<rt::Object> safe = LUMSafeStringParameter::parameterWithString("a"_s, 1);
   const LUMLogArgumentKind kinds[] = {1};
   for (const std::int32_t count : {0, -1, -2147483647 - 1}) {
@@ -194,7 +194,7 @@ class Named final : public rt::Implements<Named<name>, rt::Object> {
   rt::String description() const override { return "named"_s; }
 };
 
-TEST_F(LUMLogTest, KnowsSafeParametersByTheBeginningOfTheirClassNames) {
+TEST_F(LUMLogTest, RecognisesSafeParametersByThePrefixOfTheirClassNames) {
   const auto keeps = [&](const rt::Ref<rt::Object>& argument) {
     const rt::Ref<LUMLogMessage> message = log({1}, "%@"_s, argument.get());
     if (!message->safeParameters()) return false;
@@ -220,7 +220,7 @@ TEST_F(LUMLogTest, LogsWithoutAFormat) {
   EXPECT_EQ(recorder_->messages.size(), 1U);
 }
 
-TEST_F(LUMLogTest, ReplacesPlacesThatAreNotText) {
+TEST_F(LUMLogTest, ReplacesFileAndFunctionThatAreNotUTF8) {
   const auto logAt = [](const char* file, const char* function) {
     return LUMLog(LUMLogLevelInfo, file, function, 1, nullptr, 0, nullptr, "text"_s);
   };
@@ -234,7 +234,7 @@ TEST_F(LUMLogTest, ReplacesPlacesThatAreNotText) {
   EXPECT_EQ(logAt("", "")->function(), "");
 }
 
-TEST_F(LUMLogTest, HasACallStackAtTwoLevels) {
+TEST_F(LUMLogTest, CapturesACallStackAtTwoLevels) {
   const auto stackAt = [](LUMLogLevel level) { return LUMLogAt(level, "text")->callstack(); };
   for (const LUMLogLevel level :
        {LUMLogLevel{0}, LUMLogLevelDebug, LUMLogLevelInfo, LUMLogLevel{5}, ~LUMLogLevel{0}}) {
@@ -255,7 +255,7 @@ TEST_F(LUMLogTest, HasACallStackAtTwoLevels) {
   }
 }
 
-TEST_F(LUMLogTest, HasNoCallStackBecauseOfTheThirdSwitch) {
+TEST_F(LUMLogTest, TheThirdSwitchAddsNoCallStack) {
   const auto stackAt = [](LUMLogLevel level) { return LUMLogAt(level, "text")->callstack(); };
   multiplexer_->setCaptureSwiftCallStackOnErrorAndAbove(true);
   for (const LUMLogLevel level : {LUMLogLevel{0}, LUMLogLevelInfo, LUMLogLevel{5}, ~LUMLogLevel{0}}) {
@@ -279,7 +279,7 @@ TEST_F(LUMLogTest, HasNoCallStackBecauseOfTheThirdSwitch) {
   return message;
 }
 
-TEST_F(LUMLogTest, HasTheCallingFunctionFirstInItsCallStack) {
+TEST_F(LUMLogTest, TheCallStackBeginsWithTheCallingFunction) {
   for (const bool captureAddresses : {true, false}) {
     multiplexer_->setCaptureCallStackAddresses(captureAddresses);
     EXPECT_THAT(firstSymbolOf(*functionThatLogs(nullptr)), HasSubstr("functionThatLogs("));
@@ -302,7 +302,7 @@ rt::Ref<LUMLogMessage> messageOfList(const rt::Ref<LUMLogCallstack>& callstack,
   return message;
 }
 
-TEST_F(LUMLogTest, MakesAMessageOfAListWithoutLoggingIt) {
+TEST_F(LUMLogTest, LUMLogVMakesAMessageWithoutLoggingIt) {
   const rt::Ref<LUMLogCallstack> callstack = LUMLogSymbolCallstack::initWithSymbols(nullptr);
   const rt::Ref<LUMLogMetadata> metadata = LUMLogMetadata::init();
   const rt::Ref<rt::Object> safe = LUMSafeStringParameter::parameterWithString("a"_s, 1);
@@ -326,7 +326,7 @@ class Thrower final : public rt::Implements<Thrower, rt::Object> {
   rt::String description() const override { throw std::runtime_error("no description"); }
 };
 
-TEST_F(LUMLogTest, LetsADescriptionThrow) {
+TEST_F(LUMLogTest, ThrowsWhatADescriptionThrows) {
   const rt::Ref<Thrower> thrower = rt::make<Thrower>();
   EXPECT_THROW(LUMLogAt(LUMLogLevelInfo, "%@", thrower), std::runtime_error);
   EXPECT_TRUE(recorder_->messages.empty());

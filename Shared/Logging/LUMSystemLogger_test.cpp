@@ -120,7 +120,7 @@ TEST_F(LUMSystemLoggerTest, WritesEachLevelWithItsPriority) {
   EXPECT_THAT(fields("PRIORITY"), ElementsAre("7", "6", "3", "2"));
 }
 
-TEST_F(LUMSystemLoggerTest, WritesUnderTheBundleAndTheComponent) {
+TEST_F(LUMSystemLoggerTest, UsesBundleAndComponentAsSubsystem) {
   const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
   const auto write = [&](Ref<LUMLogMetadata> metadata) {
     logger->logWithMessage(messageWith(LUMLogLevelError, "x"_s, std::move(metadata)));
@@ -138,7 +138,7 @@ TEST_F(LUMSystemLoggerTest, WritesUnderTheBundleAndTheComponent) {
   EXPECT_EQ(journal_->entries("SUBSYSTEM=com.example.host.Importer").size(), 1U);
 }
 
-TEST_F(LUMSystemLoggerTest, WritesUnderADotAndTheComponentWithoutABundle) {
+TEST_F(LUMSystemLoggerTest, UsesADotAndTheComponentWithoutABundle) {
   rt::Bundle::setMainIdentifier(nullptr);
   ASSERT_EQ(rt::Bundle::mainIdentifier(), "");
   const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
@@ -149,7 +149,7 @@ TEST_F(LUMSystemLoggerTest, WritesUnderADotAndTheComponentWithoutABundle) {
   EXPECT_THAT(fields("SUBSYSTEM"), ElementsAre("", ".Importer", ""));
 }
 
-TEST_F(LUMSystemLoggerTest, KeepsTheBundleThatItWasMadeIn) {
+TEST_F(LUMSystemLoggerTest, KeepsTheBundleIdentifierFromItsCreation) {
   const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
   rt::Bundle::setMainIdentifier("com.example.later"_s);
   logger->logWithMessage(messageWith(LUMLogLevelError, "x"_s));
@@ -168,7 +168,7 @@ TEST_F(LUMSystemLoggerTest, WritesTheCategory) {
   EXPECT_THAT(fields("CATEGORY"), ElementsAre("", "", "network", "", "file"));
 }
 
-TEST_F(LUMSystemLoggerTest, WritesFunctionAndText) {
+TEST_F(LUMSystemLoggerTest, WritesTheFunctionAndTheText) {
   const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
   logger->logWithMessage(messageIn("int main()"_s, "started"_s));
   logger->logWithMessage(messageIn(nullptr, "started"_s));
@@ -187,7 +187,7 @@ TEST_F(LUMSystemLoggerTest, WritesNothingWithoutText) {
   EXPECT_THAT(entries(), IsEmpty());
 }
 
-TEST_F(LUMSystemLoggerTest, WritesWhatItsFormatterMakes) {
+TEST_F(LUMSystemLoggerTest, WritesTheTextOfItsFormatter) {
   const Ref<LUMLogMessage> message = messageIn("f"_s, "x"_s);
   int count = 0;
   const Ref<LUMSystemLogger> logger = loggerWith([&](const LUMLogMessage& asked) {
@@ -201,7 +201,7 @@ TEST_F(LUMSystemLoggerTest, WritesWhatItsFormatterMakes) {
 }
 
 // The formatter is called before the level is examined.
-TEST_F(LUMSystemLoggerTest, AsksItsFormatterAboutLevelsThatAreNotWrittenToo) {
+TEST_F(LUMSystemLoggerTest, AsksItsFormatterEvenForLevelsThatAreNotWritten) {
   std::vector<LUMLogLevel> asked;
   const Ref<LUMSystemLogger> logger = loggerWith([&](const LUMLogMessage& message) {
     asked.push_back(message.level());
@@ -213,7 +213,7 @@ TEST_F(LUMSystemLoggerTest, AsksItsFormatterAboutLevelsThatAreNotWrittenToo) {
   EXPECT_THAT(entries(), IsEmpty());
 }
 
-TEST_F(LUMSystemLoggerTest, WritesNothingWhereItsFormatterThrows) {
+TEST_F(LUMSystemLoggerTest, WritesNothingIfItsFormatterThrows) {
   const Ref<LUMLogMessage> message = messageWith(LUMLogLevelFault, "x"_s);
   EXPECT_NO_THROW(loggerWith([](const LUMLogMessage&) -> rt::String {
                     throw std::runtime_error("no text");
@@ -256,7 +256,7 @@ TEST_F(LUMSystemLoggerTest, LetsAThreadBeCancelledInItsFormatter) {
 }
 
 // The multiplexer asks the filter. The logger itself does not ask it again.
-TEST_F(LUMSystemLoggerTest, HasAFilterAndDoesNotAskIt) {
+TEST_F(LUMSystemLoggerTest, DoesNotAskItsFilterItself) {
   const Ref<LUMLogFilter> filter = LUMLogDropAllFilter::init();
   const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(filter);
   EXPECT_EQ(logger->filter(), filter);
@@ -285,7 +285,7 @@ TEST_F(LUMSystemLoggerTest, WritesEveryByte) {
   for (const std::string& priority : fields("PRIORITY")) EXPECT_EQ(priority, "3");
 }
 
-TEST_F(LUMSystemLoggerTest, TakesForeignTextInItsFieldsAsItIs) {
+TEST_F(LUMSystemLoggerTest, WritesForeignTextInItsFieldsUnchanged) {
   const auto metadata = LUMLogMetadata::metadataWithComponent("a\nPRIORITY=0"_s)
                             ->metadataByAddingCategory("b\nMESSAGE=forged"_s);
   LUMSystemLogger::initWithFilter(nullptr)->logWithMessage(messageWith(LUMLogLevelInfo, "x"_s, metadata));
@@ -297,7 +297,7 @@ TEST_F(LUMSystemLoggerTest, TakesForeignTextInItsFieldsAsItIs) {
 
 // Invariant: every message is written once, except those that are dropped and counted because the machine is
 // too busy to run the journal.
-TEST_F(LUMSystemLoggerTest, IsUsedByAllThreadsAtOnce) {
+TEST_F(LUMSystemLoggerTest, WritesEachMessageOnceFromManyThreads) {
   const std::uint64_t droppedBefore = rt::SystemLog::droppedCount();
   const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
   std::set<std::string> sent;
@@ -376,7 +376,7 @@ TEST_F(LUMSystemLoggerAtTheStartTest, WritesWhatIsLogged) {
   EXPECT_EQ(entry["CATEGORY"], "archive");
 }
 
-TEST_F(LUMSystemLoggerAtTheStartTest, GivesWayToTheFirstThatIsAddedOnly) {
+TEST_F(LUMSystemLoggerAtTheStartTest, IsReplacedByTheFirstAddedOnly) {
   inChild([] {
     const auto& multiplexer = LUMLogMultiplexer::sharedInstance();
     const auto adding = [&](const rt::String& text) {

@@ -22,7 +22,7 @@ using namespace rt::literals;
 using rt::Ref;
 using testing::IsEmpty;
 
-TEST_F(PECErrorHandlerTest, ForgetsCallbackAndCountAfterATest) {
+TEST_F(PECErrorHandlerTest, ResetsCallbackAndCountAfterATest) {
   handler_->setErrorHandlerBlock(tracing());
   logError();
   PECErrorHandler::resetAfterTest();
@@ -48,7 +48,7 @@ TEST_F(PECErrorHandlerTest, CountsTheErrorsOfABlock) {
   EXPECT_THAT(trace_.events(), IsEmpty());
 }
 
-TEST_F(PECErrorHandlerTest, RaisesNothingWhileItCountsAndRaisesAgainAfterwards) {
+TEST_F(PECErrorHandlerTest, FailsNoAssertionWhileItCounts) {
   EXPECT_EQ(PECErrorHandler::errorCountInBlock([&] {
               EXPECT_TRUE(handler_->errorHandlerBlock());
               logError();
@@ -60,7 +60,7 @@ TEST_F(PECErrorHandlerTest, RaisesNothingWhileItCountsAndRaisesAgainAfterwards) 
   testing::internal::GetCapturedStderr();
 }
 
-TEST_F(PECErrorHandlerTest, CountsWithinWhatIsCounted) {
+TEST_F(PECErrorHandlerTest, CountsMayNest) {
   EXPECT_EQ(PECErrorHandler::errorCountInBlock([] {
               logError();
               EXPECT_EQ(PECErrorHandler::errorCountInBlock([] { logError(); }), 1);
@@ -69,7 +69,7 @@ TEST_F(PECErrorHandlerTest, CountsWithinWhatIsCounted) {
             3);
 }
 
-TEST_F(PECErrorHandlerTest, CountsOverTheEndOfTheNumbers) {
+TEST_F(PECErrorHandlerTest, CountsAcrossIntegerOverflow) {
   handler_->setErrorCount(std::numeric_limits<std::int32_t>::max());
   EXPECT_EQ(PECErrorHandler::errorCountInBlock([] {
               logError();
@@ -81,7 +81,7 @@ TEST_F(PECErrorHandlerTest, CountsOverTheEndOfTheNumbers) {
 }
 
 // Deliberate: if a block throws, the callback that does nothing stays set.
-TEST_F(PECErrorHandlerTest, PutsNothingBackWhereABlockThrows) {
+TEST_F(PECErrorHandlerTest, KeepsTheEmptyCallbackIfABlockThrows) {
   struct Thrown {};
   handler_->setErrorHandlerBlock(tracing());
   EXPECT_THROW(PECErrorHandler::errorCountInBlock([] {
@@ -144,7 +144,7 @@ TEST_F(PECErrorHandlerTest, AssertsThatABlockReportsNoError) {
 }
 
 // A count that has decreased meets both expectations.
-TEST_F(PECErrorHandlerTest, AssertsNothingWhereABlockCountsDown) {
+TEST_F(PECErrorHandlerTest, AssertsNothingIfTheCountDecreases) {
   EXPECT_NO_THROW(PECErrorHandler::assertBlockReportsError([&] { handler_->setErrorCount(-1); }));
   EXPECT_NO_THROW(PECErrorHandler::assertBlockDoesNotReportError([&] { handler_->setErrorCount(-2); }));
 }

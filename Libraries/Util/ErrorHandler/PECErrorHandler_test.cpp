@@ -60,7 +60,7 @@ class Recorder final : public rt::Implements<Recorder, rt::AssertionHandler> {
   std::vector<Failure> failures;
 };
 
-TEST(PECErrorDescription, HasWhatIsSet) {
+TEST(PECErrorDescription, HoldsWhatIsSet) {
   const auto error = rt::make<PECErrorDescription>();
   EXPECT_EQ(error->filePath(), nullptr);
   EXPECT_EQ(error->functionName(), nullptr);
@@ -81,14 +81,14 @@ TEST(PECErrorDescription, HasWhatIsSet) {
 
 // A handler by itself.
 
-TEST_F(PECErrorHandlerTest, BeginsWithoutCallbackAndErrors) {
+TEST_F(PECErrorHandlerTest, StartsWithoutCallbackAndErrors) {
   const Ref<PECErrorHandler> handler = PECErrorHandler::init();
   EXPECT_FALSE(handler->errorHandlerBlock());
   EXPECT_EQ(handler->errorCount(), 0);
   EXPECT_NE(handler, PECErrorHandler::sharedInstance());
 }
 
-TEST_F(PECErrorHandlerTest, IsASyncLoggerForFaultsAndWhatIsAbove) {
+TEST_F(PECErrorHandlerTest, IsASyncLoggerForFaultsAndHigherLevels) {
   const Ref<PECErrorHandler> handler = PECErrorHandler::init();
   EXPECT_NE(rt::cast<LUMSyncLogger>(handler.get()), nullptr);
   const Ref<LUMLogFilter> filter = handler->filter();
@@ -117,7 +117,7 @@ TEST_F(PECErrorHandlerTest, DescribesTheMessage) {
 }
 
 // Callbacks may nest and throw. The callbacks of other threads do not count.
-TEST_F(PECErrorHandlerTest, KnowsWhetherTheThreadRunsACallback) {
+TEST_F(PECErrorHandlerTest, TellsWhetherTheThreadRunsACallback) {
   struct Thrown {};
   std::vector<bool> during;
   bool ofAnother = true;
@@ -137,7 +137,7 @@ TEST_F(PECErrorHandlerTest, KnowsWhetherTheThreadRunsACallback) {
   EXPECT_FALSE(PECErrorHandler::isCallingBack());
 }
 
-TEST_F(PECErrorHandlerTest, CountsWhenTheCallbackHasReturned) {
+TEST_F(PECErrorHandlerTest, CountsAfterTheCallbackHasReturned) {
   std::vector<std::int32_t> during;
   handler_->setErrorHandlerBlock(
       [&](const Ref<PECErrorDescription>&) { during.push_back(handler_->errorCount()); });
@@ -149,7 +149,7 @@ TEST_F(PECErrorHandlerTest, CountsWhenTheCallbackHasReturned) {
   EXPECT_THAT(during, ElementsAre(0, 1, 2));
 }
 
-TEST_F(PECErrorHandlerTest, HearsNothingBelowFault) {
+TEST_F(PECErrorHandlerTest, IgnoresLevelsBelowFault) {
   handler_->setErrorHandlerBlock(tracing());
   for (LUMLogLevel level = 0; level < LUMLogLevelFault; ++level) {
     LUMLogMultiplexer::sharedInstance()->logWithMessage(messageWith(level, "harmless"_s));
@@ -161,7 +161,7 @@ TEST_F(PECErrorHandlerTest, HearsNothingBelowFault) {
   EXPECT_EQ(handler_->errorCount(), 1);
 }
 
-TEST_F(PECErrorHandlerTest, IsToldOnTheThreadThatLogs) {
+TEST_F(PECErrorHandlerTest, CallsBackOnTheThreadThatLogs) {
   std::thread::id teller;
   handler_->setErrorHandlerBlock(
       [&](const Ref<PECErrorDescription>&) { teller = std::this_thread::get_id(); });
@@ -169,7 +169,7 @@ TEST_F(PECErrorHandlerTest, IsToldOnTheThreadThatLogs) {
   EXPECT_EQ(teller, std::this_thread::get_id());
 }
 
-TEST_F(PECErrorHandlerTest, PassesOnWhatTheCallbackThrowsAndDoesNotCountIt) {
+TEST_F(PECErrorHandlerTest, ThrowsWhatTheCallbackThrowsAndDoesNotCountIt) {
   struct Thrown {};
   handler_->setErrorHandlerBlock([](const Ref<PECErrorDescription>&) { throw Thrown(); });
   EXPECT_THROW(logError(), Thrown);
@@ -182,7 +182,7 @@ TEST_F(PECErrorHandlerTest, PassesOnWhatTheCallbackThrowsAndDoesNotCountIt) {
   EXPECT_EQ(handler_->errorCount(), 1);
 }
 
-TEST_F(PECErrorHandlerTest, ACallbackMayLogErrorsItself) {
+TEST_F(PECErrorHandlerTest, ACallbackMayLogErrors) {
   int depth = 0;
   handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>& error) {
     trace_.add("begin " + string(error->errorMessage()));
@@ -196,7 +196,7 @@ TEST_F(PECErrorHandlerTest, ACallbackMayLogErrorsItself) {
 }
 
 // Invariant: the callback never runs on two threads at once, and every error is counted.
-TEST_F(PECErrorHandlerTest, TellsOfOneErrorAfterAnother) {
+TEST_F(PECErrorHandlerTest, CallsBackForOneErrorAfterAnother) {
   constexpr int kThreads = 8;
   constexpr int kErrors = 500;
   int running = 0;  // Deliberately not atomic: only the handler's promise protects it.
@@ -223,7 +223,7 @@ TEST_F(PECErrorHandlerTest, TellsOfOneErrorAfterAnother) {
 }
 
 // Installing a callback waits for a running one, even if that one has removed itself.
-TEST_F(PECErrorHandlerTest, InstallsACallbackWhileNoneRuns) {
+TEST_F(PECErrorHandlerTest, WaitsForARunningCallbackBeforeItInstallsAnother) {
   std::latch isTold(1);
   handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>&) {
     handler_->setErrorHandlerBlock(nullptr);
@@ -272,7 +272,7 @@ TEST_F(PECErrorHandlerTest, ShowsTheLastElementOfTheFilePath) {
   }
 }
 
-TEST_F(PECErrorHandlerTest, ShowsWhatIsUnknown) {
+TEST_F(PECErrorHandlerTest, ShowsUnknownFieldsAsNull) {
   const auto recorder = rt::make<Recorder>();
   rt::AssertionHandler::setCurrentHandler(recorder);
   handler_->logWithMessage(LUMLogMessage::initWithLevel(LUMLogLevelFault, nullptr, nullptr, nullptr, nullptr,
@@ -284,7 +284,7 @@ TEST_F(PECErrorHandlerTest, ShowsWhatIsUnknown) {
                                 "   (null)\n\n\n"));
 }
 
-TEST_F(PECErrorHandlerTest, RaisesWithoutACallbackAndCountsNothing) {
+TEST_F(PECErrorHandlerTest, ThrowsWithoutACallbackAndCountsNothing) {
   testing::internal::CaptureStderr();
   bool isRaised = false;
   try {
@@ -306,7 +306,7 @@ TEST_F(PECErrorHandlerTest, RaisesWithoutACallbackAndCountsNothing) {
   EXPECT_EQ(handler_->errorCount(), 1);
 }
 
-TEST_F(PECErrorHandlerTest, HasOneCallbackForWhereThereIsNone) {
+TEST_F(PECErrorHandlerTest, AlwaysReturnsTheSameDefaultCallback) {
   const PECErrorHandlerBlock block = handler_->defaultErrorHandlerBlock();
   ASSERT_TRUE(block);
   EXPECT_EQ(block, handler_->defaultErrorHandlerBlock());
@@ -329,7 +329,7 @@ TEST_F(PECErrorHandlerTest, InstallsACallback) {
   EXPECT_EQ(handler_->errorCount(), 1);
 }
 
-TEST_F(PECErrorHandlerTest, KeepsTheFirstCallbackAndTellsItOfTheSecond) {
+TEST_F(PECErrorHandlerTest, KeepsTheFirstCallbackAndReportsTheSecondToIt) {
   std::vector<Ref<PECErrorDescription>> errors;
   const PECErrorHandlerBlock first = [&](const Ref<PECErrorDescription>& error) { errors.push_back(error); };
   handler_->registerErrorHandlerBlock(first);
@@ -361,7 +361,7 @@ TEST_F(PECErrorHandlerTest, ReportsANullCallback) {
   EXPECT_EQ(errors[0]->errorMessage(), "|errorHandlerBlock| cannot be nil!.");
 }
 
-TEST_F(PECErrorHandlerTest, RaisesForANullCallbackWhereThereIsNone) {
+TEST_F(PECErrorHandlerTest, ThrowsForANullCallbackIfNoneIsSet) {
   testing::internal::CaptureStderr();
   EXPECT_THROW(handler_->registerErrorHandlerBlock(nullptr), rt::InternalInconsistencyException);
   EXPECT_THAT(
@@ -374,7 +374,7 @@ TEST_F(PECErrorHandlerTest, RaisesForANullCallbackWhereThereIsNone) {
   EXPECT_EQ(handler_->errorCount(), 0);
 }
 
-TEST_F(PECErrorHandlerTest, MessagesWithoutMetadataAndArgumentsTellOfABadCallback) {
+TEST_F(PECErrorHandlerTest, ReportsABadCallbackWithoutMetadataAndArguments) {
   std::vector<Ref<LUMLogMessage>> messages;
   const auto logger =
       rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) { messages.push_back(message); });
@@ -404,7 +404,7 @@ TEST_F(PECErrorHandlerTest, ACallbackMayInstallACallback) {
 }
 
 // All threads register at once. One callback is accepted, and receives an error for each of the others.
-TEST_F(PECErrorHandlerTest, InstallsOneOfTheCallbacksThatThreadsInstallAtOnce) {
+TEST_F(PECErrorHandlerTest, InstallsOneOfManyConcurrentCallbacks) {
   constexpr std::int32_t kThreads = 8;
   std::latch mayStart(kThreads);
   std::atomic<std::int32_t> told = 0;
@@ -423,7 +423,7 @@ TEST_F(PECErrorHandlerTest, InstallsOneOfTheCallbacksThatThreadsInstallAtOnce) {
 
 // Setting a callback and a count.
 
-TEST_F(PECErrorHandlerTest, SetsACallbackWhateverThereIs) {
+TEST_F(PECErrorHandlerTest, SetsACallbackWithoutChecks) {
   handler_->registerErrorHandlerBlock(tracing("first "));
   handler_->setErrorHandlerBlock(tracing("second "));
   logError();
@@ -435,7 +435,7 @@ TEST_F(PECErrorHandlerTest, SetsACallbackWhateverThereIs) {
   EXPECT_FALSE(handler_->errorHandlerBlock());
 }
 
-TEST_F(PECErrorHandlerTest, CountsOnFromWhatIsSet) {
+TEST_F(PECErrorHandlerTest, CountsOnFromTheCountThatIsSet) {
   handler_->setErrorHandlerBlock(tracing());
   handler_->setErrorCount(-3);
   EXPECT_EQ(handler_->errorCount(), -3);
@@ -449,7 +449,7 @@ TEST_F(PECErrorHandlerTest, CountsOnFromWhatIsSet) {
 
 // A callback that removes itself lives until it returns. Its captures used to be destroyed with the handler's
 // lock held.
-TEST_F(PECErrorHandlerTest, GivesUpACallbackWithoutALock) {
+TEST_F(PECErrorHandlerTest, ReleasesACallbackWithoutALock) {
   bool hasReturned = false;
   int ended = 0;
   handler_->setErrorHandlerBlock([&, end = AtEnd([&] {
@@ -482,7 +482,7 @@ TEST_F(PECErrorHandlerTest, ReplacesACallbackWithoutALock) {
 
 // Hostile loggers beside the handler.
 
-TEST_F(PECErrorHandlerTest, SurvivesLoggersThatThrowLogAndLeave) {
+TEST_F(PECErrorHandlerTest, SurvivesLoggersThatThrowLogAndRemoveThemselves) {
   struct Thrown {};
   const auto& multiplexer = LUMLogMultiplexer::sharedInstance();
   handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>& error) {
@@ -520,7 +520,7 @@ class PECErrorHandlerAtTheStartDeathTest : public testing::Test {
   [[noreturn]] static void conclude(bool isTrue) { std::exit(isTrue ? 0 : 1); }
 };
 
-TEST_F(PECErrorHandlerAtTheStartDeathTest, HearsNothingUntilSomethingIsReported) {
+TEST_F(PECErrorHandlerAtTheStartDeathTest, IsNotRegisteredBeforeTheFirstReport) {
   const auto body = [] {
     silenceSystemLog();
     int told = 0;
@@ -554,7 +554,7 @@ TEST_F(PECErrorHandlerAtTheStartDeathTest, IsRegisteredOnce) {
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "");
 }
 
-TEST_F(PECErrorHandlerAtTheStartDeathTest, IsMadeAndRegisteredByAllThreadsAtOnce) {
+TEST_F(PECErrorHandlerAtTheStartDeathTest, IsMadeAndRegisteredOnceByManyThreads) {
   const auto body = [] {
     silenceSystemLog();
     constexpr std::int32_t kThreads = 8;
@@ -581,7 +581,7 @@ TEST_F(PECErrorHandlerAtTheStartDeathTest, IsMadeAndRegisteredByAllThreadsAtOnce
 }
 
 // Mistakes with callbacks are reported even if no report has registered the handler before.
-TEST_F(PECErrorHandlerAtTheStartDeathTest, RegistersItselfToTellOfASecondCallback) {
+TEST_F(PECErrorHandlerAtTheStartDeathTest, RegistersItselfToReportASecondCallback) {
   const auto body = [] {
     silenceSystemLog();
     int told = 0;
@@ -593,7 +593,7 @@ TEST_F(PECErrorHandlerAtTheStartDeathTest, RegistersItselfToTellOfASecondCallbac
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "");
 }
 
-TEST_F(PECErrorHandlerAtTheStartDeathTest, EndsTheProgramWhereNobodyCatchesIt) {
+TEST_F(PECErrorHandlerAtTheStartDeathTest, AnUncaughtReportEndsTheProgram) {
   const auto body = []() noexcept {
     silenceSystemLog();
     PECErrorHandler::sharedInstance()->registerErrorHandlerBlock(nullptr);
@@ -603,7 +603,7 @@ TEST_F(PECErrorHandlerAtTheStartDeathTest, EndsTheProgramWhereNobodyCatchesIt) {
               "Libraries/Util/ErrorHandler/PECErrorHandler:64: ");
 }
 
-TEST_F(PECErrorHandlerAtTheStartDeathTest, IsToldUntilTheProcessIsGone) {
+TEST_F(PECErrorHandlerAtTheStartDeathTest, CallsBackUntilTheProcessEnds) {
   const auto body = [] {
     silenceSystemLog();
     std::atexit([] { PECReport({"a", "b"}, "at exit"_s); });

@@ -23,8 +23,8 @@ class RT_VISIBLE ZEBFileHandleLogWriter final
   /// Makes a writer for `fileHandle`. Returns null if `fileHandle` is null.
   static rt::Ref<ZEBFileHandleLogWriter> initWithFileHandle(rt::Ref<rt::FileHandle> fileHandle);
 
-  /// Makes a writer for a new handle, which `rt::FileHandle::openForAppending` opens. Returns null if that
-  /// does.
+  /// Makes a writer for a new handle that `rt::FileHandle::openForAppending` opens. Returns null if that
+  /// fails.
   static rt::Ref<ZEBFileHandleLogWriter> fileHandleForLoggingAtPath(const rt::String& path,
                                                                     std::uint16_t mode);
 

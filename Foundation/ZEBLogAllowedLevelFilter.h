@@ -5,7 +5,7 @@
 ///     logger->setFilter(
 ///         ZEBLogAllowedLevelFilter::initWithAllowedLevels({ZEBLogLevelDebug, ZEBLogLevelError}));
 ///
-/// Threads: immutable, and so safe on any thread.
+/// Threads: thread-safe, because it is immutable.
 ///
 /// Not for: levels other than those of Foundation/ZEBLogLevel.h. They never pass.
 
@@ -19,8 +19,8 @@
 class RT_VISIBLE ZEBLogAllowedLevelFilter
     : public rt::Implements<ZEBLogAllowedLevelFilter, rt::Object, ZEBLogFilter> {
  public:
-  /// Makes a filter that allows `allowedLevels`. Returns null if there are none, or if one is not from 0 to
-  /// 4.
+  /// Makes a filter that allows `allowedLevels`. Returns null if the set is empty or has a level that is not
+  /// from 0 to 4.
   static rt::Ref<ZEBLogAllowedLevelFilter> initWithAllowedLevels(const std::set<ZEBLogLevel>& allowedLevels);
 
   /// Makes a filter that allows the levels 0 to 4.

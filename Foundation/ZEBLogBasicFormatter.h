@@ -19,8 +19,7 @@ class RT_VISIBLE ZEBLogBasicFormatter
   rt::String stringForFunc(const rt::String& func, const rt::String& withFormat, std::va_list valist,
                            ZEBLogLevel level) override;
 
-  /// Returns `func` in the form for lines. Null or blank text gives "(unknown)", and "main" gives "main()".
-  /// Text that begins with "-[" or "+[", or ends with ")", stays as it is. White space around `func` is
-  /// dropped.
+  /// Returns `func` as lines show it, without the white space around it. "main" becomes "main()". Text that
+  /// begins with "-[" or "+[", or ends with ")", stays as it is. Null or blank text becomes "(unknown)".
   virtual rt::String prettyNameForFunc(const rt::String& func);
 };

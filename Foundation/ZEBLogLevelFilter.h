@@ -5,11 +5,11 @@
 ///
 ///     rt::Ref<ZEBLogger> logger = ZEBLogger::loggerWithWriter(writer, formatter, ZEBLogLevelFilter::init());
 ///
-/// The environment variable ZEBVerboseLogging sets the switch if it exists. The switch is on if the value,
+/// If the environment variable ZEBVerboseLogging exists, it sets the switch. The switch is on if the value,
 /// after white space, begins with Y or T in either case, or is an integer other than 0.
 ///
-/// Otherwise the user default of the same name sets the switch (Runtime/Defaults/UserDefaults.h). It is read
-/// when the filter is set into a logger. It is read again whenever it changes, also by another process, until
+/// Otherwise the user default of the same name sets the switch (Runtime/Defaults/UserDefaults.h). The filter
+/// reads it when it is set into a logger, and whenever it changes, also by another process. That ends when
 /// the filter leaves its logger. Before the filter is set into a logger, the switch is off.
 ///
 /// Threads: thread-safe. A filter belongs to one logger at a time. If several share it, the first that
@@ -58,8 +58,8 @@ class RT_VISIBLE ZEBLogLevelFilter final
 
   std::atomic<bool> verboseLoggingEnabled_ = false;
   // The observer must not take this lock: ending an observation waits for the observer. Recursive, because a
-  // mistake in the user defaults is reported with the lock held, to a handler of the host that may take it
-  // again.
+  // mistake in the user defaults is reported with the lock held, to a handler of the host that may take the
+  // lock again.
   rt::RecursiveLock lock_;
   rt::UserDefaults::Observation observation_ RT_GUARDED_BY(lock_);
 };

@@ -1,6 +1,6 @@
 #pragma once
 
-/// A filter that lets the lines of a level, and of all levels below it, pass.
+/// A filter that lets a line pass if its level is at most a given one.
 ///
 ///     logger->setFilter(ZEBLogMaximumLevelFilter::initWithMaximumLevel(ZEBLogLevelInfo));
 

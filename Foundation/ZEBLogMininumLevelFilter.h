@@ -1,10 +1,10 @@
 #pragma once
 
-/// A filter that lets the lines of a level, and of all levels above it, pass.
+/// A filter that lets a line pass if its level is at least a given one.
 ///
 ///     logger->setFilter(ZEBLogMininumLevelFilter::initWithMinimumLevel(ZEBLogLevelError));
 ///
-/// The spelling of its name must stay, because classes are found by their names.
+/// The spelling of the name is permanent, because classes are found by their names.
 
 #include "Foundation/ZEBLogAllowedLevelFilter.h"
 #include "Runtime/Base/Visibility.h"

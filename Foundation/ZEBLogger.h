@@ -18,8 +18,9 @@
 ///
 /// Threads: all of it is thread-safe, also in the child of a fork, whatever other threads were doing.
 ///
-/// Not for: new code, which uses the structured framework (Shared/Logging/LUMLog.h). Not for: a writer that
-/// logs through its own logger.
+/// Not for: new code, which uses the structured framework (Shared/Logging/LUMLog.h).
+///
+/// Not for: a writer that logs through its own logger.
 
 #include <cstdarg>
 #include <type_traits>
@@ -37,7 +38,7 @@
 
 class RT_VISIBLE ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLogWriter> {
  public:
-  /// Returns the process's logger, as `setSharedLogger` has set it. If none is set, or null, the call makes a
+  /// Returns the logger that `setSharedLogger` has set. If none was set, or null, the call makes a
   /// `standardLogger` and sets it. Returns null only if that fails; the next call then tries again.
   static rt::Ref<ZEBLogger> sharedLogger();
 
@@ -78,7 +79,7 @@ class RT_VISIBLE ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLog
   /// Calls the filter's `willDetachFromLogger`.
   ~ZEBLogger() override;
 
-  /// Return the pieces; never null.
+  /// Return the pieces, which are never null.
   virtual rt::Ref<ZEBLogWriter> writer() const;
   virtual rt::Ref<ZEBLogFormatter> formatter() const;
   virtual rt::Ref<ZEBLogFilter> filter() const;
@@ -93,11 +94,12 @@ class RT_VISIBLE ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLog
   virtual void setFormatter(rt::Ref<ZEBLogFormatter> formatter);
 
   /// Calls the old filter's `willDetachFromLogger`, sets the new filter, and calls its `didAttachToLogger`.
-  /// Null stands for a new ZEBLogNoFilter. Throws what a filter throws; the steps after that are not done.
+  /// Null stands for a new ZEBLogNoFilter. If a filter throws, the remaining steps are not done and the
+  /// exception passes through.
   virtual void setFilter(rt::Ref<ZEBLogFilter> filter);
 
-  // The logging functions are inlined in every build. So `logVariadic` has the only frame between the code
-  // that logs and `logInternalFunc`. Subclasses that capture call stacks rely on that.
+  // The logging functions are inlined in every build, so that exactly one frame lies between the code that
+  // logs and `logInternalFunc`: that of `logVariadic`. Subclasses that capture call stacks rely on that.
 
   /// Log a line at the levels 1 to 4.
   template <class... Arguments>
@@ -150,9 +152,9 @@ class RT_VISIBLE ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLog
   /// Logs `message` unchanged at `level`. Drops it if `level` is not from 1 to 4.
   void logMessage(const rt::String& message, ZEBLogLevel level) override;
 
-  /// Logs one line; all of the functions above end here. The formatter makes the line of `format` and
-  /// `valist`. The writer writes it if the filter allows it. Does not advance `valist`. `func` is null or
-  /// ends with NUL. A name that is not UTF-8 counts as null.
+  /// Logs one line. All of the functions above end here. The formatter makes the line of `format` and
+  /// `valist`, the filter decides whether it passes, and the writer writes it. Does not advance `valist`.
+  /// `func` is null or ends with NUL. A name that is not UTF-8 counts as null.
   virtual void logInternalFunc(const char* func, const rt::String& format, std::va_list valist,
                                ZEBLogLevel level);
 

@@ -19,8 +19,8 @@ enum class Making : std::uint8_t {
 ///
 /// Precondition: the calling thread has taken on the identity of its caller (`CallerIdentity.h`).
 ///
-/// The caller may stop the process between any two steps, and wait until another file is at `path`. That file
-/// never becomes the caller's. docs/security.md explains how, and names the exceptions.
+/// The caller may stop the process between any two steps, and wait until something else is at `path`. The
+/// caller never gets that. docs/security.md explains how this is prevented, and where it is not.
 ///
 /// Threads: not thread-safe.
 Making makeCallersDirectory(const std::string& path);

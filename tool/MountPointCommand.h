@@ -25,10 +25,10 @@
 /// A directory that was made but could not be handed over stays.
 ///
 /// The command calls the operating system directly, starts no thread and reads no environment variable. It
-/// changes its process for good. SIGXFSZ is ignored. The calling thread acts towards the file system as its
-/// caller (`CallerIdentity.h`), from before the first message and the first use of a name. So with raised
-/// privileges it writes nothing as root, and hands over only the directory that it has made. docs/security.md
-/// has the rest.
+/// changes its process for good: SIGXFSZ is ignored from then on, and the calling thread takes on its
+/// caller's identity towards the file system (`CallerIdentity.h`). It does so before it writes a message or
+/// uses a name. So with raised privileges it writes nothing as root, and hands over only the directory that
+/// it has made. docs/security.md has the rest.
 ///
 /// Threads: not thread-safe.
 int runMountPointCommand(int argumentCount, const char* const* arguments);

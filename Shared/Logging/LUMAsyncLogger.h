@@ -15,13 +15,13 @@
 /// Order: deferred messages of one thread arrive in the order in which they were logged, provided that the
 /// logger always returns the same queue. A message that the logger wants at once may overtake deferred ones.
 ///
-/// Errors: a deferred call has no caller to throw to. An exception from `logWithMessage`, from the filter or
-/// from `operationQueue` then leaves a task of a queue. It ends the program with a line that names the queue,
-/// unless rt::Queue's `setUncaughtExceptionHandler` has installed a handler. `LUMLog` throws what is thrown
-/// while its caller waits. The filter and `dispatchModeForMessage` are asked about every message in that
-/// time. A logger that wants a message at once also runs in that time.
+/// Errors: `LUMLog` throws what the logger throws while the caller waits. The caller waits for the filter and
+/// `dispatchModeForMessage`, which are called for every message. It also waits for all calls for a message
+/// that the logger wants at once. The other calls are deferred: `operationQueue`, the filter again and
+/// `logWithMessage`. An exception from a deferred call has no caller to reach. It ends the program with a
+/// line that names the queue, unless `rt::Queue::setUncaughtExceptionHandler` has set a handler.
 ///
-/// Not for: loggers that usually must finish before the caller goes on; see LUMSyncLogger.
+/// Not for: a logger whose messages usually must be written before the caller goes on; see LUMSyncLogger.
 
 #include <cstdint>
 
@@ -30,22 +30,22 @@
 #include "Runtime/Queues/Queue.h"
 #include "Shared/Logging/LUMLogger.h"
 
-/// States how to call a LUMAsyncLogger with a message.
+/// How a LUMAsyncLogger wants to be called with a message.
 using LUMLogDispatchMode = std::uint32_t;
 
 /// Call the logger before `LUMLog` returns. Any other value: call it later.
 inline constexpr LUMLogDispatchMode LUMLogDispatchModeSynchronous = 2;
 
 struct RT_VISIBLE LUMAsyncLogger : rt::Protocol<LUMAsyncLogger, LUMLogger> {
-  /// Returns the queue to call the logger on. A logger whose queue is null receives nothing. The call comes
-  /// from the multiplexer's queue, or from the logging thread if the logger wants the message at once.
+  /// Returns the queue to call the logger on. If it is null, the logger receives nothing. Called on the
+  /// multiplexer's queue, or on the logging thread if the logger wants the message at once.
   virtual rt::Ref<rt::Queue> operationQueue() const = 0;
 
-  /// Returns how to call the logger with `message`. The call comes from the logging thread.
+  /// Returns how to call the logger with `message`. Called on the logging thread.
   ///
-  /// Must not return LUMLogDispatchModeSynchronous for a message logged on the logger's own queue: that
-  /// deadlocks. The same holds where a task of that queue may wait for a lock that a thread holds while it
-  /// logs. A service registry logs with its lock held.
+  /// LUMLogDispatchModeSynchronous deadlocks for a message that is logged on the logger's own queue. It also
+  /// deadlocks if a task of that queue waits for a lock that the logging thread holds. A service registry,
+  /// for example, logs with its lock held.
   virtual LUMLogDispatchMode dispatchModeForMessage(const LUMLogMessage& message) const = 0;
 
  protected:

@@ -7,12 +7,12 @@
 ///     LUMLogAt(LUMLogLevelInfo, "%@ has %d entries"_s, name, count);
 ///     LUMLogAt(LUMLogLevelError, metadata, "cannot open %s (error %d)"_s, path, errno);
 ///
-/// `LUMLog` builds a message and hands it to the shared multiplexer (Shared/Logging/LUMLogMultiplexer.h). The
-/// message holds the text, the source location, and the names of the thread and its queue. By default the
-/// multiplexer writes it to the system's log.
+/// Each call builds a message and hands it to the shared multiplexer (Shared/Logging/LUMLogMultiplexer.h). By
+/// default the multiplexer writes it to the system's log. The message holds the text, the source location,
+/// and the names of the thread and of its queue.
 ///
 /// Messages of levels 3 and 4 carry a call stack, unless the multiplexer is set not to capture one. The first
-/// frame is the function that logs. A LUMSafeParameter among the arguments is also kept in the message by
+/// frame is the function that logs. If an argument is a LUMSafeParameter, the message also keeps it by
 /// itself.
 ///
 /// The format is a literal. It is checked against the arguments at compile time
@@ -23,8 +23,8 @@
 /// Errors: throws what the description of an argument throws, and std::bad_alloc. Also throws what filters
 /// and loggers throw before the call returns (Shared/Logging/LUMLogMultiplexing.h).
 ///
-/// Not for: signal handlers. Logging allocates and takes locks, so a handler may interrupt a thread that
-/// holds one of them. Logging then deadlocks or ends the program.
+/// Not for: signal handlers. Logging allocates and takes locks. If a signal interrupts a thread that holds
+/// such a lock, logging in the handler deadlocks or ends the program.
 ///
 /// Not for: text made beforehand that may contain a '%'. Log it as an argument of "%@".
 
@@ -49,10 +49,10 @@ using LUMLogArgumentKind = std::uint32_t;
 
 /// Makes a message, logs it and returns it.
 ///
-/// `file` and `function` end with NUL. Text that is not UTF-8 is replaced: by "(invalid file)" or
-/// "(invalid function)". A null format is logged as a null text.
+/// `file` and `function` end with NUL. If one is null or not UTF-8, "(invalid file)" or "(invalid function)"
+/// takes its place. A null format is logged as a null text.
 ///
-/// `argumentCount` arguments follow the format, and `argumentKinds` has the kind of each:
+/// `argumentCount` arguments follow the format. `argumentKinds` gives the kind of each:
 ///
 /// - 1 for an `rt::Object*`
 /// - 0, 2, 3 or 4 for anything that is passed like an integer of at most 64 bits
@@ -75,7 +75,7 @@ rt::Ref<LUMLogMessage> LUMLogV(LUMLogLevel level, rt::String file, rt::String fu
                                const LUMLogArgumentKind* argumentKinds, const rt::String& format,
                                std::va_list arguments);
 
-/// A literal format checked against `Arguments`, and the source location of the call.
+/// A literal format that is checked against `Arguments`, with the source location of the call.
 template <class... Arguments>
 struct LUMLogFormat {
   template <class Literal>

@@ -10,9 +10,9 @@
 ///     });
 ///
 /// The innermost frames can be left out, so that the logging functions themselves do not appear. Their
-/// addresses cannot be read, but they stay in memory until the object is destroyed.
+/// addresses are hidden, but stay in memory until the object is destroyed.
 ///
-/// Threads: immutable, and so safe on any thread.
+/// Threads: thread-safe, because it is immutable.
 ///
 /// Not for: readers who need names. See LUMLogSymbolCallstack, or give these addresses to a debugger.
 
@@ -36,8 +36,8 @@ class RT_VISIBLE LUMLogAddressCallstack
   /// Receives an address and its index, which counts from 0. Set `*stop` to true to end the enumeration.
   using Visitor = rt::Block<void(std::uint64_t address, std::uint64_t index, bool* stop)>;
 
-  /// Captures the calling thread's stack without its `count` innermost calls. The caller of this function is
-  /// the innermost. Returns null if no call would be left, or if memory runs out.
+  /// Captures the calling thread's stack without its `count` innermost calls, counted from the caller of this
+  /// function. Returns null if no call would be left, or if memory runs out.
   [[gnu::noinline]] static rt::Ref<LUMLogAddressCallstack> addressCallstackIgnoringFrameCount(
       std::uint64_t count);
 
@@ -49,7 +49,7 @@ class RT_VISIBLE LUMLogAddressCallstack
   /// Precondition, not checked: `ignoreFrameCount` is at most `addressCount`.
   ///
   /// Ownership: takes `addresses`, which comes from `malloc`, or is null if there are no addresses.
-  /// Errors: frees `addresses` and throws std::bad_alloc.
+  /// Errors: throws std::bad_alloc after freeing `addresses`.
   static rt::Ref<LUMLogAddressCallstack> initWithAddresses(std::uint64_t* addresses,
                                                            std::uint64_t addressCount,
                                                            std::uint64_t ignoreFrameCount);
@@ -58,15 +58,15 @@ class RT_VISIBLE LUMLogAddressCallstack
   /// array counts as empty. Throws std::bad_alloc.
   static rt::Ref<LUMLogAddressCallstack> initWithAddresses(const rt::Ref<rt::Array>& addresses);
 
-  /// Returns the number of addresses, without those left out.
+  /// Returns the number of addresses that are not left out.
   std::uint64_t frameCount() const noexcept { return filteredAddressCount_; }
 
   /// Calls `visitor` with each address that is not left out, in order. Does nothing if `visitor` is null.
   /// Throws what `visitor` throws.
   void enumerateAddressesWithBlock(const Visitor& visitor) const;
 
-  /// Returns whether `other` is a LUMLogAddressCallstack with the same addresses, not counting those left
-  /// out.
+  /// Returns whether `other` is a LUMLogAddressCallstack with the same addresses. Those left out do not
+  /// count.
   bool isEqual(const rt::Object* other) const override;
   std::uint64_t hash() const override;
 

@@ -8,7 +8,7 @@
 ///                                   message->line()));
 ///     }
 ///
-/// Threads: immutable, and so safe on any thread.
+/// Threads: thread-safe, because it is immutable.
 ///
 /// Not for: logging an event. Call LUMLog, or hand a message to LUMLogMultiplexer.
 
@@ -26,9 +26,9 @@
 
 class RT_VISIBLE LUMLogMessage : public rt::Implements<LUMLogMessage, rt::Object> {
  public:
-  /// Makes a message of these fields, each of which may be null. If `threadName` is null, the message takes
-  /// the calling thread's name. If `dispatchQueueLabel` is null, it takes the label of the queue that the
-  /// calling thread runs for. A thread without a name or queue gives "".
+  /// Makes a message of these fields, each of which may be null. A null `threadName` becomes the calling
+  /// thread's name. A null `dispatchQueueLabel` becomes the label of the queue whose task the calling thread
+  /// runs. Without a name or a queue they become "".
   ///
   /// Errors: throws std::bad_alloc, and what copying the call stack throws.
   static rt::Ref<LUMLogMessage> initWithLevel(LUMLogLevel level, rt::String format,
@@ -51,15 +51,15 @@ class RT_VISIBLE LUMLogMessage : public rt::Implements<LUMLogMessage, rt::Object
   const rt::String& function() const noexcept { return function_; }
   std::uint64_t line() const noexcept { return line_; }
 
-  /// The thread that logged the message, and the queue that the thread ran for. Never null, but possibly "".
+  /// The thread that logged the message, and the queue whose task it ran. Never null, but possibly "".
   const rt::String& threadName() const noexcept { return threadName_; }
   const rt::String& dispatchQueueLabel() const noexcept { return dispatchQueueLabel_; }
 
   /// The call stack of the call that logged the message, or null.
   const rt::Ref<LUMLogCallstack>& callstack() const noexcept { return callstack_; }
 
-  /// The LUMSafeParameter arguments, as chosen by the names of their classes. The key of each is its index
-  /// among all arguments, a number from 0. Null if there are none.
+  /// The arguments that are safe parameters (LUMSafeParameter.h). The key of each is its index among all
+  /// arguments, a number from 0. Null if there are none.
   const rt::Ref<rt::Dictionary>& safeParameters() const noexcept { return safeParameters_; }
 
   /// The metadata that the caller gave, or null.

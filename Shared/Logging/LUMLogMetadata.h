@@ -6,7 +6,7 @@
 ///     metadata = metadata->metadataByAddingCategory("network"_s);
 ///     LUMLogAt(LUMLogLevelError, metadata, "no route to %@", host);
 ///
-/// Four keys have names. A host may add keys of its own. Values are stored as copies (`rt::Object::copy`).
+/// Four keys are predefined. A host may add its own. Values are stored as copies (`rt::Object::copy`).
 ///
 /// Threads: immutable. Safe on any thread if its values are.
 ///
@@ -24,7 +24,7 @@
 
 class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Object> {
  public:
-  /// The keys with names, as they appear in `properties`.
+  /// The predefined keys, as they appear in `properties`.
   static const rt::String kObfuscatedKiriIDKey;  // "LUMLogMetadataObfuscatedKiriID"
   static const rt::String kComponentKey;         // "LUMLogMetadataComponent"
   static const rt::String kCategoryKey;          // "LUMLogMetadataCategory"
@@ -37,7 +37,7 @@ class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Obje
   /// Makes metadata without properties.
   static rt::Ref<LUMLogMetadata> init() { return initWithProperties(nullptr); }
 
-  /// Make metadata with these properties, without those that are null. No function takes a category alone.
+  /// Make metadata of the given properties. Null ones are left out. No function takes a category alone.
   static rt::Ref<LUMLogMetadata> metadataWithObfuscatedKiriID(const rt::Ref<rt::Object>& obfuscatedKiriID) {
     return metadataWithObfuscatedKiriID(obfuscatedKiriID, nullptr);
   }
@@ -65,7 +65,7 @@ class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Obje
   /// null `key` changes nothing. Despite its name, this function returns metadata and not a message.
   rt::Ref<LUMLogMetadata> messageWithKey(const rt::String& key, const rt::Ref<rt::Object>& value) const;
 
-  /// Same as `messageWithKey`, for the keys with names.
+  /// Same as `messageWithKey`, for the predefined keys.
   rt::Ref<LUMLogMetadata> metadataByAddingObfuscatedKiriID(
       const rt::Ref<rt::Object>& obfuscatedKiriID) const {
     return messageWithKey(kObfuscatedKiriIDKey, obfuscatedKiriID);
@@ -86,8 +86,7 @@ class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Obje
   /// Returns the value for `key`. Null if there is no value, or if `key` is null.
   rt::Ref<rt::Object> propertyForKey(const rt::String& key) const { return properties_->objectForKey(key); }
 
-  /// Return the values for the keys with names. A component or category that is not a string is returned as
-  /// null.
+  /// Return the values for the predefined keys. If a component or category is not a string, they return null.
   rt::Ref<rt::Object> obfuscatedKiriID() const { return propertyForKey(kObfuscatedKiriIDKey); }
   rt::String component() const { return properties_->stringForKey(kComponentKey); }
   rt::String category() const { return properties_->stringForKey(kCategoryKey); }

@@ -21,12 +21,15 @@
 ///
 /// Threads: any thread may use it. Filters and loggers run without a lock held.
 ///
-/// Errors: an exception from a filter or logger passes through to the caller, and the loggers after it do not
-/// get the message. An exception from an asynchronous logger called later has no caller. It ends the program,
-/// or goes to rt::Queue's handler (LUMAsyncLogger.h). If `operationQueue` threw it, the asynchronous loggers
-/// after that logger do not get this message. They get later messages. If there is no memory to queue a
-/// message, LUMLog throws std::bad_alloc before any logger has it. If there is no memory on the way to one
-/// asynchronous logger's queue, that logger alone does not get the message.
+/// Errors: what throws decides who gets the message.
+///
+/// - An exception from a filter or logger reaches the caller. The loggers after it do not get the message.
+/// - An exception from an asynchronous logger that is called later has no caller to reach. It ends the
+///   program, or goes to rt::Queue's handler (LUMAsyncLogger.h).
+/// - If `operationQueue` throws in such a later call, the asynchronous loggers after it do not get the
+///   message. They get later messages.
+/// - If there is no memory to queue a message, LUMLog throws std::bad_alloc before any logger gets it.
+/// - If there is no memory to queue it for one asynchronous logger, only that logger does not get it.
 ///
 /// Fork: the child may use it at once, whatever other threads were doing, if its filters and loggers allow
 /// that. Queued messages stay with the parent, as all tasks do (Runtime/Queues/Queue.h).

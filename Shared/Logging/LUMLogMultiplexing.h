@@ -1,7 +1,7 @@
 #pragma once
 
-/// Takes messages and passes them on to filters and loggers, which may be added and removed.
-/// LUMLogMultiplexer implements it.
+/// An object that takes messages and passes them through filters to loggers, like LUMLogMultiplexer. Filters
+/// and loggers may be added and removed.
 ///
 ///     void Host::attach(LUMLogMultiplexing& multiplexer) { multiplexer.addSyncLogger(terminal_); }
 ///
@@ -18,18 +18,19 @@
 struct RT_VISIBLE LUMLogMultiplexing : rt::Protocol<LUMLogMultiplexing> {
   /// Passes `message` on. Ignores null.
   ///
-  /// Errors: throws what filters, also those of loggers, and synchronous loggers throw. Throws what an
-  /// asynchronous logger throws in `dispatchModeForMessage`. For a message that it wants at once, throws also
-  /// what it throws in `operationQueue` and `logWithMessage`.
+  /// Errors: throws what filters throw, including those of loggers, and what synchronous loggers throw.
+  /// Throws what an asynchronous logger throws in `dispatchModeForMessage`. If that logger wants the message
+  /// at once, also throws what it throws in `operationQueue` and `logWithMessage`.
   virtual void logWithMessage(const rt::Ref<LUMLogMessage>& message) = 0;
 
-  /// Adds or removes a filter that every message must pass. Ignores null, a filter to add that is already
-  /// present, and a filter to remove that is not present. All functions below do the same for loggers.
+  /// Adds or removes a filter that every message must pass. Does nothing for null, when adding a filter that
+  /// is present, or when removing one that is not. Equal objects count as the same. The functions for loggers
+  /// do the same.
   virtual void addLogFilter(const rt::Ref<LUMLogFilter>& filter) = 0;
   virtual void removeLogFilter(const rt::Ref<LUMLogFilter>& filter) = 0;
 
-  /// Adds or removes a logger. A message that is being logged meanwhile goes to the loggers present at its
-  /// start.
+  /// Adds or removes a logger. A message that is just being logged still goes to the loggers that were
+  /// present at its start.
   virtual void addSyncLogger(const rt::Ref<LUMSyncLogger>& logger) = 0;
   virtual void removeSyncLogger(const rt::Ref<LUMSyncLogger>& logger) = 0;
   virtual void addAsyncLogger(const rt::Ref<LUMAsyncLogger>& logger) = 0;

@@ -5,7 +5,7 @@
 ///     rt::Ref<LUMLogSymbolCallstack> stack = LUMLogSymbolCallstack::symbolCallstackIgnoringFrameCount(0);
 ///     for (const rt::Ref<rt::Object>& line : *stack->symbols()) ...
 ///
-/// Threads: immutable, and so safe on any thread.
+/// Threads: thread-safe, because it is immutable.
 ///
 /// Not for: every message, because looking up symbols is slow; see LUMLogAddressCallstack.
 
@@ -23,9 +23,9 @@
 class RT_VISIBLE LUMLogSymbolCallstack
     : public rt::Implements<LUMLogSymbolCallstack, rt::Object, LUMLogCallstack> {
  public:
-  /// Captures the calling thread's stack without its `count` innermost calls. The caller of this function is
-  /// the innermost. Returns null if the stack, with the call of this function, has at most `count` calls.
-  /// Returns null if memory runs out.
+  /// Captures the calling thread's stack without its `count` innermost calls, counted from the caller of this
+  /// function. Returns null if the stack has at most `count` calls, including that of this function. Returns
+  /// null if memory runs out.
   [[gnu::noinline]] static rt::Ref<LUMLogSymbolCallstack> symbolCallstackIgnoringFrameCount(
       std::uint64_t count);
 

@@ -20,7 +20,7 @@ struct RT_VISIBLE LUMLogger : rt::Protocol<LUMLogger> {
   /// Logs `message`, which is not null. Runs without a lock held, so it may log, and add and remove loggers.
   virtual void logWithMessage(const rt::Ref<LUMLogMessage>& message) = 0;
 
-  /// Returns the filter that decides which messages the logger takes. Null to take all. Called for every
+  /// Returns the filter that decides which messages the logger takes; null means all. Called for every
   /// message, on any thread.
   virtual rt::Ref<LUMLogFilter> filter() const = 0;
 

@@ -4,7 +4,7 @@
 ///
 ///     LUMSafeNumberParameter::parameterWithNumber(rt::Number::of(4), 1)->description();  // "4"
 ///
-/// Threads: immutable, and so safe on any thread.
+/// Threads: thread-safe, because it is immutable.
 ///
 /// Not for: a number that identifies a person.
 

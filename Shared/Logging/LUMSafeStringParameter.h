@@ -4,7 +4,7 @@
 ///
 ///     LUMSafeStringParameter::parameterWithString("kTagsID"_s, 1)->description();       // "kTagsID"
 ///
-/// Threads: immutable, and so safe on any thread.
+/// Threads: thread-safe, because it is immutable.
 ///
 /// Not for: a text with a person's name, address or other private data.
 

@@ -1,7 +1,7 @@
 #pragma once
 
-/// Receives every report of misuse of the libraries. It passes each message of LUMLogLevelFault to one
-/// callback of the host, on the thread that logged it, and counts it.
+/// Receives every report of misuse of the libraries. It passes each message of LUMLogLevelFault or above to
+/// one callback of the host, on the thread that logged it, and counts it.
 ///
 ///     PECErrorHandler::sharedInstance()->registerErrorHandlerBlock(
 ///         [](const rt::Ref<PECErrorDescription>& error) {
@@ -11,12 +11,12 @@
 /// Without a callback a report fails an assertion. The assertion prints the report on standard error and
 /// throws an rt::InternalInconsistencyException, which ends the program unless it is caught.
 ///
-/// The handler is a synchronous logger of the shared LUMLogMultiplexer. The first report registers it there
-/// (Libraries/Util/ErrorHandler/PECReport.h), or a call of `register_`.
+/// The handler is a synchronous logger of the shared LUMLogMultiplexer. The first report
+/// (Libraries/Util/ErrorHandler/PECReport.h) or a call of `register_` adds it there.
 ///
-/// Fork: does not wait for the handler, although the handler's lock is held while the callback runs. In the
-/// child the lock is free. If another thread was in the callback, that call never returns in the child, and
-/// its error is not counted there.
+/// Fork: a fork does not wait for the handler, although the handler holds its lock while the callback runs.
+/// In the child the lock is free. If another thread was in the callback, that call never returns in the
+/// child, and its error is not counted there.
 ///
 /// A test can check what some code reports:
 ///
@@ -65,16 +65,16 @@ class RT_VISIBLE PECErrorHandler : public rt::Implements<PECErrorHandler, rt::Ob
   /// Returns a filter that admits LUMLogLevelFault and higher levels.
   rt::Ref<LUMLogFilter> filter() const override { return filter_; }
 
-  /// Sets the callback. A null `block`, or a callback that is already set, is reported as an error and
-  /// changes nothing.
+  /// Sets the callback. If `block` is null, or if a callback is set already, reports an error and changes
+  /// nothing.
   ///
   /// Threads: thread-safe. Waits while a callback runs on another thread.
-  /// Errors: throws what the callback throws when it receives such a report. For a null `block` without a
-  /// callback set, that is an rt::InternalInconsistencyException.
+  /// Errors: throws what the callback throws when it receives such a report. If `block` is null and no
+  /// callback is set, that is an rt::InternalInconsistencyException.
   void registerErrorHandlerBlock(PECErrorHandlerBlock block);
 
-  /// Returns whether the calling thread is running an error callback of any handler. Meant for locks that are
-  /// held while errors are reported: an error callback must not wait for them.
+  /// Returns whether the calling thread is running an error callback of any handler. For code with a lock
+  /// that is held while errors are reported: an error callback must not wait for that lock.
   static bool isCallingBack() noexcept;
 
   /// Returns the callback that runs if none is set. It fails an assertion through the thread's
@@ -83,7 +83,8 @@ class RT_VISIBLE PECErrorHandler : public rt::Implements<PECErrorHandler, rt::Ob
 
   /// The callback, or null if none is set, and the number of handled errors. An error whose callback threw is
   /// not counted. The setters check nothing.
-  /// Threads: thread-safe. None of these waits for a running callback.
+  ///
+  /// Threads: thread-safe. None of these functions waits for a running callback.
   PECErrorHandlerBlock errorHandlerBlock() const;
   void setErrorHandlerBlock(PECErrorHandlerBlock block);
   std::int32_t errorCount() const noexcept { return errorCount_.load(std::memory_order_relaxed); }

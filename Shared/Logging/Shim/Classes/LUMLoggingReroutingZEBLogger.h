@@ -12,7 +12,7 @@
 ///
 /// This logger has no writer, formatter or filter. Setting one fails an assertion.
 ///
-/// Threads: immutable, and so safe on any thread.
+/// Threads: thread-safe, because it is immutable.
 ///
 /// Errors: throws what the stack-trace filter and the multiplexer's filters and loggers throw. The older
 /// logger drops such exceptions.
@@ -36,9 +36,10 @@
 class RT_VISIBLE LUMLoggingReroutingZEBLogger
     : public rt::Implements<LUMLoggingReroutingZEBLogger, ZEBLogger> {
  public:
-  /// Makes a logger for `logMultiplexer`. Returns null if `logMultiplexer` is null. `stackTraceFilter` is
-  /// asked with text and level which messages carry a call stack. It is asked in vain if the multiplexer does
-  /// not capture call stacks. If `stackTraceFilter` is null, no message carries a call stack.
+  /// Makes a logger for `logMultiplexer`. Returns null if `logMultiplexer` is null.
+  ///
+  /// `stackTraceFilter` decides by text and level which messages carry a call stack. If it is null, none
+  /// does. No message carries one unless `logMultiplexer` is a LUMLogAppControl that captures call stacks.
   static rt::Ref<LUMLoggingReroutingZEBLogger> initWithLogMultiplexer(
       rt::Ref<LUMLogMultiplexing> logMultiplexer, rt::Ref<ZEBLogFilter> stackTraceFilter);
 
@@ -57,8 +58,8 @@ class RT_VISIBLE LUMLoggingReroutingZEBLogger
   void setFormatter(rt::Ref<ZEBLogFormatter> formatter) override;
   void setFilter(rt::Ref<ZEBLogFilter> filter) override;
 
-  /// Makes the message and hands it to the multiplexer. If formatting the text throws, nothing is logged and
-  /// the exception is dropped.
+  /// Makes the message and hands it to the multiplexer. If formatting the text throws, drops the exception
+  /// and logs nothing.
   [[gnu::noinline]] void logInternalFunc(const char* func, const rt::String& format, std::va_list valist,
                                          ZEBLogLevel level) override;
 

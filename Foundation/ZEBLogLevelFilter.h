@@ -57,9 +57,9 @@ class RT_VISIBLE ZEBLogLevelFilter final
   void readSetting(const rt::UserDefaults* userDefaults);
 
   std::atomic<bool> verboseLoggingEnabled_ = false;
-  // The observer must not take this lock: ending an observation waits for the observer. Recursive, because a
-  // mistake in the user defaults is reported with the lock held, to a handler of the host that may take the
-  // lock again.
+  // The observer must not take this lock: ending an observation waits for the observer. The lock is recursive
+  // because a mistake in the user defaults is reported with the lock held. The host's handler may then take it
+  // again.
   rt::RecursiveLock lock_;
   rt::UserDefaults::Observation observation_ RT_GUARDED_BY(lock_);
 };

@@ -152,7 +152,7 @@ rt::Ref<ZEBLogFilter> ZEBLogger::filter() const {
   return pieceOf(&Pieces::filter);
 }
 
-// Copies the other pieces from the present ones.
+// The other pieces stay as they are.
 template <class Piece>
 void ZEBLogger::setPiece(rt::Ref<Piece> Pieces::* piece, rt::Ref<Piece> value, rt::Ref<Pieces>& next) {
   if (const rt::Ref<Pieces> known = pieces_.load()) {

@@ -129,8 +129,8 @@ class LUMLogCallstackMemoryTest : public testing::Test {
   }
 };
 
-// One failure is that of the object. The others are those of the buffers, which hold 128 addresses and
-// double.
+// One failure is that of the object. The others are those of the buffer, which holds 128 addresses at first
+// and doubles.
 TEST_F(LUMLogCallstackMemoryTest, AddressCallstackIsNullWithoutMemory) {
   EXPECT_EQ(failuresAtDepth(0), FAILS_MALLOC ? 2 : 1);
   EXPECT_EQ(failuresAtDepth(150), FAILS_MALLOC ? 3 : 1);

@@ -202,7 +202,7 @@ TEST(LUMLogSymbolCallstack, LeavesOutTheInnermostFrames) {
   ASSERT_GT(all.size(), 2U);
   EXPECT_THAT(all[0], HasSubstr("innerTakesSymbols"));
   EXPECT_THAT(all[1], HasSubstr("outerTakesSymbols"));
-  // The lines are numbered in the whole stack, whose first line is left out.
+  // Lines keep their numbers in the whole stack, and the first line is left out.
   EXPECT_THAT(all[0], testing::StartsWith("1 "));
 
   const std::vector<std::string> fewer = linesOf(*outerTakesSymbols(1));
@@ -214,8 +214,7 @@ TEST(LUMLogSymbolCallstack, LeavesOutTheInnermostFrames) {
 TEST(LUMLogSymbolCallstack, IsNullIfThereAreTooFewFrames) {
   const std::uint64_t depth = outerTakesSymbols(0)->symbols()->count();
   EXPECT_EQ(outerTakesSymbols(depth - 1)->symbols()->count(), 1U);
-  // With the frame that captures it, the stack has exactly this many frames. None is left, which is no
-  // failure.
+  // The stack has exactly this many frames, counting the capturing function. An empty result is no failure.
   ASSERT_TRUE(outerTakesSymbols(depth));
   EXPECT_TRUE(outerTakesSymbols(depth)->symbols()->isEmpty());
   EXPECT_FALSE(outerTakesSymbols(depth + 1));

@@ -8,7 +8,7 @@ namespace {
 
 using namespace rt::literals;
 
-// A mutable object. Changes of it do not change its copies.
+// A mutable object whose copies do not change with it.
 class Box final : public rt::Implements<Box, rt::Object> {
  public:
   explicit Box(int given) : value(given) {}

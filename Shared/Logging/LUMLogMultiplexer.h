@@ -21,7 +21,7 @@
 ///
 /// Threads: any thread may use it. Filters and loggers run without a lock held.
 ///
-/// Errors: what throws decides who gets the message.
+/// Errors: the effect depends on the source of the exception.
 ///
 /// - An exception from a filter or logger reaches the caller. The loggers after it do not get the message.
 /// - An exception from an asynchronous logger that is called later has no caller to reach. It ends the

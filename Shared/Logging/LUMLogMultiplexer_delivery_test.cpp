@@ -277,8 +277,8 @@ TEST_F(LUMLogMultiplexerTest, DeliversMessagesToAnAsyncLoggerInOrder) {
 
 // The order of the kinds of loggers.
 
-// The queued message has been delivered by the time when the synchronous logger has waited for it. Blocking
-// loggers come last.
+// The message is queued first, so the synchronous logger can wait for its delivery. Blocking loggers come
+// last.
 TEST_F(LUMLogMultiplexerTest, QueuesThenCallsSyncLoggersThenBlocks) {
   const auto other = rt::make<Queue>("other"_s);
   multiplexer_->addAsyncLogger(async("async"));

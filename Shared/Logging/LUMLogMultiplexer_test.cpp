@@ -1,7 +1,9 @@
-// Tests what a multiplexer consists of, and how filters and loggers are added and removed. Other files test
-// the rest: LUMLogMultiplexer_delivery_test.cpp and LUMLogMultiplexer_isolation_test.cpp how messages are
-// delivered, LUMLogMultiplexer_systemLogger_test.cpp the system loggers, LUMLogMultiplexer_threads_test.cpp
-// many threads.
+// Tests the parts of a multiplexer, and how filters and loggers are added and removed. Other files test the
+// rest:
+//
+// - LUMLogMultiplexer_delivery_test.cpp and LUMLogMultiplexer_isolation_test.cpp test deliveries.
+// - LUMLogMultiplexer_systemLogger_test.cpp tests system loggers.
+// - LUMLogMultiplexer_threads_test.cpp tests many threads.
 
 #include "Shared/Logging/LUMLogMultiplexer.h"
 

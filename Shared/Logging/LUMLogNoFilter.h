@@ -1,6 +1,6 @@
 #pragma once
 
-/// Lets every message pass, for code that requires a filter where none is wanted.
+/// Lets every message pass, for code that requires a filter.
 ///
 ///     rt::Ref<LUMLogFilter> filter = LUMLogNoFilter::init();
 ///

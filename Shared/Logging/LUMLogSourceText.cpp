@@ -30,8 +30,8 @@ bool isStill(const char* text, std::string_view string) noexcept {
   return std::strncmp(text, string.data(), string.size()) == 0 && text[string.size()] == '\0';
 }
 
-// The result of a look-up: the string of a known text that has not changed, or a free slot that the caller
-// now owns, or neither.
+// The result of a look-up. A known text that has not changed has its string. A new text may get a free slot,
+// which the caller then owns.
 struct Found {
   rt::StringObject* string = nullptr;
   Slot* slot = nullptr;

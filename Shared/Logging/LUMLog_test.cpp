@@ -413,8 +413,8 @@ TEST_F(LUMLogAllocationTest, AllocatesTwiceMoreForAsyncLoggers) {
   queue->barrierSync();
 }
 
-// The task that brings the message to a logger is made between two calls of `operationQueue`: after that of
-// the logger, and before that of the next one.
+// The task for a logger is made after that logger's `operationQueue` returns, and before the next logger's is
+// called.
 TEST_F(LUMLogAllocationTest, AllocatesOnceForEachAsyncLoggerOnTheMultiplexersQueue) {
   const auto queue = rt::make<rt::Queue>("logger"_s);
   std::optional<AllocationCount> count;

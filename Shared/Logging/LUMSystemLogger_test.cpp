@@ -1,4 +1,4 @@
-// Reads in the journal what the system logger has written. The journal is the machine's own journald in a
+// Reads back from the journal what the system logger has written. The machine's own journald runs in a
 // private root. The suite runs as root and as an ordinary user.
 
 #include "Shared/Logging/LUMSystemLogger.h"

@@ -58,8 +58,8 @@ class RT_VISIBLE ZEBLogLevelFilter final
 
   std::atomic<bool> verboseLoggingEnabled_ = false;
   // The observer must not take this lock: ending an observation waits for the observer. The lock is recursive
-  // because a mistake in the user defaults is reported with the lock held. The host's handler may then take it
-  // again.
+  // because a mistake in the user defaults is reported with the lock held. The host's handler may then take
+  // it again.
   rt::RecursiveLock lock_;
   rt::UserDefaults::Observation observation_ RT_GUARDED_BY(lock_);
 };

@@ -12,16 +12,16 @@
 #include "Runtime/Objects/Class.h"
 
 struct RT_VISIBLE LUMLogAppControl : rt::Protocol<LUMLogAppControl> {
-  /// Whether messages of levels 3 and 4 carry a call stack.
+  /// Return and set whether messages of levels 3 and 4 carry a call stack.
   virtual bool captureCallStack() const = 0;
   virtual void setCaptureCallStack(bool capture) = 0;
 
-  /// Whether that call stack holds addresses (LUMLogAddressCallstack) or, if false, names
-  /// (LUMLogSymbolCallstack).
+  /// Return and set what that call stack holds: addresses (LUMLogAddressCallstack) if true, or names
+  /// (LUMLogSymbolCallstack) if false.
   virtual bool captureCallStackAddresses() const = 0;
   virtual void setCaptureCallStackAddresses(bool capture) = 0;
 
-  /// A setting that is stored and has no effect here.
+  /// Return and set a value that is stored but has no effect here.
   virtual bool captureSwiftCallStackOnErrorAndAbove() const = 0;
   virtual void setCaptureSwiftCallStackOnErrorAndAbove(bool capture) = 0;
 

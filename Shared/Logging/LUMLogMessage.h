@@ -41,28 +41,28 @@ class RT_VISIBLE LUMLogMessage : public rt::Implements<LUMLogMessage, rt::Object
 
   LUMLogLevel level() const noexcept { return level_; }
 
-  /// The text before and after the arguments were substituted. Each is null if it was not given.
+  /// Return the text before and after the arguments were substituted, or null if it was not given.
   const rt::String& format() const noexcept { return format_; }
   const rt::String& formattedString() const noexcept { return formattedString_; }
 
-  /// The source location: the file's path, the function's full signature and the line. Unknown ones are null,
-  /// and an unknown line is 0.
+  /// Return the source location: the file's path, the function's full signature and the line. An unknown path
+  /// or function is null, and an unknown line is 0.
   const rt::String& file() const noexcept { return file_; }
   const rt::String& function() const noexcept { return function_; }
   std::uint64_t line() const noexcept { return line_; }
 
-  /// The thread that logged the message, and the queue whose task it ran. Never null, but possibly "".
+  /// Return the thread that logged the message, and the queue whose task it ran. Never null, but possibly "".
   const rt::String& threadName() const noexcept { return threadName_; }
   const rt::String& dispatchQueueLabel() const noexcept { return dispatchQueueLabel_; }
 
-  /// The call stack of the call that logged the message, or null.
+  /// Returns the call stack of the call that logged the message, or null.
   const rt::Ref<LUMLogCallstack>& callstack() const noexcept { return callstack_; }
 
-  /// The arguments that are safe parameters (LUMSafeParameter.h). The key of each is its index among all
-  /// arguments, a number from 0. Null if there are none.
+  /// Returns the arguments that are safe parameters (LUMSafeParameter.h). The key of each is its index among
+  /// all arguments, a number from 0. Null if there are none.
   const rt::Ref<rt::Dictionary>& safeParameters() const noexcept { return safeParameters_; }
 
-  /// The metadata that the caller gave, or null.
+  /// Returns the metadata that the caller gave, or null.
   const rt::Ref<LUMLogMetadata>& logMetadata() const noexcept { return logMetadata_; }
 
   /// Returns whether `other` is a message with equal fields.

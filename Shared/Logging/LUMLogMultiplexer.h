@@ -78,7 +78,7 @@ class RT_VISIBLE LUMLogMultiplexer
   /// those loggers to run. Must not be called on `loggingQueue`.
   void waitForLogging();
 
-  /// The queue that sends messages to the queues of the asynchronous loggers. Its label is
+  /// Returns the queue that sends messages to the queues of the asynchronous loggers. Its label is
   /// "LUMLogMultiplexer".
   const rt::Ref<rt::Queue>& loggingQueue() const noexcept { return loggingQueue_; }
 

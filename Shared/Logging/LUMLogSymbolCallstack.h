@@ -32,7 +32,7 @@ class RT_VISIBLE LUMLogSymbolCallstack
   /// Makes a call stack of `symbols`, an array of strings that may be null. Throws std::bad_alloc.
   static rt::Ref<LUMLogSymbolCallstack> initWithSymbols(rt::Ref<rt::Array> symbols);
 
-  /// The lines as given. Captured lines have the form that Runtime/Process/CallStack.h describes.
+  /// Returns the lines as given. Captured lines have the form that Runtime/Process/CallStack.h describes.
   const rt::Ref<rt::Array>& symbols() const noexcept { return symbols_; }
 
   /// Returns whether `other` is a LUMLogSymbolCallstack with equal lines.

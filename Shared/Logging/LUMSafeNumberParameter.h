@@ -31,7 +31,7 @@ class RT_VISIBLE LUMSafeNumberParameter
   std::uint64_t type() const override { return type_; }
   bool isUploadSafeType() const override { return isUploadSafe(type_); }
 
-  /// The number as given.
+  /// Returns the number as given.
   const rt::Ref<rt::Number>& numberValue() const noexcept { return numberValue_; }
 
   /// Returns whether `other` is a LUMSafeNumberParameter with an equal type and number.

@@ -17,7 +17,7 @@
 #include "Runtime/Objects/Class.h"
 
 struct RT_VISIBLE LUMSafeParameter : rt::Protocol<LUMSafeParameter> {
-  /// The kind of value, as a number that the caller defines.
+  /// Returns the kind of value, as a number that the caller defines.
   virtual std::uint64_t type() const = 0;
 
   /// Returns whether the value may be uploaded, which types 1 to 4 allow.

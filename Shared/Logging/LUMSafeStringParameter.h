@@ -30,7 +30,7 @@ class RT_VISIBLE LUMSafeStringParameter
   std::uint64_t type() const override { return type_; }
   bool isUploadSafeType() const override { return isUploadSafe(type_); }
 
-  /// The text as given.
+  /// Returns the text as given.
   const rt::String& stringValue() const noexcept { return stringValue_; }
 
   /// Returns whether `other` is a LUMSafeStringParameter with an equal type and text.

@@ -81,8 +81,8 @@ class RT_VISIBLE PECErrorHandler : public rt::Implements<PECErrorHandler, rt::Ob
   /// rt::AssertionHandler. Every call returns the same callback.
   static PECErrorHandlerBlock defaultErrorHandlerBlock();
 
-  /// The callback, or null if none is set, and the number of handled errors. An error whose callback threw is
-  /// not counted. The setters check nothing.
+  /// Return and set the callback, which may be null, and the number of handled errors. An error whose
+  /// callback threw is not counted. The setters check nothing.
   ///
   /// Threads: thread-safe. None of these functions waits for a running callback.
   PECErrorHandlerBlock errorHandlerBlock() const;

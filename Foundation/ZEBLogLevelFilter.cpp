@@ -7,7 +7,7 @@ using namespace rt::literals;
 
 namespace {
 
-// Of the environment variable and of the user default.
+// The name of both the environment variable and the user default.
 constexpr const char* kSettingName = "ZEBVerboseLogging";
 
 bool isYes(const rt::String& value) {

@@ -9,12 +9,12 @@
 
 namespace {
 
-// A capability takes a bit of one of two words; both of these are in the first.
+// A capability is one bit of two words. Both capabilities below are in the first word.
 using Capabilities = std::array<__user_cap_data_struct, _LINUX_CAPABILITY_U32S_3>;
 constexpr __u32 kOverride = 1U << CAP_DAC_OVERRIDE;
 constexpr __u32 kGiveAway = 1U << CAP_CHOWN;
 
-// SYS_capget or SYS_capset, for this thread. The C library has functions for neither.
+// Calls SYS_capget or SYS_capset for this thread. The C library has no functions for them.
 bool callWith(long call, Capabilities& capabilities) {
   __user_cap_header_struct header{_LINUX_CAPABILITY_VERSION_3, 0};
   return syscall(call, &header, capabilities.data()) == 0;
@@ -30,17 +30,17 @@ void takeOnCallersIdentity() {
   const uid_t user = getuid();
   const auto formerGroup = static_cast<gid_t>(setfsgid(group));
   const auto formerUser = static_cast<uid_t>(setfsuid(user));
-  // They answer with what was in force before, so that only a second call shows whether the first has worked.
+  // Both calls return the previous identifier, so only a second call shows whether the first one worked.
   const bool isCaller =
       static_cast<gid_t>(setfsgid(group)) == group && static_cast<uid_t>(setfsuid(user)) == user;
-  // Leaving the user root took CAP_DAC_OVERRIDE out of the effective set; this puts it back, or is refused
-  // where it is not permitted.
+  // Giving up the user root removed CAP_DAC_OVERRIDE from the effective set. This call restores it, or fails
+  // if the capability is not permitted.
   capabilities = {};
   capabilities[0].effective = capabilities[0].permitted = kOverride;
   if (isCaller && callWith(SYS_capset, capabilities)) return;
 
-  // Half an identity would be refused what the whole one, or none, is granted. Going back to root brings the
-  // capabilities back.
+  // Half an identity would be denied what both the old and the new one allow. Returning to root restores the
+  // capabilities.
   setfsuid(formerUser);
   setfsgid(formerGroup);
 }

@@ -54,6 +54,12 @@ constexpr const SRLImplementationRegistrationData* counters[] = {&userCounter, n
 constexpr _SRLBindingRegistrationData bindings[] = {{&counterAPI, counters}};
 static_assert(SRLAreBindingsSorted(bindings));
 
+// The injector: what the rest of the program calls.
+rt::Ref<Counter> injectCounter(const rt::Ref<rt::Object>& user) {
+  const SRLScopeTagSet tags{{user.get()}};
+  return rt::cast<Counter>(SRLRegistry::sharedInstance()->internalService(&counterAPI, tags));
+}
+
 // The module: what the registry is handed when the program is loaded.
 constexpr SRLBindingsModuleData module{.bindingsBegin = std::begin(bindings),
                                        .bindingsEnd = std::end(bindings)};
@@ -65,12 +71,6 @@ const SRLBindingsModuleData* counterBindings() {
 }  // namespace
 
 template struct rt::AddedClassMethod<SRLRegistry, "srl_bindingsCounter", &counterBindings>;
-
-// The injector: what the rest of the program calls.
-rt::Ref<Counter> injectCounter(const rt::Ref<rt::Object>& user) {
-  const SRLScopeTagSet tags{{user.get()}};
-  return rt::cast<Counter>(SRLRegistry::sharedInstance()->internalService(&counterAPI, tags));
-}
 
 int main() {
   const rt::Ref<rt::Object> ann = "Ann"_s.object();

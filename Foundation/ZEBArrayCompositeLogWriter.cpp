@@ -1,3 +1,6 @@
+// This class exists because the runtime knows no logger: a protocol cannot be added to `rt::Array` from
+// outside. An array never changes, so the constructor looks at its elements once.
+
 #include "Foundation/ZEBArrayCompositeLogWriter.h"
 
 #include <utility>

@@ -1,3 +1,7 @@
+// A filter that is destroyed while it still watches fails an assertion in its destructor. If the thread's
+// handler returns, the program goes on. The default handler throws. That ends the program, after the handler
+// has said why.
+
 #include "Foundation/ZEBLogLevelFilter.h"
 
 #include "Runtime/Process/AssertionHandler.h"

@@ -1,3 +1,8 @@
+// The setters work under a recursive lock. A filter is told of its attaching and detaching under that lock,
+// and may use the logger meanwhile. A line is logged without a lock: writer, formatter and filter are one
+// immutable object, which `rt::AtomicRef` reads. So a filter that logs from another thread while it is
+// attached waits for nobody. A replaced piece lives until the last line with it is written.
+
 #include "Foundation/ZEBLogger.h"
 
 #include <string_view>

@@ -1,3 +1,15 @@
+// Calls the file system directly. Tests run the program in a root file system of its own, where the real
+// calls are harmless.
+//
+// Writes messages with <cstdio>. Streams would set up a locale and eight objects before `main`, for a program
+// that prints at most one line. `stderr` is unbuffered, and glibc hands one `fprintf` of up to 8 KiB to the
+// kernel in one `write`. So the lines of commands that run at the same time do not mix.
+//
+// The exit status is `errno` after the message. If the message cannot be written, `write` has replaced
+// `errno`, and the status tells that failure instead.
+//
+// SIGPIPE keeps its default. A caller that ignores it gets EPIPE as the status.
+
 #include "MountPointCommand.h"
 
 #include <cerrno>

@@ -1,3 +1,6 @@
+// A fork does not wait for a lock that is held while callbacks run. These locks are `LongLock` and
+// `RecursiveLock`. Their owner's token tells whether the owner is a thread of this process.
+
 #include "Runtime/Locks/ForkGate.h"
 
 #include <pthread.h>

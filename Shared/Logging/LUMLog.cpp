@@ -1,3 +1,10 @@
+// `LUMLogAt` and `PECReport` are always compiled into their callers. An empty statement behind the call keeps
+// the caller's frame. The functions below them are never compiled into each other. So the number of frames to
+// leave out of a call stack is the same in every build.
+//
+// `LUMLog` is for programs that make calls, with counts and kinds of the arguments. `LUMLogAt` is for people.
+// They have two names because a call of the first sort would also fit an overload of the second.
+
 #include "Shared/Logging/LUMLog.h"
 
 #include <algorithm>

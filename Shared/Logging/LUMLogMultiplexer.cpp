@@ -1,3 +1,9 @@
+// Filters and loggers are one immutable object, which is replaced as a whole. A message takes a reference to
+// it without a lock. A change makes the next object without a lock, and makes it again if another thread was
+// quicker. So the `isEqual` of members, which is a host's code, never runs under a lock.
+//
+// If there are no asynchronous loggers, or all of them want the message at once, nothing is queued.
+
 #include "Shared/Logging/LUMLogMultiplexer.h"
 
 #include <algorithm>

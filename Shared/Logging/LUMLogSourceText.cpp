@@ -1,3 +1,7 @@
+// `LUMLog` gets files and functions as C strings, mostly the same few again. The table finds the string of
+// each by its address. It compares the text each time, since a library may have been unloaded and another may
+// have taken its place.
+
 #include "Shared/Logging/LUMLogSourceText.h"
 
 #include <array>

@@ -1,3 +1,8 @@
+// macOS cannot keep one of root's rights without the others, and a caller cannot write in /Volumes. So root
+// makes the directory under a new name, renames it to `path` only if nothing is there, and hands it over by
+// its descriptor. Nothing else can be handed over that way. Until then the directory and its blocks belong to
+// root.
+
 #include "tool/CallersDirectory.h"
 
 #include <fcntl.h>

@@ -1,3 +1,15 @@
+// The caller of a set-user-ID process may stop it between `mkdir` and `chown`. Meanwhile the name may become
+// another user's directory, a mounted volume or a symbolic link of root's. A command with all of root's
+// rights would give any of these to the caller.
+//
+// So the process takes on its caller's identity before it touches a name. The new directory then belongs to
+// the caller from its first moment, and `chown` has no right to give away anything else. CAP_DAC_OVERRIDE
+// stays, because the command has to write in root's /Volumes.
+//
+// Every process with CAP_CHOWN takes on the identity, also when its caller is root. Otherwise root could be
+// made to take what somebody puts in the place of its directory. A process without CAP_CHOWN cannot give
+// anything away.
+
 #include "tool/CallerIdentity.h"
 
 #include <linux/capability.h>

@@ -1,3 +1,5 @@
+// No `chmod` follows `mkdir`. If the umask takes more bits away from 0700, that is the caller's decision.
+
 #include "tool/CallersDirectory.h"
 
 #include <sys/stat.h>

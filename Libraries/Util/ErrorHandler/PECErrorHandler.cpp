@@ -1,3 +1,6 @@
+// The handler has two locks. The callback runs under a recursive one, because it may log an error itself. The
+// callback is read and set under the other one, so that tests that set it directly wait for nobody.
+
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
 
 #include <string_view>

@@ -2,6 +2,10 @@
 
 // Included by Runtime/Base/LoadedImages.h only.
 
+// An image has one initialiser for all its announcements, whatever the number of classes. Each source file
+// names the classes that it mentions, in a section of distances that need no relocation. `announceImage`
+// walks that section. One call for each class in each source file would make hundreds of initialisers.
+
 #include <cstdint>
 
 namespace rt::detail {

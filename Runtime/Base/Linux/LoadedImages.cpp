@@ -1,3 +1,7 @@
+// An image with classes is never unloaded, because its objects, literals and class methods may be anywhere in
+// the program. `announce` has the loader keep the image. A linker option would not do: it would not reach a
+// plug-in that takes the runtime from its host.
+
 #include "Runtime/Base/LoadedImages.h"
 
 #include <dlfcn.h>

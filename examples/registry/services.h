@@ -1,12 +1,12 @@
 #pragma once
 
-// The program's services, as its author writes them.
+// The program's services, as the program's author writes them.
 
 #include <utility>
 
 #include "Runtime/Runtime.h"
 
-// Where an account's messages are.
+// Holds the messages of an account.
 struct MessageStore : rt::Protocol<MessageStore> {
   virtual rt::String name() const = 0;
 
@@ -14,7 +14,7 @@ struct MessageStore : rt::Protocol<MessageStore> {
   ~MessageStore() = default;
 };
 
-// What a window shows of them: one for each window of each account.
+// Shows the messages of an account in a window. There is one for each window of each account.
 struct MessageList : rt::Protocol<MessageList> {
   virtual rt::String title() const = 0;
 
@@ -22,7 +22,7 @@ struct MessageList : rt::Protocol<MessageList> {
   ~MessageList() = default;
 };
 
-// What may be done when a window opens.
+// A task to run when a window opens.
 struct WindowTask : rt::Protocol<WindowTask> {
   virtual rt::String label() const = 0;
 

@@ -90,7 +90,7 @@ TEST_F(ZEBLogLevelFilterTest, LetsTheEnvironmentOverruleTheUserDefault) {
   const auto filter = ZEBLogLevelFilter::init();
   filter->didAttachToLogger();
   EXPECT_FALSE(filter->verboseLoggingEnabled());
-  rt::UserDefaults::standardUserDefaults()->setInteger(2, kSetting);
+  privateDefaults.change(kSetting, "2");
   EXPECT_FALSE(filter->verboseLoggingEnabled());
   filter->willDetachFromLogger();
 }
@@ -106,21 +106,20 @@ TEST_F(ZEBLogLevelFilterTest, ReadsTheEnvironmentAgainWhenItIsAttached) {
 }
 
 TEST_F(ZEBLogLevelFilterTest, FollowsTheUserDefaultFromAttachmentToDetachment) {
-  const auto defaults = rt::UserDefaults::standardUserDefaults();
   const auto filter = ZEBLogLevelFilter::init();
-  defaults->setBool(true, kSetting);
+  setDefault("YES");
   EXPECT_FALSE(filter->verboseLoggingEnabled());
   filter->didAttachToLogger();
   EXPECT_TRUE(filter->verboseLoggingEnabled());
-  defaults->setBool(false, kSetting);
+  privateDefaults.change(kSetting, "NO");
   EXPECT_FALSE(filter->verboseLoggingEnabled());
-  defaults->setBool(true, "another key");
+  privateDefaults.change("another key", "YES");
   EXPECT_FALSE(filter->verboseLoggingEnabled());
-  defaults->setBool(true, kSetting);
+  privateDefaults.change(kSetting, "YES");
   EXPECT_TRUE(filter->verboseLoggingEnabled());
   filter->willDetachFromLogger();
   // Nobody tells it any more.
-  defaults->remove(kSetting);
+  privateDefaults.change(kSetting, "NO");
   EXPECT_TRUE(filter->verboseLoggingEnabled());
   filter->didAttachToLogger();
   EXPECT_FALSE(filter->verboseLoggingEnabled());
@@ -138,13 +137,12 @@ TEST_F(ZEBLogLevelFilterTest, ReadsNothingWhenItIsAttachedAlready) {
 }
 
 TEST_F(ZEBLogLevelFilterTest, IsDetachedOnceHoweverOftenItWasAttached) {
-  const auto defaults = rt::UserDefaults::standardUserDefaults();
   const auto filter = ZEBLogLevelFilter::init();
   filter->willDetachFromLogger();
   filter->didAttachToLogger();
   filter->didAttachToLogger();
   filter->willDetachFromLogger();
-  defaults->setBool(true, kSetting);
+  privateDefaults.change(kSetting, "YES");
   EXPECT_FALSE(filter->verboseLoggingEnabled());
   filter->willDetachFromLogger();
 }
@@ -170,7 +168,7 @@ TEST_F(ZEBLogLevelFilterTest, HearsOfAChangeByAnotherProcess) {
 
 // Attaching, detaching, changing and asking at once: at the end the filter knows the last value.
 TEST_F(ZEBLogLevelFilterTest, MayBeUsedByManyThreads) {
-  const auto defaults = rt::UserDefaults::standardUserDefaults();
+  SettingsFile settings(privateDefaults.file());
   const auto filter = ZEBLogLevelFilter::init();
   std::vector<std::thread> threads;
   threads.reserve(2);
@@ -183,11 +181,11 @@ TEST_F(ZEBLogLevelFilterTest, MayBeUsedByManyThreads) {
       }
     });
   }
-  for (int i = 0; i < 20; ++i) defaults->setBool(i % 2 == 0, kSetting);
+  for (int i = 0; i < 20; ++i) settings.set(kSetting, i % 2 == 0 ? "YES" : "NO");
   for (std::thread& thread : threads) thread.join();
   filter->didAttachToLogger();
   EXPECT_FALSE(filter->verboseLoggingEnabled());
-  defaults->setBool(true, kSetting);
+  privateDefaults.change(kSetting, "YES");
   EXPECT_TRUE(filter->verboseLoggingEnabled());
   filter->willDetachFromLogger();
 }
@@ -223,7 +221,7 @@ TEST_F(ZEBLogLevelFilterTest, FailsAnAssertionWhereItGoesWithoutHavingBeenDetach
   EXPECT_EQ(failure.lineNumber, 544U);
   EXPECT_EQ(failure.description, kDescription);
   // Where the handler returns, the filter watches nothing any more all the same.
-  rt::UserDefaults::standardUserDefaults()->setBool(true, kSetting);
+  privateDefaults.change(kSetting, "YES");
 }
 
 TEST_F(ZEBLogLevelFilterTest, GoesInPeaceWhereItWasDetachedOrNeverAttached) {

@@ -6,15 +6,12 @@
 #include <algorithm>
 #include <chrono>
 #include <csignal>
-#include <stdexcept>
 #include <system_error>
 #include <thread>
 #include <utility>
 
 #include "Runtime/Base/StandardError.h"
-#include "Runtime/Base/UTF8.h"
 #include "Runtime/Locks/Lazy.h"
-#include "Runtime/Objects/Exception.h"
 #include "Runtime/Process/Thread.h"
 
 namespace rt::detail {
@@ -97,44 +94,6 @@ std::optional<std::string> DefaultsStore::value(std::string_view key) {
   }
   reportDefaults({problem});
   return value;
-}
-
-void DefaultsStore::change(std::string_view key, std::optional<std::string_view> value) {
-  if (!isValidUTF8(key)) throw std::invalid_argument("the key of a user default is not UTF-8");
-  const auto fail = [](const std::string& reason) {
-    throw Exception("UserDefaultsException"_s, String::fromUTF8Repaired(reason));
-  };
-  if (file_.path().empty()) fail(placeProblem_);
-  std::string problem;
-  Observers observers;
-  {
-    const LockGuard guard(changeLock_);
-    const DefaultsFile::Lock lock = file_.lock();
-    DefaultsText text;
-    try {
-      // More than may be is read, so that it is malformed like anything else that it may not be.
-      text = DefaultsText::parsed(file_.content(DefaultsText::kMaximumSize).value_or(""));
-    } catch (const MalformedDefaults& error) {
-      fail("not written over, since it is malformed: " + file_.path() + ", " + error.what());
-    }
-    const std::string* const previous = text.find(key);
-    const bool isSame = previous != nullptr ? value == *previous : !value;
-    if (!isSame) {
-      if (value) {
-        text.set(key, *value);
-      } else {
-        text.remove(key);
-      }
-      const std::string content = text.text();
-      if (content.size() > DefaultsText::kMaximumSize) {
-        throw std::length_error("user defaults of more than 1 MiB: " + file_.path());
-      }
-      file_.replace(content);
-    }
-    observers = claim(problem);
-  }
-  reportDefaults({problem});
-  if (const std::exception_ptr exception = call(observers)) std::rethrow_exception(exception);
 }
 
 std::shared_ptr<DefaultsObserver> DefaultsStore::observe(std::string_view key, bool alsoNow,
@@ -266,11 +225,7 @@ void DefaultsStore::watch(std::shared_ptr<SystemFileWatch> watch) noexcept {
 
 void DefaultsStore::tellOfChange() {
   std::string problem;
-  Observers observers;
-  {
-    const LockGuard guard(changeLock_);
-    observers = claim(problem);
-  }
+  const Observers observers = claim(problem);
   reportDefaults({problem});
   if (const std::exception_ptr exception = call(observers)) {
     reportDefaults({"an observer of user defaults threw: ", textOf(exception)});

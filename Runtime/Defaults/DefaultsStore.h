@@ -17,7 +17,6 @@
 #include "Runtime/Defaults/DefaultsFile.h"
 #include "Runtime/Defaults/DefaultsText.h"
 #include "Runtime/Defaults/SystemFileWatch.h"
-#include "Runtime/Locks/LongLock.h"
 #include "Runtime/Locks/ThreadIdentifier.h"
 #include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Objects/Block.h"
@@ -52,9 +51,6 @@ class DefaultsStore : public std::enable_shared_from_this<DefaultsStore> {
 
   std::optional<std::string> value(std::string_view key);
 
-  /// Sets the value of `key`, or takes it away where `value` is none, and tells observers.
-  void change(std::string_view key, std::optional<std::string_view> value);
-
   std::shared_ptr<DefaultsObserver> observe(std::string_view key, bool alsoNow, Block<void()> block);
   void remove(DefaultsObserver& observer) noexcept;
 
@@ -81,9 +77,8 @@ class DefaultsStore : public std::enable_shared_from_this<DefaultsStore> {
 
   using Observers = std::vector<std::shared_ptr<DefaultsObserver>>;
   // The observers whose value has changed and that no thread is about to call, which from now on this
-  // thread is. Held `changeLock_` keeps the thread that waits for changes from claiming those of another.
-  // `problem` becomes what is to be reported.
-  [[nodiscard]] Observers claim(std::string& problem) RT_REQUIRES(changeLock_) RT_EXCLUDES(lock_);
+  // thread is. `problem` becomes what is to be reported.
+  [[nodiscard]] Observers claim(std::string& problem) RT_EXCLUDES(lock_);
   // Calls what has been claimed. Returns the first exception of theirs, or std::bad_alloc.
   [[nodiscard]] std::exception_ptr call(const Observers& observers) noexcept;
   // Whether `observer`, which this thread has claimed, is to be called now, for the first time or again.
@@ -91,8 +86,6 @@ class DefaultsStore : public std::enable_shared_from_this<DefaultsStore> {
   [[nodiscard]] bool isDue(DefaultsObserver& observer);
 
   const DefaultsFile file_;
-  // Held while the file is being changed, until the observers are claimed; taken before `lock_`.
-  LongLock changeLock_;
   // One for all stores, of which a process has hardly more than one.
   static constinit UnfairLock lock_;
   DefaultsText text_ RT_GUARDED_BY(lock_);

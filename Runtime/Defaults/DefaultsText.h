@@ -1,6 +1,6 @@
 #pragma once
 
-/// The text of a file of user defaults, one setting a line, as people write it and programs change it.
+/// The text of a file of user defaults, one setting a line, as people write it.
 ///
 ///     | # Written by the operator on call.
 ///     | ZEBVerboseLogging = YES
@@ -8,8 +8,6 @@
 ///
 ///     rt::DefaultsText text = rt::DefaultsText::parsed(content);      // throws MalformedDefaults
 ///     text.find("ZEBVerboseLogging");                                 // "YES"
-///     text.set("ZEBVerboseLogging", "NO");
-///     text.text();                                                    // remarks and order are kept
 ///
 /// A line is blank, a remark that begins with `#`, or `key = value`. A value goes from the first character
 /// that is no blank to the last before the end of the line or a `#`; nothing there is the empty text. A
@@ -20,7 +18,7 @@
 /// Not for: what is to be shared with other tools; nested data.
 
 #include <cstddef>
-#include <list>
+#include <functional>
 #include <map>
 #include <stdexcept>
 #include <string>
@@ -34,42 +32,22 @@ class MalformedDefaults final : public std::runtime_error {
   using std::runtime_error::runtime_error;
 };
 
-/// A plain value that can be moved but not copied: as safe as a map.
+/// A plain value: as safe as a map.
 class DefaultsText {
  public:
   static constexpr std::size_t kMaximumSize = std::size_t{1} << 20U;
 
   /// No settings.
   DefaultsText() = default;
-  DefaultsText(DefaultsText&&) noexcept = default;
-  DefaultsText& operator=(DefaultsText&&) noexcept = default;
-  ~DefaultsText() = default;
 
   /// The settings in `text`. Throws MalformedDefaults.
   static DefaultsText parsed(std::string_view text);
 
-  /// The value of `key`, until the next change; null when there is none.
+  /// The value of `key`, as long as this is there; null when there is none.
   const std::string* find(std::string_view key) const noexcept;
 
-  /// Sets `key`, in the line that has it or in a new one at the end. Both are any UTF-8; throws
-  /// std::invalid_argument for other bytes.
-  void set(std::string_view key, std::string_view value);
-
-  /// Takes away the line that has `key`, if there is one.
-  void remove(std::string_view key);
-
-  /// The whole text: lines that were not changed are as they were.
-  std::string text() const;
-
  private:
-  using Lines = std::list<std::string>;
-  struct Setting {
-    Lines::iterator line;
-    std::string value;
-  };
-
-  Lines lines_;
-  std::map<std::string, Setting, std::less<>> settings_;
+  std::map<std::string, std::string, std::less<>> settings_;
 };
 
 }  // namespace rt

@@ -1,7 +1,7 @@
 #pragma once
 
-/// User defaults: settings of one application for one user, that the application and its user change
-/// while it runs.
+/// User defaults: settings of one application for one user. The application reads them, and people and
+/// other programs change them while it runs.
 ///
 ///     rt::Ref<rt::UserDefaults> defaults = rt::UserDefaults::standardUserDefaults();
 ///     if (defaults->boolForKey("ZEBVerboseLogging")) ...
@@ -9,8 +9,6 @@
 ///     rt::UserDefaults::Observation observation = defaults->observe(
 ///         "ZEBVerboseLogging", rt::UserDefaults::Notify::kAlsoNow,
 ///         [weak = rt::Weak<Account>(account)] { if (auto account = weak.lock()) account->readAgain(); });
-///
-///     defaults->setBool(true, "ZEBVerboseLogging");
 ///
 /// The settings are in one text file, one `key = value` a line (Runtime/Defaults/DefaultsText.h), which
 /// people may edit at any time:
@@ -21,14 +19,13 @@
 /// APPLICATION is the main bundle's identifier or, without one, the process's name. Each read sees what is
 /// in the file at that moment: it asks the system whether the file has changed, which takes about a
 /// microsecond, and reads it again only if so. No file is no settings. A file that is malformed or cannot
-/// be read is reported once, in one line; until it is repaired, what was read last stands and nothing is
-/// written over it.
+/// be read is reported once, in one line; until it is repaired, what was read last stands.
 ///
-/// A change replaces the file as a whole and is on the disk when the call returns; processes that change
-/// it at the same time wait for each other. With the first observation a thread starts that waits for
-/// changes by other processes; where the system stops telling it of them, that is reported, and it tries each
-/// second to hear of them again. Nothing is started or read before a first use. The child of a fork goes on
-/// with what the parent had, but has no such thread until it observes something itself.
+/// To change a setting, write a file beside it and rename that to `defaults.conf`: no reader then sees half a
+/// file. With the first observation a thread starts that waits for changes; where the system stops telling it
+/// of them, that is reported, and it tries each second to hear of them again. Nothing is started or read
+/// before a first use. The child of a fork goes on with what the parent had, but has no such thread until it
+/// observes something itself.
 ///
 /// Any thread may use all of it. No lock is held while an observer or the report handler runs.
 ///
@@ -92,7 +89,7 @@ class RT_VISIBLE UserDefaults final : public Implements<UserDefaults, Object> {
 
   /// The application's own, made on first use and never destroyed. Where the environment names no folder
   /// (neither HOME nor XDG_CONFIG_HOME is an absolute path, or the process has raised privileges), that is
-  /// reported once, there are no settings, and changes throw. Never null.
+  /// reported once, and there are no settings. Never null.
   static Ref<UserDefaults> standardUserDefaults();
 
   /// The settings in the file at `path`; null for null, or for a path that is empty or has a NUL in it.
@@ -110,43 +107,17 @@ class RT_VISIBLE UserDefaults final : public Implements<UserDefaults, Object> {
   /// not 0 and nothing else. False for all others, and when there is none.
   bool boolForKey(std::string_view key) const;
 
-  /// The decimal integer that the value begins with, the nearest that fits where it is out of range; 1
-  /// where `boolForKey` reads a word as true. 0 for all others, and when there is none.
-  std::int64_t integerForKey(std::string_view key) const;
-
-  /// The decimal number, such as "-1.5e3", that the value begins with, whatever the locale; 1 where
-  /// `boolForKey` reads a word as true. 0 for all others, where it is out of range, and when there is none.
-  double realForKey(std::string_view key) const;
-
   /// The value as it is written; null when there is none.
   String stringForKey(std::string_view key) const;
 
-  /// Sets the value of `key`: booleans become YES or NO, numbers the shortest text that reads back the
-  /// same, a null string removes the value. Observers of the key are called before this returns, on this
-  /// thread, if the value is another than before; where a thread is calling them already, this one
-  /// included, that thread calls them once more instead. The first exception that leaves an observer passes,
-  /// after all were called.
+  /// Calls `observer`, not null, on a thread of these user defaults when the value of `key` has become
+  /// another; a key without a value counts as one. Observers are called in the order in which they came.
+  /// Calls for one observation do not overlap. Where values follow each other quickly some may be left out,
+  /// but not the last: read the value in the observer.
   ///
-  /// Throws, with nothing changed: std::system_error that names the path when the file cannot be read or
-  /// written, rt::Exception when it is malformed or there is no place for one, std::invalid_argument when
-  /// the key is not UTF-8, std::length_error when the file would be larger than 1 MiB. Throws std::bad_alloc,
-  /// when the value may be set already and observers may not have been called: they are by the next change.
-  void setBool(bool value, std::string_view key);
-  void setInteger(std::int64_t value, std::string_view key);
-  void setReal(double value, std::string_view key);
-  void setString(const String& value, std::string_view key);
-
-  /// Takes the value of `key` away. Otherwise as the functions above.
-  void remove(std::string_view key);
-
-  /// Calls `observer`, not null, when the value of `key` has become another, by whatever process; a key
-  /// without a value counts as one. Changes by this process call it as `setBool` says, those by others on
-  /// a thread of these user defaults. Calls for one observation do not overlap. Where values follow each
-  /// other quickly some may be left out, but not the last: read the value in the observer.
-  ///
-  /// An exception that leaves the observer passes to who calls it, `observe` included, which then has
-  /// observed nothing; on the thread of these user defaults it is reported. Where the system refuses to
-  /// watch the file, that is reported, and only changes by this process are told.
+  /// An exception that leaves the observer within `observe` passes to its caller, and nothing is observed
+  /// then; on the thread of these user defaults it is reported. Where the system refuses to watch the file,
+  /// that is reported, and no change is told of until `observe` is called again. Throws std::bad_alloc.
   Observation observe(std::string_view key, Notify notify, Block<void()> observer);
 
  private:

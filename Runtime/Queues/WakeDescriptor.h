@@ -2,9 +2,18 @@
 
 // A file descriptor that is readable while it is set. For rt::MainQueue only.
 
+#include <array>
 #include <atomic>
 
 namespace rt::detail {
+
+/// What the system has for it: opens the end to read from and the end to write to, which may be the same
+/// descriptor. Neither blocks, and programs that this one starts inherit neither. Returns whether there are
+/// any; `errno` says why not.
+bool openSystemWake(std::array<int, 2>& ends) noexcept;
+
+/// Has the system's own main loop, where there is one, drain the main queue.
+void wakeSystemMainLoop() noexcept;
 
 class WakeDescriptor {
  public:
@@ -40,7 +49,7 @@ class WakeDescriptor {
 
   std::atomic<bool> isSet_ = false;
   std::atomic<int> readEnd_ = -1;
-  std::atomic<int> writeEnd_ = -1;  // Where the system needs two.
+  std::atomic<int> writeEnd_ = -1;
 };
 
 }  // namespace rt::detail

@@ -1,6 +1,5 @@
 #include "Runtime/Queues/Queue.h"
 
-#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 #include <exception>
@@ -11,8 +10,6 @@
 namespace rt {
 
 namespace {
-
-constexpr int kLowestRelativePriority = -15;
 
 constinit std::atomic<Queue::UncaughtExceptionHandler> uncaughtExceptionHandler = nullptr;
 
@@ -67,10 +64,8 @@ class Queue::RunningScope {
 
 constinit thread_local Queue::RunningScope* Queue::RunningScope::innermost_ = nullptr;
 
-Queue::Queue(String label, QualityOfService qualityOfService, int relativePriority)
-    : label_(label ? std::move(label) : ""_s),
-      qualityOfService_(qualityOfService),
-      relativePriority_(static_cast<std::int16_t>(std::clamp(relativePriority, kLowestRelativePriority, 0))) {
+Queue::Queue(String label, QualityOfService qualityOfService)
+    : label_(label ? std::move(label) : ""_s), qualityOfService_(qualityOfService) {
   detail::QueueRegistry::add(*this);
 }
 
@@ -86,7 +81,6 @@ void Queue::enqueue(detail::Task& task) noexcept {
   detail::QueueRegistry::runTasksAtExit();
   // Known before the lock is let go, since the task may drop the last reference to the queue.
   const QualityOfService qualityOfService = qualityOfService_;
-  const int relativePriority = relativePriority_;
   lock_.lock();
   const bool isStranded = isScheduled_ && !isRunning_ && isShortOfThreads();
   const bool wantsSchedule = append(task);
@@ -94,7 +88,7 @@ void Queue::enqueue(detail::Task& task) noexcept {
   if (wantsSchedule) {
     schedule();
   } else if (isStranded) {
-    detail::WorkerPool::tryAgain(qualityOfService, relativePriority);
+    detail::WorkerPool::tryAgain(qualityOfService);
   }
 }
 
@@ -116,11 +110,11 @@ detail::TaskList Queue::start() noexcept {
 
 void Queue::schedule() noexcept {
   // From here on its tasks may run and drop the last reference to it.
-  detail::WorkerPool::schedule(*this, qualityOfService_, relativePriority_);
+  detail::WorkerPool::schedule(*this, qualityOfService_);
   detail::QueueRegistry::wakeExit();  // There may be no thread for it.
 }
 
-void Queue::perform(detail::FunctionView function) {
+void Queue::perform(FunctionView<void()> function) {
   if (isCurrent()) {
     std::fprintf(stderr,
                  "rt: sync on the queue \"%.*s\" from one of its own tasks, which would wait for itself\n",
@@ -282,7 +276,7 @@ bool Queue::hasReached(std::uint64_t goal) const noexcept {
 }
 
 bool Queue::isShortOfThreads() const noexcept {
-  return detail::WorkerPool::isShort(qualityOfService_, relativePriority_);
+  return detail::WorkerPool::isShort(qualityOfService_);
 }
 
 // Not analysed: there is no other thread. The tasks are the parent's and are forgotten, not destroyed. The

@@ -32,7 +32,7 @@
 /// `async` asks again, `sync` runs them on its own thread, and so does the thread that exits.
 ///
 /// Not for: work that waits for something outside for long, of which no more than 64 at once run for each
-/// degree of niceness; timers; priorities among the tasks of one queue.
+/// of urgent and other work; timers; priorities among the tasks of one queue.
 
 #include <atomic>
 #include <concepts>
@@ -44,6 +44,7 @@
 #include <type_traits>
 #include <utility>
 
+#include "Runtime/Base/FunctionView.h"
 #include "Runtime/Base/ThreadSafety.h"
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Locks/UnfairLock.h"
@@ -66,10 +67,8 @@ class RT_VISIBLE RT_CAPABILITY("queue") Queue : public Implements<Queue, Object>
   /// How often what tasks queue at exit is run in turn.
   static constexpr int kExitRounds = 16;
 
-  /// An empty queue. `label` is for people and need not be unique; null counts as empty. `relativePriority`
-  /// is from 0 down to -15, less urgent than others of the class; what is outside counts as the nearer end.
-  explicit Queue(String label, QualityOfService qualityOfService = QualityOfService::kDefault,
-                 int relativePriority = 0);
+  /// An empty queue. `label` is for people and need not be unique; null counts as empty.
+  explicit Queue(String label, QualityOfService qualityOfService = QualityOfService::kDefault);
   ~Queue() override;
 
   /// The main queue, whose tasks run on the main thread: see Runtime/Queues/MainQueue.h. Never null, and the
@@ -79,7 +78,6 @@ class RT_VISIBLE RT_CAPABILITY("queue") Queue : public Implements<Queue, Object>
   /// Never null.
   const String& label() const noexcept { return label_; }
   QualityOfService qualityOfService() const noexcept { return qualityOfService_; }
-  int relativePriority() const noexcept { return relativePriority_; }
 
   /// Has `task`, which is called without arguments and whose result is dropped, run after all tasks that
   /// are queued, and returns without waiting for it. The task is moved or copied into the one block of
@@ -102,17 +100,17 @@ class RT_VISIBLE RT_CAPABILITY("queue") Queue : public Implements<Queue, Object>
   std::invoke_result_t<Task> sync(Task&& task) RT_EXCLUDES(this) {
     using Result = std::invoke_result_t<Task>;
     if constexpr (std::is_void_v<Result>) {
-      perform(detail::FunctionView([&] { std::forward<Task>(task)(); }));
+      perform([&] { std::forward<Task>(task)(); });
     } else if constexpr (std::is_reference_v<Result>) {
       std::remove_reference_t<Result>* result = nullptr;
-      perform(detail::FunctionView([&] {
+      perform([&] {
         Result&& reference = std::forward<Task>(task)();
         result = &reference;
-      }));
+      });
       return static_cast<Result>(*result);
     } else {
       std::optional<Result> result;
-      perform(detail::FunctionView([&] { result.emplace(std::forward<Task>(task)()); }));
+      perform([&] { result.emplace(std::forward<Task>(task)()); });
       return *std::move(result);  // NOLINT(bugprone-unchecked-optional-access): the task has run
     }
   }
@@ -168,7 +166,7 @@ class RT_VISIBLE RT_CAPABILITY("queue") Queue : public Implements<Queue, Object>
   void runOnWorker() noexcept override;
   void enqueue(detail::Task& task) noexcept RT_EXCLUDES(lock_);
   bool append(detail::Task& task) noexcept RT_REQUIRES(lock_);
-  void perform(detail::FunctionView function) RT_EXCLUDES(lock_);
+  void perform(FunctionView<void()> function) RT_EXCLUDES(lock_);
   detail::TaskList start() noexcept RT_REQUIRES(lock_);
   std::size_t runBatch(RunningScope& scope, const std::atomic<bool>* stop = nullptr) noexcept;
   bool takeMore(RunningScope& scope) noexcept RT_EXCLUDES(lock_);
@@ -183,7 +181,6 @@ class RT_VISIBLE RT_CAPABILITY("queue") Queue : public Implements<Queue, Object>
 
   const String label_;
   const QualityOfService qualityOfService_;
-  const std::int16_t relativePriority_;
 
   // A queue that has tasks is running, and whoever runs it looks for more when it is done, or scheduled,
   // or both, where a thread that waits has been quicker than the pool. While it is any of these, it has a

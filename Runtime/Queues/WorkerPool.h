@@ -3,14 +3,15 @@
 // The threads that all queues share. For rt::Queue only.
 //
 // No thread runs until there is the first work; one that has had none for `idleTimeout` ends. Work that
-// finds no idle thread gets a new one, up to kMaximumThreads for each degree of niceness: so tasks that
-// wait for each other on different queues do not starve each other. On macOS the threads are the
+// finds no idle thread gets a new one, up to kMaximumThreads for urgent and as many for other work: so tasks
+// that wait for each other on different queues do not starve each other. On macOS the threads are the
 // system's.
 
 #include <atomic>
 #include <chrono>
 #include <cstdint>
 
+#include "Runtime/Queues/LinkedList.h"
 #include "Runtime/Queues/QualityOfService.h"
 
 namespace rt::detail {
@@ -29,32 +30,11 @@ class Work {
   virtual ~Work() = default;
 
  private:
-  friend class WorkList;
+  friend class LinkedList<Work>;
   Work* next_ = nullptr;
 };
 
-/// Works in the order in which they came.
-class WorkList {
- public:
-  bool isEmpty() const noexcept { return first_ == nullptr; }
-
-  void append(Work& work) noexcept {
-    work.next_ = nullptr;
-    (first_ == nullptr ? first_ : last_->next_) = &work;
-    last_ = &work;
-  }
-
-  /// The first, which is no longer in the list, or null.
-  Work* takeFirst() noexcept {
-    Work* work = first_;
-    if (work != nullptr) first_ = work->next_;
-    return work;
-  }
-
- private:
-  Work* first_ = nullptr;
-  Work* last_ = nullptr;
-};
+using WorkList = LinkedList<Work>;
 
 class WorkerPool {
  public:
@@ -65,13 +45,13 @@ class WorkerPool {
 
   /// Has some thread of the pool run `work` once. It is in the pool once at a time. Where the system
   /// refuses a thread and there is none, the work waits for the next call of this or of `tryAgain`.
-  static void schedule(Work& work, QualityOfService qualityOfService, int relativePriority) noexcept;
+  static void schedule(Work& work, QualityOfService qualityOfService) noexcept;
 
   /// Asks the system for a thread once more, where work of the kind waits for one.
-  static void tryAgain(QualityOfService qualityOfService, int relativePriority) noexcept;
+  static void tryAgain(QualityOfService qualityOfService) noexcept;
 
   /// Whether work of the kind waits and no further thread can be had for it; out of date at once.
-  static bool isShort(QualityOfService qualityOfService, int relativePriority) noexcept;
+  static bool isShort(QualityOfService qualityOfService) noexcept;
 
   /// In the child of a fork: forgets all work and all threads but the caller.
   static void resetAfterFork() noexcept;

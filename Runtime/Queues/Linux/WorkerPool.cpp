@@ -5,10 +5,7 @@
 #include <sys/resource.h>
 #include <unistd.h>
 
-#include <algorithm>
-#include <array>
 #include <csignal>
-#include <cstddef>
 #include <new>
 
 #include "Runtime/Base/ThreadSafety.h"
@@ -71,8 +68,8 @@ class IdleWorker {
   std::atomic<std::uint32_t> state_ = kAwake;
 };
 
-/// The work and the workers of one degree of niceness. A worker keeps its degree: a thread that has
-/// become nicer may not go back without a privilege.
+/// The work and the workers of one niceness. A worker keeps it: a thread that has become nicer may not go
+/// back without a privilege.
 class Level {
  public:
   void schedule(Work& work) noexcept {
@@ -177,21 +174,15 @@ class Level {
   std::atomic<bool> isShort_ = false;
 };
 
-constexpr std::size_t kLevelCount = 16;
-constinit std::array<Level, kLevelCount> levels;
+constinit Level urgent;
+constinit Level utility;
+constexpr int kNicenessOfUtility = 5;
 
 /// The level of the calling thread; null where it is no worker.
 constinit thread_local Level* levelOfCaller = nullptr;
 
-std::size_t niceness(QualityOfService qualityOfService, int relativePriority) noexcept {
-  std::size_t base = 0;
-  if (qualityOfService == QualityOfService::kUtility) base = 5;
-  if (qualityOfService == QualityOfService::kBackground) base = 10;
-  return base + (static_cast<std::size_t>(-relativePriority) / 3);
-}
-
-Level& level(QualityOfService qualityOfService, int relativePriority) noexcept {
-  return levels.at(niceness(qualityOfService, relativePriority));
+Level& level(QualityOfService qualityOfService) noexcept {
+  return qualityOfService == QualityOfService::kUtility ? utility : urgent;
 }
 
 void* runWorker(void* argument) {
@@ -199,8 +190,8 @@ void* runWorker(void* argument) {
   // From the main thread on, as the thread that creates this one may be nicer than the process. A worker
   // that the system then refuses to make less nice does the work that waits, but does not stay for more.
   const int ofProcess = getpriority(PRIO_PROCESS, static_cast<id_t>(getpid()));
-  const bool isAsNiceAsWanted =
-      setpriority(PRIO_PROCESS, 0, ofProcess + static_cast<int>(levelOfCaller - levels.data())) == 0;
+  const int added = levelOfCaller == &utility ? kNicenessOfUtility : 0;
+  const bool isAsNiceAsWanted = setpriority(PRIO_PROCESS, 0, ofProcess + added) == 0;
   // Its creator's name, which it inherits, is not its own.
   setSystemThreadName(nullptr);
   levelOfCaller->run(isAsNiceAsWanted);
@@ -230,20 +221,20 @@ bool Level::startThread() noexcept {
 constinit std::atomic<std::chrono::nanoseconds::rep> WorkerPool::idleTimeout =
     std::chrono::nanoseconds(std::chrono::seconds(5)).count();
 
-void WorkerPool::schedule(Work& work, QualityOfService qualityOfService, int relativePriority) noexcept {
-  level(qualityOfService, relativePriority).schedule(work);
+void WorkerPool::schedule(Work& work, QualityOfService qualityOfService) noexcept {
+  level(qualityOfService).schedule(work);
 }
 
-void WorkerPool::tryAgain(QualityOfService qualityOfService, int relativePriority) noexcept {
-  level(qualityOfService, relativePriority).tryAgain();
+void WorkerPool::tryAgain(QualityOfService qualityOfService) noexcept {
+  level(qualityOfService).tryAgain();
 }
 
-bool WorkerPool::isShort(QualityOfService qualityOfService, int relativePriority) noexcept {
-  return level(qualityOfService, relativePriority).isShort();
+bool WorkerPool::isShort(QualityOfService qualityOfService) noexcept {
+  return level(qualityOfService).isShort();
 }
 
 void WorkerPool::resetAfterFork() noexcept {
-  for (Level& each : levels) new (&each) Level;
+  for (Level* each : {&urgent, &utility}) new (each) Level;
   if (levelOfCaller != nullptr) levelOfCaller->countCaller();
 }
 

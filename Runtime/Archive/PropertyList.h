@@ -15,6 +15,9 @@
 /// index, so that a value which many collections share is there once, and reading it takes time and
 /// memory in proportion to the size of the file, whatever is in it.
 ///
+/// Of the kinds of values that the format has, dates, data and short real numbers are refused: nothing that
+/// is archived has any.
+///
 /// Not for: objects (see Runtime/Archive/KeyedUnarchiver.h); settings that people edit
 /// (Runtime/Defaults/UserDefaults.h); property lists as XML.
 
@@ -45,18 +48,11 @@ class PropertyList {
   /// How deep values may be nested: a number by itself is 1 deep, an array of numbers 2.
   static constexpr std::size_t kMaximumDepth = 512;
 
-  /// A point in time.
-  struct Date {
-    /// Seconds since the start of 2001 in UTC.
-    double seconds;
-    bool operator==(const Date&) const = default;
-  };
   /// What refers to another object in a keyed archive.
   struct Reference {
     std::uint64_t number;
     bool operator==(const Reference&) const = default;
   };
-  using Data = std::vector<std::byte>;
   /// UTF-8.
   using Text = std::string;
   using Array = std::vector<Index>;
@@ -64,8 +60,7 @@ class PropertyList {
   using Dictionary = std::vector<std::pair<Index, Index>>;
 
   /// An integer is a std::uint64_t only where it is too large for std::int64_t.
-  struct Value : std::variant<bool, std::int64_t, std::uint64_t, double, Date, Data, Text, Reference, Array,
-                              Dictionary> {
+  struct Value : std::variant<bool, std::int64_t, std::uint64_t, double, Text, Reference, Array, Dictionary> {
     using variant::variant;
     Value(Value&&) noexcept = default;
     Value& operator=(Value&&) noexcept = default;

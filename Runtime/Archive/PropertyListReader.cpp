@@ -85,18 +85,9 @@ class Reader {
         readInteger(low);
         return;
       case 0x2:
-        if (low != 2 && low != 3) break;
-        list_.add(takeReal(low == 2 ? 4 : 8));
-        return;
-      case 0x3:
         if (low != 3) break;
-        list_.add(PropertyList::Date{takeReal(8)});
+        list_.add(std::bit_cast<double>(unsignedNumber(take(8))));
         return;
-      case 0x4: {
-        const Bytes bytes = takeElements(low, 1);
-        list_.add(PropertyList::Data(bytes.begin(), bytes.end()));
-        return;
-      }
       case 0x5:
         readAscii(low);
         return;
@@ -144,12 +135,6 @@ class Reader {
       if (high != (isNegative ? ~std::uint64_t{0} : 0)) fail("an integer of more than 64 bits", start_);
     }
     list_.add(static_cast<std::int64_t>(number));
-  }
-
-  double takeReal(std::size_t size) {
-    const std::uint64_t bits = unsignedNumber(take(size));
-    if (size == 4) return static_cast<double>(std::bit_cast<float>(static_cast<std::uint32_t>(bits)));
-    return std::bit_cast<double>(bits);
   }
 
   void readAscii(unsigned low) {

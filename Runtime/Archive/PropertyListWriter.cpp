@@ -78,14 +78,6 @@ class Writer {
     appendNumber(0x23, 1);
     appendNumber(std::bit_cast<std::uint64_t>(value), 8);
   }
-  void writeObject(PropertyList::Date date) {
-    appendNumber(0x33, 1);
-    appendNumber(std::bit_cast<std::uint64_t>(date.seconds), 8);
-  }
-  void writeObject(const PropertyList::Data& data) {
-    appendHeader(0x4, data.size());
-    append(data);
-  }
   void writeObject(const PropertyList::Text& text) {
     if (std::ranges::all_of(text, [](char c) { return static_cast<unsigned char>(c) < 0x80; })) {
       appendHeader(0x5, text.size());

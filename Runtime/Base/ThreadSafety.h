@@ -32,8 +32,6 @@
 
 /// On a field: touched only with the lock held.
 #define RT_GUARDED_BY(lock) RT_THREAD_ANNOTATION(guarded_by(lock))
-/// On a pointer or a reference-counted field: what it points to is touched only with the lock held.
-#define RT_POINTER_GUARDED_BY(lock) RT_THREAD_ANNOTATION(pt_guarded_by(lock))
 
 /// On a function: the caller holds the locks, before and after.
 #define RT_REQUIRES(...) RT_THREAD_ANNOTATION(requires_capability(__VA_ARGS__))

@@ -43,11 +43,6 @@ class RT_VISIBLE AssertionHandler : public Implements<AssertionHandler, Object> 
   /// description says. It may be called by any thread that it is the handler of, at once.
   virtual void handleFailureInFunction(const String& function, const String& file, std::uint64_t lineNumber,
                                        const String& description);
-
-  /// The same for a failure in the operation `selector` of `object`, which is not null: the function is
-  /// "-[ClassName selector]".
-  virtual void handleFailureInMethod(const String& selector, const Object& object, const String& file,
-                                     std::uint64_t lineNumber, const String& description);
 };
 
 }  // namespace rt

@@ -1,6 +1,11 @@
 #pragma once
 
-// The names of functions that their images do not export. Inside of the call stacks.
+// The names of functions that their images do not export. For the call stacks only.
+//
+// On Linux, `dladdr` knows exported functions alone, and nothing in a program that is linked statically. A
+// program exports none of its own functions unless it is linked for that, so a logged call stack would have
+// numbers where people look for names. CallStack_test and CallStack_static_test ask for the names of static
+// functions.
 
 #include <cstdint>
 #include <map>

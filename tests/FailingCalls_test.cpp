@@ -198,7 +198,6 @@ class FailingCalls : public testing::Test {
                                                   "eventfd2",
                                                   "fcntl",
                                                   "fstat",
-                                                  "getcwd",
                                                   "ioctl",
                                                   "inotify_init1",
                                                   "inotify_add_watch",

@@ -1,9 +1,10 @@
 // The command's memory: handed out from one piece, front to back, and never taken back. The C library's
 // own allocator does as a dozen environment variables say, some of which end the process; a command that
-// may run with raised privileges listens to none. mount-point_binary_test asks for it: it compares runs in hostile
-// environments, and lists the variables that may be read. The command runs for a millisecond and allocates a handful of
-// blocks, the largest of which holds an argument, at most 128 KiB. The C++ library reserves 71 KiB for
-// exceptions. The C library and the libraries that the command carries take about 3 KiB when they are loaded.
+// may run with raised privileges listens to none. mount-point_binary_test asks for it: it compares runs in
+// hostile environments, and lists the variables that may be read. The command runs for a millisecond and
+// allocates a handful of blocks, the largest of which holds an argument, at most 128 KiB. The C++ library
+// reserves 71 KiB for exceptions. The C library and the libraries that the command carries take about 3 KiB
+// when they are loaded.
 //
 // One variable remains: without raised privileges the C library takes LD_LIBRARY_PATH apart before `main`,
 // and ends the process where more than about 2,000 different directories in it leave no memory. With raised

@@ -10,7 +10,6 @@
 #include <utility>
 
 #include "Runtime/Defaults/DefaultsStore.h"
-#include "Runtime/Defaults/FilePath.h"
 #include "Runtime/Defaults/SystemDefaultsFolder.h"
 #include "Runtime/Locks/Lazy.h"
 #include "Runtime/Process/Bundle.h"
@@ -67,11 +66,9 @@ Ref<UserDefaults> UserDefaults::standardUserDefaults() {
 }
 
 Ref<UserDefaults> UserDefaults::initWithPath(const String& path) {
-  if (path.isEmpty() || path.contains(std::string_view("\0", 1))) return nullptr;
-  // Of one that is relative, what it means now.
-  std::string whole = absolutePath(std::string(path.view()));
+  if (!path.hasPrefix("/") || path.contains(std::string_view("\0", 1))) return nullptr;
   return Ref<UserDefaults>::adopt(
-      new UserDefaults(std::make_shared<detail::DefaultsStore>(std::move(whole), "")));
+      new UserDefaults(std::make_shared<detail::DefaultsStore>(std::string(path.view()), "")));
 }
 
 void UserDefaults::setReportHandler(Block<void(const String&)> handler) {

@@ -92,8 +92,8 @@ class RT_VISIBLE UserDefaults final : public Implements<UserDefaults, Object> {
   /// reported once, and there are no settings. Never null.
   static Ref<UserDefaults> standardUserDefaults();
 
-  /// The settings in the file at `path`; null for null, or for a path that is empty or has a NUL in it.
-  /// Nothing is opened yet.
+  /// The settings in the file at `path`, which begins with a slash; null for null, and for a path that does
+  /// not or has a NUL in it. Nothing is opened yet.
   static Ref<UserDefaults> initWithPath(const String& path);
 
   /// Has `handler` called, instead of standard error written to, with each report: one line without its

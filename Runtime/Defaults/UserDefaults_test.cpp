@@ -38,6 +38,8 @@ TEST_F(UserDefaults, NoFileIsNoSettings) {
 TEST_F(UserDefaults, NeedPath) {
   EXPECT_FALSE(rt::UserDefaults::initWithPath(nullptr));
   EXPECT_FALSE(rt::UserDefaults::initWithPath(""_s));
+  EXPECT_FALSE(rt::UserDefaults::initWithPath("defaults.conf"_s))
+      << "it would lead elsewhere from each folder";
   EXPECT_FALSE(rt::UserDefaults::initWithPath("/tmp/a\0b"_s));
 }
 

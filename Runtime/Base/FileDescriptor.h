@@ -3,7 +3,8 @@
 /// An open file, closed when it goes out of scope.
 ///
 ///     auto file = rt::FileDescriptor::open("/etc/localtime", O_RDONLY);
-///     ssize_t count = read(file.get(), buffer, sizeof buffer);
+///     std::array<char, 4096> bytes;
+///     ssize_t count = read(file.get(), bytes.data(), bytes.size());
 ///
 /// Not for: a file that is shared (Runtime/Process/FileHandle.h).
 

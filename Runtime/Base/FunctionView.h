@@ -3,7 +3,9 @@
 /// A reference to something that can be called, without a copy of it and without an allocation.
 ///
 ///     void forEachLine(std::string_view text, rt::FunctionView<void(std::string_view)> visit);
-///     forEachLine(text, [&](std::string_view line) { lines.push_back(line); });
+///
+///     std::vector<std::string_view> lines;
+///     forEachLine("one\ntwo", [&](std::string_view line) { lines.push_back(line); });
 ///
 /// What it refers to must outlive it. It is as safe to copy as a pointer, and calls from several threads are
 /// as safe as those of what it refers to.

@@ -30,10 +30,10 @@ timespec changeTime(const struct stat& status) {
 DefaultsFile::Version DefaultsFile::version() const noexcept {
   Version version;
   timespec now{};
-  // Before the status, so that a change after this moment is of this moment or later.
+  // Read before the status, so that a later change has this time or a later one.
   clock_gettime(CLOCK_REALTIME, &now);
   version.exists_ = stat(path_.c_str(), &version.status_) == 0;
-  // File systems count in steps of up to two seconds.
+  // The clock of a file system may have steps of two seconds.
   version.isSettled_ = version.exists_ ? changeTime(version.status_).tv_sec + 2 < now.tv_sec
                                        : errno == ENOENT || errno == ENOTDIR;
   return version;
@@ -53,7 +53,7 @@ bool DefaultsFile::isStill(const Version& version) const noexcept {
 std::optional<std::string> DefaultsFile::content(std::size_t maximumSize) const {
   FileDescriptor file;
   try {
-    // Without O_NONBLOCK, a pipe of that name would keep the caller waiting.
+    // Without O_NONBLOCK, a named pipe would block the caller.
     file = FileDescriptor::open(path_, O_RDONLY | O_NONBLOCK);
   } catch (const std::system_error& error) {
     if (error.code().value() == ENOENT || error.code().value() == ENOTDIR) return std::nullopt;
@@ -63,7 +63,7 @@ std::optional<std::string> DefaultsFile::content(std::size_t maximumSize) const 
   if (fstat(file.get(), &status) != 0) fail(errno, "cannot read " + path_);
   if (!S_ISREG(status.st_mode)) fail(EINVAL, "no plain file: " + path_);
 
-  // The size may change meanwhile.
+  // The size may change while the file is read.
   std::string content;
   std::size_t length = 0;
   for (;;) {

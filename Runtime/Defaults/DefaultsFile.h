@@ -18,13 +18,13 @@
 
 namespace rt {
 
-/// A plain value: any thread may read it, and call what does not change it.
+/// Threads: as safe as a string.
 class DefaultsFile {
  public:
-  /// What tells one state of the file from the next.
+  /// A state of the file, to be compared with a later one.
   class Version {
    public:
-    /// None: the file never is as it was then.
+    /// Makes a version that no state of the file has.
     Version() noexcept = default;
 
    private:
@@ -38,15 +38,17 @@ class DefaultsFile {
 
   const std::string& path() const noexcept { return path_; }
 
-  /// The present version. One that is so fresh that the clock of the file system might give it to the
-  /// next one, too, is told from all others, and so is one that cannot be found out.
+  /// Returns the present version. If the last change is so recent that the next one might get the same time
+  /// from the file system's clock, the version differs from all others. So it does if the system does not
+  /// tell it.
   Version version() const noexcept;
 
-  /// Whether the file is of `version`, as far as the system shows.
+  /// Returns whether the file still has `version`, as far as the system shows.
   bool isStill(const Version& version) const noexcept;
 
-  /// What is in the file; none when there is no file. Throws std::system_error that names the path when
-  /// it is no plain file, is larger than `maximumSize` bytes or cannot be read.
+  /// Returns the content of the file, or nullopt if there is no file. Throws std::bad_alloc. Throws a
+  /// std::system_error that names the path if it is not a regular file, is larger than `maximumSize` bytes
+  /// or cannot be read.
   std::optional<std::string> content(std::size_t maximumSize) const;
 
  private:

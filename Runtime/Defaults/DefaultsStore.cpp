@@ -36,7 +36,7 @@ std::string textOf(const std::exception_ptr& exception) {
   }
 }
 
-// Keeps signals away from a thread that is started meanwhile: the host's handlers run on its own threads.
+// Blocks signals for a thread that is started meanwhile: the host's handlers run on the host's threads.
 class SignalsBlocked {
  public:
   SignalsBlocked() {
@@ -75,7 +75,7 @@ void reportDefaults(std::initializer_list<std::string_view> parts) noexcept {
     } else {
       StandardError::write(line.append("\n"), std::chrono::seconds(1));
     }
-  } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): it goes unsaid
+  } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): it is not reported
   }
 }
 
@@ -105,7 +105,7 @@ std::shared_ptr<DefaultsObserver> DefaultsStore::observe(std::string_view key, b
   {
     const LockGuard guard(lock_);
     forgetParent();
-    // First, so that no change after what is read here goes unnoticed.
+    // First, so that no change after the following read goes unnoticed.
     watchProblem = startWatching();
     readProblem = refresh();
     if (alsoNow) {
@@ -127,7 +127,8 @@ std::shared_ptr<DefaultsObserver> DefaultsStore::observe(std::string_view key, b
 }
 
 void DefaultsStore::remove(DefaultsObserver& observer) noexcept {
-  // What it captured is let go of here, without the lock, and not by whoever still looks at it.
+  // Its captures are destroyed here, without the lock, and not by a thread that still refers to the
+  // observer.
   Block<void()> block;
   const LockGuard guard(lock_);
   forgetParent();
@@ -144,7 +145,7 @@ void DefaultsStore::remove(DefaultsObserver& observer) noexcept {
 
 void DefaultsStore::stop() noexcept {
   const LockGuard guard(lock_);
-  // A child of a fork has the parent's means to wake the parent's thread.
+  // The child of a fork shares the descriptor that would wake the parent's thread.
   forgetParent();
   isStopped_ = true;
   if (watch_ != nullptr) watch_->stop();
@@ -156,7 +157,7 @@ void DefaultsStore::forgetParent() {
   process_ = process;
   watch_ = nullptr;
   for (const auto& observer : observers_) {
-    // One in which the thread forks goes on in the child as well.
+    // If the observer's own thread has forked, the observer goes on in the child.
     if (observer->caller == 0 || !isThreadGone(observer->caller)) continue;
     observer->caller = 0;
     observer->isRunning = false;
@@ -211,7 +212,7 @@ void DefaultsStore::watch(std::shared_ptr<SystemFileWatch> watch) noexcept {
   while (watch != nullptr) {
     try {
       Thread::setCurrentName("user defaults"_s);
-      // First, what has happened before it was watched.
+      // First, for changes from before the file was watched.
       do tellOfChange();
       while (watch->wait());
       return;
@@ -277,7 +278,7 @@ std::exception_ptr DefaultsStore::call(const Observers& observers) noexcept {
 }
 
 bool DefaultsStore::isDue(DefaultsObserver& observer) {
-  // Whatever leaves this, but that it is due, ends this thread's turn with the observer.
+  // Unless the observer is due, this thread is not its caller any more when the function ends.
   struct End {
     ~End() RT_NO_THREAD_SAFETY_ANALYSIS {
       if (isDue) return;
@@ -292,7 +293,7 @@ bool DefaultsStore::isDue(DefaultsObserver& observer) {
   };
   const LockGuard guard(lock_);
   End end{.store = *this, .observer = observer};
-  // What has come to be meanwhile is this thread's, too: others have left it the observer.
+  // A change during the call is for this thread as well: other threads leave the observer to it.
   if (observer.isRemoved || (observer.isRunning && hasSeen(observer))) return false;
   observer.seen = find(observer.key);
   observer.isRunning = true;

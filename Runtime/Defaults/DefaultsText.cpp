@@ -12,7 +12,7 @@ namespace rt {
 namespace {
 
 constexpr std::string_view kBlanks = " \t";
-// What follows the backslash, and what both stand for.
+// The character behind a backslash, and the character that both stand for.
 constexpr std::array<std::pair<char, char>, 5> kEscapes{
     {{'"', '"'}, {'\\', '\\'}, {'n', '\n'}, {'r', '\r'}, {'t', '\t'}}};
 
@@ -21,7 +21,7 @@ bool isControl(char character) {
   return byte < 0x20 || byte == 0x7F;
 }
 
-// Reads one line, from its start to its end.
+// Reads one line from its start to its end.
 class Line {
  public:
   explicit Line(std::string_view text) : rest_(text) { skipBlanks(); }
@@ -49,7 +49,7 @@ class Line {
 
   void skipBlanks() { rest_.remove_prefix(std::min(rest_.find_first_not_of(kBlanks), rest_.size())); }
 
-  // What comes before one of `ends`, without the blanks at its end.
+  // Takes the text before one of the characters `ends`. Returns it without blanks at its end.
   std::string bare(const char* ends) {
     const std::string_view all = rest_.substr(0, rest_.find_first_of(ends));
     rest_.remove_prefix(all.size());

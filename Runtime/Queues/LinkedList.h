@@ -1,7 +1,7 @@
 #pragma once
 
-// A list whose elements hold the pointer to the next one, so that it allocates nothing. For rt::Queue and its
-// threads only.
+// A list whose elements hold the pointer to the next one, so that it allocates nothing. For rt::Queue and
+// its threads only.
 
 #include <utility>
 

@@ -1,6 +1,6 @@
 #pragma once
 
-// What a queue holds. For rt::Queue only.
+// The tasks of a queue. For rt::Queue only.
 
 #include <atomic>
 #include <concepts>
@@ -21,7 +21,7 @@ class Task {
   Task(const Task&) = delete;
   Task& operator=(const Task&) = delete;
 
-  /// Does it, once; the task may be gone afterwards, also when an exception passes.
+  /// Runs the task. It is called once. The task may not exist afterwards, even if an exception is thrown.
   virtual void run() = 0;
 
  protected:
@@ -35,7 +35,7 @@ class Task {
 
 using TaskList = LinkedList<Task>;
 
-/// A task that nobody waits for, in a block of memory of its own.
+/// A task that no thread waits for. It is in a block of memory of its own, and deletes itself.
 template <class Function>
 class AsyncTask final : public Task {
  public:
@@ -59,14 +59,15 @@ class SyncTask final : public Task {
 
   explicit SyncTask(FunctionView<void()> function) noexcept : function_(function) {}
 
-  /// By whoever runs the queue: calls the function, keeps what it throws, and wakes who waits.
+  /// Calls the function, keeps what it throws, and wakes the waiting thread. For the thread that runs the
+  /// queue.
   void run() override;
 
-  /// Instead: tells who waits to run the queue up to this task, and the task.
+  /// Tells the waiting thread to run the queue up to and including this task. It is called instead of `run`.
   void giveTurn() noexcept { wake(kTurn); }
 
-  /// By the thread that waits: returns when the task has run or it is its turn. Throws what the function
-  /// has thrown.
+  /// Returns when the task has run or the calling thread is to run it. Throws what the function has thrown.
+  /// For the thread that waits.
   Outcome wait();
 
  private:

@@ -12,7 +12,7 @@ namespace rt::detail {
 
 namespace {
 
-// What is written at a time; an event counter takes nothing smaller.
+// What is written at a time. An event counter takes nothing smaller.
 using Count = std::uint64_t;
 
 void closeEnds(const std::array<int, 2>& ends) noexcept {
@@ -77,7 +77,7 @@ void WakeDescriptor::renewAfterFork() noexcept {
     writeEnd_.store(ends[1] == ends[0] ? descriptor : ends[1]);
     return;
   }
-  // Rather none, which the next `open` reports or makes good, than the parent's.
+  // No descriptor is better than the parent's. The next `open` opens one, or reports that it cannot.
   close(descriptor);
   if (isOpen) closeEnds(ends);
   readEnd_.store(-1);

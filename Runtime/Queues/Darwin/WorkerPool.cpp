@@ -35,7 +35,7 @@ bool WorkerPool::isShort(QualityOfService) noexcept {
   return false;
 }
 
-// The system's pool does not survive a fork, and says so when it is used.
+// The system's pool does not survive a fork, and ends the program when it is used in the child.
 void WorkerPool::resetAfterFork() noexcept {}
 
 }  // namespace rt::detail

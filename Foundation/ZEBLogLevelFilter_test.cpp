@@ -90,7 +90,7 @@ TEST_F(ZEBLogLevelFilterTest, PrefersTheEnvironmentToTheUserDefault) {
   const auto filter = ZEBLogLevelFilter::init();
   filter->didAttachToLogger();
   EXPECT_FALSE(filter->verboseLoggingEnabled());
-  rt::UserDefaults::standardUserDefaults()->setInteger(2, kSetting);
+  privateDefaults.change(kSetting, "2");
   EXPECT_FALSE(filter->verboseLoggingEnabled());
   filter->willDetachFromLogger();
 }
@@ -106,21 +106,20 @@ TEST_F(ZEBLogLevelFilterTest, ReadsTheEnvironmentAgainWhenItIsAttached) {
 }
 
 TEST_F(ZEBLogLevelFilterTest, FollowsTheUserDefaultFromAttachmentToDetachment) {
-  const auto defaults = rt::UserDefaults::standardUserDefaults();
   const auto filter = ZEBLogLevelFilter::init();
-  defaults->setBool(true, kSetting);
+  setDefault("YES");
   EXPECT_FALSE(filter->verboseLoggingEnabled());
   filter->didAttachToLogger();
   EXPECT_TRUE(filter->verboseLoggingEnabled());
-  defaults->setBool(false, kSetting);
+  privateDefaults.change(kSetting, "NO");
   EXPECT_FALSE(filter->verboseLoggingEnabled());
-  defaults->setBool(true, "another key");
+  privateDefaults.change("another key", "YES");
   EXPECT_FALSE(filter->verboseLoggingEnabled());
-  defaults->setBool(true, kSetting);
+  privateDefaults.change(kSetting, "YES");
   EXPECT_TRUE(filter->verboseLoggingEnabled());
   filter->willDetachFromLogger();
-  // The filter is no longer told of changes.
-  defaults->remove(kSetting);
+  // Nobody tells it any more.
+  privateDefaults.change(kSetting, "NO");
   EXPECT_TRUE(filter->verboseLoggingEnabled());
   filter->didAttachToLogger();
   EXPECT_FALSE(filter->verboseLoggingEnabled());
@@ -137,14 +136,13 @@ TEST_F(ZEBLogLevelFilterTest, ReadsNothingIfAttachedAlready) {
   filter->willDetachFromLogger();
 }
 
-TEST_F(ZEBLogLevelFilterTest, OneDetachmentEndsAllAttachments) {
-  const auto defaults = rt::UserDefaults::standardUserDefaults();
+TEST_F(ZEBLogLevelFilterTest, IsDetachedOnceHoweverOftenItWasAttached) {
   const auto filter = ZEBLogLevelFilter::init();
   filter->willDetachFromLogger();
   filter->didAttachToLogger();
   filter->didAttachToLogger();
   filter->willDetachFromLogger();
-  defaults->setBool(true, kSetting);
+  privateDefaults.change(kSetting, "YES");
   EXPECT_FALSE(filter->verboseLoggingEnabled());
   filter->willDetachFromLogger();
 }
@@ -168,9 +166,9 @@ TEST_F(ZEBLogLevelFilterTest, FollowsChangesByAnotherProcess) {
   EXPECT_FALSE(filter->verboseLoggingEnabled());
 }
 
-// Attaches, detaches, changes the default and asks, all at once. At the end the filter knows the last value.
-TEST_F(ZEBLogLevelFilterTest, IsThreadSafe) {
-  const auto defaults = rt::UserDefaults::standardUserDefaults();
+// Attaching, detaching, changing and asking at once: at the end the filter knows the last value.
+TEST_F(ZEBLogLevelFilterTest, MayBeUsedByManyThreads) {
+  SettingsFile settings(privateDefaults.file());
   const auto filter = ZEBLogLevelFilter::init();
   std::vector<std::thread> threads;
   threads.reserve(2);
@@ -183,11 +181,11 @@ TEST_F(ZEBLogLevelFilterTest, IsThreadSafe) {
       }
     });
   }
-  for (int i = 0; i < 20; ++i) defaults->setBool(i % 2 == 0, kSetting);
+  for (int i = 0; i < 20; ++i) settings.set(kSetting, i % 2 == 0 ? "YES" : "NO");
   for (std::thread& thread : threads) thread.join();
   filter->didAttachToLogger();
   EXPECT_FALSE(filter->verboseLoggingEnabled());
-  defaults->setBool(true, kSetting);
+  privateDefaults.change(kSetting, "YES");
   EXPECT_TRUE(filter->verboseLoggingEnabled());
   filter->willDetachFromLogger();
 }
@@ -222,8 +220,8 @@ TEST_F(ZEBLogLevelFilterTest, FailsAnAssertionIfDestroyedWhileAttached) {
   EXPECT_EQ(failure.file, "Foundation/ZEBLogger"_s);
   EXPECT_EQ(failure.lineNumber, 544U);
   EXPECT_EQ(failure.description, kDescription);
-  // If the handler returns, the filter still stops observing.
-  rt::UserDefaults::standardUserDefaults()->setBool(true, kSetting);
+  // Where the handler returns, the filter watches nothing any more all the same.
+  privateDefaults.change(kSetting, "YES");
 }
 
 TEST_F(ZEBLogLevelFilterTest, FailsNoAssertionIfDetachedOrNeverAttached) {

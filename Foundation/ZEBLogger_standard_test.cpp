@@ -109,13 +109,13 @@ TEST_F(ZEBLoggerTest, BecomesVerboseWhileItRuns) {
   const auto logger = ZEBLogger::standardLogger();
   logger->setWriter(recorder_);
   logger->setFormatter(nullptr);
-  const auto defaults = rt::UserDefaults::standardUserDefaults();
   logger->logInfo("before"_s);
-  defaults->setBool(true, "ZEBVerboseLogging");
+  privateDefaults.change("ZEBVerboseLogging", "YES");
   logger->logInfo("verbose"_s);
   logger->logDebug("never"_s);
-  defaults->remove("ZEBVerboseLogging");
+  privateDefaults.change("ZEBVerboseLogging", "NO");
   logger->logInfo("after"_s);
+  fs::remove(privateDefaults.file());
   EXPECT_THAT(recorder_->lines(), ElementsAre("2 verbose"));
 }
 

@@ -1,5 +1,4 @@
-// Reads files of user defaults. An unchanged file must keep its text. A changed file must be readable again.
-#include <algorithm>
+// Files of user defaults: a text is read or refused, and a setting behind one that can be read is found.
 #include <cstddef>
 #include <cstdint>
 #include <cstdlib>
@@ -15,42 +14,45 @@ void require(bool condition) {
   if (!condition) std::abort();
 }
 
-bool has(const rt::DefaultsText& text, std::string_view key, std::string_view value) {
-  const std::string* found = text.find(key);
-  return found != nullptr && *found == value;
-}
-
 }  // namespace
 
-// The first byte gives the lengths of a key and of a value, which follow it. The rest of the input is a file.
+// The first byte says how long a key at the start is; the rest is a file. Where that can be read, a line with
+// the key is put behind it: it is found, unless the file had the key.
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   const std::string input(reinterpret_cast<const char*>(data), size);
   std::string_view rest = input;
-  const auto take = [&rest](std::size_t length) {
-    const std::string_view taken = rest.substr(0, std::min(length, rest.size()));
-    rest.remove_prefix(taken.size());
-    return taken;
-  };
-  const unsigned lengths = size > 0 ? data[0] : 0U;
-  take(1);
-  const std::string_view key = take(lengths & 0xFU);
-  const std::string_view value = take(lengths >> 4U);
+  const std::size_t length = size > 0 ? data[0] & 0xFU : 0U;
+  rest.remove_prefix(size > 0 ? 1 : 0);
+  std::string key(rest.substr(0, length));
+  rest.remove_prefix(key.size());
 
+  bool isThere = false;
   try {
-    rt::DefaultsText text = rt::DefaultsText::parsed(rest);
-    const std::string content = text.text();
-    require(content == std::string(rest) || content == std::string(rest) + "\n");
-    if (!rt::isValidUTF8(key) || !rt::isValidUTF8(value)) return 0;
-
-    text.set(key, value);
-    rt::DefaultsText again = rt::DefaultsText::parsed(text.text());
-    require(has(text, key, value) && has(again, key, value));
-    require(again.text() == text.text());
-    again.remove(key);
-    require(again.find(key) == nullptr);
-    require(rt::DefaultsText::parsed(again.text()).find(key) == nullptr);
+    const rt::DefaultsText text = rt::DefaultsText::parsed(rest);
+    const std::string* const found = text.find(key);
+    require(found == nullptr || rt::isValidUTF8(*found));
+    isThere = found != nullptr;
   } catch (const rt::MalformedDefaults&) {
     return 0;
+  }
+
+  std::string written = "\"";
+  for (const char character : key) {
+    if (character == '"' || character == '\\') written += '\\';
+    written += character;
+  }
+  written += "\" = value";
+  try {
+    const rt::DefaultsText again = rt::DefaultsText::parsed(std::string(rest) + "\n" + written);
+    const std::string* const found = again.find(key);
+    require(!isThere && found != nullptr && *found == "value");
+  } catch (const rt::MalformedDefaults&) {
+    bool isPlain = rt::isValidUTF8(key);
+    for (const char character : key) {
+      const auto byte = static_cast<unsigned char>(character);
+      if ((byte < 0x20 && byte != '\t') || byte == 0x7F) isPlain = false;
+    }
+    require(isThere || !isPlain || input.size() >= rt::DefaultsText::kMaximumSize - 64);
   }
   return 0;
 }

@@ -29,6 +29,7 @@
 #include "Shared/Logging/LUMLogNoFilter.h"
 #include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "tests/support/ForkTest.h"
+#include "tests/support/SettingsFile.h"
 #include "tests/support/TestServices.h"
 #include "tests/support/ZEBLoggerTest.h"
 
@@ -286,21 +287,18 @@ TEST_F(Forks, AServiceIsFoundThoughTheHashOfAnotherThreadsTagTakesForEver) {
             0);
 }
 
-TEST_F(Forks, DefaultsAreChangedThoughAnotherThreadIsInAnObserver) {
+TEST_F(Forks, DefaultsAreReadThoughAnotherThreadIsInAnObserver) {
   const auto defaults = rt::UserDefaults::initWithPath(pathText("defaults"));
   Parking parking;
-  const auto thread = std::this_thread::get_id();
-  auto observation = defaults->observe("key", rt::UserDefaults::Notify::kOnChange, [&] {
-    if (std::this_thread::get_id() != thread) parking.park();
-  });
-  ParkedThread changer(parking, [&] { defaults->setString("a"_s, "key"); });
+  auto observation = defaults->observe("key", rt::UserDefaults::Notify::kOnChange, [&] { parking.park(); });
+  SettingsFile(path("defaults")).set("key", "a");
+  parking.awaitSomebody();
   EXPECT_EQ(statusOfChild([&] {
-              defaults->setString("b"_s, "key");
               observation.remove();
-              return defaults->stringForKey("key") == "b" ? 0 : 1;
+              return defaults->stringForKey("key") == "a" ? 0 : 1;
             }),
             0);
-  changer.end();
+  parking.end();
   observation.remove();
 }
 

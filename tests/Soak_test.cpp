@@ -49,6 +49,7 @@
 #include "tests/support/PrivateJournal.h"
 #include "tests/support/Process.h"
 #include "tests/support/Sanitizers.h"
+#include "tests/support/SettingsFile.h"
 #include "tests/support/TestBindings.h"
 #include "tests/support/TestLoggers.h"
 
@@ -61,7 +62,7 @@ using rt::Ref;
 
 constexpr std::size_t kWorkers = 8;
 constexpr std::chrono::seconds kRound(2);
-// In a tmpfs: user defaults are on the disk when a change returns.
+// In a tmpfs, so that no disk has to be waited for.
 constexpr const char* kFolder = "/run/soak";
 
 std::chrono::seconds duration(SOAK_SECONDS);
@@ -235,6 +236,7 @@ struct World {
       rt::make<ZEBLogBasicFormatter>(), rt::make<ZEBLogNoFilter>());
   const Ref<rt::UserDefaults> defaults =
       rt::UserDefaults::initWithPath(rt::String::fromUTF8(std::string(kFolder) + "/defaults.conf"));
+  SettingsFile settings{std::string(kFolder) + "/defaults.conf"};
 
   std::optional<Ledger> synchronous;
   std::optional<Ledger> asynchronous;
@@ -265,7 +267,8 @@ class Worker {
         log(*world_.journal, LUMLogLevelError, world_.metadata);
         break;
       case 2:
-        world_.defaults->setInteger(++setting_, key());
+        setting_ = std::to_string(random_());
+        world_.settings.set(key(), setting_);
         break;
       case 3:
         expectSettingKept();
@@ -315,11 +318,12 @@ class Worker {
     }
   }
 
-  /// What the worker has set last is what anybody reads.
-  void expectSettingKept() const { EXPECT_EQ(world_.defaults->integerForKey(key()), setting_); }
+  /// What the worker has written last is what anybody reads.
+  void expectSettingKept() const { EXPECT_EQ(readSetting(), setting_); }
 
  private:
   std::string key() const { return "worker" + std::to_string(number_); }
+  std::string readSetting() const { return std::string(world_.defaults->stringForKey(key()).view()); }
 
   void log(Ledger& ledger, LUMLogLevel level, const Ref<LUMLogMetadata>& metadata = nullptr) {
     LUMLogAt(level, metadata, "%zu %lu"_s, number_, ledger.next(number_));
@@ -334,7 +338,7 @@ class Worker {
   World& world_;
   const std::size_t number_;
   std::mt19937 random_;
-  std::int64_t setting_ = world_.defaults->integerForKey(key());
+  std::string setting_ = readSetting();
 };
 
 /// What the process has of what must not grow.
@@ -372,7 +376,7 @@ int workInChild(World& world) {
   LUMLogAt(0, "in a child"_s);
   LUMLogAt(LUMLogLevelInfo, "in a child"_s);
   ZEBLogger::sharedLogger();
-  if (world.defaults->integerForKey("none") != 0) return 3;
+  if (!world.defaults->stringForKey("none").isNull()) return 3;
   return 0;
 }
 

@@ -111,7 +111,10 @@ class Journal {
 
  private:
   rt::LongLock lock_;
-  rt::FileDescriptor file_;
+  struct File {
+    void write(std::string_view line);
+  };
+  File file_;
 };
 extern Journal* journal;
 

@@ -1,6 +1,6 @@
 #pragma once
 
-/// The protocols of objects that can be put into a keyed archive and taken out of it again.
+/// The protocols of objects that can be archived in a keyed archive and read back from it.
 ///
 ///     class Tag final : public rt::Implements<Tag, rt::Object, rt::SecureCoding> {
 ///      public:
@@ -16,13 +16,13 @@
 ///
 ///     template struct rt::AddedClassMethod<Tag, "initWithCoder:", &rt::initWithCoder<Tag>>;
 ///
-/// The last line stands in a source file, outside any namespace. By it, and by the class's name in the
-/// archive, a reader finds `initWithCoder`, which returns a new object, or null where what it decodes is
-/// not what it needs.
+/// The last line stands in a source file, outside of any namespace. It lets a reader find `initWithCoder`
+/// by the class's name in the archive. `initWithCoder` returns a new object, or null if the archive does
+/// not have what the object needs.
 ///
-/// Strings, numbers, arrays and dictionaries can be archived without any of this.
+/// Strings, numbers, arrays and dictionaries can be archived without this protocol.
 ///
-/// Not for: text that people read (an object's `description`).
+/// Not for: text for people, which is an object's `description`.
 
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Class.h"
@@ -35,9 +35,9 @@ namespace rt {
 class KeyedArchiver;
 class KeyedUnarchiver;
 
-/// An object that can be put into an archive.
+/// An object that can be archived.
 struct RT_VISIBLE Coding : Protocol<Coding> {
-  /// Has `coder` encode what the object is made of, each part under a key of its own. It must not keep
+  /// Encodes the object's parts with `coder`, each under a key of its own. Must not keep a reference to
   /// `coder`. An exception ends the archiving.
   virtual void encodeWithCoder(KeyedArchiver& coder) const = 0;
 
@@ -45,14 +45,14 @@ struct RT_VISIBLE Coding : Protocol<Coding> {
   ~Coding() = default;
 };
 
-/// An object whose class can be trusted with what stands in an archive from anywhere: its `initWithCoder`
-/// asks for every part by the classes that it may have. Only such objects are archived.
+/// An object whose class can read an archive from an untrusted source: its `initWithCoder` names the
+/// classes that each part may have. Only such objects are archived.
 struct RT_VISIBLE SecureCoding : Protocol<SecureCoding, Coding> {
  protected:
   ~SecureCoding() = default;
 };
 
-/// What to add to the class T under "initWithCoder:".
+/// Reads a T. This is the function to add to the class T under "initWithCoder:".
 template <ClassType T>
 Ref<Object> initWithCoder(KeyedUnarchiver& coder) {
   return T::initWithCoder(coder);

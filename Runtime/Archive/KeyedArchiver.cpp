@@ -30,7 +30,7 @@ PropertyList::Value valueOf(const Number& number) {
   return number.realValue();
 }
 
-// Orders keys of dictionaries, so that equal ones become equal bytes: numbers, then texts.
+// Orders the keys of dictionaries, so that equal dictionaries become equal bytes. Numbers come before texts.
 bool isBefore(const Ref<Object>& first, const Ref<Object>& second) {
   const auto* firstNumber = cast<Number>(first.get());
   const auto* secondNumber = cast<Number>(second.get());
@@ -39,7 +39,8 @@ bool isBefore(const Ref<Object>& first, const Ref<Object>& second) {
   return String::from(first.get()) < String::from(second.get());
 }
 
-// Objects that refer to each other may be larger than any number.
+// Returns the sum, or the largest number if it is larger. Objects that refer to each other may have any
+// size.
 std::size_t sum(std::size_t first, std::size_t second) noexcept {
   return second > std::numeric_limits<std::size_t>::max() - first ? std::numeric_limits<std::size_t>::max()
                                                                   : first + second;
@@ -58,7 +59,7 @@ KeyedArchiver::KeyedArchiver() : dictionaries_(1) {
 KeyedArchiver::~KeyedArchiver() = default;
 
 void KeyedArchiver::encodeObject(const Ref<Object>& object, std::string_view key) {
-  // An exception leaves this as it is, for good.
+  // An exception leaves it incremented for good.
   ++unfinished_;
   const Index keyIndex = text(escaped(key));
   const auto isSame = [keyIndex](const auto& entry) { return entry.first == keyIndex; };
@@ -67,7 +68,7 @@ void KeyedArchiver::encodeObject(const Ref<Object>& object, std::string_view key
   }
   const bool isAtTop = dictionaries_.size() == 1;
   if (isAtTop) size_ = 0;
-  // First, since it may make the place of the dictionary another.
+  // First, since this may move the dictionary.
   const Index valueIndex = reference(object);
   if (isAtTop) largestSize_ = std::max(largestSize_, size_);
   dictionaries_.back().emplace_back(keyIndex, valueIndex);
@@ -76,7 +77,8 @@ void KeyedArchiver::encodeObject(const Ref<Object>& object, std::string_view key
 
 std::vector<std::byte> KeyedArchiver::encodedData() {
   if (unfinished_ != 0) fail("an object is being encoded, or could not be");
-  // What is around the objects is in the list for the time of this call: more may be encoded afterwards.
+  // The values around the objects are in the list for the time of this call. More objects may be encoded
+  // later.
   struct Around {
     ~Around() { values.resize(count); }
     std::vector<PropertyList::Value>& values;
@@ -111,7 +113,7 @@ std::vector<std::byte> KeyedArchiver::archivedDataWithRootObject(const Ref<Objec
 KeyedArchiver::Index KeyedArchiver::reference(const Ref<Object>& object) {
   if (object == nullptr) return referenceTo(0);
   if (const auto* string = cast<StringObject>(object.get())) {
-    // Equal strings are one: nobody tells them apart.
+    // Equal strings become one: they cannot be told apart.
     const Index content = text(string->view());
     const auto [known, isNew] = strings_.try_emplace(content, places_.size());
     if (isNew) places_.push_back(content);
@@ -173,7 +175,7 @@ PropertyList::Dictionary KeyedArchiver::partsOfCollection(const Object& object) 
     fail("an object of class " + std::string(object.classInfo().name) + " cannot be archived");
   }
 
-  // Nothing is encoded under a key here; it counts as a level all the same.
+  // Nothing is encoded under a key here, but a collection counts as a level.
   dictionaries_.emplace_back();
   PropertyList::Dictionary parts;
   if (dictionary != nullptr) {

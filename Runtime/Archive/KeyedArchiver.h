@@ -1,6 +1,6 @@
 #pragma once
 
-/// Turns objects, and all that they are made of, into bytes.
+/// Turns objects and all their parts into bytes.
 ///
 ///     rt::Ref<rt::Array> tags = rt::Array::of("Ann"_s, "the left window"_s);
 ///     rt::KeyedArchiver archiver;
@@ -9,24 +9,32 @@
 ///
 ///     bytes = rt::KeyedArchiver::archivedDataWithRootObject(tag);          // under the key "root"
 ///
-/// Strings, numbers, arrays, dictionaries with keys that are strings or numbers, and whatever conforms to
-/// `SecureCoding` (Runtime/Archive/Coding.h) can be archived, nested in each other up to 512 deep. An object
-/// that is reached twice is archived once, and is one object again when it is read; equal strings become one.
+/// Strings, numbers, arrays, dictionaries whose keys are strings or numbers, and objects that conform to
+/// `SecureCoding` (Runtime/Archive/Coding.h) can be archived. They may be nested up to 512 deep. An object
+/// that is reached twice is archived once, and is one object again when it is read. Equal strings become
+/// one.
 ///
-/// The size of what is under a key at the top must be at most 16 MiB more than 16 times that of the archive,
-/// if each object and each byte of a text is counted as often as it is reached: what is larger is not read.
+/// An object under a key at the top may have a size of 16 times that of the archive plus 16 MiB. Its size
+/// counts each object and each byte of a text as often as it is reached. A larger object is refused, since
+/// it would not be read.
 ///
-/// The bytes are a binary property list (Runtime/Archive/Private/PropertyList.h): a dictionary of
-/// "$archiver",
-/// "$version" 100000, "$top" with a reference for each key, and "$objects", to whose places references refer.
-/// Strings and numbers stand there as themselves and "$null" in the first place. All others are dictionaries,
-/// where "$class" refers to a class, a dictionary of "$classname" and "$classes", the names from the class up
-/// to Object. Array and Dictionary have their elements under "objects", Dictionary its keys under "keys".
+/// The bytes are a binary property list (Runtime/Archive/Private/PropertyList.h). It is a dictionary with
+/// these keys:
 ///
-/// An archiver is used by one thread at a time.
+///     | "$archiver"   "KeyedArchiver"
+///     | "$version"    100000
+///     | "$top"        a dictionary, which has a reference for each key
+///     | "$objects"    an array, which references are indexes of
 ///
-/// Not for: objects that refer to each other in a circle; what other programs shall read without knowing
-/// the classes.
+/// In "$objects", "$null" comes first, and strings and numbers stand for themselves. All other objects are
+/// dictionaries, in which "$class" refers to a class. A class is a dictionary of "$classname" and
+/// "$classes", the names from the class up to Object. Array and Dictionary have their elements under
+/// "objects", and Dictionary has its keys under "keys".
+///
+/// Threads: one thread at a time may use an archiver.
+///
+/// Not for: objects that refer to each other in a circle; archives for programs that do not know the
+/// classes.
 
 #include <cstddef>
 #include <cstdint>
@@ -46,39 +54,41 @@ namespace rt {
 
 class KeyedArchiver final {
  public:
-  /// With nothing in it.
+  /// Makes an archiver without objects.
   KeyedArchiver();
   KeyedArchiver(const KeyedArchiver&) = delete;
   KeyedArchiver& operator=(const KeyedArchiver&) = delete;
   ~KeyedArchiver();
 
-  /// Archives `object`, or that there is none where it is null, under `key`: as part of the object whose
-  /// `encodeWithCoder` is running, and at the top outside any. Calls the `encodeWithCoder` of `object` and
-  /// of what that encodes in turn.
+  /// Archives `object`, which may be null, under `key`. During an `encodeWithCoder` it becomes a part of
+  /// that object, and at any other time it is at the top. Calls the `encodeWithCoder` of `object` and of
+  /// its parts.
   ///
-  /// Throws rt::Exception when an object cannot be archived, contains itself or is nested too deeply, or
-  /// when there is something under `key` already; and what an `encodeWithCoder` throws. After an exception
-  /// the archiver is of no use.
+  /// Errors: throws rt::Exception if an object cannot be archived, contains itself or is nested too deeply,
+  /// or if `key` is taken. Throws what an `encodeWithCoder` throws. After an exception the archiver is of
+  /// no use.
   void encodeObject(const Ref<Object>& object, std::string_view key);
 
-  /// The archive. Throws std::invalid_argument when a key is not UTF-8, and rt::Exception when objects are
-  /// reached too often, after an earlier exception, and while an object is being encoded.
+  /// Returns the archive. More objects may be encoded afterwards. Throws std::invalid_argument if a key is
+  /// not UTF-8. Throws rt::Exception if an object is too large, after an earlier exception, and during an
+  /// `encodeWithCoder`.
   std::vector<std::byte> encodedData();
 
-  /// An archive with `object`, which may be null, under the key "root". Throws as the functions above.
+  /// Returns an archive of `object`, which may be null, under the key "root". Throws like the functions
+  /// above.
   static std::vector<std::byte> archivedDataWithRootObject(const Ref<Object>& object);
 
  private:
   using Index = PropertyList::Index;
   struct Known {
     std::size_t place;
-    // Kept, so that no other object comes to be at its address.
+    // Retained, so that no other object gets its address.
     Ref<Object> object;
     // 0 while the object is being encoded.
     std::size_t size;
   };
 
-  // The index of a reference to `object`, which is archived if it is not yet.
+  // Returns the index of a reference to `object`. Archives `object` if it is not archived yet.
   Index reference(const Ref<Object>& object);
   Index contentOf(const Ref<Object>& object);
   PropertyList::Dictionary partsOf(const SecureCoding& object);
@@ -89,9 +99,9 @@ class KeyedArchiver final {
   Index text(std::string_view text);
 
   PropertyList list_;
-  // What is under "$objects".
+  // The value of "$objects".
   PropertyList::Array places_;
-  // What is being encoded, from the top down.
+  // The objects that are being encoded, from the top down.
   std::vector<PropertyList::Dictionary> dictionaries_;
   std::unordered_map<const Object*, Known> known_;
   // The places of strings, by their texts.
@@ -99,11 +109,11 @@ class KeyedArchiver final {
   std::unordered_map<const ClassInfo*, Index> classes_;
   std::unordered_map<std::size_t, Index> references_;
   std::map<std::string, Index, std::less<>> texts_;
-  // Sizes are as detail::keyedArchive::maximumSize says: what there is so far of the object that is being
-  // encoded, and the largest at the top.
+  // Sizes are counted as detail::keyedArchive::maximumSize says. `size_` is what has been counted of the
+  // object that is being encoded, and `largestSize_` is the size of the largest object at the top.
   std::size_t size_ = 0;
   std::size_t largestSize_ = 0;
-  // How many calls of `encodeObject` have not come to their end.
+  // How many calls of `encodeObject` have begun and not ended without an exception.
   std::size_t unfinished_ = 0;
 };
 

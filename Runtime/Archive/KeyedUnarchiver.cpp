@@ -15,7 +15,7 @@ namespace {
 
 using namespace detail::keyedArchive;
 
-// For error texts: what comes from the archive may be long, and may be anything.
+// For error texts. A text from the archive may be long.
 std::string quoted(std::string_view text) {
   constexpr std::size_t kMaximumLength = 100;
   return '"' + std::string(text.substr(0, kMaximumLength)) + (text.size() > kMaximumLength ? "...\"" : "\"");
@@ -23,7 +23,7 @@ std::string quoted(std::string_view text) {
 
 }  // namespace
 
-// One object on the way down to what is being decoded.
+// Makes an object the one whose keys are decoded, until the scope ends.
 class KeyedUnarchiver::Level {
  public:
   Level(KeyedUnarchiver& unarchiver, Index index)
@@ -62,7 +62,7 @@ KeyedUnarchiver::~KeyedUnarchiver() = default;
 
 const PropertyList::Array* KeyedUnarchiver::archivedObjects() {
   const auto under = [this](std::string_view key) {
-    // An index that none has stands for nothing.
+    // A missing key yields an index that no value has.
     return list_.find(list_.root, key).value_or(static_cast<Index>(list_.values.size()));
   };
   const auto* version = list_.get<std::int64_t>(under(kVersionKey));
@@ -160,7 +160,7 @@ Ref<Object> KeyedUnarchiver::decodeInstance(Index index, Wanted wanted) {
   const ClassInfo* info = classOf(index);
   if (info == nullptr || !isAllowed(*info, wanted)) return nullptr;
   const bool isCollection = info == &classInfo<Array>() || info == &classInfo<Dictionary>();
-  // What may be in a collection depends on the classes that it was asked for with.
+  // The classes that a collection's elements may have differ from call to call.
   const std::uint64_t key = index | (isCollection ? std::uint64_t{wanted.elements + 1} << 32U : 0);
   if (const auto known = decoded_.find(key); known != decoded_.end()) {
     return grow(known->second.size) ? known->second.object : nullptr;
@@ -204,7 +204,7 @@ Ref<Object> KeyedUnarchiver::decodeDictionary(Index index, const std::vector<Ref
   if (keys.size() != elements.size()) return fail("a Dictionary with more or fewer keys than elements");
   Dictionary::Builder builder;
   for (std::size_t i = 0; i < keys.size(); ++i) {
-    // Collections as keys would be hashed again at each level: few bytes could stand for much work.
+    // Collections as keys would be hashed again at each level, so a few bytes could stand for much work.
     if (!keys[i]->isKindOf(classInfo<StringObject>()) && !keys[i]->isKindOf(classInfo<Number>())) {
       return fail("a Dictionary with a key that is neither text nor number");
     }
@@ -219,7 +219,7 @@ bool KeyedUnarchiver::decodeList(Index owner, std::string_view key, Wanted wante
   const std::optional<Index> index = list_.find(owner, key);
   const auto* references = index ? list_.get<PropertyList::Array>(*index) : nullptr;
   if (!index || references == nullptr) return fail("a collection without " + std::string(key)) != nullptr;
-  // No archiver has two collections share a list, and many that did would multiply what a file holds.
+  // No archiver has two collections share a list. Many that did would multiply what a file holds.
   if (listOwners_.try_emplace(*index, owner).first->second != owner) {
     return fail("two collections with the same " + std::string(key)) != nullptr;
   }
@@ -242,7 +242,7 @@ KeyedUnarchiver::Initializer* KeyedUnarchiver::initializerOf(const ClassInfo& in
   return known->second;
 }
 
-// Looked for once for each object, since what it has to be looked for among may be much.
+// The class is looked for once for each object, since an object may have many keys.
 const ClassInfo* KeyedUnarchiver::classOf(Index index) {
   const ClassInfo*& info = classesOfObjects_[index];
   if (info != nullptr) return info;
@@ -253,7 +253,7 @@ const ClassInfo* KeyedUnarchiver::classOf(Index index) {
   return info;
 }
 
-// The same for each class.
+// Here too, each class is looked for once.
 const ClassInfo* KeyedUnarchiver::archivedClass(Index index) {
   const ClassInfo*& info = archivedClasses_[index];
   if (info != nullptr) return info;

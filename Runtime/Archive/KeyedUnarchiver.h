@@ -1,6 +1,6 @@
 #pragma once
 
-/// Makes objects of the bytes that a `KeyedArchiver` made of objects, or that anyone says it did.
+/// Reads objects from a keyed archive, which may come from an untrusted source.
 ///
 ///     rt::KeyedUnarchiver unarchiver(archive);
 ///     rt::Ref<rt::Array> tags = unarchiver.decodeObjectOfClass<rt::Array>("kTagsID");
@@ -9,25 +9,26 @@
 ///     rt::String error;
 ///     rt::Ref<Tag> tag = rt::KeyedUnarchiver::unarchivedObjectOfClass<Tag>(archive, &error);
 ///
-/// Who decodes says of which classes the object may be; an object of one that derives from one of these
-/// will do. Nothing of an object is made before its class has been found to be among them and to conform
-/// to `SecureCoding` (Runtime/Archive/Coding.h). In an array or dictionary, elements may be of the same
-/// classes, and strings and numbers in any case.
+/// Each call names the classes that the object may have. Their subclasses are allowed as well. No part of
+/// an object is made before its class is known to be allowed and to conform to `SecureCoding`
+/// (Runtime/Archive/Coding.h). Elements of an array or dictionary may have the same classes, or be strings
+/// or numbers.
 ///
-/// Whatever the bytes are, the worst that they bring about is null and an error. Reading them takes time
-/// and memory in proportion to how many they are, besides what `initWithCoder` of the classes takes and
-/// unless keys of dictionaries are chosen to have the same hash. Once there is an error all further decoding
-/// yields null, so that it is enough to look for one at the end.
+/// Errors: malformed bytes yield null and an error, never undefined behaviour. After an error all further
+/// calls yield null, so it is enough to ask for `error()` at the end.
 ///
-/// The size of an object that is decoded is at most 16 MiB more than 16 times that of the archive, if each
-/// object and each byte of a text that it is made of is counted as often as it is decoded: nobody waits for
-/// its hash for ever. So `initWithCoder` should decode what is under a key once. A description may be longer
-/// by far, since it indents what is nested, and should only be asked of what comes from somebody trusted.
+/// Reading takes time and memory in proportion to the number of bytes. This does not count the time of the
+/// classes' `initWithCoder`, nor dictionaries whose keys were chosen to have the same hash.
 ///
-/// An unarchiver is used by one thread at a time.
+/// An object may have a size of 16 times that of the archive plus 16 MiB. Its size counts each object and
+/// each byte of a text as often as it is decoded. So the time for its hash is bounded, and `initWithCoder`
+/// should decode each key once. The description of an object may be much longer, since it indents what is
+/// nested. Do not ask for the description of an object from an untrusted source.
 ///
-/// Not for: archives of other programs, whose classes are not known here
-/// (Runtime/Archive/Private/PropertyList.h reads those).
+/// Threads: one thread at a time may use an unarchiver.
+///
+/// Not for: archives of other programs, whose classes this program does not know.
+/// Runtime/Archive/Private/PropertyList.h reads those.
 
 #include <cstddef>
 #include <cstdint>
@@ -52,52 +53,55 @@ class Array;
 
 class KeyedUnarchiver final {
  public:
-  /// Over an archive, which is not needed any more when this returns. If it is none, there is an error.
-  /// Throws std::bad_alloc.
+  /// Reads `bytes`. The unarchiver keeps no reference to them. If they are not an archive, `error()` says
+  /// why. Throws std::bad_alloc.
   explicit KeyedUnarchiver(std::span<const std::byte> bytes);
   KeyedUnarchiver(const KeyedUnarchiver&) = delete;
   KeyedUnarchiver& operator=(const KeyedUnarchiver&) = delete;
   ~KeyedUnarchiver();
 
-  /// Whether there is something under `key`, be it null: in the object whose `initWithCoder` is running,
-  /// and at the top outside any. False once there is an error.
+  /// Returns whether there is an object or null under `key`. During an `initWithCoder` the key is that
+  /// object's, and at any other time it is at the top. Returns false after an error.
   bool containsValueForKey(std::string_view key) const;
 
-  /// What is under `key` there, if it is of one of `classes`. Null is yielded without an error where null
-  /// was archived; with one, where there is nothing under the key, it is of another class, the object's
-  /// own `initWithCoder` yielded null, or the archive contradicts itself or refers to objects too often.
-  /// Calls `initWithCoder` of the object and of what that decodes in turn, once for each object; what it
-  /// throws passes, and is no error.
+  /// Returns the object under `key`, which must have one of `classes`. The key is that of
+  /// `containsValueForKey`. Calls the `initWithCoder` of the object and of its parts, once for each object.
+  ///
+  /// Errors: returns null without an error if null was archived. Returns null with an error if there is
+  /// nothing under the key, the object has another class, its `initWithCoder` returns null, or the archive
+  /// is inconsistent or refers to objects too often. An exception of `initWithCoder` passes to the caller
+  /// and is no error.
   Ref<Object> decodeObjectOfClasses(std::span<const ClassInfo* const> classes, std::string_view key);
   Ref<Object> decodeObjectOfClasses(std::initializer_list<const ClassInfo*> classes, std::string_view key) {
     return decodeObjectOfClasses(std::span(classes.begin(), classes.size()), key);
   }
 
-  /// The same for one class, T.
+  /// Does the same for one class, T.
   template <ClassType T>
   Ref<T> decodeObjectOfClass(std::string_view key) {
     return cast<T>(decodeObjectOfClasses({&classInfo<T>()}, key));
   }
 
-  /// An array, whose elements are of `classes`, or strings or numbers: unlike with `decodeObjectOfClasses`,
-  /// an object of these classes that is no array is not made. With an error if there is another object.
+  /// Returns the array under `key`. Its elements must have one of `classes`, or be strings or numbers. Null
+  /// and an error for an object that is not an array. Unlike `decodeObjectOfClasses`, this never makes an
+  /// object of `classes` in the place of the array.
   Ref<Array> decodeArrayOfObjectsOfClasses(std::initializer_list<const ClassInfo*> classes,
                                            std::string_view key);
 
-  /// The same for a string.
+  /// Does the same as `decodeObjectOfClasses` for a string.
   String decodeString(std::string_view key) {
     return String::from(decodeObjectOfClasses({&classInfo<StringObject>()}, key).get());
   }
 
-  /// What first went wrong, for people; null as long as nothing has.
+  /// Describes the first error, for people. Null if there is none.
   const String& error() const noexcept { return error_; }
 
-  /// The object under the key "root" of the archive `bytes`, of one of `classes`. Where it is null, `error`,
-  /// if given, becomes what `error()` would be.
+  /// Returns the object under the key "root" of the archive `bytes`, which must have one of `classes`. If it
+  /// returns null, it sets `*error` to what `error()` would be, unless `error` is null.
   static Ref<Object> unarchivedObjectOfClasses(std::initializer_list<const ClassInfo*> classes,
                                                std::span<const std::byte> bytes, String* error = nullptr);
 
-  /// The same for one class, T.
+  /// Does the same for one class, T.
   template <ClassType T>
   static Ref<T> unarchivedObjectOfClass(std::span<const std::byte> bytes, String* error = nullptr) {
     return cast<T>(unarchivedObjectOfClasses({&classInfo<T>()}, bytes, error));
@@ -107,9 +111,9 @@ class KeyedUnarchiver final {
   using Index = PropertyList::Index;
   using Initializer = Ref<Object>(KeyedUnarchiver&);
   class Level;
-  // Classes that an object may be of; those that were asked for once have a number.
+  // The classes that an object may have. Each list that has been asked for has a number.
   using Classes = std::vector<const ClassInfo*>;
-  // What the object is wanted for, by numbers of classes: it may be of these, and its elements of those.
+  // Numbers of lists of classes: those that the object may have, and those that its elements may have.
   struct Wanted {
     std::size_t classes;
     std::size_t elements;
@@ -123,7 +127,7 @@ class KeyedUnarchiver final {
 
   std::size_t numberOf(std::span<const ClassInfo* const> classes);
 
-  // All of these yield null where they fail.
+  // All of these return null or false if they fail.
   Ref<Object> decode(std::string_view key, Wanted wanted);
   const PropertyList::Array* archivedObjects();
   Ref<Object> decodeReference(Index reference, Wanted wanted);
@@ -142,20 +146,21 @@ class KeyedUnarchiver final {
   Ref<Object> fail(const std::string& reason);
 
   PropertyList list_;
-  // Values of `list_`: what is under "$objects", and the dictionary whose keys are decoded now.
+  // Values of `list_`: that of "$objects", and the dictionary whose keys are being decoded.
   const PropertyList::Array* objects_ = nullptr;
   Index container_ = 0;
   std::size_t depth_ = 0;
   std::vector<Classes> classes_;
   std::unordered_map<std::uint64_t, Decoded> decoded_;
-  // Sizes are as detail::keyedArchive::maximumSize says: that of all that has been decoded; what it may
-  // become by the object at the top that is being decoded; and the most that one object may have.
+  // Sizes are counted as detail::keyedArchive::maximumSize says. `size_` is that of all decoded objects,
+  // `sizeLimit_` what `size_` may be when the current object at the top is decoded, and `maximumSize_` the
+  // largest size of one object.
   std::size_t size_ = 0;
   std::size_t sizeLimit_ = 0;
   const std::size_t maximumSize_;
   std::vector<bool> isDecoding_;
   std::unordered_map<Index, Index> listOwners_;
-  // Of objects, and of what they refer to as their classes.
+  // The classes of objects, and the classes that archived classes stand for.
   std::unordered_map<Index, const ClassInfo*> classesOfObjects_;
   std::unordered_map<Index, const ClassInfo*> archivedClasses_;
   std::unordered_map<const ClassInfo*, Initializer*> initializers_;

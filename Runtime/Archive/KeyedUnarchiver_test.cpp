@@ -219,7 +219,7 @@ TEST(KeyedUnarchiver, RefusesArchivesThatContradictThemselves) {
     return errorOf(forged.bytes());
   };
   EXPECT_THAT(errorOf(Forged().bytes()), HasSubstr("no object"));
-  EXPECT_THAT(errorOfRoot([](Forged& f) { return f.list.add(PropertyList::Data{}); }),
+  EXPECT_THAT(errorOfRoot([](Forged& f) { return f.list.add(PropertyList::Array{}); }),
               HasSubstr("neither text nor"));
   EXPECT_THAT(errorOfRoot([](Forged& f) { return f.references({}); }), HasSubstr("neither text nor"));
   EXPECT_THAT(errorOfRoot([](Forged& f) { return f.dictionary({}); }), HasSubstr("without a class"));

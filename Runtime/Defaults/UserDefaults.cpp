@@ -4,15 +4,12 @@
 #include <array>
 #include <charconv>
 #include <cmath>
-#include <limits>
 #include <optional>
 #include <string>
 #include <system_error>
-#include <type_traits>
 #include <utility>
 
 #include "Runtime/Defaults/Private/DefaultsStore.h"
-#include "Runtime/Defaults/Private/FilePath.h"
 #include "Runtime/Defaults/Private/SystemDefaultsFolder.h"
 #include "Runtime/Locks/Private/Lazy.h"
 #include "Runtime/Process/Bundle.h"
@@ -29,34 +26,12 @@ bool isTrueWord(std::string_view text) {
       kWords, [&](std::string_view word) { return std::ranges::equal(text, word, isSameLetter); });
 }
 
-// The number that `text` begins with, or 0.
-template <class Number>
-Number leadingNumber(std::string_view text, bool* isWhole = nullptr) {
-  const bool isNegative = text.starts_with('-');
+bool isNumberOtherThan0(std::string_view text) {
   if (text.starts_with('+') && !text.starts_with("+-")) text.remove_prefix(1);
-  Number number{};
-  const auto [end, error] = std::from_chars(text.data(), text.data() + text.size(), number);
-  const bool isAll = end == text.data() + text.size();
-  if (isWhole != nullptr) *isWhole = error == std::errc() && isAll;
-  if constexpr (std::is_floating_point_v<Number>) {
-    // "information" begins with no number, for people.
-    if (!std::isfinite(number) && !isAll) number = 0;
-  } else if (error == std::errc::result_out_of_range) {
-    number = isNegative ? std::numeric_limits<Number>::min() : std::numeric_limits<Number>::max();
-  }
-  return number;
-}
-
-template <class Number>
-Number numberOf(const std::optional<std::string>& value) {
-  if (!value) return 0;
-  return isTrueWord(*value) ? Number{1} : leadingNumber<Number>(*value);
-}
-
-template <class Number>
-std::string textOf(Number number) {
-  std::array<char, 32> text;
-  return {text.data(), std::to_chars(text.data(), text.data() + text.size(), number).ptr};
+  double number = 0;
+  const char* const end = text.data() + text.size();
+  const auto [rest, error] = std::from_chars(text.data(), end, number);
+  return error == std::errc() && rest == end && number != 0 && std::isfinite(number);
 }
 
 std::shared_ptr<detail::DefaultsStore> standardStore() {
@@ -91,11 +66,9 @@ Ref<UserDefaults> UserDefaults::standardUserDefaults() {
 }
 
 Ref<UserDefaults> UserDefaults::initWithPath(const String& path) {
-  if (path.isEmpty() || path.contains(std::string_view("\0", 1))) return nullptr;
-  // Of one that is relative, what it means now.
-  std::string whole = absolutePath(std::string(path.view()));
+  if (!path.hasPrefix("/") || path.contains(std::string_view("\0", 1))) return nullptr;
   return Ref<UserDefaults>::adopt(
-      new UserDefaults(std::make_shared<detail::DefaultsStore>(std::move(whole), "")));
+      new UserDefaults(std::make_shared<detail::DefaultsStore>(std::string(path.view()), "")));
 }
 
 void UserDefaults::setReportHandler(Block<void(const String&)> handler) {
@@ -104,44 +77,12 @@ void UserDefaults::setReportHandler(Block<void(const String&)> handler) {
 
 bool UserDefaults::boolForKey(std::string_view key) const {
   const std::optional<std::string> value = store_->value(key);
-  if (!value) return false;
-  if (isTrueWord(*value)) return true;
-  bool isWhole = false;
-  const auto number = leadingNumber<double>(*value, &isWhole);
-  return isWhole && number != 0 && std::isfinite(number);
-}
-
-std::int64_t UserDefaults::integerForKey(std::string_view key) const {
-  return numberOf<std::int64_t>(store_->value(key));
-}
-
-double UserDefaults::realForKey(std::string_view key) const {
-  return numberOf<double>(store_->value(key));
+  return value && (isTrueWord(*value) || isNumberOtherThan0(*value));
 }
 
 String UserDefaults::stringForKey(std::string_view key) const {
   const std::optional<std::string> value = store_->value(key);
   return value ? String::fromUTF8(*value) : String();
-}
-
-void UserDefaults::setBool(bool value, std::string_view key) {
-  store_->change(key, value ? "YES" : "NO");
-}
-
-void UserDefaults::setInteger(std::int64_t value, std::string_view key) {
-  store_->change(key, textOf(value));
-}
-
-void UserDefaults::setReal(double value, std::string_view key) {
-  store_->change(key, textOf(value));
-}
-
-void UserDefaults::setString(const String& value, std::string_view key) {
-  store_->change(key, value.isNull() ? std::nullopt : std::optional(value.view()));
-}
-
-void UserDefaults::remove(std::string_view key) {
-  store_->change(key, std::nullopt);
 }
 
 UserDefaults::Observation UserDefaults::observe(std::string_view key, Notify notify, Block<void()> observer) {

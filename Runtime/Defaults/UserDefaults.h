@@ -1,7 +1,7 @@
 #pragma once
 
-/// User defaults: settings of one application for one user, that the application and its user change
-/// while it runs.
+/// User defaults: the settings of one application for one user. The application reads them. People and other
+/// programs change them while it runs.
 ///
 ///     rt::Ref<rt::UserDefaults> defaults = rt::UserDefaults::standardUserDefaults();
 ///     if (defaults->boolForKey("ZEBVerboseLogging")) ...
@@ -10,29 +10,31 @@
 ///         "ZEBVerboseLogging", rt::UserDefaults::Notify::kAlsoNow,
 ///         [weak = rt::Weak<Account>(account)] { if (auto account = weak.lock()) account->readAgain(); });
 ///
-///     defaults->setBool(true, "ZEBVerboseLogging");
+/// The settings are in a text file with one `key = value` a line (Runtime/Defaults/Private/DefaultsText.h).
+/// People may edit it at any time:
 ///
-/// The settings are in one text file, one `key = value` a line (Runtime/Defaults/Private/DefaultsText.h),
-/// which people may edit at any time:
-///
-///     | $XDG_CONFIG_HOME/APPLICATION/defaults.conf, where that is not set ~/.config/...
+///     | $XDG_CONFIG_HOME/APPLICATION/defaults.conf, or ~/.config/... if that variable is not set
 ///     | ~/Library/Application Support/APPLICATION/defaults.conf on macOS
 ///
-/// APPLICATION is the main bundle's identifier or, without one, the process's name. Each read sees what is
-/// in the file at that moment: it asks the system whether the file has changed, which takes about a
-/// microsecond, and reads it again only if so. No file is no settings. A file that is malformed or cannot
-/// be read is reported once, in one line; until it is repaired, what was read last stands and nothing is
-/// written over it.
+/// APPLICATION is the main bundle's identifier, or the process's name if there is no identifier. To change
+/// a setting from a program, write a file beside `defaults.conf` and rename it. No reader sees half a file
+/// then.
 ///
-/// A change replaces the file as a whole and is on the disk when the call returns; processes that change
-/// it at the same time wait for each other. With the first observation a thread starts that waits for
-/// changes by other processes; where the system stops telling it of them, that is reported, and it tries each
-/// second to hear of them again. Nothing is started or read before a first use. The child of a fork goes on
-/// with what the parent had, but has no such thread until it observes something itself.
+/// Each read returns what is in the file at that moment. It asks the system whether the file has changed,
+/// which takes about a microsecond, and reads the file only if it has. If there is no file, there are no
+/// settings. Nothing is opened or started before the first use.
 ///
-/// Any thread may use all of it. No lock is held while an observer or the report handler runs.
+/// The first observation starts a thread that waits for changes.
 ///
-/// Not for: secrets; large or many values; what changes more often than people change their mind.
+/// Errors: a file that is malformed or cannot be read is reported once, in one line. The settings that were
+/// read last stay in force until the file is repaired. If the system stops watching the file, that is
+/// reported, and the thread tries again each second.
+///
+/// Threads: any thread may use all of it. No lock is held while an observer or the report handler runs. The
+/// child of a fork keeps the parent's settings and observations. It has no thread that waits for changes
+/// until it observes a key itself.
+///
+/// Not for: secrets; large or many values; values that change often.
 
 #include <cstdint>
 #include <memory>
@@ -55,30 +57,31 @@ struct DefaultsObserver;
 
 class RT_VISIBLE UserDefaults final : public Implements<UserDefaults, Object> {
  public:
-  /// When an observer is called.
+  /// Says when an observer is called.
   enum class Notify : std::uint8_t {
     /// After each change.
     kOnChange,
-    /// Once before `observe` returns, on the same thread, and after each change.
+    /// Once within `observe`, on the calling thread, and after each change.
     kAlsoNow,
   };
 
-  /// Keeps an observer, and the user defaults, in place for as long as it lives.
+  /// An observation lasts as long as this object. It retains the user defaults.
   class [[nodiscard]] Observation {
    public:
-    /// Of nothing.
+    /// Makes an object without an observation.
     Observation() noexcept = default;
     Observation(Observation&& other) noexcept = default;
     Observation& operator=(Observation&& other) noexcept;
     ~Observation() { remove(); }
 
-    /// Ends the observation: when this returns, the observer is not running and never will again, except
-    /// where it is the observer itself that calls this. Waits for an observer that runs on another
-    /// thread, so do not call it with a lock held that the observer takes, nor have two observers end
-    /// each other's observations. Does nothing the second time.
+    /// Ends the observation. When it returns, the observer is not running and will never run again. The
+    /// observer itself may call it, and then runs to its end. Does nothing if there is no observation.
+    ///
+    /// Threads: waits for an observer that runs on another thread. It deadlocks if the caller holds a lock
+    /// that the observer takes, or if two observers end each other's observations.
     void remove() noexcept;
 
-    /// Whether there is something that `remove` would end.
+    /// Returns whether there is an observation.
     explicit operator bool() const noexcept { return observer_ != nullptr; }
 
    private:
@@ -90,63 +93,43 @@ class RT_VISIBLE UserDefaults final : public Implements<UserDefaults, Object> {
     std::shared_ptr<detail::DefaultsObserver> observer_;
   };
 
-  /// The application's own, made on first use and never destroyed. Where the environment names no folder
-  /// (neither HOME nor XDG_CONFIG_HOME is an absolute path, or the process has raised privileges), that is
-  /// reported once, there are no settings, and changes throw. Never null.
+  /// Returns the application's own user defaults. Never null. They are made on first use and never
+  /// destroyed.
+  ///
+  /// Errors: if the environment names no folder, that is reported once and there are no settings. It names
+  /// none if neither HOME nor XDG_CONFIG_HOME is an absolute path, or if the process has raised privileges.
   static Ref<UserDefaults> standardUserDefaults();
 
-  /// The settings in the file at `path`; null for null, or for a path that is empty or has a NUL in it.
-  /// Nothing is opened yet.
+  /// Returns the user defaults in the file at `path`. Null if `path` is null, does not begin with a slash,
+  /// or contains NUL. Opens nothing.
   static Ref<UserDefaults> initWithPath(const String& path);
 
-  /// Has `handler` called, instead of standard error written to, with each report: one line without its
-  /// end. Null brings standard error back. It is called on the thread that came upon what it reports, and
-  /// must not throw.
+  /// Sets the handler of reports. A report is one line without its end. The default is null, which writes
+  /// reports to standard error. The handler is called on the thread that has found the problem. It must not
+  /// throw.
   static void setReportHandler(Block<void(const String&)> handler);
 
   ~UserDefaults() override;
 
-  /// Whether the value is "yes", "true", "on", "y" or "t", in letters of either case, or a number that is
-  /// not 0 and nothing else. False for all others, and when there is none.
+  /// Returns true if the value is "yes", "true", "on", "y" or "t", in letters of either case, or a decimal
+  /// number other than 0. Returns false for any other value, and if there is no value.
   bool boolForKey(std::string_view key) const;
 
-  /// The decimal integer that the value begins with, the nearest that fits where it is out of range; 1
-  /// where `boolForKey` reads a word as true. 0 for all others, and when there is none.
-  std::int64_t integerForKey(std::string_view key) const;
-
-  /// The decimal number, such as "-1.5e3", that the value begins with, whatever the locale; 1 where
-  /// `boolForKey` reads a word as true. 0 for all others, where it is out of range, and when there is none.
-  double realForKey(std::string_view key) const;
-
-  /// The value as it is written; null when there is none.
+  /// Returns the value as it is in the file. Null if there is no value.
   String stringForKey(std::string_view key) const;
 
-  /// Sets the value of `key`: booleans become YES or NO, numbers the shortest text that reads back the
-  /// same, a null string removes the value. Observers of the key are called before this returns, on this
-  /// thread, if the value is another than before; where a thread is calling them already, this one
-  /// included, that thread calls them once more instead. The first exception that leaves an observer passes,
-  /// after all were called.
+  /// Calls `observer` whenever the value of `key` has changed. It also counts as a change if the value
+  /// appears or disappears. Precondition: `observer` is not null. If values follow each other quickly, some
+  /// may be skipped, but never the last one. So read the value in the observer.
   ///
-  /// Throws, with nothing changed: std::system_error that names the path when the file cannot be read or
-  /// written, rt::Exception when it is malformed or there is no place for one, std::invalid_argument when
-  /// the key is not UTF-8, std::length_error when the file would be larger than 1 MiB. Throws std::bad_alloc,
-  /// when the value may be set already and observers may not have been called: they are by the next change.
-  void setBool(bool value, std::string_view key);
-  void setInteger(std::int64_t value, std::string_view key);
-  void setReal(double value, std::string_view key);
-  void setString(const String& value, std::string_view key);
-
-  /// Takes the value of `key` away. Otherwise as the functions above.
-  void remove(std::string_view key);
-
-  /// Calls `observer`, not null, when the value of `key` has become another, by whatever process; a key
-  /// without a value counts as one. Changes by this process call it as `setBool` says, those by others on
-  /// a thread of these user defaults. Calls for one observation do not overlap. Where values follow each
-  /// other quickly some may be left out, but not the last: read the value in the observer.
+  /// Threads: observers run on a thread of these user defaults, in the order in which they were registered.
+  /// Calls of one observer do not overlap. If the value changes during the call within `observe`, the same
+  /// thread calls the observer again.
   ///
-  /// An exception that leaves the observer passes to who calls it, `observe` included, which then has
-  /// observed nothing; on the thread of these user defaults it is reported. Where the system refuses to
-  /// watch the file, that is reported, and only changes by this process are told.
+  /// Errors: throws std::bad_alloc. An exception of an observer within `observe` passes to the caller, and
+  /// the key is not observed. An exception on the thread of these user defaults is reported. If the system
+  /// refuses to watch the file, that is reported, and observers are not called until the next call of
+  /// `observe`.
   Observation observe(std::string_view key, Notify notify, Block<void()> observer);
 
  private:

@@ -10,6 +10,7 @@
 #include <cstdint>
 #include <fstream>
 #include <memory>
+#include <semaphore>
 #include <stdexcept>
 #include <string>
 #include <thread>
@@ -22,6 +23,7 @@
 
 namespace {
 
+using namespace rt::literals;
 using Notify = rt::UserDefaults::Notify;
 using testing::Contains;
 using testing::ElementsAre;
@@ -30,40 +32,43 @@ using testing::StartsWith;
 
 TEST_F(UserDefaults, TellObserversOfChanges) {
   const auto defaults = this->defaults();
-  std::vector<std::string> calls;
+  std::vector<std::string> calls;  // looked at while nothing changes
   const auto record = [&](const char* name) { return [&calls, name] { calls.emplace_back(name); }; };
   auto later = defaults->observe("key", Notify::kOnChange, record("later"));
   EXPECT_THAT(calls, IsEmpty());
   auto now = defaults->observe("key", Notify::kAlsoNow, record("now"));
   EXPECT_THAT(calls, ElementsAre("now"));
   calls.clear();
+  const auto last = observe(defaults);
 
-  defaults->setInteger(1, "key");
+  set("key", "1");
+  await("1"_s);
   EXPECT_THAT(calls, ElementsAre("later", "now"));
-  defaults->setInteger(1, "key");
-  defaults->setInteger(1, "other");
-  EXPECT_EQ(calls.size(), 2U);
-  calls.clear();
+  set("key", "1");
+  set("other", "1");
   later.remove();
   EXPECT_FALSE(later);
   EXPECT_TRUE(now);
   later.remove();
-  defaults->remove("key");
-  EXPECT_THAT(calls, ElementsAre("now"));
+  remove("key");
+  await(nullptr);
+  EXPECT_THAT(calls, ElementsAre("later", "now", "now"));
   {
     const auto moved = std::move(now);
   }
-  defaults->setInteger(2, "key");
-  EXPECT_EQ(calls.size(), 1U);
+  set("key", "2");
+  await("2"_s);
+  EXPECT_EQ(calls.size(), 3U);
   EXPECT_THAT(reports(), IsEmpty());
 }
 
-// They are read anew at each request all the same.
+// They are read anew at each request all the same, and watched as soon as the next observer comes.
 TEST_F(UserDefaults, SayThatTheyAreNotWatched) {
   if (RT_TEST_ADDRESS_SANITIZER) GTEST_SKIP() << "the address sanitizer needs descriptors for its checks";
   const auto defaults = this->defaults();
-  defaults->setInteger(1, "key");
-  int calls = 0;
+  set("key", "1");
+  EXPECT_EQ(defaults->stringForKey("key"), "1");
+  std::atomic<int> calls = 0;
   rlimit before{};
   getrlimit(RLIMIT_NOFILE, &before);
   rlimit none = before;
@@ -73,9 +78,13 @@ TEST_F(UserDefaults, SayThatTheyAreNotWatched) {
   setrlimit(RLIMIT_NOFILE, &before);
   EXPECT_THAT(reports(),
               Contains(StartsWith("user defaults are not watched for changes: " + path().string())));
-  defaults->setInteger(2, "key");
-  EXPECT_EQ(calls, 1);
-  EXPECT_EQ(defaults->integerForKey("key"), 2);
+  set("key", "2");
+  EXPECT_EQ(defaults->stringForKey("key"), "2");
+  EXPECT_EQ(calls, 0);
+  const auto next = observe(defaults);
+  set("key", "3");
+  await("3"_s);
+  EXPECT_GE(calls, 1);
 }
 
 TEST_F(UserDefaults, LiveAsLongAsTheyAreObserved) {
@@ -101,19 +110,25 @@ TEST_F(UserDefaults, HoldNoLockWhileAnObserverRuns) {
   const auto defaults = this->defaults();
   int calls = 0;
   int inner = 0;
+  std::binary_semaphore isOver{0};
   rt::UserDefaults::Observation observation;
   rt::UserDefaults::Observation another;
   observation = defaults->observe("key", Notify::kOnChange, [&] {
     ++calls;
     another = defaults->observe("other", Notify::kAlsoNow, [&] { ++inner; });
-    // Its own change runs it once more, after this.
-    if (defaults->integerForKey("key") < 3) defaults->setInteger(defaults->integerForKey("key") + 1, "key");
-    defaults->setInteger(calls, "other");
+    // Runs it once more, after this.
+    if (calls < 3) {
+      set("key", std::to_string(calls + 1));
+      EXPECT_EQ(defaults->stringForKey("key"), std::string_view(std::to_string(calls + 1)));
+    } else {
+      isOver.release();
+    }
   });
-  defaults->setInteger(1, "key");
+  set("key", "1");
+  isOver.acquire();
+  observation.remove();
   EXPECT_EQ(calls, 3);
-  EXPECT_EQ(inner, 6);
-  EXPECT_EQ(defaults->integerForKey("key"), 3);
+  EXPECT_EQ(inner, 3);
 }
 
 TEST_F(UserDefaults, LetAnObserverEndItsOwnObservation) {
@@ -122,37 +137,34 @@ TEST_F(UserDefaults, LetAnObserverEndItsOwnObservation) {
   rt::UserDefaults::Observation observation;
   observation = defaults->observe("key", Notify::kOnChange, [&, captured = std::make_shared<int>(7)] {
     observation.remove();
-    defaults->setInteger(2, "key");
+    set("key", "2");
     calls += *captured;
   });
-  defaults->setInteger(1, "key");
+  const auto last = observe(defaults);
+  set("key", "1");
+  await("2"_s);
+  set("key", "3");
+  await("3"_s);
   EXPECT_EQ(calls, 7);
 }
 
-TEST_F(UserDefaults, PassExceptionsOfObserversOn) {
+TEST_F(UserDefaults, PassOnWhatAnObserverThrowsAtOnce) {
   const auto defaults = this->defaults();
-  int calls = 0;
-  const auto first = defaults->observe("key", Notify::kOnChange, [] { throw std::runtime_error("first"); });
-  const auto second = defaults->observe("key", Notify::kOnChange, [&] { ++calls; });
-  EXPECT_EQ(whatOf([&] { defaults->setInteger(1, "key"); }), "first");
-  EXPECT_EQ(calls, 1);
-  EXPECT_EQ(defaults->integerForKey("key"), 1);
-  EXPECT_EQ(whatOf([&] { defaults->setInteger(2, "key"); }), "first");
-  EXPECT_EQ(calls, 2);
-
   int tries = 0;
   EXPECT_EQ(whatOf([&] {
-              const auto none = defaults->observe("other", Notify::kAlsoNow, [&] {
+              const auto none = defaults->observe("key", Notify::kAlsoNow, [&] {
                 ++tries;
                 throw std::runtime_error("at once");
               });
             }),
             "at once");
-  defaults->setInteger(1, "other");
+  const auto last = observe(defaults);
+  set("key", "1");
+  await("1"_s);
   EXPECT_EQ(tries, 1);
+  EXPECT_THAT(reports(), IsEmpty());
 }
 
-// Invariant: what has been removed is not running and never runs again.
 // Whether a thread of this process waits in the system.
 bool isAsleep(pid_t thread) {
   std::ifstream file("/proc/self/task/" + std::to_string(thread) + "/stat");
@@ -174,7 +186,7 @@ TEST_F(UserDefaults, RemovalWaitsForAnObserverThatRuns) {
     mayEnd.wait(false);
     hasEnded = true;
   });
-  std::thread changer([&] { defaults->setInteger(1, "key"); });
+  set("key", "1");
   isRunning.wait(false);
   std::atomic<pid_t> remover = 0;
   std::atomic<bool> isRemoved = false;
@@ -188,14 +200,14 @@ TEST_F(UserDefaults, RemovalWaitsForAnObserverThatRuns) {
   mayEnd = true;
   mayEnd.notify_all();
   other.join();
-  changer.join();
 }
 
+// Invariant: what has been removed is not running and never runs again.
 TEST_F(UserDefaults, ConcurrentRemovalIsFinal) {
   const auto defaults = this->defaults();
   std::atomic<bool> isDone = false;
   std::jthread setter([&] {
-    for (int i = 0; !isDone; ++i) defaults->setInteger(i, "key");
+    for (int i = 0; !isDone; ++i) set("key", std::to_string(i));
   });
   std::vector<std::jthread> observers;
   observers.reserve(2);
@@ -221,20 +233,21 @@ TEST_F(UserDefaults, ConcurrentRemovalIsFinal) {
 TEST_F(UserDefaults, ConcurrentChangesEndWithTheLastValueSeen) {
   const auto defaults = this->defaults();
   for (int round = 0; round < 10; ++round) {
-    std::int64_t seen = 0;  // not atomic, as above
-    auto observation =
-        defaults->observe("key", Notify::kAlsoNow, [&] { seen = defaults->integerForKey("key"); });
+    int calls = 0;  // not atomic, as above
+    auto observation = defaults->observe("key", Notify::kAlsoNow, [&] { ++calls; });
+    const auto last = observe(defaults);
     {
       std::vector<std::jthread> setters;
       setters.reserve(4);
       for (int thread = 0; thread < 4; ++thread) {
         setters.emplace_back([&, thread] {
-          for (int i = 0; i < 5; ++i) defaults->setInteger((round * 100) + (thread * 10) + i, "key");
+          for (int i = 0; i < 5; ++i) set("key", std::to_string((round * 100) + (thread * 10) + i));
         });
       }
     }
+    await(rt::String::fromUTF8(contentOf(path()).substr(6)).trimmed());
     observation.remove();
-    ASSERT_EQ(seen, defaults->integerForKey("key"));
+    EXPECT_GT(calls, 1);
   }
   EXPECT_THAT(reports(), IsEmpty());
 }

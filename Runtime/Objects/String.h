@@ -69,9 +69,7 @@ constexpr String operator""_s() noexcept;
 
 class String {
  public:
-  static constexpr std::size_t kNotFound = std::string_view::npos;
-
-  /// Makes a null string.
+  /// Null.
   constexpr String() noexcept = default;
   constexpr String(std::nullptr_t) noexcept {}
 
@@ -137,12 +135,8 @@ class String {
 
   constexpr bool hasPrefix(std::string_view prefix) const noexcept { return view().starts_with(prefix); }
   constexpr bool hasSuffix(std::string_view suffix) const noexcept { return view().ends_with(suffix); }
-  constexpr bool contains(std::string_view text) const noexcept { return find(text) != kNotFound; }
-
-  /// Returns the first position of `text` at or after `start`, or `kNotFound`. An empty text is found at
-  /// `start`, if that is not past the end.
-  constexpr std::size_t find(std::string_view text, std::size_t start = 0) const noexcept {
-    return view().find(text, start);
+  constexpr bool contains(std::string_view text) const noexcept {
+    return view().find(text) != std::string_view::npos;
   }
 
   /// Returns the text without the Unicode white space and line ends at both ends. Null for null. Throws

@@ -40,11 +40,4 @@ void AssertionHandler::handleFailureInFunction(const String& function, const Str
   throw InternalInconsistencyException(knownFunction, knownFile, lineNumber, description);
 }
 
-void AssertionHandler::handleFailureInMethod(const String& selector, const Object& object, const String& file,
-                                             std::uint64_t lineNumber, const String& description) {
-  std::string function = "-[";
-  function.append(object.classInfo().name).append(" ").append(selector.view()).append("]");
-  handleFailureInFunction(String::fromUTF8Repaired(function), file, lineNumber, description);
-}
-
 }  // namespace rt

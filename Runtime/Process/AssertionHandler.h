@@ -47,11 +47,6 @@ class RT_VISIBLE AssertionHandler : public Implements<AssertionHandler, Object> 
   /// Threads: several threads may share a handler and call it at the same time.
   virtual void handleFailureInFunction(const String& function, const String& file, std::uint64_t lineNumber,
                                        const String& description);
-
-  /// Handles a failure in the operation `selector` of `object`. Calls `handleFailureInFunction` with the
-  /// function "-[ClassName selector]".
-  virtual void handleFailureInMethod(const String& selector, const Object& object, const String& file,
-                                     std::uint64_t lineNumber, const String& description);
 };
 
 }  // namespace rt

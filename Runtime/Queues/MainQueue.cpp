@@ -5,6 +5,7 @@
 
 #include "Runtime/Locks/Private/Lazy.h"
 #include "Runtime/Locks/Private/ThreadIdentifier.h"
+#include "Runtime/Queues/Private/WakeDescriptor.h"
 
 namespace rt {
 
@@ -59,7 +60,7 @@ std::size_t MainQueue::drain() {
 }
 
 int MainQueue::fileDescriptor() {
-  instance();  // With the first queue comes what renews the descriptor in the child of a fork.
+  instance();  // The first queue registers the handler that renews the descriptor in the child of a fork.
   return wakeDescriptor_.open();
 }
 

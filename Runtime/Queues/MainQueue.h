@@ -1,6 +1,6 @@
 #pragma once
 
-/// The main queue, whose tasks run on the main thread, when the host has it do so.
+/// The main queue. Its tasks run on the main thread, when the host calls `run` or `drain` there.
 ///
 ///     int main() {
 ///       startService([](Result result) { rt::Queue::main()->async([=] { show(result); }); });
@@ -15,44 +15,46 @@
 ///       ...
 ///     }
 ///
-/// What is queued stays queued until the main thread does one or the other, calls `sync` on the main
-/// queue, or exits. The main queue is a `rt::Queue` in every other way: see Runtime/Queues/Queue.h. On macOS
-/// the system's own main loop drains it too.
+/// Tasks stay queued until the main thread calls `run` or `drain`, calls `sync` on the main queue, or
+/// exits. In every other way the main queue is like any `rt::Queue` (Runtime/Queues/Queue.h). On macOS the
+/// system's own main loop drains it too.
 ///
-/// Not for: programs whose main thread has no time for others; these use a queue of their own.
+/// Not for: programs whose main thread has no time to run tasks. They use a queue of their own.
 
 #include <atomic>
 #include <cstddef>
 
-#include "Runtime/Queues/Private/WakeDescriptor.h"
 #include "Runtime/Queues/Queue.h"
+
+namespace rt::detail {
+class WakeDescriptor;
+}
 
 namespace rt {
 
 class MainQueue final : public Queue {
  public:
-  /// Its label.
+  /// The label of the main queue.
   static constexpr String kLabel = "main"_s;
 
-  /// Runs the queue's tasks, and waits for more, until `stop` is called. Ends the program when called on
-  /// another than the main thread or from a task of the main queue. Throws std::system_error when the
-  /// system has no descriptor left to wait on.
+  /// Runs the queue's tasks and waits for more, until `stop` is called. Ends the program if another thread
+  /// than the main thread calls it, or a task of the main queue. Throws std::system_error if the system has
+  /// no descriptor left to wait on.
   static void run();
 
-  /// Makes `run` return once the task that is running, if any, has ended; what else is queued stays
-  /// queued. Where `run` is not running, its next call returns at once. Any thread may call it, as may a
-  /// task.
+  /// Makes `run` return when the running task, if any, has ended. All other tasks stay queued. If `run` is
+  /// not running, its next call returns at once. Threads: any thread and any task may call it.
   static void stop() noexcept;
 
-  /// Runs the tasks that are queued by now, and not those that they queue in turn. Returns how many it
-  /// has run: 0 also when called from a task of the main queue, as an event loop within a task would.
-  /// Ends the program when called on another than the main thread.
+  /// Runs the tasks that are queued now, without those that they queue in turn. Returns how many it has
+  /// run. It is 0 if a task of the main queue calls it, as an event loop inside a task would. Ends the
+  /// program if another thread than the main thread calls it.
   static std::size_t drain();
 
-  /// A descriptor that is readable while there is something to `drain`, for poll, select or epoll. It is
-  /// opened by the first call, stays open for ever, and is not to be read or closed. In the child of a
-  /// fork the same number stands for the child's own queue; an epoll set has to be given it again. Any
-  /// thread may call it. Throws std::system_error when the system has no descriptor left.
+  /// Returns a descriptor for poll, select or epoll, which is readable while there are tasks to `drain`.
+  /// The first call opens it. It stays open for ever, and must be neither read nor closed. In the child of
+  /// a fork the same number stands for the child's own queue; add it to an epoll set again there. Threads:
+  /// any thread may call it. Throws std::system_error if the system has no descriptor left.
   static int fileDescriptor();
 
  private:
@@ -66,7 +68,7 @@ class MainQueue final : public Queue {
   void schedule() noexcept override;
   static void checkThread(const char* operation) noexcept;
 
-  static constinit detail::WakeDescriptor wakeDescriptor_;
+  static detail::WakeDescriptor wakeDescriptor_;
   static constinit std::atomic<bool> isStopping_;
 };
 

@@ -1,29 +1,24 @@
 #pragma once
 
-/// How urgent the work of a queue is, from what somebody waits for to what nobody will miss.
+/// How urgent the work of a queue is.
 ///
-/// What the system makes of it: on Linux the threads that run the work are nicer than the process by 0
-/// (the first three), 5 (utility) or 10 (background), and by a third of the relative priority below 0
-/// more. They are never less nice than the process: that would take a privilege, and would put the
-/// library before its host. A thread that a nicer one had to start may stay as nice for want of that
-/// privilege; it does what waits at that moment, and no more. On macOS they are the system's classes of the
-/// same names.
+/// On Linux, a thread that runs work of `kUtility` is nicer than the process by 5. All other threads are as
+/// nice as the process. No thread is less nice than the process, which takes a privilege and would put the
+/// library before its host. A thread that a nicer one has started may lack the privilege to become less
+/// nice. It then does the work that waits at that moment, and ends. On macOS these are the system's classes
+/// of the same names.
 
 #include <cstdint>
 
 namespace rt {
 
 enum class QualityOfService : std::uint8_t {
-  /// What a user sees or touches right now.
+  /// Work whose result a user sees or touches right now.
   kUserInteractive,
-  /// What a user has asked for and waits for.
-  kUserInitiated,
-  /// Nothing was said.
+  /// Work that nothing else is said of.
   kDefault,
-  /// What goes on for a while and nobody waits for.
+  /// Work that goes on for a while and that nobody waits for.
   kUtility,
-  /// What nobody knows of.
-  kBackground,
 };
 
 }  // namespace rt

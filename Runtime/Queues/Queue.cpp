@@ -1,6 +1,5 @@
 #include "Runtime/Queues/Queue.h"
 
-#include <algorithm>
 #include <cstdio>
 #include <cstdlib>
 #include <exception>
@@ -12,15 +11,13 @@ namespace rt {
 
 namespace {
 
-constexpr int kLowestRelativePriority = -15;
-
 constinit std::atomic<Queue::UncaughtExceptionHandler> uncaughtExceptionHandler = nullptr;
 
 void terminateForUncaughtException(const Queue& queue) noexcept {
   const auto report = [&](const char* what) {
     std::fprintf(stderr, "rt: an exception has left a task of the queue \"%.*s\": %s\n",
                  static_cast<int>(queue.label().length()), queue.label().view().data(), what);
-    std::terminate();  // While the exception is being handled, so that it is seen there.
+    std::terminate();  // While the exception is being handled, so that a terminate handler sees it.
   };
   try {
     throw;
@@ -33,8 +30,8 @@ void terminateForUncaughtException(const Queue& queue) noexcept {
 
 }  // namespace
 
-/// From when the calling thread has the queue to itself (isRunning_ is set) until it lets it go: the queue
-/// is the thread's current one.
+// Makes a queue the calling thread's current one. The thread has set `isRunning_`, and has the queue to
+// itself until the scope ends.
 class Queue::RunningScope {
  public:
   RunningScope(Queue& queue, detail::TaskList batch) noexcept
@@ -50,10 +47,10 @@ class Queue::RunningScope {
   RunningScope* outer() const noexcept { return outer_; }
   Queue& queue() const noexcept { return queue_; }
 
-  /// The tasks to run next; the child of a fork forgets them.
+  // The tasks to run next. The child of a fork forgets them.
   detail::TaskList& batch() noexcept { return batch_; }
 
-  /// How many tasks have run and are not counted in the queue yet.
+  // How many tasks have run that the queue has not counted yet.
   std::uint64_t& count() noexcept { return count_; }
 
  private:
@@ -67,10 +64,8 @@ class Queue::RunningScope {
 
 constinit thread_local Queue::RunningScope* Queue::RunningScope::innermost_ = nullptr;
 
-Queue::Queue(String label, QualityOfService qualityOfService, int relativePriority)
-    : label_(label ? std::move(label) : ""_s),
-      qualityOfService_(qualityOfService),
-      relativePriority_(static_cast<std::int16_t>(std::clamp(relativePriority, kLowestRelativePriority, 0))) {
+Queue::Queue(String label, QualityOfService qualityOfService)
+    : label_(label ? std::move(label) : ""_s), qualityOfService_(qualityOfService) {
   detail::QueueRegistry::add(*this);
 }
 
@@ -84,9 +79,8 @@ Ref<Queue> Queue::main() {
 
 void Queue::enqueue(detail::Task& task) noexcept {
   detail::QueueRegistry::runTasksAtExit();
-  // Known before the lock is let go, since the task may drop the last reference to the queue.
+  // Read before the lock is released, since the task may release the last reference to the queue.
   const QualityOfService qualityOfService = qualityOfService_;
-  const int relativePriority = relativePriority_;
   lock_.lock();
   const bool isStranded = isScheduled_ && !isRunning_ && isShortOfThreads();
   const bool wantsSchedule = append(task);
@@ -94,7 +88,7 @@ void Queue::enqueue(detail::Task& task) noexcept {
   if (wantsSchedule) {
     schedule();
   } else if (isStranded) {
-    detail::WorkerPool::tryAgain(qualityOfService, relativePriority);
+    detail::WorkerPool::tryAgain(qualityOfService);
   }
 }
 
@@ -115,12 +109,12 @@ detail::TaskList Queue::start() noexcept {
 }
 
 void Queue::schedule() noexcept {
-  // From here on its tasks may run and drop the last reference to it.
-  detail::WorkerPool::schedule(*this, qualityOfService_, relativePriority_);
+  // From here on, its tasks may run and release the last reference to it.
+  detail::WorkerPool::schedule(*this, qualityOfService_);
   detail::QueueRegistry::wakeExit();  // There may be no thread for it.
 }
 
-void Queue::perform(detail::FunctionView function) {
+void Queue::perform(FunctionView<void()> function) {
   if (isCurrent()) {
     std::fprintf(stderr,
                  "rt: sync on the queue \"%.*s\" from one of its own tasks, which would wait for itself\n",
@@ -162,7 +156,8 @@ std::size_t Queue::runScheduled(const std::atomic<bool>* stop) noexcept {
   return runBatch(scope, stop);
 }
 
-// Runs what is queued, unless some thread is at it. It stays scheduled, and so keeps its reference to itself.
+// Runs the queued tasks, unless another thread runs the queue. The queue stays scheduled, so it still
+// retains itself.
 void Queue::runHere() noexcept {
   const bool mayRun = mayRunHere();
   lock_.lock();
@@ -193,7 +188,7 @@ void Queue::runOnWorker() noexcept {
 std::size_t Queue::runBatch(RunningScope& scope, const std::atomic<bool>* stop) noexcept {
   std::size_t count = 0;
   while (detail::Task* task = scope.batch().takeFirst()) {
-    // Counted before it runs: in the child of a fork, it is the parent's and no longer counted.
+    // Counted before it runs. In the child of a fork the task is the parent's, and no longer counted.
     ++scope.count();
     ++count;
     try {
@@ -210,7 +205,7 @@ std::size_t Queue::runBatch(RunningScope& scope, const std::atomic<bool>* stop) 
 bool Queue::takeMore(RunningScope& scope) noexcept {
   LockGuard guard(lock_);
   if (tasks_.isEmpty()) return false;
-  // Other queues have their turn where threads are short, unless somebody waits for this one.
+  // If threads are short, other queues have their turn, unless a thread waits for this one.
   if (lastWaiter_ == nullptr && isShortOfThreads()) return false;
   doneCount_ += std::exchange(scope.count(), 0);
   scope.batch() = start();
@@ -230,7 +225,8 @@ void Queue::finish(RunningScope& scope) noexcept {
     if (isIdle) release();
     return;
   }
-  // A thread that waits goes on in place of this one: all workers may be waiting, and it needs none.
+  // A thread that waits runs the queue instead of this one. It needs no worker, and all workers may be
+  // waiting.
   if (detail::SyncTask* waiter = std::exchange(lastWaiter_, nullptr)) {
     lock_.unlock();
     waiter->giveTurn();
@@ -269,10 +265,10 @@ Queue::UncaughtExceptionHandler Queue::setUncaughtExceptionHandler(
 std::optional<std::uint64_t> Queue::exitGoal() noexcept {
   if (isCurrent()) return std::nullopt;
   LockGuard guard(lock_);
-  // In this order: a queue that is being made or destroyed at this moment is in the list, but has no tasks,
-  // and is not asked what only a whole one can answer.
+  // In this order: a queue that is being constructed or destroyed now is in the list, but has no tasks. So
+  // its virtual function is not called.
   if (doneCount_ == queuedCount_ || !mayRunHere()) return std::nullopt;
-  retain();  // It has a reference to itself until this lock is let go.
+  retain();  // Possible because a busy queue retains itself at least until this lock is released.
   return queuedCount_;
 }
 
@@ -282,11 +278,12 @@ bool Queue::hasReached(std::uint64_t goal) const noexcept {
 }
 
 bool Queue::isShortOfThreads() const noexcept {
-  return detail::WorkerPool::isShort(qualityOfService_, relativePriority_);
+  return detail::WorkerPool::isShort(qualityOfService_);
 }
 
-// Not analysed: there is no other thread. The tasks are the parent's and are forgotten, not destroyed. The
-// reference that a busy queue has to itself stays, if it was to be given up by a thread that is gone.
+// Not analysed: there is no other thread. The tasks are the parent's, and are forgotten without being
+// destroyed. A busy queue stays retained by itself if the thread that would have released it does not exist
+// here.
 void Queue::resetAfterFork() noexcept RT_NO_THREAD_SAFETY_ANALYSIS {
   isRunning_ = isCurrent();
   isScheduled_ = false;

@@ -45,7 +45,7 @@ struct Kind {
 };
 
 Ref<Queue> makeSerialQueue() {
-  return rt::make<Queue>("conformance"_s, rt::QualityOfService::kUtility, -2);
+  return rt::make<Queue>("conformance"_s, rt::QualityOfService::kUtility);
 }
 
 Ref<Queue> mainQueue() {

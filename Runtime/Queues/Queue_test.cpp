@@ -24,12 +24,10 @@ using rt::Queue;
 using rt::Ref;
 
 TEST_F(QueueTest, KeepsWhatItIsMadeOf) {
-  const Ref<Queue> queue = rt::make<Queue>("made"_s, QualityOfService::kBackground, -7);
+  const Ref<Queue> queue = rt::make<Queue>("made"_s, QualityOfService::kUtility);
   EXPECT_EQ(queue->label(), "made"_s);
-  EXPECT_EQ(queue->qualityOfService(), QualityOfService::kBackground);
-  EXPECT_EQ(queue->relativePriority(), -7);
+  EXPECT_EQ(queue->qualityOfService(), QualityOfService::kUtility);
   EXPECT_EQ(queue_->qualityOfService(), QualityOfService::kDefault);
-  EXPECT_EQ(queue_->relativePriority(), 0);
   EXPECT_EQ(rt::make<Queue>(nullptr)->label(), ""_s);
 }
 
@@ -47,11 +45,6 @@ TEST_F(QueueTest, TakesWhatCanBeCalledAsItCallsIt) {
   CalledOnce once;
   EXPECT_FALSE(isTaken(inPlace)) << "it would be called as what is given up";
   EXPECT_TRUE(isTaken(once));
-}
-
-TEST_F(QueueTest, RelativePriorityEndsAtItsLimits) {
-  EXPECT_EQ(rt::make<Queue>("test"_s, QualityOfService::kUtility, -100)->relativePriority(), -15);
-  EXPECT_EQ(rt::make<Queue>("test"_s, QualityOfService::kUtility, 3)->relativePriority(), 0);
 }
 
 TEST_F(QueueTest, AnIdleQueueRunsSyncOnTheCallersThread) {

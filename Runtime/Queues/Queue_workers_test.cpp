@@ -159,10 +159,10 @@ TEST_F(QueueDeathTest, FaultsOfATaskReachTheHostsHandler) {
 }
 
 TEST_F(QueueTest, WorkersDoNotBearTheNameOfWhoStartedThem) {
+  if (!RT_TEST_THREAD_SANITIZER) waitUntilWorkersHaveEnded();
   std::thread([&] {
     rt::Thread::setCurrentName("Importer"_s);
-    const Ref<Queue> queue =
-        rt::make<Queue>("test"_s, QualityOfService::kBackground, -15);  // A worker of its own.
+    const Ref<Queue> queue = rt::make<Queue>("test"_s);
     std::latch hasRun(1);
     rt::String name = "untouched"_s;
     char ofSystem[16] = "";
@@ -177,18 +177,16 @@ TEST_F(QueueTest, WorkersDoNotBearTheNameOfWhoStartedThem) {
   }).join();
 }
 
-TEST_F(QueueTest, NicenessFollowsClassAndRelativePriority) {
+TEST_F(QueueTest, NicenessFollowsQualityOfService) {
   const int ofProcess = getpriority(PRIO_PROCESS, static_cast<id_t>(getpid()));
   const struct {
     QualityOfService qualityOfService;
-    int relativePriority;
     int added;
-  } cases[] = {{QualityOfService::kUserInteractive, 0, 0}, {QualityOfService::kUserInitiated, 0, 0},
-               {QualityOfService::kDefault, 0, 0},         {QualityOfService::kDefault, -15, 5},
-               {QualityOfService::kUtility, 0, 5},         {QualityOfService::kUtility, -4, 6},
-               {QualityOfService::kBackground, 0, 10},     {QualityOfService::kBackground, -15, 15}};
+  } cases[] = {{QualityOfService::kUserInteractive, 0},
+               {QualityOfService::kDefault, 0},
+               {QualityOfService::kUtility, 5}};
   for (const auto& each : cases) {
-    const Ref<Queue> queue = rt::make<Queue>("nice"_s, each.qualityOfService, each.relativePriority);
+    const Ref<Queue> queue = rt::make<Queue>("nice"_s, each.qualityOfService);
     std::latch hasRun(1);
     int ofTask = 0;
     queue->async([&] {
@@ -201,8 +199,8 @@ TEST_F(QueueTest, NicenessFollowsClassAndRelativePriority) {
 }
 
 // A thread is as nice as the one that starts it, and may not become less so without a privilege: once a
-// background task had started a worker for urgent work, all urgent work was done as if in the background.
-TEST_F(QueueDeathTest, NicenessDoesNotSpreadFromTheBackground) {
+// task of a utility queue had started a worker for urgent work, all urgent work was done as nicely.
+TEST_F(QueueDeathTest, NicenessDoesNotSpreadToUrgentWork) {
   EXPECT_EXIT(
       {
         if (geteuid() == 0 && setresuid(65534, 65534, 65534) != 0) _exit(1);
@@ -211,10 +209,10 @@ TEST_F(QueueDeathTest, NicenessDoesNotSpreadFromTheBackground) {
         setrlimit(RLIMIT_NICE, &none);
         rt::detail::WorkerPool::idleTimeout = std::chrono::nanoseconds(std::chrono::hours(1)).count();
         const int ofProcess = getpriority(PRIO_PROCESS, static_cast<id_t>(getpid()));
-        const Ref<Queue> background = rt::make<Queue>("background"_s, QualityOfService::kBackground);
+        const Ref<Queue> utility = rt::make<Queue>("utility"_s, QualityOfService::kUtility);
         std::latch hasRun(1);
         rt::ThreadIdentifier worker = 0;
-        background->async([&] {
+        utility->async([&] {
           queue_->async([&] {
             worker = rt::currentThreadIdentifier();
             hasRun.count_down();

@@ -288,38 +288,33 @@ void Formatter::write(FormatDirective& directive) {
 
   const FormatArgument type = directive.argument();
   const Value& value = argument(directive.position, type);
-  switch (directive.conversion) {
-    case 'd':
-    case 'i':
-      writeSigned(directive, signedValue(directive.length, value));
+  switch (FormatDirective::kindOf(directive.conversion)) {
+    case FormatDirective::Kind::kInteger:
+      if (directive.conversion == 'd' || directive.conversion == 'i') {
+        writeSigned(directive, signedValue(directive.length, value));
+      } else {
+        writeUnsigned(directive, unsignedValue(directive.length, value));
+      }
       break;
-    case 'u':
-    case 'o':
-    case 'x':
-    case 'X':
-      writeUnsigned(directive, unsignedValue(directive.length, value));
-      break;
-    case 'c':
-    case 'C':
+    case FormatDirective::Kind::kCharacter:
       writeCharacter(directive, value.integer);
       break;
-    case 's':
-    case 'S':
+    case FormatDirective::Kind::kText:
       if (directive.isWide()) {
         writeWide(directive, static_cast<const wchar_t*>(value.pointer));
       } else {
         writeBytes(directive, static_cast<const char*>(value.pointer));
       }
       break;
-    case 'p':
+    case FormatDirective::Kind::kPointer:
       writePointer(directive, value.pointer);
       break;
-    case '@':
+    case FormatDirective::Kind::kObject:
       writeObject(directive, static_cast<const Object*>(value.pointer));
       break;
-    case 'n':
+    case FormatDirective::Kind::kPassedOver:
       break;
-    case '%':
+    case FormatDirective::Kind::kPercentSign:
       out_.append('%');
       break;
     default:

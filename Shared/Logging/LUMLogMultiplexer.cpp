@@ -76,7 +76,7 @@ rt::Ref<LUMLogMultiplexer> LUMLogMultiplexer::initWithSystemLogger(rt::Ref<LUMSy
 }
 
 LUMLogMultiplexer::LUMLogMultiplexer(rt::Ref<LUMSystemLogger> systemLogger)
-    : loggingQueue_(rt::make<rt::Queue>("LUMLogMultiplexer"_s, rt::QualityOfService::kUtility, 0)) {
+    : loggingQueue_(rt::make<rt::Queue>("LUMLogMultiplexer"_s, rt::QualityOfService::kUtility)) {
   Lists lists;
   if (systemLogger) lists.syncLoggers.emplace_back(systemLogger);
   lists.systemLogger = std::move(systemLogger);

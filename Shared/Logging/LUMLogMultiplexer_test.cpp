@@ -118,7 +118,6 @@ class NamedAsyncLogger final : public rt::Implements<NamedAsyncLogger, rt::Objec
 TEST_F(LUMLogMultiplexerTest, HasItsOwnSerialQueue) {
   EXPECT_EQ(multiplexer_->loggingQueue()->label(), "LUMLogMultiplexer");
   EXPECT_EQ(multiplexer_->loggingQueue()->qualityOfService(), rt::QualityOfService::kUtility);
-  EXPECT_EQ(multiplexer_->loggingQueue()->relativePriority(), 0);
   EXPECT_EQ(multiplexer_->loggingQueue(), multiplexer_->loggingQueue());
   EXPECT_NE(multiplexer_->loggingQueue(), LUMLogMultiplexer::init()->loggingQueue());
 }

@@ -5,8 +5,12 @@
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
+#include <semaphore>
 #include <stdexcept>
 #include <string>
+
+#include "Runtime/Defaults/UserDefaults.h"
+#include "tests/support/SettingsFile.h"
 
 /// Standard user defaults of the test program's own, in a folder that goes with it. To be made before the
 /// first use of any, once a program:
@@ -40,6 +44,17 @@ class PrivateDefaults {
   /// The file of the settings; its folder is there.
   std::filesystem::path file() const {
     return folder_ / std::filesystem::read_symlink("/proc/self/exe").filename() / "defaults.conf";
+  }
+
+  /// Has the file say `value` for `key`, which it does not yet, and nothing else. Returns when all that
+  /// observe the key have been told.
+  void change(const std::string& key, const std::string& value) const {
+    // Observers are called in their order: when this one is, all others have been.
+    std::counting_semaphore<> told{0};
+    const auto observation = rt::UserDefaults::standardUserDefaults()->observe(
+        key, rt::UserDefaults::Notify::kOnChange, [&] { told.release(); });
+    SettingsFile(file()).set(key, value);
+    told.acquire();
   }
 
  private:

@@ -1,6 +1,6 @@
 #pragma once
 
-// What the tests of user defaults share: a folder of their own, and what is reported.
+// What the tests of user defaults share: a folder of their own, what is reported, and what is observed.
 
 #include <gtest/gtest.h>
 #include <sys/stat.h>
@@ -11,6 +11,7 @@
 #include <functional>
 #include <iterator>
 #include <mutex>
+#include <semaphore>
 #include <stdexcept>
 #include <string>
 #include <string_view>
@@ -18,6 +19,7 @@
 #include <vector>
 
 #include "Runtime/Defaults/UserDefaults.h"
+#include "tests/support/SettingsFile.h"
 
 inline std::string contentOf(const std::filesystem::path& path) {
   std::ifstream stream(path, std::ios::binary);
@@ -44,9 +46,6 @@ inline std::string whatOf(const std::function<void()>& function) {
 class UserDefaults : public testing::Test {
  protected:
   UserDefaults() {
-    std::string folder = testing::TempDir() + "user-defaults.XXXXXX";
-    if (mkdtemp(folder.data()) == nullptr) throw std::runtime_error("no temporary folder");
-    folder_ = folder;
     rt::UserDefaults::setReportHandler([this](const rt::String& line) {
       const std::scoped_lock lock(mutex_);
       reports_.emplace_back(line.view());
@@ -68,9 +67,45 @@ class UserDefaults : public testing::Test {
     return std::exchange(reports_, {});
   }
 
-  std::filesystem::path folder_;
+  // Changes the file as another program would.
+  void set(const std::string& key, const std::string& value) { settings_.set(key, value); }
+  void remove(const std::string& key) { settings_.remove(key); }
+
+  // Observes "key" for `await`. What was observed before it has been called when `await` returns, if there
+  // was one change.
+  rt::UserDefaults::Observation observe(const rt::Ref<rt::UserDefaults>& defaults) {
+    return defaults->observe("key", rt::UserDefaults::Notify::kAlsoNow, [this, raw = defaults.get()] {
+      {
+        const rt::String value = raw->stringForKey("key");
+        const std::scoped_lock lock(mutex_);
+        seen_ = value;
+      }
+      called_.release();
+    });
+  }
+  // Waits until that observer has seen `value`.
+  void await(const rt::String& value) {
+    for (;;) {
+      {
+        const std::scoped_lock lock(mutex_);
+        if (seen_ == value) return;
+      }
+      called_.acquire();
+    }
+  }
+
+  const std::filesystem::path folder_ = newFolder();
 
  private:
+  static std::filesystem::path newFolder() {
+    std::string folder = testing::TempDir() + "user-defaults.XXXXXX";
+    if (mkdtemp(folder.data()) == nullptr) throw std::runtime_error("no temporary folder");
+    return folder;
+  }
+
+  SettingsFile settings_{path()};
   std::mutex mutex_;
   std::vector<std::string> reports_;
+  rt::String seen_ = rt::String::fromUTF8("(nothing yet)");
+  std::counting_semaphore<> called_{0};
 };

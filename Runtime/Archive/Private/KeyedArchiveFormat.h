@@ -1,6 +1,7 @@
 #pragma once
 
-// What the writer and the reader of keyed archives agree on. Runtime/Archive/KeyedArchiver.h describes it.
+// What the writer and the reader of keyed archives share. Runtime/Archive/KeyedArchiver.h describes the
+// format.
 
 // The size of an object in an archive is bounded (`maximumSize`). Otherwise a few thousand bytes could hold
 // objects of a few hundred levels, each referring twice to the next. Hashing them would take forever.
@@ -28,17 +29,17 @@ inline constexpr std::string_view kKeysKey = "keys";
 inline constexpr std::string_view kRootKey = "root";
 inline constexpr std::string_view kInitializer = "initWithCoder:";
 
-/// How large an object under a key at the top of an archive of so many bytes may be. Its size is the number
-/// of objects that it is made of plus that of the bytes of their texts, each counted as often as it is
-/// referred to, and nulls not at all. Objects of a few bytes that refer to each other could make up one that
-/// nobody would live to see the hash of.
+/// Returns the largest size of an object under a key at the top of an archive of `bytes` bytes. An object's
+/// size is the number of objects in it plus the number of bytes in their texts. Each is counted as often as
+/// it is referred to; nulls are not counted. Without this limit, a few bytes could stand for an object that
+/// takes years to hash.
 constexpr std::size_t maximumSize(std::size_t bytes) noexcept {
   constexpr std::size_t kFactor = 16;
   constexpr std::size_t kSpare = std::size_t{16} << 20U;
   return (kFactor * bytes) + kSpare;
 }
 
-/// `key`, which a class chose, such that it is none of the archive's own: with a "$" more if it has one.
+/// Returns `key` so that it differs from the archive's own keys: a key that begins with "$" gets one more.
 inline std::string escaped(std::string_view key) {
   return (key.starts_with('$') ? "$" : "") + std::string(key);
 }

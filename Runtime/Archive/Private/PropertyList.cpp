@@ -8,8 +8,8 @@ namespace rt {
 
 namespace {
 
-// Finds the longest way down from any value, one step of the way at a time: what is nested deeply must
-// not use up the stack.
+// Finds how deep each value is nested. It does not recurse, since deeply nested values would exhaust the
+// stack.
 class DepthCheck {
  public:
   explicit DepthCheck(const PropertyList& list) : list_(list), heights_(list.values.size(), kUnknown) {}
@@ -65,7 +65,7 @@ class DepthCheck {
     path_.pop_back();
   }
 
-  // Keys are no collections, so only values lead further down.
+  // Keys are texts, so only values lead further down.
   std::optional<PropertyList::Index> childOf(PropertyList::Index parent, std::size_t position) const {
     if (const auto* array = list_.get<PropertyList::Array>(parent)) {
       return position < array->size() ? std::optional((*array)[position]) : std::nullopt;
@@ -117,8 +117,7 @@ const char* PropertyList::structuralError() const {
 }
 
 bool PropertyList::hasRepeatedKey() const {
-  // All texts are compared with each other once, and the keys of each dictionary then by number: many
-  // dictionaries may share long keys.
+  // Equal texts get the same number, and keys are compared by number: many dictionaries may share long keys.
   std::vector<Index> texts;
   for (Index index = 0; index < values.size(); ++index) {
     if (get<Text>(index) != nullptr) texts.push_back(index);

@@ -1,6 +1,6 @@
 #pragma once
 
-/// A property list in the binary format "bplist00": read from bytes that nobody vouches for, and written.
+/// A property list in the binary format "bplist00". Reads it from untrusted bytes, and writes it.
 ///
 ///     rt::PropertyList list;
 ///     const auto key = list.add("answer");
@@ -11,12 +11,17 @@
 ///     rt::PropertyList read = rt::PropertyList::decoded(bytes);      // throws MalformedPropertyList
 ///     read.find(read.root, "answer");                                // the index of 42
 ///
-/// The values stand in one table, in the order of the file; collections refer to their elements by
-/// index, so that a value which many collections share is there once, and reading it takes time and
-/// memory in proportion to the size of the file, whatever is in it.
+/// All values are in one table, in the order of the file. Collections refer to their elements by index. A
+/// value that many collections share is in the table once. So reading takes time and memory in proportion
+/// to the size of the file, whatever it contains.
 ///
-/// Not for: objects (see Runtime/Archive/KeyedUnarchiver.h); settings that people edit
-/// (Runtime/Defaults/UserDefaults.h); property lists as XML.
+/// The format also has dates, data and real numbers of four bytes. They are refused, since no archive has
+/// any.
+///
+/// Threads: as safe as a std::vector.
+///
+/// Not for: objects (Runtime/Archive/KeyedUnarchiver.h); settings that people edit
+/// (Runtime/Defaults/UserDefaults.h); property lists in XML.
 
 #include <cstddef>
 #include <cstdint>
@@ -31,41 +36,33 @@
 
 namespace rt {
 
-/// The bytes are no property list; `what()` says why, and at which byte.
+/// The bytes are not a property list. `what()` says why, and at which byte.
 class MalformedPropertyList final : public std::runtime_error {
  public:
   using std::runtime_error::runtime_error;
 };
 
-/// As safe as a vector. Moved, and never copied: what refers to a value has its index.
+/// Can be moved but not copied.
 class PropertyList {
  public:
-  /// The place of a value in `values`.
+  /// The index of a value in `values`.
   using Index = std::uint32_t;
-  /// How deep values may be nested: a number by itself is 1 deep, an array of numbers 2.
+  /// How deep values may be nested. A number by itself is 1 deep, an array of numbers 2.
   static constexpr std::size_t kMaximumDepth = 512;
 
-  /// A point in time.
-  struct Date {
-    /// Seconds since the start of 2001 in UTC.
-    double seconds;
-    bool operator==(const Date&) const = default;
-  };
-  /// What refers to another object in a keyed archive.
+  /// A reference to another object of a keyed archive.
   struct Reference {
     std::uint64_t number;
     bool operator==(const Reference&) const = default;
   };
-  using Data = std::vector<std::byte>;
-  /// UTF-8.
+  /// Valid UTF-8.
   using Text = std::string;
   using Array = std::vector<Index>;
-  /// Keys, which are texts and differ from each other, and values, in the order of the file.
+  /// Pairs of a key and a value, in the order of the file. Keys are texts, and no two are equal.
   using Dictionary = std::vector<std::pair<Index, Index>>;
 
-  /// An integer is a std::uint64_t only where it is too large for std::int64_t.
-  struct Value : std::variant<bool, std::int64_t, std::uint64_t, double, Date, Data, Text, Reference, Array,
-                              Dictionary> {
+  /// A value. An integer is a std::uint64_t only if it is too large for std::int64_t.
+  struct Value : std::variant<bool, std::int64_t, std::uint64_t, double, Text, Reference, Array, Dictionary> {
     using variant::variant;
     Value(Value&&) noexcept = default;
     Value& operator=(Value&&) noexcept = default;
@@ -78,30 +75,30 @@ class PropertyList {
   PropertyList(PropertyList&&) noexcept = default;
   PropertyList& operator=(PropertyList&&) noexcept = default;
 
-  /// Appends `value`; returns its index.
+  /// Appends `value` and returns its index.
   Index add(Value value);
 
-  /// The value at `index` if it is a T, else null.
+  /// Returns the value at `index` if there is one and it is a T, and null otherwise.
   template <class T>
   const T* get(Index index) const noexcept {
     return index < values.size() ? std::get_if<T>(&values[index]) : nullptr;
   }
 
-  /// The index of the value under `key` of the dictionary at `dictionary`; none when it has no such key
-  /// or is no dictionary.
+  /// Returns the index of the value under `key` in the dictionary at `dictionary`. Nullopt if there is no
+  /// such key or the value is not a dictionary.
   std::optional<Index> find(Index dictionary, std::string_view key) const noexcept;
 
-  /// What `bytes` hold. Throws MalformedPropertyList when they are not a whole property list, and when
-  /// it has collections that contain themselves, are nested deeper than `kMaximumDepth`, or have a key
-  /// twice; also when it has a null, which no writer puts in one.
+  /// Reads `bytes`. Throws MalformedPropertyList if they are not a whole property list, if a collection
+  /// contains itself, is nested deeper than `kMaximumDepth` or has a key twice, and if there is a null,
+  /// which no writer puts in a property list.
   static PropertyList decoded(std::span<const std::byte> bytes);
 
-  /// The property list as bytes: the same values and order give the same bytes. Throws
-  /// std::invalid_argument where `decoded` would refuse what comes out.
+  /// Returns the property list as bytes. The same values in the same order give the same bytes. Throws
+  /// std::invalid_argument if `decoded` would refuse the bytes.
   std::vector<std::byte> encoded() const;
 
  private:
-  // What is wrong with how the values refer to each other, or null.
+  // Says what is wrong with the indexes of collections. Null if nothing is.
   const char* structuralError() const;
   bool hasRepeatedKey() const;
 };

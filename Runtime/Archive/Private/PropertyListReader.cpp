@@ -19,22 +19,22 @@ using Bytes = std::span<const std::byte>;
   throw MalformedPropertyList(std::string(what) + " at byte " + std::to_string(offset));
 }
 
-// The big-endian number that `bytes`, 8 at most, spell.
+// Returns the big-endian number in `bytes`, which are 8 at most.
 std::uint64_t unsignedNumber(Bytes bytes) {
   std::uint64_t number = 0;
   for (const std::byte byte : bytes) number = number << 8U | std::to_integer<std::uint64_t>(byte);
   return number;
 }
 
-// Reads each object of the table once. Every length is compared with the bytes that are there before
-// anything is allocated for it.
+// Reads each object of the table once. Compares every length with the number of bytes left before it
+// allocates.
 class Reader {
  public:
   explicit Reader(Bytes file) : file_(file) {}
 
   PropertyList read() {
     readTrailer();
-    // As objects do not overlap, all together they take no more than what is between header and table.
+    // Objects do not overlap, so all of them together fit between header and table.
     bytesLeft_ = tableOffset_ - kHeader.size();
     list_.values.reserve(objectCount_);
     for (std::size_t i = 0; i < objectCount_; ++i) {
@@ -85,18 +85,9 @@ class Reader {
         readInteger(low);
         return;
       case 0x2:
-        if (low != 2 && low != 3) break;
-        list_.add(takeReal(low == 2 ? 4 : 8));
-        return;
-      case 0x3:
         if (low != 3) break;
-        list_.add(PropertyList::Date{takeReal(8)});
+        list_.add(std::bit_cast<double>(unsignedNumber(take(8))));
         return;
-      case 0x4: {
-        const Bytes bytes = takeElements(low, 1);
-        list_.add(PropertyList::Data(bytes.begin(), bytes.end()));
-        return;
-      }
       case 0x5:
         readAscii(low);
         return;
@@ -146,12 +137,6 @@ class Reader {
     list_.add(static_cast<std::int64_t>(number));
   }
 
-  double takeReal(std::size_t size) {
-    const std::uint64_t bits = unsignedNumber(take(size));
-    if (size == 4) return static_cast<double>(std::bit_cast<float>(static_cast<std::uint32_t>(bits)));
-    return std::bit_cast<double>(bits);
-  }
-
   void readAscii(unsigned low) {
     const Bytes bytes = takeElements(low, 1);
     std::string text(bytes.size(), '\0');
@@ -187,7 +172,7 @@ class Reader {
     return static_cast<PropertyList::Index>(number);
   }
 
-  // The bytes of as many elements of `size` bytes as `low`, or the integer that follows it, says.
+  // Takes the bytes of elements of `size` bytes each. `low`, or the integer that follows, is their number.
   Bytes takeElements(unsigned low, std::size_t size) {
     std::uint64_t count = low;
     if (low == 0xF) {

@@ -11,14 +11,14 @@ namespace {
 
 constexpr std::string_view kHeader = "bplist00";
 
-// How many bytes a number takes, of the sizes that the format knows for integers, as a power of two.
+// Returns the binary logarithm of how many bytes `number` takes as an integer of the format.
 unsigned log2Size(std::uint64_t number) {
   if (number <= 0xFF) return 0;
   if (number <= 0xFFFF) return 1;
   return number <= 0xFFFFFFFF ? 2 : 3;
 }
 
-// `text` in UTF-16. Throws std::invalid_argument if it is no valid UTF-8.
+// Returns `text` in UTF-16. Throws std::invalid_argument if it is not valid UTF-8.
 std::u16string utf16(std::string_view text) {
   if (!isValidUTF8(text)) throw std::invalid_argument("a text in a property list is no valid UTF-8");
   std::u16string units;
@@ -26,7 +26,7 @@ std::u16string utf16(std::string_view text) {
   for (std::size_t position = 0; position < text.size();) {
     const auto at = [&](std::size_t i) { return char32_t{static_cast<unsigned char>(text[position + i])}; };
     const std::size_t length = nextUTF8(text.substr(position)).length;
-    // The first byte of a character of several says by its leading ones how many.
+    // In a character of several bytes, the leading ones of the first byte are their number.
     char32_t point = length == 1 ? at(0) : at(0) & (0x7FU >> length);
     for (std::size_t i = 1; i < length; ++i) point = point << 6U | (at(i) & 0x3F);
     if (point >= 0x10000) {
@@ -77,14 +77,6 @@ class Writer {
   void writeObject(double value) {
     appendNumber(0x23, 1);
     appendNumber(std::bit_cast<std::uint64_t>(value), 8);
-  }
-  void writeObject(PropertyList::Date date) {
-    appendNumber(0x33, 1);
-    appendNumber(std::bit_cast<std::uint64_t>(date.seconds), 8);
-  }
-  void writeObject(const PropertyList::Data& data) {
-    appendHeader(0x4, data.size());
-    append(data);
   }
   void writeObject(const PropertyList::Text& text) {
     if (std::ranges::all_of(text, [](char c) { return static_cast<unsigned char>(c) < 0x80; })) {

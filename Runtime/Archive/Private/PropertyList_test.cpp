@@ -86,9 +86,8 @@ TEST(PropertyList, ReadsKnownBytes) {
             PropertyList::Value(std::int64_t{255}));
   EXPECT_EQ(PropertyList::decoded(file("\x13\xFF\xFF\xFF\xFF\xFF\xFF\xFF\xFE"sv, {8})).values.at(0),
             PropertyList::Value(std::int64_t{-2}));
-  EXPECT_EQ(PropertyList::decoded(file("\x22\x3F\xC0\0\0"sv, {8})).values.at(0), PropertyList::Value(1.5));
-  EXPECT_EQ(PropertyList::decoded(file("\x33\x3F\xF8\0\0\0\0\0\0"sv, {8})).values.at(0),
-            PropertyList::Value(PropertyList::Date{1.5}));
+  EXPECT_EQ(PropertyList::decoded(file("\x23\x3F\xF8\0\0\0\0\0\0"sv, {8})).values.at(0),
+            PropertyList::Value(1.5));
   EXPECT_EQ(PropertyList::decoded(file("\x52hi"sv, {8})).values.at(0), PropertyList::Value("hi"));
   EXPECT_EQ(PropertyList::decoded(file("\x62\xD8\x3D\xDE\0"sv, {8})).values.at(0), PropertyList::Value("😀"));
   EXPECT_EQ(PropertyList::decoded(file("\x81\1\2"sv, {8})).values.at(0),
@@ -115,8 +114,6 @@ TEST(PropertyList, ReadsBackEachKindAtItsEdges) {
   }
   for (const std::size_t length : {0U, 1U, 14U, 15U, 16U, 255U, 256U, 65535U, 65536U}) {
     EXPECT_EQ(readBack(std::string(length, 'a')), PropertyList::Value(std::string(length, 'a')));
-    EXPECT_EQ(readBack(PropertyList::Data(length, std::byte{0xFF})),
-              PropertyList::Value(PropertyList::Data(length, std::byte{0xFF})));
   }
   for (const char* text : {"\x7F", "\u0080", "\u07FF", "\u0800", "\uD7FF", "\uE000", "\uFFFF", "\U00010000",
                            "\U0010FFFF", "a😀ü"}) {
@@ -162,6 +159,10 @@ TEST(PropertyList, RefusesWhatIsMalformed) {
   using namespace std::string_view_literals;
   EXPECT_THAT(errorOfDecoding(file("\x00"sv, {8})), HasSubstr("unknown kind"));
   EXPECT_THAT(errorOfDecoding(file("\xC0"sv, {8})), HasSubstr("unknown kind"));
+  // A short real number, a date and data.
+  EXPECT_THAT(errorOfDecoding(file("\x22\x3F\xC0\0\0"sv, {8})), HasSubstr("unknown kind"));
+  EXPECT_THAT(errorOfDecoding(file("\x33\x3F\xF8\0\0\0\0\0\0"sv, {8})), HasSubstr("unknown kind"));
+  EXPECT_THAT(errorOfDecoding(file("\x41\1"sv, {8})), HasSubstr("unknown kind"));
   EXPECT_THAT(errorOfDecoding(file("\x15\1"sv, {8})), HasSubstr("unknown size"));
   EXPECT_THAT(errorOfDecoding(file("\x51\x80"sv, {8})), HasSubstr("not ASCII"));
   EXPECT_THAT(errorOfDecoding(file("\x61\xD8\x3D"sv, {8})), HasSubstr("half a character"));
@@ -240,7 +241,7 @@ PropertyList randomList(std::mt19937_64& random) {
   std::vector<PropertyList::Index> keys;
   const std::size_t size = 1 + below(300);
   for (std::size_t i = 0; i < size; ++i) {
-    switch (below(10)) {
+    switch (below(8)) {
       case 0:
         list.add(below(2) == 0);
         break;
@@ -254,21 +255,15 @@ PropertyList randomList(std::mt19937_64& random) {
         list.add(static_cast<double>(random()) / 3);
         break;
       case 4:
-        list.add(PropertyList::Date{static_cast<double>(random()) / 7});
-        break;
-      case 5:
-        list.add(PropertyList::Data(below(40), static_cast<std::byte>(random())));
-        break;
-      case 6:
         list.add(PropertyList::Reference{random() >> below(64)});
         break;
-      case 7: {
+      case 5: {
         PropertyList::Array array(i == 0 ? 0 : below(20));
         for (auto& index : array) index = static_cast<PropertyList::Index>(below(i));
         list.add(std::move(array));
         break;
       }
-      case 8: {
+      case 6: {
         PropertyList::Dictionary dictionary;
         for (const auto key : keys) {
           if (below(2) == 0) dictionary.emplace_back(key, static_cast<PropertyList::Index>(below(i)));
@@ -336,8 +331,6 @@ TEST_F(PropertyListAndPython, PythonReadsOurs) {
   add("small", std::int64_t{-3});
   add("large", std::numeric_limits<std::uint64_t>::max());
   add("real", 0.25);
-  add("date", PropertyList::Date{86400});
-  add("data", PropertyList::Data{std::byte{1}, std::byte{0xFF}});
   add("text", "a\xC3\xBC\xF0\x9F\x98\x80");
   add("uid", PropertyList::Reference{300});
   add("array", PropertyList::Array{0, 1});
@@ -345,18 +338,14 @@ TEST_F(PropertyListAndPython, PythonReadsOurs) {
   list.root = list.add(root);
   writeFile(list.encoded());
 
-  EXPECT_EQ(
-      python("print(ascii(plistlib.load(open(path, 'rb'))))"),
-      "{'no': False, 'small': -3, 'large': 18446744073709551615, 'real': 0.25, "
-      "'date': datetime.datetime(2001, 1, 2, 0, 0), 'data': b'\\x01\\xff', 'text': 'a\\xfc\\U0001f600', "
-      "'uid': UID(300), 'array': ['no', False]}\n");
+  EXPECT_EQ(python("print(ascii(plistlib.load(open(path, 'rb'))))"),
+            "{'no': False, 'small': -3, 'large': 18446744073709551615, 'real': 0.25, "
+            "'text': 'a\\xfc\\U0001f600', 'uid': UID(300), 'array': ['no', False]}\n");
 }
 
 TEST_F(PropertyListAndPython, ReadsPythons) {
   python(R"(
-import datetime
-plistlib.dump({'yes': True, 'int': -1, 'large': 2**64 - 1, 'real': 0.5, 'date': datetime.datetime(2001, 1, 2),
-    'data': b'\x00\x01', 'text': '\xfc\U0001f600', 'uid': plistlib.UID(70000),
+plistlib.dump({'yes': True, 'int': -1, 'large': 2**64 - 1, 'real': 0.5, 'text': '\xfc\U0001f600', 'uid': plistlib.UID(70000),
     'array': list(range(500))}, open(path, 'wb'), fmt=plistlib.FMT_BINARY))");
   const PropertyList list = PropertyList::decoded(readFile());
 
@@ -367,8 +356,6 @@ plistlib.dump({'yes': True, 'int': -1, 'large': 2**64 - 1, 'real': 0.5, 'date': 
   EXPECT_EQ(at("int"), PropertyList::Value(std::int64_t{-1}));
   EXPECT_EQ(at("large"), PropertyList::Value(std::numeric_limits<std::uint64_t>::max()));
   EXPECT_EQ(at("real"), PropertyList::Value(0.5));
-  EXPECT_EQ(at("date"), PropertyList::Value(PropertyList::Date{86400}));
-  EXPECT_EQ(at("data"), PropertyList::Value(PropertyList::Data{std::byte{0}, std::byte{1}}));
   EXPECT_EQ(at("text"), PropertyList::Value("ü😀"));
   EXPECT_EQ(at("uid"), PropertyList::Value(PropertyList::Reference{70000}));
   const auto array = std::get<PropertyList::Array>(at("array"));

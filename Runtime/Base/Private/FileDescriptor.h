@@ -2,19 +2,15 @@
 
 /// An open file descriptor that is closed at the end of its scope.
 ///
-///     auto file = rt::FileDescriptor::open("/var/log/a.log", O_WRONLY | O_APPEND | O_CREAT, 0644);
-///     file.write("whole\n");
-///
-/// Interrupted calls are repeated, and short writes are continued.
+///     auto file = rt::FileDescriptor::open("/etc/localtime", O_RDONLY);
+///     std::array<char, 4096> bytes;
+///     ssize_t count = read(file.get(), bytes.data(), bytes.size());
 ///
 /// Errors: failures are std::system_error.
 ///
 /// Not for: a file that threads share (Runtime/Process/FileHandle.h).
 
-#include <sys/types.h>
-
 #include <string>
-#include <string_view>
 #include <utility>
 
 namespace rt {
@@ -34,19 +30,15 @@ class FileDescriptor {
   }
   ~FileDescriptor();
 
-  /// Opens `path` with `flags` and O_CLOEXEC. A file that is created gets `mode`. Throws a std::system_error
-  /// that names the path. Throws std::invalid_argument if the path has a NUL in it.
-  static FileDescriptor open(const std::string& path, int flags, mode_t mode = 0);
+  /// Opens the file that is at `path` with `flags` (O_CLOEXEC is added); a call that is interrupted is taken
+  /// up again. Throws std::system_error that names the path; std::invalid_argument for a path with a NUL.
+  static FileDescriptor open(const std::string& path, int flags);
 
   /// Returns the descriptor, or -1.
   int get() const noexcept { return descriptor_; }
   /// Gives up the descriptor and returns it, or -1. The caller has to close it.
   int release() noexcept { return std::exchange(descriptor_, -1); }
   explicit operator bool() const noexcept { return descriptor_ >= 0; }
-
-  /// Writes all of `bytes`. Waits for room if the descriptor is non-blocking. Throws std::system_error. Some
-  /// of the bytes may have been written then.
-  void write(std::string_view bytes) const;
 
  private:
   int descriptor_ = -1;

@@ -10,7 +10,6 @@
 #include <stdexcept>
 #include <string>
 #include <system_error>
-#include <thread>
 #include <utility>
 
 namespace {
@@ -69,35 +68,6 @@ TEST_F(FileDescriptor, NamesThePathThatCannotBeOpened) {
 // The system would not read the path beyond the NUL.
 TEST_F(FileDescriptor, RefusesAPathWithANul) {
   EXPECT_THROW(rt::FileDescriptor::open(std::string("/dev/null\0x", 11), O_RDONLY), std::invalid_argument);
-}
-
-// The text is longer than a pipe has room for, so it is written in several pieces.
-TEST_F(FileDescriptor, WaitsForRoomToWrite) {
-  const std::string text(1'000'000, 'x');
-  std::string read;
-  rt::FileDescriptor writer = takeWriter();
-  fcntl(writer.get(), F_SETFL, O_NONBLOCK);
-  std::thread reader([&] {
-    std::array<char, 4096> bytes{};
-    for (ssize_t count; (count = ::read(ends_[0], bytes.data(), bytes.size())) > 0;) {
-      read.append(bytes.data(), static_cast<std::size_t>(count));
-    }
-  });
-  writer.write(text);
-  writer = rt::FileDescriptor();
-  reader.join();
-  EXPECT_EQ(read, text);
-}
-
-TEST_F(FileDescriptor, ThrowsIfItCannotWrite) {
-  const rt::FileDescriptor reader(std::exchange(ends_[0], -1));
-  try {
-    reader.write("text");
-    FAIL() << "it was written";
-  } catch (const std::system_error& error) {
-    EXPECT_EQ(error.code().value(), EBADF);
-  }
-  EXPECT_NO_THROW(reader.write(""));
 }
 
 }  // namespace

@@ -1,17 +1,13 @@
 #include "Runtime/Defaults/Private/DefaultsFile.h"
 
 #include <fcntl.h>
-#include <sys/file.h>
 #include <unistd.h>
 
 #include <cerrno>
-#include <cstdio>
-#include <cstdlib>
 #include <ctime>
 #include <system_error>
-#include <utility>
 
-#include "Runtime/Defaults/Private/FilePath.h"
+#include "Runtime/Base/Private/FileDescriptor.h"
 
 namespace rt {
 
@@ -29,75 +25,15 @@ timespec changeTime(const struct stat& status) {
 #endif
 }
 
-// What `call` gives, which is called again as long as it is interrupted.
-template <class Call>
-int untilNotInterrupted(Call call) {
-  int result = -1;
-  do {
-    result = call();
-  } while (result == -1 && errno == EINTR);
-  return result;
-}
-
-void makeFolders(const std::string& folder) {
-  if (mkdir(folder.c_str(), 0700) == 0 || errno == EEXIST) return;
-  if (errno == ENOENT) {
-    const std::string parent = folderOf(folder);
-    if (parent != folder) {
-      makeFolders(parent);
-      if (mkdir(folder.c_str(), 0700) == 0 || errno == EEXIST) return;
-    }
-  }
-  fail(errno, "cannot make the folder " + folder);
-}
-
-// A file that is removed again unless it becomes another.
-class TemporaryFile {
- public:
-  explicit TemporaryFile(const std::string& path)
-      : file_(untilNotInterrupted([&] {
-          path_ = path + ".XXXXXX";
-          return mkostemp(path_.data(), O_CLOEXEC);
-        })) {
-    if (!file_) fail(errno, "cannot make " + path_);
-  }
-  TemporaryFile(const TemporaryFile&) = delete;
-  TemporaryFile& operator=(const TemporaryFile&) = delete;
-  ~TemporaryFile() {
-    if (!path_.empty()) unlink(path_.c_str());
-  }
-
-  void takeOver(const struct stat& status) const {
-    // The owner first, as a change of it may take bits of the mode away. Who may not give a file away
-    // keeps it.
-    untilNotInterrupted([&] { return fchown(file_.get(), status.st_uid, status.st_gid); });
-    untilNotInterrupted([&] { return fchmod(file_.get(), status.st_mode & 07777U); });
-  }
-
-  void write(std::string_view content) const {
-    file_.write(content);
-    if (untilNotInterrupted([&] { return fsync(file_.get()); }) != 0) fail(errno, "cannot write");
-  }
-
-  void become(const std::string& path) {
-    if (rename(path_.c_str(), path.c_str()) != 0) fail(errno, "cannot replace");
-    path_.clear();
-  }
-
- private:
-  std::string path_;
-  FileDescriptor file_;
-};
-
 }  // namespace
 
 DefaultsFile::Version DefaultsFile::version() const noexcept {
   Version version;
   timespec now{};
-  // Before the status, so that a change after this moment is of this moment or later.
+  // Read before the status, so that a later change has this time or a later one.
   clock_gettime(CLOCK_REALTIME, &now);
   version.exists_ = stat(path_.c_str(), &version.status_) == 0;
-  // File systems count in steps of up to two seconds.
+  // The clock of a file system may have steps of two seconds.
   version.isSettled_ = version.exists_ ? changeTime(version.status_).tv_sec + 2 < now.tv_sec
                                        : errno == ENOENT || errno == ENOTDIR;
   return version;
@@ -117,7 +53,7 @@ bool DefaultsFile::isStill(const Version& version) const noexcept {
 std::optional<std::string> DefaultsFile::content(std::size_t maximumSize) const {
   FileDescriptor file;
   try {
-    // Without O_NONBLOCK, a pipe of that name would keep the caller waiting.
+    // Without O_NONBLOCK, a named pipe would block the caller.
     file = FileDescriptor::open(path_, O_RDONLY | O_NONBLOCK);
   } catch (const std::system_error& error) {
     if (error.code().value() == ENOENT || error.code().value() == ENOTDIR) return std::nullopt;
@@ -127,7 +63,7 @@ std::optional<std::string> DefaultsFile::content(std::size_t maximumSize) const 
   if (fstat(file.get(), &status) != 0) fail(errno, "cannot read " + path_);
   if (!S_ISREG(status.st_mode)) fail(EINVAL, "no plain file: " + path_);
 
-  // The size may change meanwhile.
+  // The size may change while the file is read.
   std::string content;
   std::size_t length = 0;
   for (;;) {
@@ -141,43 +77,6 @@ std::optional<std::string> DefaultsFile::content(std::size_t maximumSize) const 
   }
   content.resize(length);
   return content;
-}
-
-DefaultsFile::Lock::Lock(FileDescriptor folder) noexcept : folder_(std::move(folder)) {
-  while (flock(folder_.get(), LOCK_EX) != 0 && errno == EINTR) {
-  }
-}
-
-DefaultsFile::Lock::~Lock() {
-  // Closing would not do where a child has been forked meanwhile.
-  if (folder_) flock(folder_.get(), LOCK_UN);
-}
-
-DefaultsFile::Lock DefaultsFile::lock() const {
-  const std::string folder = folderOf(resolvedPath(path_));
-  makeFolders(folder);
-  return Lock(FileDescriptor::open(folder, O_RDONLY | O_DIRECTORY));
-}
-
-void DefaultsFile::replace(std::string_view content) const {
-  const std::string path = resolvedPath(path_);
-  const std::string folder = folderOf(path);
-  try {
-    struct stat status{};
-    const bool exists = stat(path.c_str(), &status) == 0;
-    if (exists && faccessat(AT_FDCWD, path.c_str(), W_OK, AT_EACCESS) != 0) fail(errno, "cannot write");
-    TemporaryFile file(path);
-    if (exists) file.takeOver(status);
-    file.write(content);
-    file.become(path);
-    // So that the new name, too, is there after a loss of power. The file has been replaced by now, so
-    // that to report a failure would mislead.
-    const FileDescriptor opened(
-        untilNotInterrupted([&] { return ::open(folder.c_str(), O_RDONLY | O_DIRECTORY | O_CLOEXEC); }));
-    if (opened) untilNotInterrupted([&] { return fsync(opened.get()); });
-  } catch (const std::system_error& error) {
-    fail(error.code().value(), "cannot write " + path);
-  }
 }
 
 }  // namespace rt

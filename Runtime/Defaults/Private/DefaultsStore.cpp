@@ -6,15 +6,12 @@
 #include <algorithm>
 #include <chrono>
 #include <csignal>
-#include <stdexcept>
 #include <system_error>
 #include <thread>
 #include <utility>
 
 #include "Runtime/Base/Private/StandardError.h"
-#include "Runtime/Base/Private/UTF8.h"
 #include "Runtime/Locks/Private/Lazy.h"
-#include "Runtime/Objects/Exception.h"
 #include "Runtime/Process/Thread.h"
 
 namespace rt::detail {
@@ -39,7 +36,7 @@ std::string textOf(const std::exception_ptr& exception) {
   }
 }
 
-// Keeps signals away from a thread that is started meanwhile: the host's handlers run on its own threads.
+// Blocks signals for a thread that is started meanwhile: the host's handlers run on the host's threads.
 class SignalsBlocked {
  public:
   SignalsBlocked() {
@@ -78,7 +75,7 @@ void reportDefaults(std::initializer_list<std::string_view> parts) noexcept {
     } else {
       StandardError::write(line.append("\n"), std::chrono::seconds(1));
     }
-  } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): it goes unsaid
+  } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): it is not reported
   }
 }
 
@@ -99,44 +96,6 @@ std::optional<std::string> DefaultsStore::value(std::string_view key) {
   return value;
 }
 
-void DefaultsStore::change(std::string_view key, std::optional<std::string_view> value) {
-  if (!isValidUTF8(key)) throw std::invalid_argument("the key of a user default is not UTF-8");
-  const auto fail = [](const std::string& reason) {
-    throw Exception("UserDefaultsException"_s, String::fromUTF8Repaired(reason));
-  };
-  if (file_.path().empty()) fail(placeProblem_);
-  std::string problem;
-  Observers observers;
-  {
-    const LockGuard guard(changeLock_);
-    const DefaultsFile::Lock lock = file_.lock();
-    DefaultsText text;
-    try {
-      // More than may be is read, so that it is malformed like anything else that it may not be.
-      text = DefaultsText::parsed(file_.content(DefaultsText::kMaximumSize).value_or(""));
-    } catch (const MalformedDefaults& error) {
-      fail("not written over, since it is malformed: " + file_.path() + ", " + error.what());
-    }
-    const std::string* const previous = text.find(key);
-    const bool isSame = previous != nullptr ? value == *previous : !value;
-    if (!isSame) {
-      if (value) {
-        text.set(key, *value);
-      } else {
-        text.remove(key);
-      }
-      const std::string content = text.text();
-      if (content.size() > DefaultsText::kMaximumSize) {
-        throw std::length_error("user defaults of more than 1 MiB: " + file_.path());
-      }
-      file_.replace(content);
-    }
-    observers = claim(problem);
-  }
-  reportDefaults({problem});
-  if (const std::exception_ptr exception = call(observers)) std::rethrow_exception(exception);
-}
-
 std::shared_ptr<DefaultsObserver> DefaultsStore::observe(std::string_view key, bool alsoNow,
                                                          Block<void()> block) {
   auto observer = std::make_shared<DefaultsObserver>(std::string(key), std::move(block));
@@ -146,7 +105,7 @@ std::shared_ptr<DefaultsObserver> DefaultsStore::observe(std::string_view key, b
   {
     const LockGuard guard(lock_);
     forgetParent();
-    // First, so that no change after what is read here goes unnoticed.
+    // First, so that no change after the following read goes unnoticed.
     watchProblem = startWatching();
     readProblem = refresh();
     if (alsoNow) {
@@ -168,7 +127,8 @@ std::shared_ptr<DefaultsObserver> DefaultsStore::observe(std::string_view key, b
 }
 
 void DefaultsStore::remove(DefaultsObserver& observer) noexcept {
-  // What it captured is let go of here, without the lock, and not by whoever still looks at it.
+  // Its captures are destroyed here, without the lock, and not by a thread that still refers to the
+  // observer.
   Block<void()> block;
   const LockGuard guard(lock_);
   forgetParent();
@@ -185,7 +145,7 @@ void DefaultsStore::remove(DefaultsObserver& observer) noexcept {
 
 void DefaultsStore::stop() noexcept {
   const LockGuard guard(lock_);
-  // A child of a fork has the parent's means to wake the parent's thread.
+  // The child of a fork shares the descriptor that would wake the parent's thread.
   forgetParent();
   isStopped_ = true;
   if (watch_ != nullptr) watch_->stop();
@@ -197,7 +157,7 @@ void DefaultsStore::forgetParent() {
   process_ = process;
   watch_ = nullptr;
   for (const auto& observer : observers_) {
-    // One in which the thread forks goes on in the child as well.
+    // If the observer's own thread has forked, the observer goes on in the child.
     if (observer->caller == 0 || !isThreadGone(observer->caller)) continue;
     observer->caller = 0;
     observer->isRunning = false;
@@ -252,7 +212,7 @@ void DefaultsStore::watch(std::shared_ptr<SystemFileWatch> watch) noexcept {
   while (watch != nullptr) {
     try {
       Thread::setCurrentName("user defaults"_s);
-      // First, what has happened before it was watched.
+      // First, for changes from before the file was watched.
       do tellOfChange();
       while (watch->wait());
       return;
@@ -266,11 +226,7 @@ void DefaultsStore::watch(std::shared_ptr<SystemFileWatch> watch) noexcept {
 
 void DefaultsStore::tellOfChange() {
   std::string problem;
-  Observers observers;
-  {
-    const LockGuard guard(changeLock_);
-    observers = claim(problem);
-  }
+  const Observers observers = claim(problem);
   reportDefaults({problem});
   if (const std::exception_ptr exception = call(observers)) {
     reportDefaults({"an observer of user defaults threw: ", textOf(exception)});
@@ -322,7 +278,7 @@ std::exception_ptr DefaultsStore::call(const Observers& observers) noexcept {
 }
 
 bool DefaultsStore::isDue(DefaultsObserver& observer) {
-  // Whatever leaves this, but that it is due, ends this thread's turn with the observer.
+  // Unless the observer is due, this thread is not its caller any more when the function ends.
   struct End {
     ~End() RT_NO_THREAD_SAFETY_ANALYSIS {
       if (isDue) return;
@@ -337,7 +293,7 @@ bool DefaultsStore::isDue(DefaultsObserver& observer) {
   };
   const LockGuard guard(lock_);
   End end{.store = *this, .observer = observer};
-  // What has come to be meanwhile is this thread's, too: others have left it the observer.
+  // A change during the call is for this thread as well: other threads leave the observer to it.
   if (observer.isRemoved || (observer.isRunning && hasSeen(observer))) return false;
   observer.seen = find(observer.key);
   observer.isRunning = true;

@@ -1,6 +1,6 @@
 #pragma once
 
-// What user defaults are made of: the file, what was last read of it, and who wants to know of changes.
+// The state of user defaults: the file, the settings that were read last, and the observers.
 
 #include <sys/types.h>
 
@@ -17,7 +17,6 @@
 #include "Runtime/Defaults/Private/DefaultsFile.h"
 #include "Runtime/Defaults/Private/DefaultsText.h"
 #include "Runtime/Defaults/Private/SystemFileWatch.h"
-#include "Runtime/Locks/Private/LongLock.h"
 #include "Runtime/Locks/Private/ThreadIdentifier.h"
 #include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Objects/Block.h"
@@ -25,87 +24,81 @@
 
 namespace rt::detail {
 
-/// Where reports of user defaults go; null is standard error.
+/// Sets the handler of reports. Null stands for standard error.
 void setDefaultsReportHandler(Block<void(const String&)> handler);
 
-/// Says the line that `parts` make up there, if they are not empty. Without memory for it, nothing is said.
-/// No lock is held then.
+/// Reports the line that `parts` make up, unless it is empty. Precondition: the caller holds no lock.
+/// Without memory nothing is reported.
 void reportDefaults(std::initializer_list<std::string_view> parts) noexcept;
 
-/// One who wants to know of changes. All but the key is the store's, under its lock.
+/// An observer of a key. The store's lock guards all members but the key.
 struct DefaultsObserver {
   const std::string key;
   Block<void()> block;
-  /// The value that it has been called for.
+  /// The value that it was last called for.
   std::optional<std::string> seen;
-  /// The thread that calls it or is about to; 0 for none.
+  /// The thread that calls it or is about to; 0 if there is none.
   ThreadToken caller = 0;
   bool isRunning = false;
   bool isRemoved = false;
 };
 
-/// Any thread may use it. See Runtime/Defaults/UserDefaults.h for what its functions promise.
+/// Threads: any thread may use it. Runtime/Defaults/UserDefaults.h has the contracts of its functions.
 class DefaultsStore : public std::enable_shared_from_this<DefaultsStore> {
  public:
-  /// Over the file at `path`. Where that is empty there is no place for one, and `problem` says why.
+  /// Makes a store for the file at `path`. If `path` is empty, there is no file and `problem` says why.
   DefaultsStore(std::string path, std::string problem);
 
   std::optional<std::string> value(std::string_view key);
 
-  /// Sets the value of `key`, or takes it away where `value` is none, and tells observers.
-  void change(std::string_view key, std::optional<std::string_view> value);
-
   std::shared_ptr<DefaultsObserver> observe(std::string_view key, bool alsoNow, Block<void()> block);
   void remove(DefaultsObserver& observer) noexcept;
 
-  /// Lets the thread that waits for changes end.
+  /// Ends the thread that waits for changes.
   void stop() noexcept;
 
  private:
-  // Forgets, in the child of a fork, the threads that it does not have, and what they were doing. Comes first
-  // wherever observers and the thread count.
+  // In the child of a fork, forgets the threads of the parent and what they were doing. It comes first
+  // wherever observers or the waiting thread are used.
   void forgetParent() RT_REQUIRES(lock_);
 
-  // Reads the file if it has changed. Returns what is to be reported, without the lock; "" for nothing.
+  // Reads the file if it has changed. Returns a report to make when the lock is released, or "".
   [[nodiscard]] std::string refresh() RT_REQUIRES(lock_);
   std::optional<std::string> find(std::string_view key) const RT_REQUIRES(lock_);
-  // Whether the observer has been called for the value that there is. Allocates nothing.
+  // Returns whether the observer has been called for the present value. Allocates nothing.
   bool hasSeen(const DefaultsObserver& observer) const RT_REQUIRES(lock_);
 
-  // Starts the thread if this process has none. Returns what is to be reported.
+  // Starts the waiting thread if this process has none. Returns a report to make.
   [[nodiscard]] std::string startWatching() RT_REQUIRES(lock_);
   void watch(std::shared_ptr<SystemFileWatch> watch) noexcept;
   void tellOfChange();
-  // A new watch, as soon as the system allows one; null when the thread is to end.
+  // Returns a new watch as soon as the system allows one, or null if the thread is to end.
   std::shared_ptr<SystemFileWatch> renewedWatch() noexcept;
 
   using Observers = std::vector<std::shared_ptr<DefaultsObserver>>;
-  // The observers whose value has changed and that no thread is about to call, which from now on this
-  // thread is. Held `changeLock_` keeps the thread that waits for changes from claiming those of another.
-  // `problem` becomes what is to be reported.
-  [[nodiscard]] Observers claim(std::string& problem) RT_REQUIRES(changeLock_) RT_EXCLUDES(lock_);
-  // Calls what has been claimed. Returns the first exception of theirs, or std::bad_alloc.
+  // Returns the observers whose value has changed and that no other thread calls or is about to call. From
+  // now on the calling thread is about to call them. Sets `problem` to a report to make.
+  [[nodiscard]] Observers claim(std::string& problem) RT_EXCLUDES(lock_);
+  // Calls observers that have been claimed. Returns their first exception, or std::bad_alloc.
   [[nodiscard]] std::exception_ptr call(const Observers& observers) noexcept;
-  // Whether `observer`, which this thread has claimed, is to be called now, for the first time or again.
-  // Throws std::bad_alloc; then it is not, and counts as not having seen the value.
+  // Returns whether to call `observer`, which this thread has claimed, for the first time or again. Throws
+  // std::bad_alloc. Then it is not called, and counts as not having seen the value.
   [[nodiscard]] bool isDue(DefaultsObserver& observer);
 
   const DefaultsFile file_;
-  // Held while the file is being changed, until the observers are claimed; taken before `lock_`.
-  LongLock changeLock_;
-  // One for all stores, of which a process has hardly more than one.
+  // One lock for all stores: a process hardly has more than one.
   static constinit UnfairLock lock_;
   DefaultsText text_ RT_GUARDED_BY(lock_);
   DefaultsFile::Version version_ RT_GUARDED_BY(lock_);
-  // What was reported last, until it is no longer so.
+  // The problem that was reported last, until it is solved.
   std::string problem_ RT_GUARDED_BY(lock_);
   const std::string placeProblem_;
   Observers observers_ RT_GUARDED_BY(lock_);
-  // Counts the calls of observers that have ended.
+  // The number of calls of observers that have ended.
   std::atomic<std::uint32_t> endedCalls_ = 0;
-  // What the thread waits at; null while there is no thread.
+  // The watch that the waiting thread waits at. Null while there is no thread.
   std::shared_ptr<SystemFileWatch> watch_ RT_GUARDED_BY(lock_);
-  // The process that has all these threads.
+  // The process that has these threads.
   pid_t process_ RT_GUARDED_BY(lock_);
   bool isStopped_ RT_GUARDED_BY(lock_) = false;
 };

@@ -12,7 +12,7 @@ namespace rt {
 namespace {
 
 constexpr std::string_view kBlanks = " \t";
-// What follows the backslash, and what both stand for.
+// The character behind a backslash, and the character that both stand for.
 constexpr std::array<std::pair<char, char>, 5> kEscapes{
     {{'"', '"'}, {'\\', '\\'}, {'n', '\n'}, {'r', '\r'}, {'t', '\t'}}};
 
@@ -21,7 +21,7 @@ bool isControl(char character) {
   return byte < 0x20 || byte == 0x7F;
 }
 
-// Reads one line, from its start to its end.
+// Reads one line from its start to its end.
 class Line {
  public:
   explicit Line(std::string_view text) : rest_(text) { skipBlanks(); }
@@ -49,7 +49,7 @@ class Line {
 
   void skipBlanks() { rest_.remove_prefix(std::min(rest_.find_first_not_of(kBlanks), rest_.size())); }
 
-  // What comes before one of `ends`, without the blanks at its end.
+  // Takes the text before one of the characters `ends`. Returns it without blanks at its end.
   std::string bare(const char* ends) {
     const std::string_view all = rest_.substr(0, rest_.find_first_of(ends));
     rest_.remove_prefix(all.size());
@@ -102,51 +102,29 @@ class Line {
   std::string_view rest_;
 };
 
-// `text` as it is written in a line: in quotes only where it has to be.
-std::string written(std::string_view text) {
-  const auto isSpecial = [](char c) { return isControl(c) || c == '"' || c == '#' || c == '='; };
-  const bool isBare =
-      !text.empty() && text.front() != ' ' && text.back() != ' ' && std::ranges::none_of(text, isSpecial);
-  if (isBare) return std::string(text);
-  std::string result = "\"";
-  for (const char character : text) {
-    const auto* escape = std::ranges::find(kEscapes, character, &std::pair<char, char>::second);
-    if (escape != kEscapes.end()) {
-      result += {'\\', escape->first};
-    } else if (isControl(character)) {
-      constexpr std::string_view kDigits = "0123456789abcdef";
-      const auto byte = static_cast<unsigned char>(character);
-      result += {'\\', 'u', '0', '0', kDigits[byte >> 4U], kDigits[byte & 0xFU]};
-    } else {
-      result += character;
-    }
-  }
-  return result + '"';
-}
-
 }  // namespace
 
 DefaultsText DefaultsText::parsed(std::string_view text) {
   if (text.size() > kMaximumSize) throw MalformedDefaults("more than 1 MiB");
   DefaultsText result;
+  std::size_t number = 0;
   for (std::size_t start = 0; start < text.size();) {
     const std::size_t end = std::min(text.find('\n', start), text.size());
-    result.lines_.emplace_back(text.substr(start, end - start));
+    std::string_view content = text.substr(start, end - start);
     start = end + 1;
-    const auto line = std::prev(result.lines_.end());
+    ++number;
     try {
-      if (!isValidUTF8(*line)) throw MalformedDefaults("bytes that are not UTF-8");
-      std::string_view content = *line;
+      if (!isValidUTF8(content)) throw MalformedDefaults("bytes that are not UTF-8");
       if (content.ends_with('\r')) content.remove_suffix(1);
       Line reader(content);
       if (!reader.isSetting()) continue;
       std::string key = reader.key();
       std::string value = reader.value();
-      if (!result.settings_.try_emplace(std::move(key), Setting{line, std::move(value)}).second) {
+      if (!result.settings_.try_emplace(std::move(key), std::move(value)).second) {
         throw MalformedDefaults("a key for the second time");
       }
     } catch (const MalformedDefaults& error) {
-      throw MalformedDefaults("line " + std::to_string(result.lines_.size()) + ": " + error.what());
+      throw MalformedDefaults("line " + std::to_string(number) + ": " + error.what());
     }
   }
   return result;
@@ -154,35 +132,7 @@ DefaultsText DefaultsText::parsed(std::string_view text) {
 
 const std::string* DefaultsText::find(std::string_view key) const noexcept {
   const auto setting = settings_.find(key);
-  return setting != settings_.end() ? &setting->second.value : nullptr;
-}
-
-void DefaultsText::set(std::string_view key, std::string_view value) {
-  if (!isValidUTF8(key) || !isValidUTF8(value)) throw std::invalid_argument("a user default is not UTF-8");
-  std::string content = written(key) + " = " + written(value);
-  auto setting = settings_.find(key);
-  if (setting == settings_.end()) {
-    setting = settings_.try_emplace(std::string(key), Setting{lines_.end(), {}}).first;
-    setting->second.line = lines_.insert(lines_.end(), std::string());
-  }
-  setting->second.value = value;
-  *setting->second.line = std::move(content);
-}
-
-void DefaultsText::remove(std::string_view key) {
-  const auto setting = settings_.find(key);
-  if (setting == settings_.end()) return;
-  lines_.erase(setting->second.line);
-  settings_.erase(setting);
-}
-
-std::string DefaultsText::text() const {
-  std::string text;
-  for (const std::string& line : lines_) {
-    text += line;
-    text += '\n';
-  }
-  return text;
+  return setting != settings_.end() ? &setting->second : nullptr;
 }
 
 }  // namespace rt

@@ -1,13 +1,13 @@
 #pragma once
 
-// Where the operating system wants settings of one user kept.
+// The folder for the settings of one user.
 
 #include <string>
 
 namespace rt::detail {
 
-/// The path of the folder; "" when the environment does not say, or when the process has raised
-/// privileges and the environment is the caller's.
+/// Returns the path of the folder. Returns "" if the environment does not name it. Returns "" with raised
+/// privileges as well, since the environment is the caller's then.
 std::string systemDefaultsFolder();
 
 }  // namespace rt::detail

@@ -1,6 +1,6 @@
 #pragma once
 
-// How the operating system says that a file may have changed.
+// Waiting until a file may have changed.
 
 #include <atomic>
 #include <string>
@@ -10,34 +10,35 @@
 
 namespace rt::detail {
 
-/// Watches one path, from when it is made: a file there, one that comes to be there, and the file that a
-/// symbolic link there leads to. A write counts when who wrote closes the file. What happens to folders
-/// above the file's own is seen only while that is not there.
+/// Watches one path from its construction on: the file at the path, a file that appears there, and the file
+/// that a symbolic link there leads to. On Linux a write counts when the writer closes the file. Folders
+/// above the file's own are watched only while the file's own folder cannot be watched.
 class SystemFileWatch {
  public:
-  /// `path` begins with a slash. Throws std::system_error when the system refuses.
+  /// Begins to watch `path`. Precondition: it begins with a slash. Throws std::system_error if the system
+  /// refuses.
   explicit SystemFileWatch(const std::string& path);
   SystemFileWatch(const SystemFileWatch&) = delete;
   SystemFileWatch& operator=(const SystemFileWatch&) = delete;
   ~SystemFileWatch();
 
-  /// Waits until the file may be another than it was when the watch was made or the last wait ended, and
-  /// returns true; returns false after `stop`. One thread at a time.
+  /// Waits until the file may have changed since the construction or since the last wait, and returns true.
+  /// Returns false after `stop`. Throws std::system_error. Threads: one thread at a time may call it.
   bool wait();
 
-  /// Ends `wait`, now and for ever. Any thread may call it.
+  /// Makes the present `wait` and all later ones return false. Threads: any thread may call it.
   void stop() noexcept;
 
  private:
-  // Watches what there is to watch now.
+  // Watches the folders and files that exist now.
   void arm();
 
   const std::string path_;
   std::atomic<bool> isStopped_{false};
   FileDescriptor events_;
-  // What wakes the thread that waits. On macOS, `events_` does that as well.
+  // Wakes the thread that waits. On macOS, `events_` does that as well.
   FileDescriptor wake_;
-  // What is watched: identifiers of inotify; on macOS, descriptors.
+  // Identifiers of inotify, or descriptors on macOS.
   std::vector<int> watched_;
 };
 

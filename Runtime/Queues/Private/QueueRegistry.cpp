@@ -12,13 +12,14 @@
 #include "Runtime/Locks/Private/Lazy.h"
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Queues/MainQueue.h"
+#include "Runtime/Queues/Private/WakeDescriptor.h"
 #include "Runtime/Queues/Queue.h"
 
 namespace rt::detail {
 
 namespace {
 
-// Changes with everything that the thread that exits waits for.
+// Changes with each event that the thread that exits waits for.
 constinit std::atomic<std::uint32_t> exitEvents = 0;
 
 }  // namespace
@@ -62,14 +63,14 @@ void QueueRegistry::drainAtExit() {
   static bool hasGivenUp = false;
   if (hasGivenUp) return;
   isExiting_ = true;
-  // What is queued from here on has this called again: so do destructors of static objects, which run
-  // afterwards.
+  // A task that is queued from here on registers this function again. Destructors of static objects, which
+  // run later, may queue such tasks.
   runsTasksAtExit_ = false;
   hasGivenUp = !runUntilIdle(deadline);
 }
 
-// Runs, or waits for, what is queued; returns whether nothing is left. Pool queues are left to the pool
-// while it has threads: a task that never ends must not take the thread that watches the clock.
+// Runs the queued tasks or waits for them, and returns whether none is left. While the pool has threads, it
+// runs the tasks: a task that never ends must not occupy the thread that watches the clock.
 bool QueueRegistry::runUntilIdle(std::chrono::steady_clock::time_point deadline) {
   struct Unfinished {
     Ref<Queue> queue;
@@ -86,7 +87,7 @@ bool QueueRegistry::runUntilIdle(std::chrono::steady_clock::time_point deadline)
     if (all.empty()) return true;
     for (;;) {
       const std::uint32_t events = exitEvents.load(std::memory_order_acquire);
-      // Also where it was not busy: a task that is waited for may come to wait for it.
+      // Also if it was not busy: a task that is waited for may itself wait for the main queue.
       MainQueue::instance().runHere();
       for (const Unfinished& each : all) {
         if (each.queue->isShortOfThreads()) each.queue->runHere();
@@ -110,7 +111,7 @@ bool QueueRegistry::runUntilIdle(std::chrono::steady_clock::time_point deadline)
 void QueueRegistry::registerForkHandler() noexcept {
   static constinit std::atomic<bool> isRegistered = false;
   if (isRegistered.load(std::memory_order_relaxed) || isRegistered.exchange(true)) return;
-  // Where there is no memory for it now, the next queue tries again.
+  // If there is no memory for it now, the next queue tries again.
   if (pthread_atfork(nullptr, nullptr, resetAfterFork) != 0) isRegistered = false;
 }
 

@@ -1,6 +1,6 @@
 #pragma once
 
-// All queues there are, for what concerns them all: exit and fork. For rt::Queue only.
+// The list of all queues, which handles exit and fork for them. For rt::Queue only.
 
 #include <atomic>
 #include <chrono>
@@ -16,25 +16,26 @@ namespace detail {
 
 class QueueRegistry {
  public:
-  /// How long the program waits at exit for tasks that run, altogether.
+  /// How long the program waits at exit for running tasks, in total.
   static constinit std::atomic<std::chrono::nanoseconds::rep> exitPatience;
 
   static void add(Queue& queue) RT_EXCLUDES(lock);
   static void remove(Queue& queue) noexcept RT_EXCLUDES(lock);
 
-  /// Sees to it that what is queued runs before the process exits. Called when a queue gets a task, not
-  /// when it is made: what tasks use has mostly been made by then, and is destroyed after they have run.
+  /// Ensures that queued tasks run before the process exits. It is called when a queue gets a task, not
+  /// when a queue is made. Most static objects that tasks use exist by then, and so are destroyed after the
+  /// tasks.
   static void runTasksAtExit() noexcept {
     if (!runsTasksAtExit_.load(std::memory_order_relaxed)) registerExitHandler();
   }
 
-  /// Has the thread that exits, if there is one, look at the queues again. Called when one has got on, or
-  /// has got a task: it may be the main queue, or there may be no thread for it.
+  /// Makes the thread that exits, if there is one, look at the queues again. It is called when a queue has
+  /// run or got a task: the queue may be the main queue, or have no thread.
   static void wakeExit() noexcept {
     if (isExiting_.load()) changeExitEvents();
   }
 
-  /// Guards the list of all queues, which is in the queues.
+  /// Guards the list of all queues, whose links are in the queues.
   static constinit UnfairLock lock;
 
  private:

@@ -4,7 +4,7 @@
 
 namespace rt::detail {
 
-// As long as a few small tasks take; after that, sleeping is cheaper.
+// As long as a few small tasks take. After that, sleeping is cheaper.
 constexpr int kSpins = 20;
 
 void SyncTask::run() {
@@ -17,7 +17,7 @@ void SyncTask::run() {
 }
 
 void SyncTask::wake(State state) noexcept {
-  // The frame is gone as soon as the state is there.
+  // The waiting thread's frame may not exist any more once the state is stored.
   if (state_.exchange(state, std::memory_order_acq_rel) == kAsleep) wakeAtAddress(&state_);
 }
 

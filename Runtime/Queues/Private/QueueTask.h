@@ -1,6 +1,6 @@
 #pragma once
 
-// What a queue holds. For rt::Queue only.
+// The tasks of a queue. For rt::Queue only.
 
 #include <atomic>
 #include <concepts>
@@ -8,6 +8,9 @@
 #include <exception>
 #include <type_traits>
 #include <utility>
+
+#include "Runtime/Base/Private/FunctionView.h"
+#include "Runtime/Queues/Private/LinkedList.h"
 
 namespace rt::detail {
 
@@ -17,7 +20,7 @@ class Task {
   Task(const Task&) = delete;
   Task& operator=(const Task&) = delete;
 
-  /// Does it, once; the task may be gone afterwards, also when an exception passes.
+  /// Runs the task. It is called once. The task may not exist afterwards, even if an exception is thrown.
   virtual void run() = 0;
 
  protected:
@@ -25,55 +28,13 @@ class Task {
   virtual ~Task() = default;
 
  private:
-  friend class TaskList;
+  friend class LinkedList<Task>;
   Task* next_ = nullptr;
 };
 
-/// Tasks in the order in which they run.
-class TaskList {
- public:
-  bool isEmpty() const noexcept { return first_ == nullptr; }
+using TaskList = LinkedList<Task>;
 
-  void append(Task& task) noexcept {
-    (first_ == nullptr ? first_ : last_->next_) = &task;
-    last_ = &task;
-  }
-
-  /// Puts all of `others` before what is here.
-  void prepend(TaskList others) noexcept {
-    if (others.isEmpty()) return;
-    others.last_->next_ = first_;
-    if (first_ == nullptr) last_ = others.last_;
-    first_ = others.first_;
-  }
-
-  /// The first, which is no longer in the list, or null.
-  Task* takeFirst() noexcept {
-    Task* task = first_;
-    if (task != nullptr) first_ = task->next_;
-    return task;
-  }
-
-  /// All; none is left.
-  TaskList takeAll() noexcept { return std::exchange(*this, TaskList()); }
-
-  /// All before `task`, which is in the list. Neither they nor `task` are left.
-  TaskList takeBefore(const Task& task) noexcept {
-    TaskList before;
-    for (;;) {
-      Task* first = takeFirst();
-      if (first == &task) return before;
-      first->next_ = nullptr;
-      before.append(*first);
-    }
-  }
-
- private:
-  Task* first_ = nullptr;
-  Task* last_ = nullptr;
-};
-
-/// A task that nobody waits for, in a block of memory of its own.
+/// A task that no thread waits for. It is in a block of memory of its own, and deletes itself.
 template <class Function>
 class AsyncTask final : public Task {
  public:
@@ -94,37 +55,22 @@ class AsyncTask final : public Task {
   Function function_;
 };
 
-/// Something to call that outlives the view.
-class FunctionView {
- public:
-  template <class Function>
-    requires(!std::same_as<std::remove_cvref_t<Function>, FunctionView>)
-  explicit FunctionView(Function&& function) noexcept
-      : function_(&function),
-        call_([](void* context) { (*static_cast<std::remove_reference_t<Function>*>(context))(); }) {}
-
-  void operator()() const { call_(function_); }
-
- private:
-  void* function_;
-  void (*call_)(void*);
-};
-
 /// A task in the stack frame of the thread that waits for it.
 class SyncTask final : public Task {
  public:
   enum class Outcome : std::uint8_t { kRan, kIsTurn };
 
-  explicit SyncTask(FunctionView function) noexcept : function_(function) {}
+  explicit SyncTask(FunctionView<void()> function) noexcept : function_(function) {}
 
-  /// By whoever runs the queue: calls the function, keeps what it throws, and wakes who waits.
+  /// Calls the function, keeps what it throws, and wakes the waiting thread. For the thread that runs the
+  /// queue.
   void run() override;
 
-  /// Instead: tells who waits to run the queue up to this task, and the task.
+  /// Tells the waiting thread to run the queue up to and including this task. It is called instead of `run`.
   void giveTurn() noexcept { wake(kTurn); }
 
-  /// By the thread that waits: returns when the task has run or it is its turn. Throws what the function
-  /// has thrown.
+  /// Returns when the task has run or the calling thread is to run it. Throws what the function has thrown.
+  /// For the thread that waits.
   Outcome wait();
 
  private:
@@ -132,7 +78,7 @@ class SyncTask final : public Task {
   enum State : std::uint32_t { kWaiting, kAsleep, kTurn, kDone };
   void wake(State state) noexcept;
 
-  const FunctionView function_;
+  const FunctionView<void()> function_;
   std::exception_ptr exception_;
   std::atomic<std::uint32_t> state_ = kWaiting;
 };

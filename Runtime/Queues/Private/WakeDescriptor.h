@@ -2,9 +2,18 @@
 
 // A file descriptor that is readable while it is set. For rt::MainQueue only.
 
+#include <array>
 #include <atomic>
 
 namespace rt::detail {
+
+/// Opens the end to read from and the end to write to. They may be the same descriptor. Neither end blocks,
+/// and neither is inherited by programs that this one starts. Returns false, with `errno` set, if the
+/// system refuses.
+bool openSystemWake(std::array<int, 2>& ends) noexcept;
+
+/// Makes the system's own main loop, if there is one, drain the main queue.
+void wakeSystemMainLoop() noexcept;
 
 class WakeDescriptor {
  public:
@@ -12,26 +21,28 @@ class WakeDescriptor {
   WakeDescriptor(const WakeDescriptor&) = delete;
   WakeDescriptor& operator=(const WakeDescriptor&) = delete;
 
-  /// The descriptor, which the first call opens. Throws std::system_error.
+  /// Returns the descriptor. The first call opens it. Throws std::system_error.
   int open();
 
-  /// Makes the descriptor readable, now or when it is opened. What was done before is seen by who comes
-  /// out of the next `reset`.
+  /// Makes the descriptor readable, now or when it is opened. The thread that returns from the next `reset`
+  /// sees all that was written before.
   void set() noexcept {
     if (!isSet_.exchange(true)) makeReadable();
   }
 
-  /// Makes it unreadable again. May leave it readable, where a `set` is at work at the same time.
+  /// Makes the descriptor unreadable again. May leave it readable if another thread calls `set` at the same
+  /// time.
   void reset() noexcept {
-    // In this order: a `set` that comes in between makes nothing readable, but it is undone as well.
+    // In this order: a `set` in between makes nothing readable, but the next line undoes it as well.
     makeUnreadable();
     isSet_.exchange(false);
   }
 
-  /// Sleeps until the descriptor, which is open, is readable.
+  /// Sleeps until the descriptor is readable. Precondition: it is open.
   void wait() noexcept;
 
-  /// In the child of a fork: the same number, but no longer shared with the parent; not set.
+  /// Replaces what the parent has by a new one under the same number, which is not set. For the child of a
+  /// fork.
   void renewAfterFork() noexcept;
 
  private:
@@ -40,7 +51,7 @@ class WakeDescriptor {
 
   std::atomic<bool> isSet_ = false;
   std::atomic<int> readEnd_ = -1;
-  std::atomic<int> writeEnd_ = -1;  // Where the system needs two.
+  std::atomic<int> writeEnd_ = -1;
 };
 
 }  // namespace rt::detail

@@ -2,25 +2,26 @@
 
 // The threads that all queues share. For rt::Queue only.
 //
-// No thread runs until there is the first work; one that has had none for `idleTimeout` ends. Work that
-// finds no idle thread gets a new one, up to kMaximumThreads for each degree of niceness: so tasks that
-// wait for each other on different queues do not starve each other. On macOS the threads are the
-// system's.
+// The first work starts the first thread. A thread that has had no work for `idleTimeout` ends. Work that
+// finds no idle thread gets a new one, up to kMaximumThreads for utility work and as many for all other
+// work. So tasks that wait for each other on different queues do not starve each other. On macOS the system
+// has the threads.
 
 #include <atomic>
 #include <cstdint>
 
+#include "Runtime/Queues/Private/LinkedList.h"
 #include "Runtime/Queues/QualityOfService.h"
 
 namespace rt::detail {
 
-/// Something a worker can do. It belongs to whoever schedules it and must last until it has run.
+/// Something that a thread of the pool can do. The pool does not own it. It must exist until it has run.
 class Work {
  public:
   Work(const Work&) = delete;
   Work& operator=(const Work&) = delete;
 
-  /// Does it, on a thread of the pool.
+  /// Does the work. It is called on a thread of the pool.
   virtual void runOnWorker() noexcept = 0;
 
  protected:
@@ -28,51 +29,32 @@ class Work {
   virtual ~Work() = default;
 
  private:
-  friend class WorkList;
+  friend class LinkedList<Work>;
   Work* next_ = nullptr;
 };
 
-/// Works in the order in which they came.
-class WorkList {
- public:
-  bool isEmpty() const noexcept { return first_ == nullptr; }
-
-  void append(Work& work) noexcept {
-    work.next_ = nullptr;
-    (first_ == nullptr ? first_ : last_->next_) = &work;
-    last_ = &work;
-  }
-
-  /// The first, which is no longer in the list, or null.
-  Work* takeFirst() noexcept {
-    Work* work = first_;
-    if (work != nullptr) first_ = work->next_;
-    return work;
-  }
-
- private:
-  Work* first_ = nullptr;
-  Work* last_ = nullptr;
-};
+using WorkList = LinkedList<Work>;
 
 class WorkerPool {
  public:
   static constexpr int kMaximumThreads = 64;
 
-  /// How many nanoseconds a thread without work stays, from its next wait on.
+  /// How many nanoseconds a thread without work stays. A change counts from a thread's next wait on.
   static constinit std::atomic<std::int64_t> idleTimeout;
 
-  /// Has some thread of the pool run `work` once. It is in the pool once at a time. Where the system
-  /// refuses a thread and there is none, the work waits for the next call of this or of `tryAgain`.
-  static void schedule(Work& work, QualityOfService qualityOfService, int relativePriority) noexcept;
+  /// Makes a thread of the pool run `work` once. Precondition: `work` is not in the pool already. If there
+  /// is no thread and the system refuses one, the work waits for the next call of this function or of
+  /// `tryAgain`.
+  static void schedule(Work& work, QualityOfService qualityOfService) noexcept;
 
-  /// Asks the system for a thread once more, where work of the kind waits for one.
-  static void tryAgain(QualityOfService qualityOfService, int relativePriority) noexcept;
+  /// Asks the system for a thread once more if work of this quality of service waits for one.
+  static void tryAgain(QualityOfService qualityOfService) noexcept;
 
-  /// Whether work of the kind waits and no further thread can be had for it; out of date at once.
-  static bool isShort(QualityOfService qualityOfService, int relativePriority) noexcept;
+  /// Returns whether work of this quality of service waits and no further thread can be had for it. The
+  /// answer may be out of date at once.
+  static bool isShort(QualityOfService qualityOfService) noexcept;
 
-  /// In the child of a fork: forgets all work and all threads but the caller.
+  /// Forgets all work and all threads but the calling one. For the child of a fork.
   static void resetAfterFork() noexcept;
 };
 

@@ -47,6 +47,56 @@ struct FormatDirective {
   // kLongLong stands for ll, j, z, t and q, which all mean 64 bits.
   enum class Length : std::uint8_t { kDefault, kByte, kShort, kLong, kLongLong, kLongDouble };
 
+  /// What a conversion is for.
+  enum class Kind : std::uint8_t {
+    kUnknown,
+    kInteger,
+    kReal,
+    kCharacter,
+    kText,
+    kPointer,
+    kObject,
+    kPassedOver,
+    kPercentSign,
+  };
+
+  static constexpr Kind kindOf(char conversion) noexcept {
+    switch (conversion) {
+      case 'd':
+      case 'i':
+      case 'u':
+      case 'o':
+      case 'x':
+      case 'X':
+        return Kind::kInteger;
+      case 'f':
+      case 'F':
+      case 'e':
+      case 'E':
+      case 'g':
+      case 'G':
+      case 'a':
+      case 'A':
+        return Kind::kReal;
+      case 'c':
+      case 'C':
+        return Kind::kCharacter;
+      case 's':
+      case 'S':
+        return Kind::kText;
+      case 'p':
+        return Kind::kPointer;
+      case '@':
+        return Kind::kObject;
+      case 'n':
+        return Kind::kPassedOver;
+      case '%':
+        return Kind::kPercentSign;
+      default:
+        return Kind::kUnknown;
+    }
+  }
+
   /// A width or precision.
   struct Number {
     /// The number, at most INT_MAX, or `kNone`.
@@ -65,27 +115,14 @@ struct FormatDirective {
   char conversion = '\0';
 
   constexpr FormatArgument argument() const noexcept {
-    switch (conversion) {
-      case 'd':
-      case 'i':
-      case 'u':
-      case 'o':
-      case 'x':
-      case 'X':
+    switch (kindOf(conversion)) {
+      case Kind::kInteger:
         return length >= Length::kLong ? FormatArgument::kLong : FormatArgument::kInt;
-      case 'c':
-      case 'C':
-        return FormatArgument::kInt;
-      case 'f':
-      case 'F':
-      case 'e':
-      case 'E':
-      case 'g':
-      case 'G':
-      case 'a':
-      case 'A':
+      case Kind::kReal:
         return length == Length::kLongDouble ? FormatArgument::kLongDouble : FormatArgument::kDouble;
-      case '%':
+      case Kind::kCharacter:
+        return FormatArgument::kInt;
+      case Kind::kPercentSign:
         return FormatArgument::kNone;
       default:
         return FormatArgument::kPointer;
@@ -229,36 +266,26 @@ class FormatDirectiveParser {
   }
 
   static constexpr bool suits(Length length, char conversion) noexcept {
-    switch (conversion) {
-      case 'd':
-      case 'i':
-      case 'u':
-      case 'o':
-      case 'x':
-      case 'X':
-      case 'n':
-      case '%':
+    using Kind = FormatDirective::Kind;
+    const bool isDefault = length == Length::kDefault;
+    switch (FormatDirective::kindOf(conversion)) {
+      case Kind::kInteger:
+      case Kind::kPassedOver:
+      case Kind::kPercentSign:
         return true;
-      case 'f':
-      case 'F':
-      case 'e':
-      case 'E':
-      case 'g':
-      case 'G':
-      case 'a':
-      case 'A':
-        return length == Length::kDefault || length == Length::kLong || length == Length::kLongDouble;
-      case 'c':
-      case 's':
-        return length == Length::kDefault || length == Length::kLong;
-      case 'C':
-      case 'S':
-      case 'p':
-      case '@':
-        return length == Length::kDefault;
-      default:
-        return false;
+      case Kind::kReal:
+        return isDefault || length == Length::kLong || length == Length::kLongDouble;
+      case Kind::kCharacter:
+      case Kind::kText:
+        // An upper-case conversion is wide by itself.
+        return isDefault || (length == Length::kLong && conversion >= 'a');
+      case Kind::kPointer:
+      case Kind::kObject:
+        return isDefault;
+      case Kind::kUnknown:
+        break;
     }
+    return false;
   }
 
   std::string_view format_;

@@ -92,34 +92,35 @@ std::vector<OrderedEntry> ordered(std::span<const DescribedEntry> entries) {
   return result;
 }
 
-}  // namespace
-
-String describeArray(std::span<const Ref<Object>> elements) {
+// Each of `elements` as `write` writes it, on a line of its own.
+template <class Elements, class Write>
+String describeLines(std::string_view opening, const Elements& elements, std::string_view closing,
+                     Write write) {
   StringBuilder builder;
-  builder.append('(');
+  builder.append(opening);
   std::string_view separator = "\n";
-  for (const Ref<Object>& element : elements) {
+  for (const auto& element : elements) {
     builder.append(separator);
     builder.append(kIndentation);
-    append(builder, *element);
+    write(builder, element);
     separator = ",\n";
   }
-  builder.append("\n)");
+  builder.append(closing);
   return builder.string();
 }
 
+}  // namespace
+
+String describeArray(std::span<const Ref<Object>> elements) {
+  return describeLines("(", elements, "\n)",
+                       [](StringBuilder& builder, const Ref<Object>& element) { append(builder, *element); });
+}
+
 String describeSet(std::span<const DescribedEntry> elements) {
-  StringBuilder builder;
-  builder.append("{(");
-  std::string_view separator = "\n";
-  for (const OrderedEntry& element : ordered(elements)) {
-    builder.append(separator);
-    builder.append(kIndentation);
-    append(builder, *element.entry.key, element.description);
-    separator = ",\n";
-  }
-  builder.append("\n)}");
-  return builder.string();
+  return describeLines("{(", ordered(elements), "\n)}",
+                       [](StringBuilder& builder, const OrderedEntry& element) {
+                         append(builder, *element.entry.key, element.description);
+                       });
 }
 
 String describeDictionary(std::span<const DescribedEntry> entries) {

@@ -20,7 +20,7 @@ constexpr unsigned kEvents = NOTE_WRITE | NOTE_EXTEND | NOTE_ATTRIB | NOTE_DELET
   throw std::system_error(errno, std::generic_category(), what);
 }
 
-// Has `queue` tell of `path`; returns the descriptor by which it does, or none.
+// Adds `path` to `queue`. Returns the descriptor that it is watched by, or none if it cannot be opened.
 FileDescriptor watch(int queue, const char* path) {
   FileDescriptor file(open(path, O_EVTONLY | O_CLOEXEC));
   if (!file) return file;
@@ -46,7 +46,7 @@ SystemFileWatch::~SystemFileWatch() {
 }
 
 void SystemFileWatch::arm() {
-  // A folder tells of names that come and go in it, the file of what is written to it.
+  // Events of a folder are about the names in it, and events of the file about its content.
   std::vector<int> watched;
   watched.reserve(2);
   std::string folder = folderOf(path_);

@@ -6,7 +6,7 @@ namespace rt::detail {
 
 namespace {
 
-// A path that is relative says nothing: it would lead elsewhere from each folder.
+// A relative path counts as missing: it would lead elsewhere from each folder.
 std::string pathInEnvironment(const char* name) {
   const char* const value = secure_getenv(name);
   return value != nullptr && *value == '/' ? value : "";

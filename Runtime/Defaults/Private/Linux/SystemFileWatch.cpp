@@ -40,8 +40,8 @@ SystemFileWatch::~SystemFileWatch() = default;
 void SystemFileWatch::arm() {
   const std::string whole = folderOf(path_);
   std::vector<int> watched;
-  // The file's folder or, while that cannot be watched, the nearest above it that can. One below that may
-  // come to be while this looks, so it looks until it finds the same one twice.
+  // Watches the file's folder, or the nearest folder above it that can be watched. A folder below that one
+  // may appear meanwhile, so the loop goes on until it finds the same folder twice.
   std::string found;
   for (std::string folder = whole;;) {
     const int watch = inotify_add_watch(events_.get(), folder.c_str(), kEvents);
@@ -69,7 +69,7 @@ bool SystemFileWatch::wait() {
     if (errno != EINTR) fail("poll");  // The system has no memory.
   }
   if (isStopped_.load(std::memory_order_relaxed)) return false;
-  // What has happened matters less than that something has: all of it is taken, and the file looked at.
+  // Which events there are does not matter: all of them are taken, and the file is looked at.
   alignas(inotify_event) std::array<char, 16 * (sizeof(inotify_event) + NAME_MAX + 1)> events;
   while (read(events_.get(), events.data(), events.size()) > 0) {
   }

@@ -10,14 +10,10 @@ qos_class_t systemClass(QualityOfService qualityOfService) noexcept {
   switch (qualityOfService) {
     case QualityOfService::kUserInteractive:
       return QOS_CLASS_USER_INTERACTIVE;
-    case QualityOfService::kUserInitiated:
-      return QOS_CLASS_USER_INITIATED;
     case QualityOfService::kDefault:
       return QOS_CLASS_DEFAULT;
     case QualityOfService::kUtility:
       return QOS_CLASS_UTILITY;
-    case QualityOfService::kBackground:
-      return QOS_CLASS_BACKGROUND;
   }
 }
 
@@ -29,17 +25,17 @@ void run(void* work) {
 
 constinit std::atomic<std::int64_t> WorkerPool::idleTimeout = 0;  // The system decides.
 
-void WorkerPool::schedule(Work& work, QualityOfService qualityOfService, int) noexcept {
+void WorkerPool::schedule(Work& work, QualityOfService qualityOfService) noexcept {
   dispatch_async_f(dispatch_get_global_queue(systemClass(qualityOfService), 0), &work, run);
 }
 
-void WorkerPool::tryAgain(QualityOfService, int) noexcept {}
+void WorkerPool::tryAgain(QualityOfService) noexcept {}
 
-bool WorkerPool::isShort(QualityOfService, int) noexcept {
+bool WorkerPool::isShort(QualityOfService) noexcept {
   return false;
 }
 
-// The system's pool does not survive a fork, and says so when it is used.
+// The system's pool does not survive a fork, and ends the program when it is used in the child.
 void WorkerPool::resetAfterFork() noexcept {}
 
 }  // namespace rt::detail

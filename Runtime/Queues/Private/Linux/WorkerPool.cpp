@@ -5,10 +5,7 @@
 #include <sys/resource.h>
 #include <unistd.h>
 
-#include <algorithm>
-#include <array>
 #include <csignal>
-#include <cstddef>
 #include <new>
 
 #include "Runtime/Base/ThreadSafety.h"
@@ -20,12 +17,12 @@ namespace rt::detail {
 
 namespace {
 
-// A worker whose queue has run empty looks for new work a few times before it sleeps: with tasks that
-// come one after another, nobody pays for sleeping and waking. In between it gives the processor away,
-// perhaps to the very thread that has the next task.
+// A worker without work looks for more a few times before it sleeps. So tasks that come one after another
+// cost no sleeping and waking. Between the looks it yields the processor, perhaps to the thread that has
+// the next task.
 constexpr int kLooks = 4;
 
-/// The place at which a worker without work waits, in its stack frame.
+// Where a worker without work waits. It is in the worker's stack frame.
 class IdleWorker {
  public:
   explicit IdleWorker(IdleWorker* next) noexcept : next_(next) {}
@@ -33,13 +30,13 @@ class IdleWorker {
   IdleWorker* next() const noexcept { return next_; }
   void setNext(IdleWorker* next) noexcept { next_ = next; }
 
-  /// Ends the wait. The worker, and this with it, may be gone when it returns.
+  // Ends the wait. The worker, and this object with it, may not exist any more when it returns.
   void give(Work& work) noexcept {
     work_ = &work;
     if (state_.exchange(kWoken, std::memory_order_acq_rel) == kAsleep) wakeAtAddress(&state_);
   }
 
-  /// Waits for work, or until `timeout` is over, where that is not null. Returns null without work.
+  // Waits for work and returns it, or returns null when `timeout` is over. A null `timeout` never is.
   Work* wait(const std::chrono::nanoseconds* timeout) noexcept {
     for (int look = 0; look < kLooks; ++look) {
       if (state_.load(std::memory_order_acquire) == kWoken) return work_;
@@ -51,7 +48,7 @@ class IdleWorker {
     }
     const auto start = std::chrono::steady_clock::now();
     for (;;) {
-      if (timeout == nullptr) {  // Somebody is just telling it.
+      if (timeout == nullptr) {  // Another thread is about to call `give`.
         waitAtAddress(state_, kAsleep);
       } else {
         const std::chrono::nanoseconds left = *timeout - (std::chrono::steady_clock::now() - start);
@@ -71,8 +68,8 @@ class IdleWorker {
   std::atomic<std::uint32_t> state_ = kAwake;
 };
 
-/// The work and the workers of one degree of niceness. A worker keeps its degree: a thread that has
-/// become nicer may not go back without a privilege.
+// The work and the workers of one niceness. A worker keeps its niceness: becoming less nice takes a
+// privilege.
 class Level {
  public:
   void schedule(Work& work) noexcept {
@@ -98,19 +95,19 @@ class Level {
 
   bool isShort() const noexcept { return isShort_.load(std::memory_order_relaxed); }
 
-  /// The life of a worker.
+  // Runs work until the worker is to end.
   void run(bool mayBeIdle) noexcept {
     while (Work* work = nextWork(mayBeIdle)) work->runOnWorker();
   }
 
-  /// For the child of a fork, in which the calling thread alone is left.
+  // For the child of a fork, which has the calling thread only.
   void countCaller() noexcept {
     LockGuard guard(lock_);
     threadCount_ = 1;
   }
 
  private:
-  /// For the work that waits, if there may be one more.
+  // Starts a thread for the work that waits, if there may be one more.
   void addThread() noexcept RT_RELEASE(lock_) {
     const bool mayStart = threadCount_ < WorkerPool::kMaximumThreads;
     if (mayStart) {
@@ -128,7 +125,7 @@ class Level {
 
   bool startThread() noexcept;
 
-  /// What the calling worker does next; null when it is to end, and is no longer counted.
+  // Returns what the calling worker does next. Null means that it is to end, and is not counted any more.
   Work* nextWork(bool mayBeIdle) noexcept {
     lock_.lock();
     if (Work* work = ready_.takeFirst()) {
@@ -136,14 +133,14 @@ class Level {
       lock_.unlock();
       return work;
     }
-    // In an ordinary user's process, whose threads the system refuses to make less nice.
+    // The worker is nicer than wanted, since the system did not let it become less nice.
     if (!mayBeIdle) {
       --threadCount_;
       lock_.unlock();
       return nullptr;
     }
-    // The last to fall idle is the first to be woken: its memory is still in the processor's caches, and
-    // those that are not needed grow old enough to end.
+    // The last worker to fall idle is the first to be woken. Its memory is still in the processor's caches,
+    // and workers that are not needed stay idle long enough to end.
     IdleWorker self(idle_);
     idle_ = &self;
     lock_.unlock();
@@ -177,39 +174,34 @@ class Level {
   std::atomic<bool> isShort_ = false;
 };
 
-constexpr std::size_t kLevelCount = 16;
-constinit std::array<Level, kLevelCount> levels;
+constinit Level urgent;
+constinit Level utility;
+constexpr int kNicenessOfUtility = 5;
 
-/// The level of the calling thread; null where it is no worker.
+// The calling worker's level. Null on all other threads.
 constinit thread_local Level* levelOfCaller = nullptr;
 
-std::size_t niceness(QualityOfService qualityOfService, int relativePriority) noexcept {
-  std::size_t base = 0;
-  if (qualityOfService == QualityOfService::kUtility) base = 5;
-  if (qualityOfService == QualityOfService::kBackground) base = 10;
-  return base + (static_cast<std::size_t>(-relativePriority) / 3);
-}
-
-Level& level(QualityOfService qualityOfService, int relativePriority) noexcept {
-  return levels.at(niceness(qualityOfService, relativePriority));
+Level& level(QualityOfService qualityOfService) noexcept {
+  return qualityOfService == QualityOfService::kUtility ? utility : urgent;
 }
 
 void* runWorker(void* argument) {
   levelOfCaller = static_cast<Level*>(argument);
-  // From the main thread on, as the thread that creates this one may be nicer than the process. A worker
-  // that the system then refuses to make less nice does the work that waits, but does not stay for more.
+  // Counted from the main thread, since the thread that creates this one may be nicer than the process. If
+  // the system does not let the worker become less nice, it does the work that waits and does not stay for
+  // more.
   const int ofProcess = getpriority(PRIO_PROCESS, static_cast<id_t>(getpid()));
-  const bool isAsNiceAsWanted =
-      setpriority(PRIO_PROCESS, 0, ofProcess + static_cast<int>(levelOfCaller - levels.data())) == 0;
-  // Its creator's name, which it inherits, is not its own.
+  const int added = levelOfCaller == &utility ? kNicenessOfUtility : 0;
+  const bool isAsNiceAsWanted = setpriority(PRIO_PROCESS, 0, ofProcess + added) == 0;
+  // A thread inherits its creator's name.
   setSystemThreadName(nullptr);
   levelOfCaller->run(isAsNiceAsWanted);
   return nullptr;
 }
 
 bool Level::startThread() noexcept {
-  // Signals are for the host's threads, but those that an instruction of the worker's raises are its own:
-  // blocked, they would end the process past the host's handler.
+  // The host's threads take all signals but those that an instruction of the worker itself raises. If these
+  // were blocked, they would end the process without the host's handler.
   sigset_t blocked;
   sigset_t before;
   sigfillset(&blocked);
@@ -230,20 +222,20 @@ bool Level::startThread() noexcept {
 constinit std::atomic<std::int64_t> WorkerPool::idleTimeout =
     std::chrono::nanoseconds(std::chrono::seconds(5)).count();
 
-void WorkerPool::schedule(Work& work, QualityOfService qualityOfService, int relativePriority) noexcept {
-  level(qualityOfService, relativePriority).schedule(work);
+void WorkerPool::schedule(Work& work, QualityOfService qualityOfService) noexcept {
+  level(qualityOfService).schedule(work);
 }
 
-void WorkerPool::tryAgain(QualityOfService qualityOfService, int relativePriority) noexcept {
-  level(qualityOfService, relativePriority).tryAgain();
+void WorkerPool::tryAgain(QualityOfService qualityOfService) noexcept {
+  level(qualityOfService).tryAgain();
 }
 
-bool WorkerPool::isShort(QualityOfService qualityOfService, int relativePriority) noexcept {
-  return level(qualityOfService, relativePriority).isShort();
+bool WorkerPool::isShort(QualityOfService qualityOfService) noexcept {
+  return level(qualityOfService).isShort();
 }
 
 void WorkerPool::resetAfterFork() noexcept {
-  for (Level& each : levels) new (&each) Level;
+  for (Level* each : {&urgent, &utility}) new (each) Level;
   if (levelOfCaller != nullptr) levelOfCaller->countCaller();
 }
 

@@ -72,7 +72,7 @@ rt::Ref<SRLMemoizingScope> SRLMemoizingScope::init() {
 }
 
 rt::Ref<rt::Object> SRLMemoizingScope::makeOrAwaitInstance(const void* identifier, bool* instanceCreated,
-                                                           const FactoryReference& factory) {
+                                                           rt::FunctionView<rt::Ref<rt::Object>()> factory) {
   SRLMemoizingScopeIvars& ivars = *ivars_;
   rt::Ref<SRLPendingCreation> awaited;
   SRLPendingCreation* begun = nullptr;
@@ -108,7 +108,7 @@ rt::Ref<rt::Object> SRLMemoizingScope::makeOrAwaitInstance(const void* identifie
 
   rt::Ref<rt::Object> instance;
   try {
-    instance = factory.call(factory.factory);
+    instance = factory();
   } catch (...) {
     // It stays pending, but nobody has to wait for it any more.
     begun->end();

@@ -25,6 +25,7 @@
 #include <type_traits>
 #include <utility>
 
+#include "Runtime/Base/Private/FunctionView.h"
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Objects/Class.h"
@@ -56,10 +57,7 @@ class RT_VISIBLE SRLMemoizingScope final : public rt::Implements<SRLMemoizingSco
       rt::Ref<rt::Object> instance;
       if (findInstance(identifier, instance)) [[likely]]
         return instance;
-      return makeOrAwaitInstance(identifier, instanceCreated,
-                                 {&factoryBlock, [](const void* factory) -> rt::Ref<rt::Object> {
-                                    return (*static_cast<const Factory*>(factory))();
-                                  }});
+      return makeOrAwaitInstance(identifier, instanceCreated, factoryBlock);
     }
   }
 
@@ -79,17 +77,12 @@ class RT_VISIBLE SRLMemoizingScope final : public rt::Implements<SRLMemoizingSco
  private:
   friend struct SRLMemoizingScopeTestAccess;
 
-  // A factory for the time of a call: an instance that is there already must not cost a block.
-  struct FactoryReference {
-    const void* factory;
-    rt::Ref<rt::Object> (*call)(const void* factory);
-  };
-
   SRLMemoizingScope() : ivars_(std::make_unique_for_overwrite<SRLMemoizingScopeIvars>()) {}
 
-  // What `instanceForIdentifier` does where it found no instance. It looks once more, under the lock.
+  // What `instanceForIdentifier` does where it found no instance. It looks once more, under the lock. The
+  // factory is no block, which would have to be allocated.
   [[gnu::noinline]] rt::Ref<rt::Object> makeOrAwaitInstance(const void* identifier, bool* instanceCreated,
-                                                            const FactoryReference& factory);
+                                                            rt::FunctionView<rt::Ref<rt::Object>()> factory);
 
   const std::unique_ptr<SRLMemoizingScopeIvars> ivars_;
 };

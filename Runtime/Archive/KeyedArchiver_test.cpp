@@ -34,7 +34,7 @@ std::string whatOf(const std::function<void()>& function) {
   return "";
 }
 
-// Archives `object` and returns what is read back. Fails the test if it is null.
+// Archives `object` and returns what is read back. Fails the test on an error.
 Ref<rt::Object> throughAnArchive(const Ref<rt::Object>& object) {
   rt::String error;
   Ref<rt::Object> read = KeyedUnarchiver::unarchivedObjectOfClasses(kAll, archive(object), &error);

@@ -24,7 +24,7 @@
 ///     | "$archiver"   "KeyedArchiver"
 ///     | "$version"    100000
 ///     | "$top"        a dictionary, which has a reference for each key
-///     | "$objects"    an array, which references are indexes of
+///     | "$objects"    an array; references are indexes of it
 ///
 /// In "$objects", "$null" comes first, and strings and numbers stand for themselves. All other objects are
 /// dictionaries, in which "$class" refers to a class. A class is a dictionary of "$classname" and
@@ -60,9 +60,9 @@ class KeyedArchiver final {
   KeyedArchiver& operator=(const KeyedArchiver&) = delete;
   ~KeyedArchiver();
 
-  /// Archives `object`, which may be null, under `key`. During an `encodeWithCoder` it becomes a part of
-  /// that object, and at any other time it is at the top. Calls the `encodeWithCoder` of `object` and of
-  /// its parts.
+  /// Archives `object`, which may be null, under `key`. It becomes a part of the object whose
+  /// `encodeWithCoder` is running, and at any other time it is at the top. Calls the `encodeWithCoder` of
+  /// `object` and of its parts.
   ///
   /// Errors: throws rt::Exception if an object cannot be archived, contains itself or is nested too deeply,
   /// or if `key` is taken. Throws what an `encodeWithCoder` throws. After an exception the archiver is of

@@ -34,7 +34,7 @@ std::string whatOf(const std::function<void()>& function) {
   return "";
 }
 
-// What comes back of `object`, which must.
+// Archives `object` and returns what is read back. Fails the test on an error.
 Ref<rt::Object> throughAnArchive(const Ref<rt::Object>& object) {
   rt::String error;
   Ref<rt::Object> read = KeyedUnarchiver::unarchivedObjectOfClasses(kAll, archive(object), &error);
@@ -51,7 +51,7 @@ TEST(KeyedArchiver, ArchivesNothing) {
   EXPECT_EQ(unarchiver.error(), "there is nothing under the key \"root\""_s);
 }
 
-TEST(KeyedArchiver, TellsNullFromNothing) {
+TEST(KeyedArchiver, TellsNullFromAMissingKey) {
   KeyedArchiver archiver;
   archiver.encodeObject(nullptr, "null");
   archiver.encodeObject(rt::String(), "null string");
@@ -95,7 +95,7 @@ TEST(KeyedArchiver, ReadsBackCollections) {
                         {{"key"_s, inner}, {rt::Number::of(2), "two"_s}, {"other"_s, rt::make<Tag>("t"_s)}}));
   const Ref<rt::Object> read = throughAnArchive(object);
   EXPECT_TRUE(rt::isEqual(read, object));
-  // What was one object is one again.
+  // One object is read back as one object.
   const auto* array = rt::cast<rt::Array>(read.get());
   EXPECT_EQ(array->at(1), array->at(2));
 }
@@ -128,7 +128,7 @@ TEST(KeyedArchiver, GivesEqualBytesForEqualDictionaries) {
   EXPECT_EQ(archive(forward.dictionary()), archive(backward.dictionary()));
 }
 
-TEST(KeyedArchiver, CanGoOnAfterItsData) {
+TEST(KeyedArchiver, EncodesMoreAfterEncodedData) {
   KeyedArchiver archiver;
   archiver.encodeObject("1"_s, "first");
   const Bytes first = archiver.encodedData();
@@ -154,7 +154,7 @@ TEST(KeyedArchiver, RefusesWhatItCannotArchive) {
               HasSubstr("under the key \"how\" already"));
   EXPECT_EQ(errorOfArchiving(rt::make<Misbehaving>("throw while encoding"_s)), "thrown");
   EXPECT_THAT(errorOfArchiving(rt::make<Misbehaving>("finish early"_s)), HasSubstr("is being encoded"));
-  // One that says nothing of what went wrong below gives no archive either.
+  // An object that hides an exception of its parts is refused as well.
   EXPECT_THAT(errorOfArchiving(rt::make<Misbehaving>("swallow"_s)), HasSubstr("could not be"));
   const Ref<Tag> circle = rt::make<Tag>("circle"_s);
   circle->setOther(rt::Array::of(circle));
@@ -162,7 +162,7 @@ TEST(KeyedArchiver, RefusesWhatItCannotArchive) {
   circle->setOther(nullptr);
 }
 
-TEST(KeyedArchiver, NestsAsDeepAsItSays) {
+TEST(KeyedArchiver, AllowsTheDocumentedDepth) {
   const auto nested = [](int depth) {
     Ref<rt::Object> object = "innermost"_s;
     for (int i = 0; i < depth; ++i) {
@@ -182,21 +182,21 @@ Ref<rt::Object> doubled(int times) {
   return object;
 }
 
-// An array of `times` one text of 64 KiB.
+// Returns an array that has one text of 64 KiB `times` times.
 Ref<rt::Object> repeated(std::size_t times) {
   const rt::String text = rt::String::fromUTF8(std::string(65536, 'a'));
   return rt::make<rt::Array>(std::vector<Ref<rt::Object>>(times, text));
 }
 
-// What is archived may be 16 MiB larger than 16 times the archive, and no larger: it used to be archived
-// however large it was.
+// An object may be 16 MiB larger than 16 times the archive, and no larger. Regression: objects of any size
+// were archived.
 TEST(KeyedArchiver, RefusesWhatIsReachedTooOften) {
-  // The tag is 1, and its name 1 and 9 bytes: with the arrays, 12 times 2 to the 20th.
+  // The tag counts 1, and its name 1 and 9 bytes. With the arrays, the size is 12 times 2 to the 20th.
   EXPECT_TRUE(throughAnArchive(doubled(20)));
   EXPECT_THAT(whatOf([] { archive(doubled(21)); }), HasSubstr("objects are referred to too often"));
   EXPECT_THAT(whatOf([] { archive(doubled(500)); }), HasSubstr("objects are referred to too often"));
 
-  // The text stands in the archive once, and each reference to it is a byte more.
+  // The text is in the archive once, and each reference to it takes one more byte.
   const std::size_t lengthOf250 = archive(repeated(250)).size();
   ASSERT_EQ(archive(repeated(251)).size(), lengthOf250 + 1);
   const auto fits = [&](std::size_t times) {
@@ -217,8 +217,8 @@ TEST(KeyedArchiver, CountsWhatIsUnderEachKeyByItself) {
     EXPECT_TRUE(unarchiver.decodeObjectOfClasses(kAll, key)) << unarchiver.error().view();
 }
 
-// Of what is reached once there may be any amount.
-TEST(KeyedArchiver, ArchivesMuch) {
+// The size of objects that are reached once is not limited.
+TEST(KeyedArchiver, ArchivesAnyAmountThatIsReachedOnce) {
   const Ref<rt::Object> object = rt::String::fromUTF8(std::string(std::size_t{17} << 20U, 'a'));
   EXPECT_TRUE(rt::isEqual(throughAnArchive(rt::Array::of(object)), rt::Array::of(object)));
 }

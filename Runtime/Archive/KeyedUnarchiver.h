@@ -60,12 +60,12 @@ class KeyedUnarchiver final {
   KeyedUnarchiver& operator=(const KeyedUnarchiver&) = delete;
   ~KeyedUnarchiver();
 
-  /// Returns whether there is an object or null under `key`. During an `initWithCoder` the key is that
-  /// object's, and at any other time it is at the top. Returns false after an error.
+  /// Returns whether there is an object or null under `key`. Looks in the object whose `initWithCoder` is
+  /// running, and at any other time at the top of the archive. Returns false after an error.
   bool containsValueForKey(std::string_view key) const;
 
-  /// Returns the object under `key`, which must have one of `classes`. The key is that of
-  /// `containsValueForKey`. Calls the `initWithCoder` of the object and of its parts, once for each object.
+  /// Returns the object under `key`, which must have one of `classes`. Looks where `containsValueForKey`
+  /// does. Calls the `initWithCoder` of the object and of its parts, once for each object.
   ///
   /// Errors: returns null without an error if null was archived. Returns null with an error if there is
   /// nothing under the key, the object has another class, its `initWithCoder` returns null, or the archive
@@ -82,9 +82,9 @@ class KeyedUnarchiver final {
     return cast<T>(decodeObjectOfClasses({&classInfo<T>()}, key));
   }
 
-  /// Returns the array under `key`. Its elements must have one of `classes`, or be strings or numbers. Null
-  /// and an error for an object that is not an array. Unlike `decodeObjectOfClasses`, this never makes an
-  /// object of `classes` in the place of the array.
+  /// Returns the array under `key`. Its elements must have one of `classes`, or be strings or numbers.
+  /// Returns null with an error for an object that is not an array. Unlike `decodeObjectOfClasses`, this
+  /// never makes an object of `classes` in the place of the array.
   Ref<Array> decodeArrayOfObjectsOfClasses(std::initializer_list<const ClassInfo*> classes,
                                            std::string_view key);
 
@@ -113,7 +113,7 @@ class KeyedUnarchiver final {
   class Level;
   // The classes that an object may have. Each list that has been asked for has a number.
   using Classes = std::vector<const ClassInfo*>;
-  // Numbers of lists of classes: those that the object may have, and those that its elements may have.
+  // The numbers of two lists of classes: that for the object, and that for its elements.
   struct Wanted {
     std::size_t classes;
     std::size_t elements;

@@ -24,20 +24,20 @@ using rt::Ref;
 using testing::HasSubstr;
 using Bytes = std::vector<std::byte>;
 
-// Inherits from Tag all but what makes one.
+// Derives from Tag, but has no `initWithCoder` of its own.
 class BareTag final : public rt::Implements<BareTag, Tag> {
  public:
   using Implements::Implements;
 };
 
-// The error that decoding `bytes` for `classes` has.
+// Returns the error of decoding `bytes` for `classes`.
 std::string errorOf(const Bytes& bytes, std::initializer_list<const rt::ClassInfo*> classes = kAll) {
   rt::String error;
   EXPECT_FALSE(KeyedUnarchiver::unarchivedObjectOfClasses(classes, bytes, &error));
   return std::string(error.view());
 }
 
-// An archive put together by hand; place 0 is "$null", and "root" refers to place 1.
+// An archive that is made by hand. Place 0 is "$null", and "root" refers to place 1.
 class Forged {
  public:
   using Index = PropertyList::Index;
@@ -105,11 +105,11 @@ TEST(KeyedUnarchiver, RefusesObjectsOfOtherClasses) {
   EXPECT_THAT(errorOf(archive(rt::make<rt::Array>()), {string, &rt::classInfo<rt::Number>()}),
               HasSubstr(" or "));
   EXPECT_THAT(errorOf(archive("text"_s), {}), HasSubstr("String"));
-  // A superclass is not enough, a subclass is.
+  // A subclass is allowed, a superclass is not.
   EXPECT_THAT(errorOf(archive(rt::make<Tag>("t"_s)), {&rt::classInfo<ColoredTag>()}), HasSubstr("\"Tag\""));
   EXPECT_TRUE(KeyedUnarchiver::unarchivedObjectOfClass<Tag>(archive(rt::make<ColoredTag>("t"_s))));
 
-  // The class is looked at before anything of the object is made, in collections too.
+  // The class is checked before any part of the object is made, in collections as well.
   Tag::initialized = 0;
   EXPECT_THAT(errorOf(archive(rt::make<Tag>("t"_s)), {array}), HasSubstr("\"Tag\""));
   EXPECT_THAT(errorOf(archive(rt::Array::of(rt::make<Tag>("t"_s))), {array}), HasSubstr("\"Tag\""));
@@ -136,7 +136,7 @@ TEST(KeyedUnarchiver, MakesNothingButAnArrayWhereOneIsAskedFor) {
   EXPECT_TRUE(decode(rt::Array::of(rt::Array::of(tag)), kAll, error));
   EXPECT_EQ(error, "");
 
-  // Used to be made before it was found to be no array.
+  // Regression: the object was made before its class was checked.
   Tag::initialized = 0;
   EXPECT_FALSE(decode(tag, kAll, error));
   EXPECT_THAT(error, HasSubstr("an object of class \"Tag\" where one of class \"Array\" was asked for"));
@@ -150,8 +150,8 @@ TEST(KeyedUnarchiver, MakesNothingButAnArrayWhereOneIsAskedFor) {
   EXPECT_EQ(Tag::initialized, 0);
 }
 
-// Used to be possible in a first version: what was decoded once for more classes was there for fewer.
-TEST(KeyedUnarchiver, AsksAgainForOtherClasses) {
+// Regression: an object that had been decoded for many classes was returned when fewer were allowed.
+TEST(KeyedUnarchiver, ChecksTheClassesAtEachCall) {
   const Ref<rt::Array> array = rt::Array::of(rt::make<Tag>("t"_s));
   KeyedArchiver archiver;
   archiver.encodeObject(array, "first");
@@ -180,7 +180,7 @@ TEST(KeyedUnarchiver, RefusesClassesThatCannotBeUnarchived) {
   EXPECT_THAT(errorOfClass(std::string(1000, 'x').c_str()), HasSubstr("xxx...\", which is not known"));
 }
 
-TEST(KeyedUnarchiver, ReportsWhatAClassDoes) {
+TEST(KeyedUnarchiver, ReportsWhatInitWithCoderDoesWrong) {
   const auto errorOfDoing = [](const char* how) {
     return errorOf(archive(rt::make<Misbehaving>(rt::String::fromUTF8(how))));
   };
@@ -191,7 +191,7 @@ TEST(KeyedUnarchiver, ReportsWhatAClassDoes) {
   KeyedUnarchiver unarchiver(bytes);
   EXPECT_THROW(unarchiver.decodeObjectOfClasses(kAll, "root"), std::runtime_error);
   EXPECT_TRUE(unarchiver.error().isNull());
-  // The same again, not a circle.
+  // The same object twice, which is not a circle.
   EXPECT_THROW(unarchiver.decodeObjectOfClasses(kAll, "root"), std::runtime_error);
 }
 
@@ -273,7 +273,7 @@ TEST(KeyedUnarchiver, RefusesKeysThatAreCollections) {
   EXPECT_THAT(errorOf(forged.bytes()), HasSubstr("neither text nor number"));
 }
 
-// A list of a thousand elements that a thousand collections share would be a million elements.
+// A list of a thousand elements that a thousand collections share would yield a million elements.
 TEST(KeyedUnarchiver, DoesNotMultiplyWhatAFileHolds) {
   Forged forged;
   const auto list = forged.references({3});
@@ -304,10 +304,10 @@ TEST(KeyedUnarchiver, RefusesWhatIsNestedTooDeeply) {
   }
 }
 
-// A few bytes can stand for more objects than there are atoms. They used to be decoded, and who then asked
-// for a hash waited for ever.
+// A few bytes can stand for more objects than there are atoms. Regression: they were decoded, and their
+// hash took for ever.
 TEST(KeyedUnarchiver, RefusesWhatIsReferredToTooOften) {
-  // A tag with an array of twice the next tag, and so on.
+  // Each tag has an array that has the next tag twice.
   const auto doubled = [](std::uint64_t times) {
     Forged forged;
     const std::uint64_t last = (2 * times) + 1;
@@ -329,7 +329,7 @@ TEST(KeyedUnarchiver, RefusesWhatIsReferredToTooOften) {
   EXPECT_EQ(errorOf(doubled(22)), "objects are referred to too often");
   EXPECT_TRUE(KeyedUnarchiver::unarchivedObjectOfClasses(kAll, doubled(20)));
 
-  // A file may be longer than it has to be, and what is read of it larger.
+  // If the file is longer than necessary, a larger object is allowed.
   const auto repeated = [](std::size_t times, std::size_t unused) {
     Forged forged;
     const auto references = forged.list.add(PropertyList::Array(times, forged.reference(2)));
@@ -347,7 +347,7 @@ TEST(KeyedUnarchiver, RefusesWhatIsReferredToTooOften) {
   }
 }
 
-// Nothing is done any more for what is too large, however much there is of it.
+// Decoding stops at the limit, however large the object would be.
 TEST(KeyedUnarchiver, StopsWhereObjectsAreReferredToTooOften) {
   Forged forged;
   PropertyList::Array references(300, forged.reference(2));

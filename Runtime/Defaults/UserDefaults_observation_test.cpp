@@ -1,4 +1,4 @@
-// What observers of user defaults are told, and when they are told no more.
+// Observers of user defaults: when they are called, and when not any more.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -32,7 +32,7 @@ using testing::StartsWith;
 
 TEST_F(UserDefaults, TellObserversOfChanges) {
   const auto defaults = this->defaults();
-  std::vector<std::string> calls;  // looked at while nothing changes
+  std::vector<std::string> calls;  // Read only while nothing changes.
   const auto record = [&](const char* name) { return [&calls, name] { calls.emplace_back(name); }; };
   auto later = defaults->observe("key", Notify::kOnChange, record("later"));
   EXPECT_THAT(calls, IsEmpty());
@@ -62,7 +62,7 @@ TEST_F(UserDefaults, TellObserversOfChanges) {
   EXPECT_THAT(reports(), IsEmpty());
 }
 
-// They are read anew at each request all the same, and watched as soon as the next observer comes.
+// Each read still returns what is in the file. The next observation tries again to watch it.
 TEST_F(UserDefaults, SayThatTheyAreNotWatched) {
   if (RT_TEST_ADDRESS_SANITIZER) GTEST_SKIP() << "the address sanitizer needs descriptors for its checks";
   const auto defaults = this->defaults();
@@ -116,7 +116,7 @@ TEST_F(UserDefaults, HoldNoLockWhileAnObserverRuns) {
   observation = defaults->observe("key", Notify::kOnChange, [&] {
     ++calls;
     another = defaults->observe("other", Notify::kAlsoNow, [&] { ++inner; });
-    // Runs it once more, after this.
+    // Makes the observer run once more, after this call.
     if (calls < 3) {
       set("key", std::to_string(calls + 1));
       EXPECT_EQ(defaults->stringForKey("key"), std::string_view(std::to_string(calls + 1)));
@@ -165,7 +165,7 @@ TEST_F(UserDefaults, PassOnWhatAnObserverThrowsAtOnce) {
   EXPECT_THAT(reports(), IsEmpty());
 }
 
-// Whether a thread of this process waits in the system.
+// Returns whether a thread of this process sleeps.
 bool isAsleep(pid_t thread) {
   std::ifstream file("/proc/self/task/" + std::to_string(thread) + "/stat");
   std::string text;
@@ -174,7 +174,7 @@ bool isAsleep(pid_t thread) {
   return name != std::string::npos && text.substr(name + 2, 1) == "S";
 }
 
-// Who removes an observer may then destroy what the observer uses.
+// After a removal, the caller may destroy what the observer uses.
 TEST_F(UserDefaults, RemovalWaitsForAnObserverThatRuns) {
   const auto defaults = this->defaults();
   std::atomic<bool> isRunning = false;
@@ -202,7 +202,7 @@ TEST_F(UserDefaults, RemovalWaitsForAnObserverThatRuns) {
   other.join();
 }
 
-// Invariant: what has been removed is not running and never runs again.
+// Invariant: a removed observer is not running and never runs again.
 TEST_F(UserDefaults, ConcurrentRemovalIsFinal) {
   const auto defaults = this->defaults();
   std::atomic<bool> isDone = false;
@@ -215,7 +215,7 @@ TEST_F(UserDefaults, ConcurrentRemovalIsFinal) {
     observers.emplace_back([&] {
       std::int64_t total = 0;
       for (int i = 0; i < 300; ++i) {
-        // Not atomic: the thread sanitizer would see a call that overlaps another or the removal.
+        // Not atomic, so that the thread sanitizer finds calls that overlap each other or the removal.
         std::int64_t calls = 0;
         auto observation = defaults->observe("key", Notify::kAlsoNow, [&calls] { ++calls; });
         observation.remove();
@@ -229,11 +229,11 @@ TEST_F(UserDefaults, ConcurrentRemovalIsFinal) {
   isDone = true;
 }
 
-// Invariant: once all is quiet, an observer has seen the last value; its calls never overlap.
+// Invariant: after the last change, an observer sees the last value. Its calls never overlap.
 TEST_F(UserDefaults, ConcurrentChangesEndWithTheLastValueSeen) {
   const auto defaults = this->defaults();
   for (int round = 0; round < 10; ++round) {
-    int calls = 0;  // not atomic, as above
+    int calls = 0;  // Not atomic, as above.
     auto observation = defaults->observe("key", Notify::kAlsoNow, [&] { ++calls; });
     const auto last = observe(defaults);
     {

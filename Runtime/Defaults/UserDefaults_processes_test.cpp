@@ -1,4 +1,4 @@
-// What other processes do to user defaults, and what is left of them in the child of a fork.
+// Changes by other processes, and user defaults in the child of a fork.
 
 #include <fcntl.h>
 #include <gmock/gmock.h>
@@ -32,7 +32,7 @@ using Notify = rt::UserDefaults::Notify;
 using testing::ElementsAre;
 using testing::HasSubstr;
 
-// Has another process run `script`, in which $1 is `path`.
+// Runs `script` in another process. In the script, $1 is `path`.
 void inShell(const std::string& script, const fs::path& path) {
   const ProcessResult result = runProcess({"sh", "-ec", script, "sh", path.string()});
   ASSERT_EQ(result.exitStatus, 0) << result.standardError;
@@ -101,7 +101,7 @@ TEST_F(UserDefaultsOfOthers, AreToldOfAfterAChildHasForked) {
   auto observation = observe(defaults);
   const pid_t child = fork();
   if (child == 0) {
-    // Ends what the parent has, but in the child only.
+    // Ends the observation in the child only.
     observation = {};
     defaults = nullptr;
     _exit(0);
@@ -157,8 +157,8 @@ TEST_F(UserDefaultsOfOthers, ReportWhatAnObserverThrows) {
   rt::UserDefaults::setReportHandler(nullptr);
 }
 
-// An observer may drop the last reference on the thread that would otherwise be waited for.
-TEST_F(UserDefaultsOfOthers, MayBeLetGoOfByAnObserver) {
+// An observer may release the last reference, on the thread that the removal would otherwise wait for.
+TEST_F(UserDefaultsOfOthers, MayBeReleasedByAnObserver) {
   auto defaults = this->defaults();
   const rt::Weak<rt::UserDefaults> weak = defaults;
   std::binary_semaphore kept{0};
@@ -176,7 +176,7 @@ TEST_F(UserDefaultsOfOthers, MayBeLetGoOfByAnObserver) {
   EXPECT_FALSE(weak.lock());
 }
 
-// In the child of a fork: what `inChild` returns, which is ended where it does not within a minute.
+// Runs `inChild` in the child of a fork and returns its status. The child is killed after a minute.
 int statusOfFork(const std::function<int()>& inChild) {
   const pid_t child = fork();
   if (child == 0) {
@@ -188,7 +188,7 @@ int statusOfFork(const std::function<int()>& inChild) {
   return status;
 }
 
-// Used to wait in the child, for ever, for a call that a thread of the parent was making.
+// Regression: the child waited for ever for a call that a thread of the parent was making.
 TEST_F(UserDefaults, InAChildDoNotWaitForAThreadOfTheParent) {
   const auto defaults = this->defaults();
   std::binary_semaphore isCalled{0};
@@ -208,7 +208,7 @@ TEST_F(UserDefaults, InAChildDoNotWaitForAThreadOfTheParent) {
   observation.remove();
 }
 
-// Used to call no more, in the child, an observer that a thread of the parent was in.
+// Regression: if a thread of the parent was calling an observer, the child never called that observer.
 TEST_F(UserDefaults, InAChildAreObservedAgain) {
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the thread sanitizer allows no thread in such a child";
   const auto defaults = this->defaults();
@@ -227,7 +227,7 @@ TEST_F(UserDefaults, InAChildAreObservedAgain) {
   set("key", "1");
   isCalled.acquire();
   EXPECT_EQ(statusOfFork([&] {
-              // Has a thread begin to watch, which calls the one from before, too.
+              // Starts a thread that watches, which calls the parent's observer as well.
               const auto another = defaults->observe("other", Notify::kOnChange, [] {});
               set("key", "2");
               isCalledInChild.acquire();
@@ -238,7 +238,7 @@ TEST_F(UserDefaults, InAChildAreObservedAgain) {
   observation.remove();
 }
 
-// Used to wait in the child, for ever, for itself.
+// Regression: in the child, the thread waited for itself for ever.
 TEST_F(UserDefaults, MayBeForkedInAnObserver) {
   const auto defaults = this->defaults();
   int status = -1;
@@ -258,7 +258,7 @@ TEST_F(UserDefaults, MayBeForkedInAnObserver) {
   EXPECT_EQ(status, 0);
 }
 
-// Invariant: a child reads and is told whatever the threads of its parent were doing.
+// Invariant: a child reads and observes, whatever the threads of its parent were doing.
 TEST_F(UserDefaults, InAChildAreFreeOfWhatTheParentsThreadsHeld) {
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the thread sanitizer allows no thread in such a child";
   const auto defaults = this->defaults();
@@ -285,7 +285,7 @@ TEST_F(UserDefaults, InAChildAreFreeOfWhatTheParentsThreadsHeld) {
   for (std::thread& thread : threads) thread.join();
 }
 
-// Used to be watched no more, for as long as the process ran, once the system had refused.
+// Regression: once the system had refused to watch the file, it was never watched again.
 TEST_F(UserDefaultsOfOthers, AreToldOfAgainAfterTheSystemHasFailed) {
   const auto defaults = this->defaults();
   const auto observation = observe(defaults);
@@ -300,7 +300,7 @@ TEST_F(UserDefaultsOfOthers, AreToldOfAgainAfterTheSystemHasFailed) {
   }
   close(nothing);
   ASSERT_GT(replaced, 0) << "the file is not watched";
-  // Either wakes the thread, which then finds that it cannot watch.
+  // One of these changes wakes the thread, which then finds that it cannot watch.
   inShell(R"(echo 'key = 1' > "$1")", path());
   await("1"_s);
   inShell(R"(echo 'key = 2' > "$1")", path());

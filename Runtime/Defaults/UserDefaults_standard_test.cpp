@@ -1,4 +1,4 @@
-// Where the standard user defaults are, and what is said where there are none or may not be read.
+// The place of the standard user defaults, and what is reported if there is none or it cannot be read.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -21,8 +21,8 @@ using namespace rt::literals;
 using Notify = rt::UserDefaults::Notify;
 using testing::HasSubstr;
 
-// In a child of its own, since each process has but one of them: what it writes to standard error, after
-// `environment` has been put in place.
+// Each test runs in a child, since a process has only one of them. `inChild` calls `environment` and then
+// `use` there, and returns what the child writes to standard error.
 class StandardUserDefaults : public UserDefaults {
  protected:
   static std::string inChild(const std::function<void()>& environment, const std::function<void()>& use) {
@@ -70,7 +70,7 @@ TEST_F(StandardUserDefaults, AreInTheUsersFolder) {
                 },
                 use),
             "of a bundle");
-  // What is relative leads nowhere.
+  // A relative path counts as missing.
   EXPECT_EQ(inChild(
                 [&] {
                   setEnvironment("HOME", folder_);

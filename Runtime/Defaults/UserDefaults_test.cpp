@@ -1,5 +1,5 @@
-// What user defaults read. Observers are in UserDefaults_observation_test.cpp, other processes in
-// UserDefaults_processes_test.cpp, the standard ones in UserDefaults_standard_test.cpp.
+// Reading user defaults. UserDefaults_observation_test.cpp tests observers, UserDefaults_processes_test.cpp
+// other processes, and UserDefaults_standard_test.cpp the standard user defaults.
 
 #include "Runtime/Defaults/UserDefaults.h"
 
@@ -68,7 +68,7 @@ TEST_F(UserDefaults, ReadTextsAsTheyAreWritten) {
   EXPECT_TRUE(defaults->stringForKey("none").isNull());
 }
 
-// Used to be missed: the same size, and within one tick of the file system's clock.
+// Regression: a change to the same size within one step of the file system's clock was missed.
 TEST_F(UserDefaults, SeeEachChangeAtTheNextRead) {
   write(path(), "key = 0");
   const auto defaults = this->defaults();
@@ -116,7 +116,7 @@ TEST_F(UserDefaults, ReportOnStandardErrorInOneLine) {
             "rt: malformed user defaults: " + path().string() + ", line 1: bytes that are not UTF-8\n");
 }
 
-TEST_F(UserDefaults, AreNotKeptWaitingByWhatIsNoFile) {
+TEST_F(UserDefaults, AreNotBlockedByANamedPipe) {
   ASSERT_EQ(mkfifo(path().c_str(), 0600), 0);
   EXPECT_TRUE(defaults()->stringForKey("key").isNull());
   EXPECT_THAT(reports(), ElementsAre(HasSubstr("no plain file")));

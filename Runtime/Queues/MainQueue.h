@@ -47,7 +47,7 @@ class MainQueue final : public Queue {
   static void stop() noexcept;
 
   /// Runs the tasks that are queued now, without those that they queue in turn. Returns how many it has
-  /// run. It is 0 if a task of the main queue calls it, as an event loop inside a task would. Ends the
+  /// run, which is 0 if a task of the main queue calls it, as an event loop inside a task would. Ends the
   /// program if another thread than the main thread calls it.
   static std::size_t drain();
 

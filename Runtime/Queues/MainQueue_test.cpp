@@ -1,4 +1,5 @@
-// What is particular to the main queue. What every kind of queue keeps is in Queue_conformance_test.cpp.
+// Behaviour of the main queue only. Queue_conformance_test.cpp tests what all kinds of queues have in
+// common.
 
 #include "Runtime/Queues/MainQueue.h"
 
@@ -140,8 +141,8 @@ TEST_F(MainQueueTest, StopFromAnotherThreadWakesRun) {
   other.join();
 }
 
-// Invariant: every wait of the main thread is ended by what is queued, so nothing is left when the last
-// task has stopped it.
+// Invariant: each queued task ends a wait of the main thread. So no task is left when the last one has
+// called `stop`.
 TEST_F(MainQueueTest, NoWakeUpIsLost) {
   constexpr int kRounds = 5000;
   int count = 0;
@@ -201,7 +202,7 @@ TEST_F(MainQueueTest, TheForkingThreadIsTheChildsMainThread) {
 
 constexpr const char* kSanitizerNeedsDescriptors = "the address sanitizer needs descriptors for its checks";
 
-/// Has the system refuse descriptors.
+// Makes the system refuse descriptors.
 class DescriptorRefusal {
  public:
   DescriptorRefusal() {
@@ -232,7 +233,7 @@ TEST_F(MainQueueDeathTest, SaysThatThereIsNoDescriptorAndTriesAgain) {
       testing::ExitedWithCode(0), "");
 }
 
-// Where there had been no queue before, it went on with its parent's.
+// Regression: if the parent had made no queue, the child kept the parent's descriptor.
 TEST_F(MainQueueDeathTest, TheChildOfAForkHasNoneWhereThereIsNone) {
   if (RT_TEST_ADDRESS_SANITIZER) GTEST_SKIP() << kSanitizerNeedsDescriptors;
   EXPECT_EXIT(

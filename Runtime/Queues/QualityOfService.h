@@ -3,7 +3,7 @@
 /// How urgent the work of a queue is.
 ///
 /// On Linux, a thread that runs work of `kUtility` is nicer than the process by 5. All other threads are as
-/// nice as the process. No thread is less nice than the process, which takes a privilege and would put the
+/// nice as the process. No thread is less nice than the process: that takes a privilege, and would put the
 /// library before its host. A thread that a nicer one has started may lack the privilege to become less
 /// nice. It then does the work that waits at that moment, and ends. On macOS these are the system's classes
 /// of the same names.
@@ -15,7 +15,7 @@ namespace rt {
 enum class QualityOfService : std::uint8_t {
   /// Work whose result a user sees or touches right now.
   kUserInteractive,
-  /// Work that nothing else is said of.
+  /// The default.
   kDefault,
   /// Work that goes on for a while and that nobody waits for.
   kUtility,

@@ -114,8 +114,8 @@ class RT_VISIBLE RT_CAPABILITY("queue") Queue : public Implements<Queue, Object>
     }
   }
 
-  /// Does the same as `sync`. The name is that of queues that run several tasks at once. On a serial queue,
-  /// every task runs either before or after any other.
+  /// Does the same as `sync`. Concurrent queues have this name for running a task alone. On a serial queue
+  /// every task runs alone.
   template <std::invocable Task>
   std::invoke_result_t<Task> barrierSync(Task&& task) RT_EXCLUDES(this) {
     return sync(std::forward<Task>(task));

@@ -1,4 +1,4 @@
-// What every kind of queue keeps: one suite, run by each of them.
+// What all kinds of queues have in common. Each kind runs this suite.
 
 #include <gtest/gtest.h>
 #include <poll.h>
@@ -34,8 +34,8 @@ using namespace rt::literals;
 using rt::Queue;
 using rt::Ref;
 
-/// A kind of queue. It makes one for a test, and runs the test's body while that is being served. A value and
-/// no type, so that the suite is compiled once.
+// A kind of queue. It makes a queue for a test, and runs the test's body while a thread serves the queue.
+// It is a value and not a type, so that the suite is compiled once.
 struct Kind {
   std::string name;
   rt::String label;
@@ -83,7 +83,7 @@ class QueueConformance : public testing::TestWithParam<Kind> {
  protected:
   QueueConformance() { GTEST_FLAG_SET(death_test_style, "threadsafe"); }
 
-  /// Runs `body(queue)` while the queue is being served, and until all that it has queued has run.
+  // Runs `body(queue)` while a thread serves the queue, and until all tasks that `body` has queued have run.
   static void serve(const std::function<void(Queue&)>& body) {
     GetParam().serveDuring([&] {
       const Ref<Queue> queue = GetParam().make();
@@ -201,7 +201,7 @@ TEST_P(QueueConformance, TasksMayOnlyBeMovable) {
   EXPECT_EQ(value, 5);
 }
 
-// Invariant: a task has gone, with all that it holds, when the next one starts.
+// Invariant: a task and its captures are destroyed before the next task starts.
 TEST_P(QueueConformance, ATaskIsDestroyedOnceItHasRun) {
   serve([](Queue& queue) {
     auto held = std::make_shared<int>(0);
@@ -260,7 +260,7 @@ TEST_P(QueueConformance, TasksQueueTasksManyTimesOver) {
   EXPECT_EQ(count, kTasks);
 }
 
-// Invariant: at most one task is inside at any time, whoever queues and however.
+// Invariant: at most one task runs at any time, whichever threads queue tasks and in whatever way.
 TEST_P(QueueConformance, TasksDoNotOverlap) {
   std::atomic<int> inside = 0;
   const auto task = [&] {
@@ -281,8 +281,8 @@ TEST_P(QueueConformance, TasksDoNotOverlap) {
   });
 }
 
-// Invariant: `sum` and `last` are plain data that only tasks touch, so each task sees what the one before
-// it has left there, on whichever thread; the thread sanitizer sees no race.
+// Invariant: only tasks touch the plain variables `sum` and `last`. Each task sees what the task before it
+// has written, on whichever thread, and the thread sanitizer finds no race.
 TEST_P(QueueConformance, TasksSeeWhatTasksHaveWritten) {
   constexpr int kThreads = 4;
   constexpr int kRounds = 250;
@@ -307,7 +307,7 @@ TEST_P(QueueConformance, TasksSeeWhatTasksHaveWritten) {
   });
 }
 
-// Invariant: what one thread queues runs in that thread's order, whatever the other threads do.
+// Invariant: tasks of one thread run in the order in which that thread has queued them.
 TEST_P(QueueConformance, EveryThreadsOrderIsKept) {
   constexpr int kThreads = 8;
   constexpr int kTasks = 1000;
@@ -325,8 +325,8 @@ TEST_P(QueueConformance, EveryThreadsOrderIsKept) {
   EXPECT_EQ(next, std::vector<int>(kThreads, kTasks));
 }
 
-// Against a model: a thread that queues and waits in a random order sees the queue as if its tasks had run
-// at once.
+// Compares with a model. For a thread that queues and waits in a random order, it is as if each task had
+// run at once.
 TEST_P(QueueConformance, IsLikeRunningTasksAtOnceForOneThread) {
   serve([](Queue& queue) {
     std::mt19937 random(20240611);
@@ -413,7 +413,7 @@ TEST_P(QueueConformance, AsyncTasksRunWithTheNicenessOfTheirClass) {
 }
 #endif
 
-// Invariant: a queue that nobody refers to any more lives until its tasks have run.
+// Invariant: a queue without references exists until its tasks have run.
 TEST_P(QueueConformance, ReleasedWithTasksItRunsThemAll) {
   GetParam().serveDuring([] {
     std::latch mayGoOn(1);
@@ -471,7 +471,7 @@ TEST_P(QueueConformance, AsyncAllocatesOnceAndSyncNever) {
   if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
   serve([](Queue& queue) {
     queue.async([] {});
-    queue.barrierSync();  // What is made once has been made.
+    queue.barrierSync();  // Allocates what the queue allocates only once.
     std::latch mayGoOn(1);
     queue.async([&] { mayGoOn.wait(); });
     const AllocationCount count;

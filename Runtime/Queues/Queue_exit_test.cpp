@@ -1,4 +1,4 @@
-// What becomes of queued tasks when the process exits, and in the child of a fork.
+// Queued tasks when the process exits, and in the child of a fork.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -23,9 +23,9 @@ using namespace rt::literals;
 using rt::Queue;
 using rt::Ref;
 
-// Exit. The tasks report on standard error, which is what the parent of a death test sees.
+// Exit. The tasks write to standard error, which the parent of a death test reads.
 
-/// A task that holds its queue until the process exits.
+// Queues a task that occupies its queue until the process exits.
 void holdUntilExit(Queue& queue, std::atomic<bool>& mayGoOn) {
   std::latch isHeld(1);
   queue.async([&] {
@@ -41,7 +41,7 @@ TEST_F(QueueDeathTest, QueuedTasksRunBeforeTheProcessExits) {
         static std::atomic<bool> mayGoOn = false;
         static const Ref<Queue> queue = rt::make<Queue>("test"_s);
         holdUntilExit(*queue, mayGoOn);
-        std::atexit([] { mayGoOn = true; });  // Once exit has begun, as handlers run in turn from the last.
+        std::atexit([] { mayGoOn = true; });  // Runs when exit has begun: the last handler runs first.
         for (int i = 1; i <= 3; ++i) queue->async([i] { std::fprintf(stderr, "task %d;", i); });
         queue->async([] { queue->async([] { std::fprintf(stderr, "task of a task;"); }); });
         std::exit(0);
@@ -64,7 +64,7 @@ TEST_F(QueueDeathTest, MainQueuesTasksRunBeforeTheMainThreadExits) {
 TEST_F(QueueDeathTest, ATaskThatWaitsForTheMainQueueIsServedAtExit) {
   EXPECT_EXIT(
       {
-        alarm(30);  // Before patience ends.
+        alarm(30);  // Sooner than the queues would give up.
         rt::detail::QueueRegistry::exitPatience = std::chrono::nanoseconds(std::chrono::hours(1)).count();
         static std::latch isExiting(1);
         rt::make<Queue>("test"_s)->async([] {
@@ -104,7 +104,7 @@ TEST_F(QueueDeathTest, ATaskThatDoesNotEndIsNamedAtExit) {
       testing::ExitedWithCode(3), "rt: the queue \"stuck\" still runs a task at exit");
 }
 
-// A task that did not end and came to run on the thread that exits kept the process for ever.
+// Regression: a task that did not end ran on the thread that exits, and the process never ended.
 TEST_F(QueueDeathTest, TheThreadThatExitsRunsNoTasksOfThePool) {
   EXPECT_EXIT(
       {
@@ -119,7 +119,7 @@ TEST_F(QueueDeathTest, TheThreadThatExitsRunsNoTasksOfThePool) {
       testing::ExitedWithCode(0), "");
 }
 
-// As long as anything ran, nobody looked at the clock.
+// Regression: as long as tasks ran, the time limit was not checked.
 TEST_F(QueueDeathTest, ABusyMainQueueDoesNotKeepTheProcess) {
   EXPECT_EXIT(
       {
@@ -136,8 +136,8 @@ TEST_F(QueueDeathTest, ABusyMainQueueDoesNotKeepTheProcess) {
       testing::ExitedWithCode(3), "rt: the queue \"stuck\" still runs a task at exit");
 }
 
-// Static objects that are older than the first task are destroyed after the tasks have run, and what they
-// queued was lost.
+// Regression: static objects that exist before the first task are destroyed after the tasks have run. Tasks
+// that they queued then were lost.
 TEST_F(QueueDeathTest, WhatStaticObjectsQueueInTheirDestructorsRunsToo) {
   EXPECT_EXIT(
       {
@@ -155,7 +155,7 @@ TEST_F(QueueDeathTest, WhatStaticObjectsQueueInTheirDestructorsRunsToo) {
       testing::ExitedWithCode(0), "first words;last words;waited for;");
 }
 
-// Tasks that referred to such an object used it after its destructor.
+// Regression: tasks that referred to such an object used it after its destructor.
 TEST_F(QueueDeathTest, AStaticObjectThatIsYoungerThanTheFirstTaskCanWaitForTasks) {
   EXPECT_EXIT(
       {
@@ -194,7 +194,7 @@ TEST_F(QueueDeathTest, ATaskMayExit) {
       testing::ExitedWithCode(4), "another queue's;");
 }
 
-// Fork. The child reports by its exit status.
+// Fork. The child's exit status is the result.
 
 int statusOf(pid_t child) {
   int status = 0;
@@ -260,7 +260,7 @@ TEST_F(QueueTest, ATaskMayFork) {
     alarm(30);
     isChild = true;
     if (!queue_->isCurrent()) _exit(1);
-    // After this task, in the child, comes this one, and not what the parent has queued.
+    // In the child, this task comes next, and not the tasks that the parent has queued.
     queue_->async([] { _exit(0); });
   });
   queue_->async([&] {
@@ -275,7 +275,7 @@ TEST_F(QueueTest, ATaskMayFork) {
 constexpr const char* kLeaksAfterFork =
     "to the address sanitizer, what the parent's threads hold has leaked when the child of a fork exits";
 
-// In the child of a fork, what the parent had queued was waited for at exit, until patience ended.
+// Regression: at exit, the child of a fork waited for the parent's tasks until the time limit.
 TEST_F(QueueDeathTest, AChildDoesNotWaitAtExitForWhatItsParentHasQueued) {
   if (RT_TEST_ADDRESS_SANITIZER) GTEST_SKIP() << kLeaksAfterFork;
   const auto exitOfTheChild = [&] {
@@ -291,7 +291,8 @@ TEST_F(QueueDeathTest, AChildDoesNotWaitAtExitForWhatItsParentHasQueued) {
               testing::Not(testing::HasSubstr("still runs a task")));
 }
 
-/// Exits with a task of `queue` that does not end, and names it if the task is waited for.
+// Exits while a task of `queue` does not end. The queue is named on standard error if the task is waited
+// for.
 [[noreturn]] void exitWhileBusy(Queue& queue) {
   static std::atomic<bool> never = false;
   holdUntilExit(queue, never);
@@ -299,7 +300,7 @@ TEST_F(QueueDeathTest, AChildDoesNotWaitAtExitForWhatItsParentHasQueued) {
   std::exit(3);
 }
 
-// Had the parent run a task before, the child left one of its own behind at exit.
+// Regression: if the parent had run a task before, the child did not wait for one of its own tasks at exit.
 TEST_F(QueueDeathTest, AChildWaitsAtExitForEveryTaskOfItsOwn) {
   if (RT_TEST_ADDRESS_SANITIZER) GTEST_SKIP() << kLeaksAfterFork;
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << kNoThreadsAfterFork;
@@ -314,7 +315,7 @@ TEST_F(QueueDeathTest, AChildWaitsAtExitForEveryTaskOfItsOwn) {
               "rt: the queue \"test\" still runs a task at exit");
 }
 
-// The task that forks is the parent's too, and counted there.
+// The task that forks is also the parent's, which counts it.
 TEST_F(QueueDeathTest, AChildOfATaskWaitsAtExitForEveryTaskOfItsOwn) {
   if (RT_TEST_ADDRESS_SANITIZER) GTEST_SKIP() << kLeaksAfterFork;
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << kNoThreadsAfterFork;

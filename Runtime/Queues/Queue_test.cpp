@@ -1,5 +1,5 @@
-// What is particular to serial queues. What every kind of queue keeps is in Queue_conformance_test.cpp, the
-// threads that run queues are in Queue_workers_test.cpp, exit and fork in Queue_exit_test.cpp.
+// Behaviour of serial queues only. Queue_conformance_test.cpp tests what all kinds of queues have in common,
+// Queue_workers_test.cpp the threads that run queues, and Queue_exit_test.cpp exit and fork.
 
 #include "Runtime/Queues/Queue.h"
 
@@ -84,10 +84,11 @@ TEST_F(QueueTest, IsDestroyedOnceNobodyRefersToItAndItsTasksHaveRun) {
   mayGoOn.count_down();
   hasRun.wait();
   EXPECT_TRUE(isAlive);
-  while (weak.lock() != nullptr) std::this_thread::yield();  // Ends with the queue.
+  while (weak.lock() != nullptr) std::this_thread::yield();  // Until the queue is destroyed.
 }
 
-// Whoever gives up a queue with tasks hands it to a thread that waits, but not to one that has been served.
+// A thread that stops running a queue hands it to a waiting thread, but not to one whose task has run
+// already.
 TEST_F(QueueTest, GoesOnAfterAThreadThatWaitedWasServed) {
   for (int round = 0; round < 100; ++round) {
     std::latch isRunning(1);
@@ -129,15 +130,15 @@ TEST_F(QueueTest, SyncNestsFromQueueToQueue) {
   EXPECT_EQ(depth, kQueues);
 }
 
-// Invariant: whatever several threads do with several queues, each thread's tasks run in its order on each
-// queue, one at a time, and none is lost.
+// Invariant: on each queue, a thread's tasks run in the order in which it has queued them, one at a time,
+// and none is lost.
 TEST_F(QueueTest, ManyThreadsUseManyQueuesAtRandom) {
   constexpr std::size_t kQueues = 5;
   constexpr std::size_t kThreads = 6;
   constexpr int kSteps = 1000;
   struct State {
     Ref<Queue> queue = rt::make<Queue>("random"_s);
-    std::vector<int> next = std::vector<int>(kThreads, 0);  // Touched by the queue's tasks only.
+    std::vector<int> next = std::vector<int>(kThreads, 0);  // Only the queue's tasks touch it.
   };
   std::vector<State> states(kQueues);
   std::vector<std::vector<int>> sent(kThreads, std::vector<int>(kQueues, 0));
@@ -158,8 +159,8 @@ TEST_F(QueueTest, ManyThreadsUseManyQueuesAtRandom) {
             state.queue->sync(task);
             break;
           case 1: {
-            // From another queue's task, which waits in turn; always in one direction, or they would wait
-            // for each other.
+            // From a task of another queue, which waits. The direction is always the same, since queues that
+            // wait for each other deadlock.
             const std::size_t other = random() % kQueues;
             if (other < chosen) {
               states[other].queue->sync([&] { state.queue->sync(task); });

@@ -41,9 +41,9 @@ std::ptrdiff_t threadCount() {
                        std::filesystem::directory_iterator());
 }
 
-/// Lets idle workers end at once, and returns when there are none.
+// Makes idle workers end, and returns when there are none.
 void waitUntilWorkersHaveEnded() {
-  // Those that are asleep already have to be woken to see it.
+  // Workers that sleep already see the new timeout only when they are woken.
   rt::detail::WorkerPool::idleTimeout = 1;
   while (threadCount() > 1) {
     for (const auto qualityOfService : {QualityOfService::kDefault, QualityOfService::kUtility}) {
@@ -56,8 +56,8 @@ void waitUntilWorkersHaveEnded() {
   rt::detail::WorkerPool::idleTimeout = std::chrono::nanoseconds(std::chrono::seconds(5)).count();
 }
 
-// More queues than there may be threads, all waiting for one queue that is busy. The thread that has kept
-// it busy leaves while no worker is free: so one of those that wait must go on.
+// More queues than threads wait for one busy queue. The thread that has kept it busy stops while no worker
+// is free. So one of the waiting threads must run the queue.
 TEST_F(QueueTest, WaitingTasksDoNotNeedFreeThreads) {
   constexpr int kQueues = 2 * rt::detail::WorkerPool::kMaximumThreads;
   const Ref<Queue> shared = rt::make<Queue>("shared"_s);
@@ -90,13 +90,12 @@ TEST_F(QueueTest, ThreadsEndWhenTheyHaveBeenIdle) {
   EXPECT_EQ(runs, 10) << "there are new threads when they are needed";
 }
 
-/// What a worker queues at its next look at the clock, which is how it finds that it has been idle for too
-/// long.
+// What a worker queues when it next reads the clock, by which it finds that its timeout is over.
 constinit thread_local Queue* queuedWhenIdle = nullptr;
 constinit std::atomic<bool> hasRunAfterwards = false;
 
-// Work that is given to a worker between the end of its wait and its leaving was lost with it. Here the
-// worker itself gives it, as it reads in the clock that its time is over.
+// Regression: work that a worker got between the end of its wait and its own end was lost. Here the worker
+// itself queues the work, when it reads the clock.
 TEST_F(QueueDeathTest, AWorkerThatGetsWorkAsItsTimeEndsDoesIt) {
   EXPECT_EXIT(
       {
@@ -142,7 +141,8 @@ TEST_F(QueueTest, WorkersTakeNoSignals) {
   EXPECT_EQ(sigismember(&ofCaller, SIGUSR1), 0) << "and the caller does as before";
 }
 
-// Blocked, they ended the process and its crash handler saw nothing.
+// Regression: the signals of a task's own faults were blocked. They ended the process without its crash
+// handler.
 TEST_F(QueueDeathTest, FaultsOfATaskReachTheHostsHandler) {
   for (const int signal : {SIGSEGV, SIGBUS, SIGFPE, SIGILL, SIGTRAP, SIGSYS}) {
     EXPECT_EXIT(
@@ -198,8 +198,8 @@ TEST_F(QueueTest, NicenessFollowsQualityOfService) {
   }
 }
 
-// A thread is as nice as the one that starts it, and may not become less so without a privilege: once a
-// task of a utility queue had started a worker for urgent work, all urgent work was done as nicely.
+// Regression: a thread is as nice as the thread that starts it, and becoming less nice takes a privilege.
+// Once a utility task had started a worker for urgent work, all urgent work ran as nicely.
 TEST_F(QueueDeathTest, NicenessDoesNotSpreadToUrgentWork) {
   EXPECT_EXIT(
       {
@@ -238,7 +238,7 @@ class QueueWithoutThreadsDeathTest : public QueueTest {
   }
 };
 
-/// Has the system refuse threads: what memory there is stays, but a new stack is refused.
+// Makes the system refuse threads. Existing memory stays usable, but a new stack is refused.
 class ThreadRefusal {
  public:
   ThreadRefusal() {
@@ -277,8 +277,8 @@ TEST_F(QueueWithoutThreadsDeathTest, TasksWaitWhereTheSystemRefusesAThread) {
       testing::ExitedWithCode(0), "");
 }
 
-// A queue that had once been refused a thread never asked again, and held its tasks until the process
-// exited.
+// Regression: a queue that had been refused a thread once never asked again. Its tasks waited until the
+// process exited.
 TEST_F(QueueWithoutThreadsDeathTest, AQueueThatWasRefusedAThreadAsksAgain) {
   EXPECT_EXIT(
       {

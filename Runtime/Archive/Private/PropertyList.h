@@ -84,8 +84,8 @@ class PropertyList {
     return index < values.size() ? std::get_if<T>(&values[index]) : nullptr;
   }
 
-  /// Returns the index of the value under `key` in the dictionary at `dictionary`. Nullopt if there is no
-  /// such key or the value is not a dictionary.
+  /// Returns the index of the value under `key` in the dictionary at `dictionary`. Returns nullopt if there
+  /// is no such key, or if the value at `dictionary` is not a dictionary.
   std::optional<Index> find(Index dictionary, std::string_view key) const noexcept;
 
   /// Reads `bytes`. Throws MalformedPropertyList if they are not a whole property list, if a collection
@@ -98,7 +98,7 @@ class PropertyList {
   std::vector<std::byte> encoded() const;
 
  private:
-  // Says what is wrong with the indexes of collections. Null if nothing is.
+  // Returns what is wrong with the indexes of collections, or null.
   const char* structuralError() const;
   bool hasRepeatedKey() const;
 };

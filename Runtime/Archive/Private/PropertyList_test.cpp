@@ -18,8 +18,7 @@ using rt::PropertyList;
 using Bytes = std::vector<std::byte>;
 using testing::HasSubstr;
 
-// A whole file around the objects `objects`, whose offsets are `offsets`: one byte for each offset and
-// each reference.
+// Returns a file with `objects`, whose offsets are `offsets`. Offsets and references have one byte each.
 Bytes file(std::string_view objects, std::initializer_list<unsigned> offsets, unsigned root = 0) {
   Bytes bytes;
   const auto append = [&bytes](std::string_view text) {
@@ -64,8 +63,8 @@ PropertyList::Value readBack(PropertyList::Value value) {
   return std::move(PropertyList::decoded(single(std::move(value)).encoded()).values.at(0));
 }
 
-// Used to be copied where an archive is made; g++'s variant jumps into garbage when it has no memory for
-// that.
+// Regression: values were copied when an archive was made. Copying g++'s variant is undefined if there is no
+// memory for it.
 TEST(PropertyList, IsNeverCopied) {
   static_assert(!std::is_copy_constructible_v<PropertyList> && !std::is_copy_assignable_v<PropertyList>);
   static_assert(!std::is_copy_constructible_v<PropertyList::Value>);
@@ -105,7 +104,7 @@ TEST(PropertyList, ReadsBackEachKindAtItsEdges) {
   }
   EXPECT_EQ(readBack(std::numeric_limits<std::uint64_t>::max()),
             PropertyList::Value(std::numeric_limits<std::uint64_t>::max()));
-  // What fits a signed integer comes back as one.
+  // A number that fits a signed integer is read back as one.
   EXPECT_EQ(readBack(std::uint64_t{7}), PropertyList::Value(std::int64_t{7}));
   for (const double number : {0.0, -0.0, 0.1, -1e308, std::numeric_limits<double>::infinity(),
                               std::numeric_limits<double>::denorm_min()}) {
@@ -183,7 +182,7 @@ TEST(PropertyList, RefusesWhatIsMalformed) {
   EXPECT_THAT(errorOfDecoding(file("\xA1\1\xA1\0"sv, {8, 10})), HasSubstr("contains itself"));
   EXPECT_THAT(errorOfDecoding(file("\xD1\1\1\x09"sv, {8, 11})), HasSubstr("no text"));
   EXPECT_THAT(errorOfDecoding(file("\xD2\1\2\1\1\x51k\x51k"sv, {8, 13, 15})), HasSubstr("twice"));
-  // Two objects at one place, and one inside another, as many would multiply what a file holds.
+  // Two objects at one place, and one inside another. Many of them would multiply what a file holds.
   EXPECT_THAT(errorOfDecoding(file("\x51k"sv, {8, 8})), HasSubstr("overlaps"));
   EXPECT_THAT(errorOfDecoding(file("\x53\x52\x51k"sv, {8, 9, 10})), HasSubstr("overlaps"));
 }
@@ -212,12 +211,12 @@ PropertyList nested(std::size_t depth) {
   return list;
 }
 
-TEST(PropertyList, NestsAsDeepAsItSays) {
+TEST(PropertyList, AllowsTheDocumentedDepth) {
   const Bytes bytes = nested(PropertyList::kMaximumDepth).encoded();
   EXPECT_EQ(PropertyList::decoded(bytes).values.size(), PropertyList::kMaximumDepth);
   EXPECT_THAT(errorOf([] { static_cast<void>(nested(PropertyList::kMaximumDepth + 1).encoded()); }),
               HasSubstr("deep"));
-  // The same where the deep part stands before what refers to it, and behind it.
+  // The deep part may be before or behind the value that refers to it.
   PropertyList list = nested(PropertyList::kMaximumDepth + 1);
   std::ranges::reverse(list.values);
   for (auto& value : list.values) {
@@ -230,7 +229,7 @@ TEST(PropertyList, NestsAsDeepAsItSays) {
   EXPECT_THAT(errorOf([&] { static_cast<void>(list.encoded()); }), HasSubstr("deep"));
 }
 
-// 60 arrays of which each holds the next twice: 2^60 elements for one who walks them all.
+// 60 arrays, each of which has the next one twice. To walk through all would mean 2^60 elements.
 TEST(PropertyList, ReadsSharedReferencesOnce) {
   EXPECT_EQ(PropertyList::decoded(nested(60).encoded()).values.size(), 60U);
 }
@@ -294,7 +293,7 @@ TEST(PropertyList, ReadsBackRandomLists) {
   }
 }
 
-// Whatever is cut off or changed, the result is an exception or a list that can be written again.
+// If bytes are cut off or changed, the result is an exception or a list that can be written again.
 TEST(PropertyList, SurvivesDamage) {
   std::mt19937_64 random(7);  // NOLINT(cert-msc*): the same damage in every run
   const Bytes bytes = randomList(random).encoded();

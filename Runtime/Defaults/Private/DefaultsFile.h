@@ -39,8 +39,8 @@ class DefaultsFile {
   const std::string& path() const noexcept { return path_; }
 
   /// Returns the present version. If the last change is so recent that the next one might get the same time
-  /// from the file system's clock, the version differs from all others. So it does if the system does not
-  /// tell it.
+  /// from the file system's clock, the version differs from all others. The same holds if the system does
+  /// not tell the version.
   Version version() const noexcept;
 
   /// Returns whether the file still has `version`, as far as the system shows.

@@ -1,4 +1,4 @@
-// What the tests of Runtime/Defaults/UserDefaults.h do not reach.
+// Behaviour that the tests of Runtime/Defaults/UserDefaults.h do not reach.
 #include "Runtime/Defaults/Private/DefaultsFile.h"
 
 #include <gmock/gmock.h>
@@ -30,7 +30,7 @@ class DefaultsFile : public testing::Test {
   }
   ~DefaultsFile() override { fs::remove_all(folder_); }
 
-  // Whether the file is older than the step of any file system's clock.
+  // Returns whether the file is older than the step of any file system's clock.
   static bool isOld(const char* path) {
     struct stat status{};
     return stat(path, &status) == 0 && status.st_mtime + 10 < time(nullptr);
@@ -40,7 +40,7 @@ class DefaultsFile : public testing::Test {
 };
 
 TEST_F(DefaultsFile, ThatIsOldIsReadOnlyOnce) {
-  // The time of a change cannot be set back, so these are files that have been there for long.
+  // The time of a change cannot be set back, so the test uses files that have existed for long.
   constexpr const char* kOld = "/etc/passwd";
   constexpr const char* kOther = "/etc/group";
   if (!isOld(kOld) || !isOld(kOther)) GTEST_SKIP() << kOld << " or " << kOther << " is missing or fresh";
@@ -61,7 +61,7 @@ TEST_F(DefaultsFile, ThatIsFreshIsReadAgain) {
   EXPECT_FALSE(file.isStill(file.version()));
 }
 
-// File systems may count in steps of two seconds: what changes within one step has the same time twice.
+// The clock of a file system may have steps of two seconds. Two changes within one step have the same time.
 TEST_F(DefaultsFile, IsFreshForTwoSeconds) {
   static time_t now;
   const rt::DefaultsFile file((folder_ / "file").string());

@@ -25,7 +25,7 @@ std::string errorOf(std::string_view text) {
   return "";
 }
 
-// The value that the text of one line gives "key".
+// Returns the value of "key" in a text of one line.
 std::string valueIn(std::string_view line) {
   const DefaultsText text = DefaultsText::parsed(line);
   const std::string* value = text.find("key");
@@ -78,7 +78,7 @@ TEST(DefaultsText, SaysWhatIsMalformedAndWhere) {
   EXPECT_EQ(errorOf(std::string(DefaultsText::kMaximumSize, '\n')), "");
 }
 
-// Random settings, written with each character that may be as it stands or escaped, against a map.
+// Reads random settings with escaped characters, and compares them with a map.
 TEST(DefaultsText, ReadsRandomSettings) {
   std::mt19937_64 random(2001);  // NOLINT(cert-msc*): the same texts in every run
   const std::vector<std::pair<std::string, std::string>> pieces{

@@ -41,8 +41,8 @@ class WakeDescriptor {
   /// Sleeps until the descriptor is readable. Precondition: it is open.
   void wait() noexcept;
 
-  /// Replaces what the parent has by a new one under the same number, which is not set. For the child of a
-  /// fork.
+  /// Opens a new descriptor under the same number, which is not set. For the child of a fork, which must
+  /// not share the parent's.
   void renewAfterFork() noexcept;
 
  private:

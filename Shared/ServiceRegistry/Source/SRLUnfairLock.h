@@ -9,13 +9,13 @@
 /// program.
 ///
 /// Some errors are reported while the lock is held. So error callbacks, log filters and loggers must not call
-/// a registry: a thread that reports and a thread whose callback calls the registry could deadlock. To
-/// prevent that, a callback ends the program if it needs a lock that is held, or an instance that is being
-/// made. It prints a line to standard error first.
+/// a registry. Otherwise the thread that reports could deadlock with the thread whose callback calls.
+/// Instead, an error callback that needs a held lock, or an instance that is being made, ends the program. It
+/// prints a line to standard error first.
 ///
-/// Callbacks must not wait for other threads that call a registry either. They must not take a lock that
-/// another thread holds while it calls a registry. They must not wait for a queue whose tasks call a
-/// registry, and the main queue may be one. These deadlocks are not detected.
+/// Nor may callbacks wait for another thread that calls a registry. They must not take a lock that any thread
+/// holds during such a call. They must not wait for a queue, including the main queue, whose tasks make such
+/// calls. These deadlocks are not detected.
 ///
 /// Not for: anything but registries.
 

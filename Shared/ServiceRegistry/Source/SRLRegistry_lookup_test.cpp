@@ -72,7 +72,7 @@ TEST(SRLAPIIdentifierForProtocol, FindsTheFirstAPIOfTheProtocolAlone) {
   EXPECT_EQ(apiOf(rt::protocolInfo<Unrelated>(), registryWith({&others, &module})), nullptr);
 }
 
-// The record holds names, but another kind.
+// The record holds names, but its kind says that it does not.
 TEST(SRLAPIIdentifierForProtocol, IgnoresAPIsThatAreNotGivenByName) {
   for (const unsigned kind : {1U, 2U, 3U}) {
     SRLAPIRegistrationData api = testClockAPI;

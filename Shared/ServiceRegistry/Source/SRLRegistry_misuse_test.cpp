@@ -63,7 +63,7 @@ TEST_F(SRLRegistryDeathTest, ModulesRegisteredTwiceEndTheProgramAfterAReport) {
       "Shared/ServiceRegistry/Source/SRLRegistry: -[SRLRegistry internalRegisterBindings:]: \"" +
       std::string(kTwice) + "\" of \"" + kTwice + "\"\n";
   EXPECT_EXIT(registry_->internalRegisterBindings({}), KilledBySignal(SIGABRT), HasSubstr(report));
-  // The shared registry has its modules since the program was loaded.
+  // The shared registry got its modules when the program was loaded.
   EXPECT_EXIT(SRLRegistry::sharedInstance()->internalRegisterBindings({}), KilledBySignal(SIGABRT),
               HasSubstr(report));
   EXPECT_EXIT(SRLRegistry::initialize(rt::classInfo<SRLRegistry>()), KilledBySignal(SIGABRT),

@@ -60,7 +60,7 @@ TEST(SRLRegistrySharedInstance, IsTheSameAtEveryCall) {
   EXPECT_EQ(SRLRegistry::sharedInstance(), registry);
 }
 
-// This program has no module. The shared registry has registered that.
+// This program has no module. The shared registry has completed its registration nevertheless.
 TEST(SRLRegistrySharedInstance, HasItsModulesFromTheStart) {
   TestReports reports;
   EXPECT_EQ(SRLRegistry::sharedInstance()->internalService(&testClockAPI, {}), nullptr);

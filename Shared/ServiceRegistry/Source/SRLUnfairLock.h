@@ -9,7 +9,7 @@
 /// program.
 ///
 /// Some errors are reported while the lock is held. So error callbacks, log filters and loggers must not call
-/// a registry. Otherwise the thread that reports could deadlock with the thread whose callback calls.
+/// a registry. Otherwise a thread that reports and a thread whose callback calls a registry could deadlock.
 /// Instead, an error callback that needs a held lock, or an instance that is being made, ends the program. It
 /// prints a line to standard error first.
 ///
@@ -27,6 +27,7 @@ struct RT_CAPABILITY("lock") SRLUnfairLock {
     if (!unfair_lock_.tryLock()) [[unlikely]]
       lockHeld();
   }
+  /// Releases the lock. Ends the program if the caller does not hold it.
   void unlock() noexcept RT_RELEASE() RT_NO_THREAD_SAFETY_ANALYSIS { unfair_lock_.unlock(); }
   /// Ends the program if the caller does not hold the lock.
   void assertOwner() const noexcept RT_ASSERT_CAPABILITY(this) RT_NO_THREAD_SAFETY_ANALYSIS {

@@ -5,8 +5,9 @@
 ///     const auto difference = [](int receiver, int argument) { return std::int64_t{receiver} - argument; };
 ///     std::vector<int> sorted = SRLPSelectorSort(std::vector{3, 1, 2}, difference);      // 1, 2, 3
 ///
-/// The receiver of an answer stands before the argument in the list. An answer over 0 puts the receiver
-/// behind the argument. Any other answer keeps their order.
+/// Each answer is one element's, the receiver's, about another one, the argument. The receiver stands before
+/// the argument in the list. An answer over 0 puts the receiver behind the argument. Any other answer keeps
+/// their order.
 ///
 /// If the answers define an order, the list is sorted by it, and equal elements keep their order. Otherwise
 /// the result is some permutation of the list. This is so for an accessor, whose answer depends on the

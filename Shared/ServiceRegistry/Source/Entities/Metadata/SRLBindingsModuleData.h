@@ -64,7 +64,7 @@ constexpr bool SRLIsIdentifierBefore(std::string_view first, std::string_view se
 }
 
 /// Returns whether a module's bindings are sorted, each API occurs once, and each `identifierLength` is
-/// right. Otherwise the registry may miss bindings, so generated code asserts this at compile time.
+/// right. Otherwise the registry may miss bindings. Assert this at compile time, beside the bindings.
 constexpr bool SRLAreBindingsSorted(std::span<const _SRLBindingRegistrationData> bindings) noexcept {
   constexpr auto identifier = [](const _SRLBindingRegistrationData& binding) {
     return std::string_view(binding.api->identifier);

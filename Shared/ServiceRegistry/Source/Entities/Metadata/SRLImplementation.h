@@ -34,7 +34,7 @@ class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementati
   /// - `identifier` is not copied. Its bytes must outlive the implementation.
   /// - `instanceType` and `configuration` may be null.
   /// - `lifetime` is 0 for one instance per scope, and 1 for a new instance at every request.
-  /// - `factoryBlock` may be null for a single-bound API only. Requests then find no binding.
+  /// - `factoryBlock` may be null for a single-bound API only. Requests then treat the API as unbound.
   static rt::Ref<SRLImplementation> initWithIdentifier(
       std::string_view identifier, rt::Ref<SRLInstanceType> instanceType, std::uint64_t lifetime,
       SRLScopeType scope, SRLFactoryBlock factoryBlock,
@@ -48,9 +48,11 @@ class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementati
 
   /// Returns the type of the instances that the factory makes. May be null.
   const rt::Ref<SRLInstanceType>& instanceType() const noexcept { return instanceType_; }
+  /// Returns 0 for one instance per scope, or 1 for a new instance at every request.
   std::uint64_t lifetime() const noexcept { return lifetime_; }
   /// Returns the type of the scopes in which instances live.
   SRLScopeType scopeType() const noexcept { return scopeType_; }
+  /// Returns the block that gets an instance. May be null.
   const SRLFactoryBlock& factoryBlock() const noexcept { return factoryBlock_; }
   /// Returns the scoped factory that the factory block calls, so that a registry can look for an existing
   /// instance first. Null if the implementation was made with a block.

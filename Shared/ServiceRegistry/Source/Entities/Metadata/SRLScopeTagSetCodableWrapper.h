@@ -11,8 +11,8 @@
 ///
 /// The archive holds the tags in an array, under the key "kTagsID". Tags can be archived if they are strings,
 /// numbers, arrays or dictionaries, or conform to rt::SecureCoding (Runtime/Archive/Coding.h). Archiving
-/// other tags throws an rt::Exception, as does everything else that rt::KeyedArchiver refuses. It may also
-/// refuse tags that were unarchived.
+/// other tags throws an rt::Exception, as does everything else that rt::KeyedArchiver refuses. It may refuse
+/// an unarchived wrapper, too.
 ///
 /// Errors: unarchiving a wrapper without an array of tags is reported. Without an error callback the report
 /// throws an rt::InternalInconsistencyException, which passes through the unarchiver. A host that unarchives

@@ -55,7 +55,7 @@ class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementati
   /// Returns the block that gets an instance. May be null.
   const SRLFactoryBlock& factoryBlock() const noexcept { return factoryBlock_; }
   /// Returns the scoped factory that the factory block calls, so that a registry can look for an existing
-  /// instance first. Null if the implementation was made with a block.
+  /// instance first. Null if the block is of another kind.
   const SRLScopedFactory* scopedFactory() const noexcept {
     return scopedFactory_ ? &*scopedFactory_ : nullptr;
   }

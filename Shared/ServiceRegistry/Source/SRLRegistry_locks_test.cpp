@@ -144,7 +144,7 @@ TEST_F(SRLRegistryLocks, AreNotHeldWhileScopedInstancesAreMade) {
   registry_->internalService(&outerAPI, tags());
   EXPECT_THAT(std::exchange(runs, {}),
               ElementsAre(Pair("outer", 0), Pair("inner", 0), Pair("outer again", 0)));
-  // The scopes of a copy are those of the shared registry.
+  // A copy makes scoped instances in the shared registry.
   const Ref<rt::Object> another = rt::make<Noted>("end of another tag");
   registry_->mutableCopy()->internalOptionalService(&outerAPI, {{another.get()}});
   EXPECT_THAT(runs, ElementsAre(Pair("outer", 0), Pair("inner", 0), Pair("outer again", 0)));

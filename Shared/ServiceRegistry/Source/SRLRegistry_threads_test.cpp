@@ -108,7 +108,7 @@ Ref<rt::Object> makeInstance(SRLScopeTagSet tags) {
   takeTheLock();
   Ref<rt::Object> dependency;
   if constexpr (level > 0) {
-    // The scope of each API is an account. An instance of no account has no tag for it.
+    // Each API needs an account's tag. An implementation without a scope gets none, so it requests nothing.
     if (tags.tags[0] != nullptr) {
       const std::size_t below = ((level - 1) * kAPIsInLevel) + (chance() % kAPIsInLevel);
       dependency = SRLRegistry::sharedInstance()->internalService(&apis.at(below), tags);

@@ -1,13 +1,13 @@
 #pragma once
 
-/// An object on demand: a service that is handed out before anybody knows whether it is needed.
+/// Provides an object on demand, for example a service that may never be needed.
 ///
 ///     rt::Ref<AVOProvider> clock = AVOProvider::providerWithBlock([] { return rt::make<SystemClock>(); });
 ///     rt::Ref<Clock> now = rt::cast<Clock>(clock->get());          // the block runs now, and at each `get`
 ///
-/// It never changes: any thread may use it whose block bears that.
+/// Threads: immutable. Any thread may use it if the block allows that.
 ///
-/// Not for: keeping what was made; each `get` calls the block anew.
+/// Not for: caching an object. Each `get` calls the block again.
 
 #include <utility>
 
@@ -21,20 +21,21 @@ class RT_VISIBLE AVOProvider final : public rt::Implements<AVOProvider, rt::Obje
  public:
   using ProviderBlock = rt::Block<rt::Ref<rt::Object>()>;
 
-  /// Same as `initWithBlock`.
+  /// Does the same as `initWithBlock`.
   static rt::Ref<AVOProvider> providerWithBlock(ProviderBlock block);
 
-  /// A provider of `object`, which it keeps and which may be null. Throws std::bad_alloc.
+  /// Returns a provider that retains `object` and always returns it. `object` may be null. Throws
+  /// std::bad_alloc.
   static rt::Ref<AVOProvider> providerWithObject(rt::Ref<rt::Object> object);
 
-  /// A provider of nothing: `get` returns null. Throws std::bad_alloc.
+  /// Returns a provider whose `get` returns null. Throws std::bad_alloc.
   static rt::Ref<AVOProvider> init();
 
-  /// A provider of what `block` returns. Null is reported, and yields null. Throws what the error callback
-  /// throws, and std::bad_alloc.
+  /// Returns a provider that calls `block` at each `get`.
+  /// Errors: null is reported and yields null. Throws what the error callback throws, and std::bad_alloc.
   static rt::Ref<AVOProvider> initWithBlock(ProviderBlock block);
 
-  /// What the block returns, which may be null. Throws what it throws.
+  /// Calls the block and returns its result, which may be null. Throws what the block throws.
   rt::Ref<rt::Object> get() const;
 
  private:

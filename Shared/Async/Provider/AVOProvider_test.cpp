@@ -37,23 +37,23 @@ TEST(AVOProvider, CallsItsBlockAtEachGet) {
   }
 }
 
-TEST(AVOProvider, IsNewEachTime) {
+TEST(AVOProvider, IsANewObjectEachTime) {
   const AVOProvider::ProviderBlock block = []() -> Ref<rt::Object> { return nullptr; };
   EXPECT_NE(AVOProvider::providerWithBlock(block), AVOProvider::providerWithBlock(block));
 }
 
-TEST(AVOProvider, ReturnsTheNullOfItsBlock) {
+TEST(AVOProvider, ReturnsNullIfItsBlockDoes) {
   EXPECT_EQ(AVOProvider::providerWithBlock([] { return nullptr; })->get(), nullptr);
 }
 
-TEST(AVOProvider, LetsAnExceptionOfItsBlockOut) {
+TEST(AVOProvider, ThrowsWhatItsBlockThrows) {
   const Ref<AVOProvider> provider =
       AVOProvider::providerWithBlock([]() -> Ref<rt::Object> { throw std::out_of_range("no clock"); });
   EXPECT_THROW(provider->get(), std::out_of_range);
   EXPECT_THROW(provider->get(), std::out_of_range);
 }
 
-TEST(AVOProvider, KeepsItsBlockUntilItGoes) {
+TEST(AVOProvider, OwnsItsBlock) {
   Ref<Clock> clock = rt::make<Clock>();
   const rt::Weak<Clock> weak = clock;
   Ref<AVOProvider> provider =
@@ -64,7 +64,7 @@ TEST(AVOProvider, KeepsItsBlockUntilItGoes) {
   EXPECT_EQ(weak.lock(), nullptr);
 }
 
-TEST(AVOProvider, ReturnsItsObjectAtEachGetAndKeepsIt) {
+TEST(AVOProvider, RetainsItsObjectAndReturnsItAtEachGet) {
   Ref<Clock> clock = rt::make<Clock>();
   const rt::Weak<Clock> weak = clock;
   Ref<AVOProvider> provider = AVOProvider::providerWithObject(clock);
@@ -77,7 +77,7 @@ TEST(AVOProvider, ReturnsItsObjectAtEachGetAndKeepsIt) {
   EXPECT_EQ(weak.lock(), nullptr);
 }
 
-TEST(AVOProvider, MayProvideNull) {
+TEST(AVOProvider, AcceptsANullObject) {
   TestReports reports;
   const Ref<AVOProvider> provider = AVOProvider::providerWithObject(nullptr);
   ASSERT_TRUE(provider);
@@ -85,7 +85,7 @@ TEST(AVOProvider, MayProvideNull) {
   EXPECT_TRUE(reports.messages().empty());
 }
 
-TEST(AVOProvider, WithoutABlockProvidesNull) {
+TEST(AVOProvider, ReturnsNullWithoutABlock) {
   TestReports reports;
   const Ref<AVOProvider> provider = AVOProvider::init();
   ASSERT_TRUE(provider);
@@ -93,7 +93,7 @@ TEST(AVOProvider, WithoutABlockProvidesNull) {
   EXPECT_TRUE(reports.messages().empty());
 }
 
-TEST(AVOProvider, ExpectsABlock) {
+TEST(AVOProvider, ReportsANullBlockAndYieldsNull) {
   TestReports reports;
   for (const auto make : {&AVOProvider::providerWithBlock, &AVOProvider::initWithBlock}) {
     EXPECT_EQ(make(nullptr), nullptr);

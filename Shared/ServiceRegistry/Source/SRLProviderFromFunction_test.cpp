@@ -39,17 +39,17 @@ TEST(SRLProviderFromFunction, CallsTheFunctionAtEachGet) {
   last = nullptr;
 }
 
-TEST(SRLProviderFromFunction, ReturnsTheFunctionsNull) {
+TEST(SRLProviderFromFunction, ReturnsNullIfTheFunctionDoes) {
   EXPECT_EQ(SRLProviderFromFunction([]() -> Ref<rt::Object> { return nullptr; })->get(), nullptr);
 }
 
-TEST(SRLProviderFromFunction, LetsAnExceptionOfTheFunctionOut) {
+TEST(SRLProviderFromFunction, ThrowsWhatTheFunctionThrows) {
   const Ref<AVOProvider> provider =
       SRLProviderFromFunction([]() -> Ref<rt::Object> { throw std::out_of_range("no clock"); });
   EXPECT_THROW(provider->get(), std::out_of_range);
 }
 
-TEST(SRLProviderFromFunction, ExpectsAFunction) {
+TEST(SRLProviderFromFunction, ReportsANullFunctionAndYieldsNull) {
   TestReports reports;
   EXPECT_EQ(SRLProviderFromFunction(nullptr), nullptr);
   const std::vector<Ref<LUMLogMessage>> messages = reports.messages();

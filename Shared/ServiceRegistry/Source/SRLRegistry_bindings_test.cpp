@@ -1,4 +1,4 @@
-// How bindings come into the tables: what is registered, and what is refused.
+// The registration of bindings: which are accepted, and which are refused.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -66,7 +66,7 @@ class SRLRegistryBindings : public testing::Test {
   Ref<SRLRegistry> registry_ = SRLRegistry::initPrivate();
 };
 
-TEST_F(SRLRegistryBindings, AreMadeOfTheirRecords) {
+TEST_F(SRLRegistryBindings, AreMadeFromTheirRecords) {
   registerBindings({&testClockAPI, testSundials});
   const Ref<SRLImplementation> implementation = bound();
   ASSERT_NE(implementation, nullptr);
@@ -82,7 +82,7 @@ TEST_F(SRLRegistryBindings, AreMadeOfTheirRecords) {
   EXPECT_THAT(wholeReports(reports_), IsEmpty());
 }
 
-TEST_F(SRLRegistryBindings, HaveWhatTheRecordsSay) {
+TEST_F(SRLRegistryBindings, CarryTheFieldsOfTheirRecords) {
   static SRLScopeTagSet received;
   const SRLImplementationRegistrationData record{
       .identifier = "implementation",
@@ -107,7 +107,7 @@ TEST_F(SRLRegistryBindings, HaveWhatTheRecordsSay) {
   EXPECT_EQ(implementation->configuration()->instanceType()->asObject()->description(), "TestStone");
   EXPECT_THAT(textOf(implementation),
               testing::HasSubstr(", identifier: implementation, instanceType: TestSundial,"));
-  // The factory is given the tags of the implementation's scope, and asked once for it.
+  // The factory gets the tags of the implementation's scope, and runs once for this scope.
   const Ref<rt::Array> tags = rt::Array::of("one"_s, "two"_s);
   const Ref<rt::Array> scope = rt::Array::of("two"_s);
   const SRLScopeTagSet set = SRLScopeTagSetCreateWithTags(tags.get());
@@ -119,8 +119,8 @@ TEST_F(SRLRegistryBindings, HaveWhatTheRecordsSay) {
   SRLRegistry::sharedInstance()->removeScopesWithTag("two"_s);
 }
 
-// The configuration comes first, then the type of the implementation, and then that of the API.
-TEST_F(SRLRegistryBindings, AreMadeInTheOrderOfTheParts) {
+// The configuration is made first, then the implementation's type, and then the API's type.
+TEST_F(SRLRegistryBindings, MakeTheirPartsInOrder) {
   const SRLImplementationRegistrationData record{
       .identifier = "implementation",
       .instanceType = {.className = "NoSuchClass"},
@@ -134,20 +134,20 @@ TEST_F(SRLRegistryBindings, AreMadeInTheOrderOfTheParts) {
   EXPECT_THAT(reports_.texts(), ElementsAre("SRLClassType's concreteClass must not be nil.",
                                             "SRLImplementationConfiguration requires a non-nil instanceType.",
                                             "SRLClassType's concreteClass must not be nil."));
-  // Without a type there is nothing that could be wrong for the API.
+  // An implementation without a type fits every API.
   ASSERT_NE(bound(), nullptr);
   EXPECT_EQ(bound()->instanceType(), nullptr);
   EXPECT_EQ(bound()->configuration(), nullptr);
 }
 
-TEST_F(SRLRegistryBindings, AreAllRegistered) {
+TEST_F(SRLRegistryBindings, OfAMultiBoundAPIAreAllRegistered) {
   registerBindings({&testClocksAPI, testBothClocks});
   EXPECT_EQ(countBoundTo(testClocksAPI, registry_), 2);
   EXPECT_THAT(wholeReports(reports_), IsEmpty());
 }
 
-// Each by itself: those after one that is refused are registered.
-TEST_F(SRLRegistryBindings, GoOnAfterOneThatIsRefused) {
+// Implementations after a refused one are registered.
+TEST_F(SRLRegistryBindings, ContinueAfterARefusedOne) {
   TestImplementations records[] = {&testStone, &testSundial, &testWallClock, nullptr};
   registerBindings({&testClockAPI, records});
   ASSERT_NE(bound(), nullptr);
@@ -158,21 +158,21 @@ TEST_F(SRLRegistryBindings, GoOnAfterOneThatIsRefused) {
   EXPECT_EQ(reports[1], alreadyRegistered(textOf(bound()), reports[1].parameters.at(2)));
 }
 
-TEST_F(SRLRegistryBindings, OfNothingClearASingleOne) {
+TEST_F(SRLRegistryBindings, ThatAreEmptyUnbindASingleBoundAPI) {
   const TestModule module({{&testClockAPI, testWallClocks}});
   registry_ = registryWith({&module});
   ASSERT_NE(bound(), nullptr);
   registerBindings({&testClockAPI, testNoClocks});
-  // The API is known, or else it would be looked up in the module.
+  // The API is known. Otherwise it would be looked up in the module.
   EXPECT_EQ(bound(), nullptr);
   EXPECT_EQ(bound(), nullptr);
-  // What is nothing is no obstacle.
+  // An empty binding does not prevent a later one.
   registerBindings({&testClockAPI, testSundials});
   EXPECT_NE(bound(), nullptr);
   EXPECT_THAT(wholeReports(reports_), IsEmpty());
 }
 
-TEST_F(SRLRegistryBindings, OfNothingReleaseTheSingleOne) {
+TEST_F(SRLRegistryBindings, ThatAreEmptyReleaseTheImplementation) {
   registerBindings({&testClockAPI, testWallClocks});
   const rt::Weak<SRLImplementation> weak = bound();
   ASSERT_NE(weak.lock(), nullptr);
@@ -180,7 +180,7 @@ TEST_F(SRLRegistryBindings, OfNothingReleaseTheSingleOne) {
   EXPECT_EQ(weak.lock(), nullptr);
 }
 
-TEST_F(SRLRegistryBindings, OfNothingMakeAnEmptySetOrKeepTheOneThatThereIs) {
+TEST_F(SRLRegistryBindings, ThatAreEmptyMakeAnEmptySetOrKeepTheExistingOne) {
   EXPECT_EQ(countBoundTo(testClocksAPI, registry_), -1);
   registerBindings({&testClocksAPI, testNoClocks});
   EXPECT_EQ(countBoundTo(testClocksAPI, registry_), 0);
@@ -191,19 +191,19 @@ TEST_F(SRLRegistryBindings, OfNothingMakeAnEmptySetOrKeepTheOneThatThereIs) {
   EXPECT_THAT(wholeReports(reports_), IsEmpty());
 }
 
-TEST_F(SRLRegistryBindings, AreRegisteredWhenAModuleHasTheAPI) {
+TEST_F(SRLRegistryBindings, AreRegisteredIfAModuleHasTheAPI) {
   const TestModule one({{&testClockAPI, testNoClocks}});
   const TestModule other({{&testClocksAPI, testSundials}});
   const Ref<SRLRegistry> registry = registryWith({&one, &other});
   const rt::LockGuard guard(*registry->lock());
-  // That nothing is bound is something, too.
+  // An empty binding counts, too.
   EXPECT_TRUE(registry->lazilyRegisterBindingsForAPI(&testClockAPI));
   EXPECT_TRUE(registry->lazilyRegisterBindingsForAPI(&testClocksAPI));
   const SRLAPIRegistrationData unknown{.identifier = "Unknown", .identifierLength = 7};
   EXPECT_FALSE(registry->lazilyRegisterBindingsForAPI(&unknown));
 }
 
-TEST_F(SRLRegistryBindings, AreThoseOfTheFirstModuleWhereTwoHaveOne) {
+TEST_F(SRLRegistryBindings, ComeFromTheFirstOfTwoModules) {
   const TestModule one({{&testClockAPI, testWallClocks}});
   const TestModule other({{&testClockAPI, testSundials}});
   registry_ = registryWith({&one, &other});
@@ -215,7 +215,7 @@ TEST_F(SRLRegistryBindings, AreThoseOfTheFirstModuleWhereTwoHaveOne) {
   EXPECT_THAT(reports[0].parameters.at(2), testing::HasSubstr("identifier: TestSundial"));
 }
 
-TEST_F(SRLRegistryBindings, AreClearedByALaterModuleWithNothing) {
+TEST_F(SRLRegistryBindings, AreClearedByAnEmptyBindingOfALaterModule) {
   const TestModule one({{&testClockAPI, testWallClocks}, {&testClocksAPI, testWallClocks}});
   const TestModule nothing({{&testClockAPI, testNoClocks}, {&testClocksAPI, testNoClocks}});
   registry_ = registryWith({&one, &nothing});
@@ -226,10 +226,10 @@ TEST_F(SRLRegistryBindings, AreClearedByALaterModuleWithNothing) {
   EXPECT_THAT(wholeReports(reports_), IsEmpty());
 }
 
-TEST_F(SRLRegistryBindings, OfManyAreThoseOfAllModules) {
+TEST_F(SRLRegistryBindings, OfAMultiBoundAPIComeFromAllModules) {
   const TestModule one({{&testClocksAPI, testWallClocks}});
   const TestModule other({{&testClocksAPI, testBothClocks}});
-  // The wall clock of both is one.
+  // Both modules bind the wall clock, which counts once.
   EXPECT_EQ(countBoundTo(testClocksAPI, registryWith({&one, &other})), 2);
   EXPECT_THAT(wholeReports(reports_), IsEmpty());
 }
@@ -240,7 +240,7 @@ TEST_F(SRLRegistryBindings, NeedAnAPIAndAnImplementation) {
   bind(&testClockAPI, nullptr);
   EXPECT_THAT(wholeReports(reports_),
               ElementsAre(WholeReport{kFile, kService, "implMetadata cannot be nil!"}));
-  // The API is what is missed first.
+  // A null API is reported first.
   bind(nullptr, nullptr);
   EXPECT_THAT(wholeReports(reports_), ElementsAre(WholeReport{kFile, kService, "apiData cannot be nil!"}));
   EXPECT_EQ(bound(), nullptr);
@@ -266,8 +266,8 @@ TEST_F(SRLRegistryBindings, NeedAnAPIWithAType) {
   EXPECT_EQ(boundTo(api, registry_), nullptr);
 }
 
-// Only of a class one can say what it conforms to.
-TEST_F(SRLRegistryBindings, OfOtherTypesAreNotCompared) {
+// Only a class can be checked for conformance.
+TEST_F(SRLRegistryBindings, OfTypesOtherThanClassesAreNotChecked) {
   struct Unrelated : rt::Protocol<Unrelated> {
    protected:
     ~Unrelated() = default;
@@ -281,7 +281,7 @@ TEST_F(SRLRegistryBindings, OfOtherTypesAreNotCompared) {
   EXPECT_THAT(wholeReports(reports_), IsEmpty());
 }
 
-TEST_F(SRLRegistryBindings, NeedAScopeThatTheAPIHas) {
+TEST_F(SRLRegistryBindings, NeedASubsetOfTheAPIsScope) {
   for (const SRLScopeType scope : {0b100U, 0b101U, 0b111U, 0x80000000U}) {
     const Ref<SRLImplementation> implementation = implementationOf<TestWallClock>("clock", scope);
     bind(&testClockAPI, implementation);
@@ -303,26 +303,26 @@ TEST_F(SRLRegistryBindings, NeedAScopeThatTheAPIHas) {
   EXPECT_THAT(wholeReports(reports_), IsEmpty());
 }
 
-// Of two faults the type's is what is told.
-TEST_F(SRLRegistryBindings, AreComparedByTypeBeforeScope) {
+// An implementation with a wrong type and a wrong scope: the type is reported.
+TEST_F(SRLRegistryBindings, AreCheckedForTypeBeforeScope) {
   bind(&testClockAPI, implementationOf<TestStone>("stone", 0b100));
   EXPECT_THAT(wholeReports(reports_), ElementsAre(incompatible("TestStone", "id<TestClock>")));
 }
 
-TEST_F(SRLRegistryBindings, OfOneStay) {
+TEST_F(SRLRegistryBindings, OfASingleBoundAPIAreNotReplaced) {
   const Ref<SRLImplementation> first = implementationOf<TestWallClock>("first");
   const Ref<SRLImplementation> second = implementationOf<TestSundial>("second");
   bind(&testClockAPI, first);
   bind(&testClockAPI, second);
   EXPECT_THAT(wholeReports(reports_), ElementsAre(alreadyRegistered(textOf(first), textOf(second))));
   EXPECT_EQ(bound(), first);
-  // The same again is another one, too.
+  // Binding the same implementation again is reported, too.
   bindSingle(first, &testClockAPI, false);
   EXPECT_THAT(wholeReports(reports_), ElementsAre(alreadyRegistered(textOf(first), textOf(first))));
   EXPECT_EQ(bound(), first);
 }
 
-TEST_F(SRLRegistryBindings, OfOneAreOverriddenWhereThatIsAllowed) {
+TEST_F(SRLRegistryBindings, OfASingleBoundAPIAreReplacedIfAllowed) {
   const Ref<SRLImplementation> first = implementationOf<TestWallClock>("first");
   const Ref<SRLImplementation> second = implementationOf<TestSundial>("second");
   bindSingle(first, &testClockAPI, true);
@@ -332,7 +332,7 @@ TEST_F(SRLRegistryBindings, OfOneAreOverriddenWhereThatIsAllowed) {
   EXPECT_THAT(wholeReports(reports_), IsEmpty());
 }
 
-TEST_F(SRLRegistryBindings, OfTheWrongKindAreRefused) {
+TEST_F(SRLRegistryBindings, ToAnAPIOfTheWrongKindAreRefused) {
   const Ref<SRLImplementation> implementation = implementationOf<TestWallClock>("clock");
   for (const bool allowOverriding : {false, true}) {
     bindSingle(implementation, &testClocksAPI, allowOverriding);
@@ -346,7 +346,7 @@ TEST_F(SRLRegistryBindings, OfTheWrongKindAreRefused) {
   EXPECT_EQ(bound(), nullptr);
 }
 
-TEST_F(SRLRegistryBindings, OfManyHaveEachImplementationOnce) {
+TEST_F(SRLRegistryBindings, OfAMultiBoundAPIHoldEqualImplementationsOnce) {
   bindMulti(implementationOf<TestWallClock>("clock"), &testClocksAPI);
   bindMulti(implementationOf<TestWallClock>("clock"), &testClocksAPI);
   EXPECT_EQ(countBoundTo(testClocksAPI, registry_), 1);
@@ -355,8 +355,8 @@ TEST_F(SRLRegistryBindings, OfManyHaveEachImplementationOnce) {
   EXPECT_THAT(wholeReports(reports_), IsEmpty());
 }
 
-// A callback that throws passes through, with the lock let go and the tables as they were.
-TEST_F(SRLRegistryBindings, AreAsTheyWereWhenTheErrorCallbackThrows) {
+// The exception reaches the caller. The lock is released, and the tables are unchanged.
+TEST_F(SRLRegistryBindings, AreUnchangedIfTheErrorCallbackThrows) {
   const TestModule one({{&testClockAPI, testWallClocks}});
   const TestModule other({{&testClockAPI, testSundials}});
   registry_ = registryWith({&one, &other});
@@ -368,7 +368,7 @@ TEST_F(SRLRegistryBindings, AreAsTheyWereWhenTheErrorCallbackThrows) {
   EXPECT_EQ(bound()->instanceType()->asObject()->description(), "TestWallClock");
 }
 
-// What cannot be hashed is not added, and the API no more known than before.
+// An implementation whose hash throws is not added, and the API does not become known.
 TEST_F(SRLRegistryBindings, AreRegisteredAgainAfterATypeHasThrown) {
   struct Thrown {};
   static bool isThrowing;

@@ -1,5 +1,5 @@
-// What factories, destructors and the delegate find locked while they run: nothing. The lock for which others
-// wait while a factory makes an instance is none of those that forks wait for, and does not count.
+// No lock is held while factories, destructors and the delegate run. The lock of a pending instance does not
+// count: forks do not wait for it.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -23,7 +23,7 @@ using testing::IsEmpty;
 using testing::Pair;
 using testing::UnorderedElementsAre;
 
-// What has run, and how many locks its thread held.
+// The calls so far, and how many locks the thread of each held.
 std::vector<std::pair<std::string, int>> runs;
 
 int heldLocks() {
@@ -133,24 +133,24 @@ class SRLRegistryLocks : public testing::Test {
   Ref<SRLRegistry> before_;
 };
 
-TEST_F(SRLRegistryLocks, AreNotHeldWhileInstancesAreMadeAnew) {
+TEST_F(SRLRegistryLocks, AreNotHeldWhileNewInstancesAreMade) {
   registry_->internalService(&freshAPI, tags());
   registry_->internalOptionalService(&freshAPI, tags());
   EXPECT_THAT(runs, ElementsAre(Pair("fresh", 0), Pair("end of fresh", 0), Pair("fresh", 0),
                                 Pair("end of fresh", 0)));
 }
 
-TEST_F(SRLRegistryLocks, AreNotHeldWhileInstancesOfScopesAreMade) {
+TEST_F(SRLRegistryLocks, AreNotHeldWhileScopedInstancesAreMade) {
   registry_->internalService(&outerAPI, tags());
   EXPECT_THAT(std::exchange(runs, {}),
               ElementsAre(Pair("outer", 0), Pair("inner", 0), Pair("outer again", 0)));
-  // By way of the shared registry.
+  // A copy makes scoped instances in the shared registry.
   const Ref<rt::Object> another = rt::make<Noted>("end of another tag");
   registry_->mutableCopy()->internalOptionalService(&outerAPI, {{another.get()}});
   EXPECT_THAT(runs, ElementsAre(Pair("outer", 0), Pair("inner", 0), Pair("outer again", 0)));
 }
 
-TEST_F(SRLRegistryLocks, AreNotHeldWhileManyAreMade) {
+TEST_F(SRLRegistryLocks, AreNotHeldWhileInstancesOfAMultiBoundAPIAreMade) {
   registry_->internalMultiBoundService(&manyAPI, tags());
   EXPECT_THAT(runs, UnorderedElementsAre(Pair("fresh", 0), Pair("inner", 0), Pair("end of fresh", 0)));
 }
@@ -182,7 +182,7 @@ TEST_F(SRLRegistryLocks, AreNotHeldWhenARegistryEnds) {
               UnorderedElementsAre(Pair("end of inner", 0), Pair("end of outer", 0), Pair("end of tag", 0)));
 }
 
-TEST_F(SRLRegistryLocks, AreNotHeldWhenARegistryEndsElsewhere) {
+TEST_F(SRLRegistryLocks, AreNotHeldWhenARegistryEndsOnAnotherThread) {
   registry_->internalService(&outerAPI, tags());
   SRLRegistry::setSharedInstance(nullptr);
   runs.clear();

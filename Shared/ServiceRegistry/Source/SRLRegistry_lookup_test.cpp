@@ -1,4 +1,4 @@
-// How APIs are found by their protocol and by their identifier's text.
+// Finding APIs by their protocol and by the text of their identifier.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -39,7 +39,7 @@ struct Unrelated : rt::Protocol<Unrelated> {
   ~Unrelated() = default;
 };
 
-TEST(SRLAPIIdentifierForProtocol, IsTheFirstAPIThatIsNothingButTheProtocol) {
+TEST(SRLAPIIdentifierForProtocol, FindsTheFirstAPIOfTheProtocolAlone) {
   const SRLAPIRegistrationData byFunction{.identifier = "a",
                                           .instanceType = {.function = typeOf},
                                           .identifierLength = 1,
@@ -72,8 +72,8 @@ TEST(SRLAPIIdentifierForProtocol, IsTheFirstAPIThatIsNothingButTheProtocol) {
   EXPECT_EQ(apiOf(rt::protocolInfo<Unrelated>(), registryWith({&others, &module})), nullptr);
 }
 
-// A names arm is no names arm for another kind, whatever it holds.
-TEST(SRLAPIIdentifierForProtocol, LooksAtNamesOnly) {
+// The record holds names, but its kind says that it does not.
+TEST(SRLAPIIdentifierForProtocol, IgnoresAPIsThatAreNotGivenByName) {
   for (const unsigned kind : {1U, 2U, 3U}) {
     SRLAPIRegistrationData api = testClockAPI;
     api.instanceTypeKind = kind & 3U;
@@ -82,7 +82,7 @@ TEST(SRLAPIIdentifierForProtocol, LooksAtNamesOnly) {
   }
 }
 
-TEST(SRLAPIIdentifierForProtocol, IsNullWithoutModulesAndWithoutProtocol) {
+TEST(SRLAPIIdentifierForProtocol, IsNullWithoutModulesOrProtocol) {
   TestReports reports;
   EXPECT_EQ(apiOf(rt::protocolInfo<TestClock>(), registryWith({})), nullptr);
   EXPECT_EQ(apiOf(rt::protocolInfo<TestClock>(), SRLRegistry::initPrivate()), nullptr);
@@ -93,7 +93,7 @@ TEST(SRLAPIIdentifierForProtocol, IsNullWithoutModulesAndWithoutProtocol) {
   EXPECT_THAT(wholeReports(reports), IsEmpty());
 }
 
-TEST(SRLAPIIdentifierFromString, IsTheFirstAPIOfThatIdentifier) {
+TEST(SRLAPIIdentifierFromString, FindsTheFirstAPIWithTheIdentifier) {
   const SRLAPIRegistrationData another = testClockAPI;
   const TestModule one({{&testClockAPI, testNoClocks}, {&testClocksAPI, testNoClocks}});
   const TestModule other({{&another, testNoClocks}});
@@ -103,8 +103,8 @@ TEST(SRLAPIIdentifierFromString, IsTheFirstAPIOfThatIdentifier) {
             &testClocksAPI);
 }
 
-// However often it is asked for, and by whichever string.
-TEST(SRLAPIIdentifierFromString, IsAlwaysTheSame) {
+// For repeated look-ups, by different strings, also in a copy.
+TEST(SRLAPIIdentifierFromString, FindsTheSameAPIEachTime) {
   const SRLAPIRegistrationData another = testClockAPI;
   const TestModule one({{&testClockAPI, testNoClocks}, {&testClocksAPI, testNoClocks}});
   const TestModule other({{&another, testNoClocks}});
@@ -122,7 +122,7 @@ TEST(SRLAPIIdentifierFromString, IsAlwaysTheSame) {
   }
 }
 
-TEST(SRLAPIIdentifierFromString, IsLookedForAgainOnceThereAreModules) {
+TEST(SRLAPIIdentifierFromString, LooksAgainOnceThereAreModules) {
   const Ref<SRLRegistry> registry = SRLRegistry::initPrivate();
   EXPECT_EQ(registry->apiIdentifierFromString("Clock"_s), nullptr);
   const TestModule module({{&testClockAPI, testNoClocks}});
@@ -130,7 +130,7 @@ TEST(SRLAPIIdentifierFromString, IsLookedForAgainOnceThereAreModules) {
   EXPECT_EQ(registry->apiIdentifierFromString("Clock"_s), &testClockAPI);
 }
 
-TEST(SRLAPIIdentifierFromString, IsNullWhereNoModuleHasIt) {
+TEST(SRLAPIIdentifierFromString, IsNullForAnUnknownIdentifier) {
   TestReports reports;
   const TestModule module({{&testClockAPI, testNoClocks}});
   const Ref<SRLRegistry> registry = registryWith({&module});
@@ -141,7 +141,7 @@ TEST(SRLAPIIdentifierFromString, IsNullWhereNoModuleHasIt) {
   EXPECT_THAT(wholeReports(reports), IsEmpty());
 }
 
-// The length counts bytes, and it is the record's.
+// The record's length counts bytes.
 TEST(SRLAPIIdentifierFromString, ComparesAsManyBytesAsTheRecordSays) {
   const SRLAPIRegistrationData umlaut{.identifier = "\u00fc", .identifierLength = 2};
   const SRLAPIRegistrationData part{.identifier = "Weather", .identifierLength = 4};
@@ -152,14 +152,14 @@ TEST(SRLAPIIdentifierFromString, ComparesAsManyBytesAsTheRecordSays) {
   EXPECT_EQ(registry->apiIdentifierFromString("Weather"_s), nullptr);
 }
 
-TEST(SRLAPIIdentifierFromString, ReportsThatThereIsNone) {
+TEST(SRLAPIIdentifierFromString, ReportsANullIdentifier) {
   TestReports reports;
   EXPECT_EQ(SRLRegistry::initPrivate()->apiIdentifierFromString(nullptr), nullptr);
   EXPECT_THAT(wholeReports(reports), ElementsAre(WholeReport{kFile, "-[SRLRegistry apiIdentifierFromString:]",
                                                              "apiIdentifierString must not be nil"}));
 }
 
-// That report is made without the lock.
+// The null identifier is reported without the lock.
 TEST(SRLAPIIdentifierFromString, LetsTheErrorCallbackUseTheRegistry) {
   TestReports reports;
   const TestModule module({{&testClockAPI, testNoClocks}});
@@ -179,14 +179,14 @@ TEST(SRLRegisteredAPIIdentifiers, AreThoseOfAllModules) {
   const Ref<SRLRegistry> registry = registryWith({&one, &other});
   const Ref<rt::Set> identifiers = registry->registeredAPIIdentifiers();
   EXPECT_TRUE(rt::isEqual(identifiers, rt::Set::of("Clock"_s, "Clocks"_s, "\u00fc"_s)));
-  // They stay the same when they are asked for, and the set is a new one.
+  // Requesting a service does not change them. Each call returns a new set.
   boundTo(testClockAPI, registry);
   EXPECT_TRUE(rt::isEqual(registry->registeredAPIIdentifiers(), identifiers));
   EXPECT_NE(registry->registeredAPIIdentifiers(), identifiers);
 }
 
-// What has been bound by hand is of no module.
-TEST(SRLRegisteredAPIIdentifiers, AreOfModulesOnly) {
+// An API that is bound by hand belongs to no module.
+TEST(SRLRegisteredAPIIdentifiers, DoNotIncludeAPIsBoundByHand) {
   const Ref<SRLRegistry> registry = registryWith({});
   {
     const rt::LockGuard guard(*registry->lock());
@@ -195,7 +195,7 @@ TEST(SRLRegisteredAPIIdentifiers, AreOfModulesOnly) {
   EXPECT_TRUE(registry->registeredAPIIdentifiers()->isEmpty());
 }
 
-// Whoever asks first has the bindings registered, once, and all find the same.
+// The first look-up registers the bindings, once, and all threads find the same ones.
 TEST(SRLRegistryThreads, FindTheSameBindings) {
   TestReports reports;
   const TestModule module({{&testClockAPI, testWallClocks}, {&testClocksAPI, testBothClocks}});
@@ -223,11 +223,11 @@ TEST(SRLRegistryThreads, FindTheSameBindings) {
     EXPECT_THAT(counts, testing::Each(2));
   }
   EXPECT_THAT(wholeReports(reports), IsEmpty());
-  // Those copies that ended on the threads.
+  // Releases what is left of the copies that were destroyed on the threads.
   rt::MainQueue::drain();
 }
 
-// One takes what another has put there: none is lost, and none is had twice.
+// Each registry that a thread installs is returned to exactly one thread.
 TEST(SRLRegistryThreads, ExchangeTheSharedInstance) {
   const Ref<SRLRegistry> original = SRLRegistry::sharedInstance();
   std::array<std::vector<Ref<SRLRegistry>>, 4> replaced;

@@ -1,4 +1,4 @@
-// What ends the program: modules that are registered twice, and misuse of the lock.
+// Misuse that ends the program: registering modules twice, and misuse of the lock.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -37,7 +37,7 @@ constexpr const char* kWaitsInCallback =
 constexpr const char* kNotHeld =
     "rt: the lock at 0x[0-9a-f]+ is needed by thread [0-9]+, but no thread holds it\n";
 
-// The error callback writes the report, and returns.
+// An error callback that prints the report and returns.
 void print(const Ref<PECErrorDescription>& error) {
   std::fprintf(stderr, "%s: %s: \"%s\" of \"%s\"\n", std::string(error->filePath().view()).c_str(),
                std::string(error->functionName().view()).c_str(),
@@ -63,7 +63,7 @@ TEST_F(SRLRegistryDeathTest, ModulesRegisteredTwiceEndTheProgramAfterAReport) {
       "Shared/ServiceRegistry/Source/SRLRegistry: -[SRLRegistry internalRegisterBindings:]: \"" +
       std::string(kTwice) + "\" of \"" + kTwice + "\"\n";
   EXPECT_EXIT(registry_->internalRegisterBindings({}), KilledBySignal(SIGABRT), HasSubstr(report));
-  // The program's own have been registered when it was loaded.
+  // The shared registry got its modules when the program was loaded.
   EXPECT_EXIT(SRLRegistry::sharedInstance()->internalRegisterBindings({}), KilledBySignal(SIGABRT),
               HasSubstr(report));
   EXPECT_EXIT(SRLRegistry::initialize(rt::classInfo<SRLRegistry>()), KilledBySignal(SIGABRT),
@@ -80,7 +80,7 @@ TEST_F(SRLRegistryDeathTest, ModulesRegisteredTwiceEndTheProgramAfterAReport) {
   };
   EXPECT_EXIT(registerWithLogger(), KilledBySignal(SIGABRT),
               AllOf(HasSubstr("level 4, 0 parameters\n"), HasSubstr(report)));
-  // A copy is as far as the original.
+  // A copy of a registry with modules has these modules.
   EXPECT_EXIT(registry_->mutableCopy()->internalRegisterBindings({}), KilledBySignal(SIGABRT),
               HasSubstr(report));
 }
@@ -94,8 +94,8 @@ TEST_F(SRLRegistryDeathTest, ModulesRegisteredWhileModulesAreRegisteredEndThePro
   EXPECT_EXIT(fresh->internalRegisterBindings(modules), KilledBySignal(SIGABRT), HasSubstr(kTwice));
 }
 
-// Nobody can catch what the error callback throws.
-TEST_F(SRLRegistryDeathTest, ModulesRegisteredTwiceEndTheProgramWhereTheCallbackThrows) {
+// No caller can catch what the error callback throws.
+TEST_F(SRLRegistryDeathTest, ModulesRegisteredTwiceEndTheProgramEvenIfTheCallbackThrows) {
   struct Thrown {};
   const auto registerTwice = [this] {
     try {
@@ -109,12 +109,12 @@ TEST_F(SRLRegistryDeathTest, ModulesRegisteredTwiceEndTheProgramWhereTheCallback
     throw Thrown();
   });
   EXPECT_EXIT(registerTwice(), KilledBySignal(SIGABRT), AllOf(HasSubstr(kTwice), Not(HasSubstr("caught"))));
-  // The one that stands in where none is set.
+  // The default error callback throws, too.
   setCallback(nullptr);
   EXPECT_EXIT(registerTwice(), KilledBySignal(SIGABRT), AllOf(HasSubstr(kTwice), Not(HasSubstr("caught"))));
 }
 
-TEST_F(SRLRegistryDeathTest, WhatNeedsTheLockEndsTheProgramWithoutIt) {
+TEST_F(SRLRegistryDeathTest, FunctionsThatNeedTheLockEndTheProgramWithoutIt) {
   const auto registerBindings = [this]() RT_NO_THREAD_SAFETY_ANALYSIS {
     registry_->registerBindings(module_.bindings().front());
   };
@@ -125,8 +125,8 @@ TEST_F(SRLRegistryDeathTest, WhatNeedsTheLockEndsTheProgramWithoutIt) {
   EXPECT_EXIT(ask(), KilledBySignal(SIGABRT), ContainsRegex(kNotHeld));
 }
 
-// The lock of another registry is another lock.
-TEST_F(SRLRegistryDeathTest, WhatNeedsTheLockEndsTheProgramWithAnotherLock) {
+// Each registry has a lock of its own.
+TEST_F(SRLRegistryDeathTest, FunctionsThatNeedTheLockEndTheProgramWithAnotherLock) {
   const Ref<SRLRegistry> copy = registry_->mutableCopy();
   const auto registerBindings = [&]() RT_NO_THREAD_SAFETY_ANALYSIS {
     const rt::LockGuard guard(*registry_->lock());
@@ -135,7 +135,7 @@ TEST_F(SRLRegistryDeathTest, WhatNeedsTheLockEndsTheProgramWithAnotherLock) {
   EXPECT_EXIT(registerBindings(), KilledBySignal(SIGABRT), ContainsRegex(kNotHeld));
 }
 
-TEST_F(SRLRegistryDeathTest, WhatTakesTheLockEndsTheProgramWithIt) {
+TEST_F(SRLRegistryDeathTest, FunctionsThatTakeTheLockEndTheProgramIfItIsHeld) {
   const std::function<void()> takers[] = {
       [this] { registry_->apiIdentifierFromString("Clock"_s); },
       [this] { registry_->registeredAPIIdentifiers(); },
@@ -152,14 +152,14 @@ TEST_F(SRLRegistryDeathTest, WhatTakesTheLockEndsTheProgramWithIt) {
   }
 }
 
-// An identifier that has been found before is found without the lock.
-TEST_F(SRLRegistryDeathTest, AnIdentifierThatWasFoundBeforeMayBeAskedForWithTheLock) {
+// The second look-up of an identifier takes no lock.
+TEST_F(SRLRegistryDeathTest, AnIdentifierFoundBeforeIsFoundWithTheLockHeld) {
   registry_->apiIdentifierFromString("Clock"_s);
   const rt::LockGuard guard(*registry_->lock());
   EXPECT_EQ(registry_->apiIdentifierFromString("Clock"_s), &testClockAPI);
 }
 
-// Of reports that are made with the lock held.
+// Some reports are made with the lock held.
 TEST_F(SRLRegistryDeathTest, AnErrorCallbackThatUsesTheRegistryUnderItsLockEndsTheProgram) {
   setCallback([this](const Ref<PECErrorDescription>& error) {
     print(error);
@@ -178,7 +178,7 @@ TEST_F(SRLRegistryDeathTest, AnErrorCallbackThatUsesTheRegistryUnderItsLockEndsT
                     ContainsRegex(kAsksInCallback)));
 }
 
-// Neither may a logger, which is told on the thread that reports.
+// A logger runs on the thread that reports.
 TEST_F(SRLRegistryDeathTest, ALoggerThatUsesTheRegistryUnderItsLockEndsTheProgram) {
   const auto report = [this] {
     LUMLogMultiplexer::sharedInstance()->addSyncLogger(rt::make<TestSyncLogger>(
@@ -189,7 +189,7 @@ TEST_F(SRLRegistryDeathTest, ALoggerThatUsesTheRegistryUnderItsLockEndsTheProgra
   EXPECT_EXIT(report(), KilledBySignal(SIGABRT), ContainsRegex(kTakenAgain));
 }
 
-// Also where another thread holds the lock: it may wait to report, until this callback returns.
+// Another thread holds the lock. It may be waiting to report until this callback returns.
 TEST_F(SRLRegistryDeathTest, AnErrorCallbackThatWouldWaitForTheRegistryEndsTheProgram) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   const auto report = [this] {
@@ -208,7 +208,7 @@ TEST_F(SRLRegistryDeathTest, AnErrorCallbackThatWouldWaitForTheRegistryEndsThePr
   EXPECT_EXIT(report(), KilledBySignal(SIGABRT), ContainsRegex(kAsksInCallback));
 }
 
-// And where another thread makes an instance: both used to wait for each other.
+// Another thread is making the instance. Both threads used to wait for each other.
 TEST_F(SRLRegistryDeathTest, AnErrorCallbackThatWouldWaitForAnInstanceEndsTheProgram) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   const auto report = [this] {

@@ -1,4 +1,4 @@
-// What a registry takes from bindings modules, and how it finds it there.
+// What a registry takes from bindings modules, and how it finds bindings there.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -38,7 +38,7 @@ Bindings bindingsOf(const SRLAPIRegistrationData& api, const Ref<SRLRegistry>& r
   return registry->registrationDatasForAPI(&api);
 }
 
-// Configurations, of which each is made with a note of who made it.
+// The identifiers of configurations. `made` lists the factories that have run.
 const int first = 0;
 const int second = 0;
 const int third = 0;
@@ -59,7 +59,7 @@ class SRLRegistryConfigurations : public testing::Test {
     factories[&second] = [] { return note<TestStone>("second of one"); };
   }
   static void addOthers(SRLConfigurationFactories& factories) {
-    // Each module is given a table of its own.
+    // Each module gets a table of its own.
     EXPECT_TRUE(factories.empty());
     factories[&second] = [] { return note<TestSundial>("second of other"); };
     factories[&third] = [] { return note<TestSundial>("third of other"); };
@@ -70,7 +70,7 @@ class SRLRegistryConfigurations : public testing::Test {
   const TestModule other_{{}, addOthers};
 };
 
-TEST_F(SRLRegistryConfigurations, AreThoseOfTheFirstModuleThatHasThem) {
+TEST_F(SRLRegistryConfigurations, ComeFromTheFirstModuleThatHasThem) {
   TestReports reports;
   const Ref<SRLRegistry> registry = registryWith({&one_, &none_, &other_});
   EXPECT_THAT(made, IsEmpty());
@@ -85,7 +85,7 @@ TEST_F(SRLRegistryConfigurations, AreThoseOfTheFirstModuleThatHasThem) {
   EXPECT_THAT(wholeReports(reports), IsEmpty());
 }
 
-TEST_F(SRLRegistryConfigurations, GoByTheOrderOfTheModules) {
+TEST_F(SRLRegistryConfigurations, DependOnTheOrderOfTheModules) {
   registryWith({&other_, &one_})->internalImplementationConfigForIdentifier(&second);
   EXPECT_THAT(made, ElementsAre("second of other"));
 }
@@ -100,7 +100,7 @@ TEST_F(SRLRegistryConfigurations, AreMadeOnceForEachRegistry) {
   EXPECT_THAT(made, ElementsAre("first of one", "first of one"));
 }
 
-TEST_F(SRLRegistryConfigurations, AreNullWhereNoModuleHasThem) {
+TEST_F(SRLRegistryConfigurations, AreNullIfNoModuleHasThem) {
   TestReports reports;
   const Ref<SRLRegistry> registry = registryWith({&one_});
   EXPECT_EQ(registry->internalImplementationConfigForIdentifier(&third), nullptr);
@@ -108,14 +108,14 @@ TEST_F(SRLRegistryConfigurations, AreNullWhereNoModuleHasThem) {
   EXPECT_THAT(wholeReports(reports), IsEmpty());
 }
 
-TEST_F(SRLRegistryConfigurations, AreHadWithTheLockHeld) {
+TEST_F(SRLRegistryConfigurations, CanBeRequestedWithTheLockHeld) {
   const Ref<SRLRegistry> registry = registryWith({&one_});
   const rt::LockGuard guard(*registry->lock());
   EXPECT_NE(registry->internalImplementationConfigForIdentifier(&first), nullptr);
 }
 
-// What is left of a module's table, the one that came too late, is given up.
-TEST_F(SRLRegistryConfigurations, ThatAreDroppedAreReleased) {
+// A factory for an address that an earlier module has used is released.
+TEST_F(SRLRegistryConfigurations, ReleaseFactoriesThatAreNotUsed) {
   static std::weak_ptr<int> kept;
   static std::weak_ptr<int> dropped;
   const TestModule late({}, [](SRLConfigurationFactories& factories) {
@@ -133,8 +133,8 @@ TEST_F(SRLRegistryConfigurations, ThatAreDroppedAreReleased) {
   EXPECT_TRUE(kept.expired());
 }
 
-// A module's callback asks for services while it is asked itself.
-TEST(SRLRegistryRegistration, IsInProgressWhileModulesAreAsked) {
+// A module's callback requests services.
+TEST(SRLRegistryRegistration, IsInProgressDuringTheCallbacksOfModules) {
   TestReports reports;
   static Ref<SRLRegistry> registry;
   registry = SRLRegistry::initPrivate();
@@ -143,7 +143,7 @@ TEST(SRLRegistryRegistration, IsInProgressWhileModulesAreAsked) {
                             EXPECT_EQ(registry->internalService(&testClockAPI, {}), nullptr);
                             EXPECT_EQ(registry->internalOptionalService(&testClockAPI, {}), nullptr);
                             EXPECT_EQ(registry->internalMultiBoundService(&testClocksAPI, {}), nullptr);
-                            // Its bindings come after its configurations.
+                            // A module's bindings are added after its configurations.
                             EXPECT_TRUE(registry->registeredAPIIdentifiers()->isEmpty());
                           });
   const SRLBindingsModuleData* const modules[] = {module.data()};
@@ -162,7 +162,7 @@ TEST(SRLRegistryRegistration, IsInProgressWhileModulesAreAsked) {
                       "-[SRLRegistry internalMultiBoundService:scopeTags:]",
                       prior + "Service: Clocks",
                       {"Clocks"}}));
-  // What was asked for too early is found now.
+  // The same requests succeed now.
   EXPECT_NE(registry->internalService(&testClockAPI,
                                       SRLScopeTagSetCreateWithTags(rt::Array::of("a"_s, "b"_s).get())),
             nullptr);
@@ -171,7 +171,7 @@ TEST(SRLRegistryRegistration, IsInProgressWhileModulesAreAsked) {
   registry = nullptr;
 }
 
-// With bindings of a type that must not be looked at before it is asked for.
+// The API's type is given by a function, which must not run before a request for the API.
 TEST(SRLRegistryRegistration, LooksAtNoBinding) {
   TestReports reports;
   static int calls;
@@ -208,13 +208,13 @@ TEST(SRLRegistrationDatasForAPI, AreInTheOrderOfTheModules) {
               ElementsAre(other.bindings().data(), one.bindings().data()));
   EXPECT_THAT(bindingsOf(testClockAPI, registryWith({&without, &empty})), IsEmpty());
   EXPECT_THAT(bindingsOf(testClockAPI, registryWith({})), IsEmpty());
-  // The same module twice is two modules.
+  // A module that is registered twice counts as two.
   EXPECT_THAT(bindingsOf(testClockAPI, registryWith({&other, &other})),
               ElementsAre(other.bindings().data(), other.bindings().data()));
 }
 
-// The record that is asked with need not be the module's, nor is its own length looked at.
-TEST(SRLRegistrationDatasForAPI, GoByTheTextOfTheIdentifier) {
+// The given record need not be the module's. Its `identifierLength` does not matter.
+TEST(SRLRegistrationDatasForAPI, CompareTheTextOfTheIdentifier) {
   const TestModule module({{&testClockAPI, testWallClocks}});
   const Ref<SRLRegistry> registry = registryWith({&module});
   const std::string text = "Clock";
@@ -224,8 +224,8 @@ TEST(SRLRegistrationDatasForAPI, GoByTheTextOfTheIdentifier) {
   EXPECT_THAT(bindingsOf(api, registry), ElementsAre(module.bindings().data()));
 }
 
-TEST(SRLRegistrationDatasForAPI, PutTheLengthBeforeTheBytes) {
-  // By bytes alone "B" would come after "AA".
+TEST(SRLRegistrationDatasForAPI, CompareTheLengthBeforeTheBytes) {
+  // By bytes alone, "B" would come after "AA".
   const std::string identifiers[] = {"", "B", "Z", "\xC3", "AA", "AB", "BA", "AAA"};
   std::vector<SRLAPIRegistrationData> apis;
   apis.reserve(std::size(identifiers));
@@ -239,13 +239,13 @@ TEST(SRLRegistrationDatasForAPI, PutTheLengthBeforeTheBytes) {
     EXPECT_EQ(module.bindings()[i].api, &apis[i]);
     EXPECT_THAT(bindingsOf(apis[i], registry), ElementsAre(&module.bindings()[i])) << identifiers[i];
   }
-  // Before, between, behind, and what only begins like one that is there.
+  // Identifiers before, between and behind these, and some that only share a prefix with them.
   for (const std::string absent : {"A", "C", "\xC4", "A@", "AC", "ZZ", "AA@", "AAB", "AAAA"}) {
     EXPECT_THAT(bindingsOf(apiNamed(absent), registry), IsEmpty()) << absent;
   }
 }
 
-TEST(SRLRegistrationDatasForAPI, AreWhatALinearSearchFinds) {
+TEST(SRLRegistrationDatasForAPI, AgreeWithALinearSearch) {
   std::mt19937 random(20240229);  // NOLINT(cert-msc32-c,cert-msc51-cpp): the same at every run
   const auto below = [&random](std::size_t limit) {
     return std::uniform_int_distribution<std::size_t>(0, limit - 1)(random);
@@ -290,13 +290,13 @@ TEST(SRLRegistrationDatasForAPI, AreWhatALinearSearchFinds) {
   }
 }
 
-// The first answer in the process is that of all, so each case is a process of its own.
+// The first answer in a process holds for all registries. So each case runs in a process of its own.
 class SRLRegistryMultipleModulesDeathTest : public testing::Test {
  protected:
   static bool answerOf(std::initializer_list<const TestModule*> modules) {
     return registryWith(modules)->multipleBindingsModulesAllowed();
   }
-  // Ends the process, with 0 where `answer` is as expected.
+  // Ends the process, with status 0 if `isRight`.
   [[noreturn]] static void exitWith(bool isRight) { std::exit(isRight ? 0 : 1); }
 
   const TestModule allowing_{{}, nullptr, 1};
@@ -304,21 +304,21 @@ class SRLRegistryMultipleModulesDeathTest : public testing::Test {
   const TestModule forbidding_{{}, nullptr, 0};
 };
 
-TEST_F(SRLRegistryMultipleModulesDeathTest, AreAllowedWithoutAny) {
+TEST_F(SRLRegistryMultipleModulesDeathTest, AreAllowedWithoutModules) {
   EXPECT_EXIT(exitWith(answerOf({})), testing::ExitedWithCode(0), "");
 }
 
-TEST_F(SRLRegistryMultipleModulesDeathTest, AreAllowedWhereAllAllowThem) {
+TEST_F(SRLRegistryMultipleModulesDeathTest, AreAllowedIfAllModulesAllowThem) {
   EXPECT_EXIT(exitWith(answerOf({&allowing_, &allowingToo_})), testing::ExitedWithCode(0), "");
 }
 
-TEST_F(SRLRegistryMultipleModulesDeathTest, AreForbiddenWhereOneForbidsThem) {
+TEST_F(SRLRegistryMultipleModulesDeathTest, AreForbiddenIfOneModuleForbidsThem) {
   EXPECT_EXIT(exitWith(!answerOf({&allowing_, &forbidding_})), testing::ExitedWithCode(0), "");
   EXPECT_EXIT(exitWith(!answerOf({&forbidding_, &allowing_})), testing::ExitedWithCode(0), "");
   EXPECT_EXIT(exitWith(!answerOf({&forbidding_})), testing::ExitedWithCode(0), "");
 }
 
-TEST_F(SRLRegistryMultipleModulesDeathTest, AreWhatTheFirstAnswerSaid) {
+TEST_F(SRLRegistryMultipleModulesDeathTest, KeepTheFirstAnswer) {
   EXPECT_EXIT(exitWith(answerOf({}) && answerOf({&forbidding_}) &&
                        SRLRegistry::sharedInstance()->multipleBindingsModulesAllowed()),
               testing::ExitedWithCode(0), "");
@@ -326,8 +326,8 @@ TEST_F(SRLRegistryMultipleModulesDeathTest, AreWhatTheFirstAnswerSaid) {
               testing::ExitedWithCode(0), "");
 }
 
-// The byte before is the generator's own.
-TEST_F(SRLRegistryMultipleModulesDeathTest, AreNotWhatTheGeneratorsFlagSays) {
+// The generator's own byte stands before the flag.
+TEST_F(SRLRegistryMultipleModulesDeathTest, IgnoreTheGeneratorsFlag) {
   const auto answer = [](std::uint8_t generatorFlag, std::uint8_t allowsMultipleModules) {
     const SRLBindingsModuleData data{.generatorFlag = generatorFlag,
                                      .allowsMultipleModules = allowsMultipleModules};
@@ -340,7 +340,7 @@ TEST_F(SRLRegistryMultipleModulesDeathTest, AreNotWhatTheGeneratorsFlagSays) {
   EXPECT_EXIT(exitWith(answer(0, 1)), testing::ExitedWithCode(0), "");
 }
 
-TEST_F(SRLRegistryMultipleModulesDeathTest, AreAskedAboutWithTheLockHeld) {
+TEST_F(SRLRegistryMultipleModulesDeathTest, CanBeAskedAboutWithTheLockHeld) {
   const auto ask = [] {
     const Ref<SRLRegistry> registry = registryWith({});
     const rt::LockGuard guard(*registry->lock());

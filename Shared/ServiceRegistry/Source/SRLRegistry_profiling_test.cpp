@@ -1,5 +1,4 @@
-// What is measured of services that a registry hands out, in a program that has profiling on or off:
-// SWITCH_ANSWER.
+// What a registry measures. SWITCH_ANSWER says whether profiling is on in this program.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -26,7 +25,7 @@ using rt::Ref;
 
 class SRLRegistryProfiling : public ServicesTest {
  protected:
-  // New events since the last call: the store is the process's.
+  // Returns the new events since the last call. The whole process shares one storage.
   std::vector<Ref<SRLPServiceInitializationEvent>> newEvents() {
     std::vector<Ref<SRLPServiceInitializationEvent>> events;
     const Ref<rt::Array> all = SRLProfilingStorage::sharedInstance()->serviceInitializationEvents();
@@ -52,7 +51,7 @@ class SRLRegistryProfiling : public ServicesTest {
 
 constexpr std::size_t kOne = SWITCH_ANSWER ? 1 : 0;
 
-TEST_F(SRLRegistryProfiling, MeasuresWhatIsMadeForAScopeOnce) {
+TEST_F(SRLRegistryProfiling, MeasuresAScopedInstanceOnce) {
   registry->internalService(&scopedAPI, tags);
   const auto events = newEvents();
   ASSERT_EQ(events.size(), kOne);
@@ -61,14 +60,14 @@ TEST_F(SRLRegistryProfiling, MeasuresWhatIsMadeForAScopeOnce) {
     EXPECT_TRUE(events[0]->implDescription().contains("identifier: ScopedThing"));
     EXPECT_FALSE(events[0]->parentImplDescription());
   }
-  // What is there already is forgotten.
+  // Requests for an existing instance are not recorded.
   registry->internalService(&scopedAPI, tags);
   registry->internalOptionalService(&scopedAPI, tags);
   EXPECT_EQ(newEvents().size(), 0U);
   EXPECT_EQ(SRLPProfilingDetail::countOfStacks(), 0U);
 }
 
-TEST_F(SRLRegistryProfiling, KnowsWhatNeededAService) {
+TEST_F(SRLRegistryProfiling, RecordsTheParentOfAService) {
   registry->internalService(&nestedAPI, tags);
   const auto events = newEvents();
   ASSERT_EQ(events.size(), 2 * kOne);
@@ -80,7 +79,7 @@ TEST_F(SRLRegistryProfiling, KnowsWhatNeededAService) {
   }
 }
 
-TEST_F(SRLRegistryProfiling, CountsWhatIsMadeAnewEachTime) {
+TEST_F(SRLRegistryProfiling, CountsNewInstances) {
   const std::uint64_t before = freshOnes();
   for (int i = 0; i < 3; ++i) registry->internalService(&freshAPI, tags);
   registry->internalOptionalService(&freshAPI, tags);
@@ -88,17 +87,17 @@ TEST_F(SRLRegistryProfiling, CountsWhatIsMadeAnewEachTime) {
   EXPECT_EQ(newEvents().size(), 0U);
 }
 
-TEST_F(SRLRegistryProfiling, MeasuresEachOfMany) {
+TEST_F(SRLRegistryProfiling, MeasuresEachInstanceOfAMultiBoundAPI) {
   const std::uint64_t before = freshOnes();
   registry->internalMultiBoundService(&manyAPI, tags);
   registry->internalMultiBoundService(&manyAPI, tags);
-  // A scoped one and one that is null, made once, and one that is made twice.
+  // A scoped instance and a null are made once. Another instance is made twice.
   EXPECT_EQ(newEvents().size(), 2 * kOne);
   EXPECT_EQ(freshOnes() - before, 2 * kOne);
 }
 
-// Null that was made before, and what a registry asks another for.
-TEST_F(SRLRegistryProfiling, ForgetsWhatIsNotNew) {
+// A null that was made before is not new. Neither is an instance that a copy finds in the shared registry.
+TEST_F(SRLRegistryProfiling, DoesNotRecordExistingInstances) {
   const Ref<SRLRegistry> copy = registry->mutableCopy();
   const auto ask = [&] {
     registry->internalOptionalService(&nullAPI, {});
@@ -112,7 +111,7 @@ TEST_F(SRLRegistryProfiling, ForgetsWhatIsNotNew) {
   EXPECT_EQ(SRLPProfilingDetail::countOfStacks(), 0U);
 }
 
-TEST_F(SRLRegistryProfiling, ForgetsWhatThrows) {
+TEST_F(SRLRegistryProfiling, DoesNotRecordAFactoryThatThrows) {
   EXPECT_THROW(registry->internalService(&throwingAPI, {}), Failure);
   EXPECT_EQ(SRLPProfilingDetail::countOfStacks(), 0U);
   EXPECT_EQ(newEvents().size(), 0U);

@@ -1,4 +1,4 @@
-// Which reports a registry makes while its lock is held, and which without it.
+// Which reports a registry makes with its lock held, and which without it.
 
 #include <gtest/gtest.h>
 
@@ -19,7 +19,7 @@ using rt::Ref;
 
 class SRLRegistryReports : public ServicesTest {
  protected:
-  // Whether `asked`'s lock was held at each report of `request`.
+  // Returns, for each report that `request` makes, whether the lock of `asked` was held.
   static std::vector<bool> locksHeld(SRLRegistry& asked, const std::function<void()>& request) {
     std::vector<bool> held;
     PECErrorHandler::sharedInstance()->setErrorHandlerBlock([&](const Ref<PECErrorDescription>&) {
@@ -35,7 +35,7 @@ class SRLRegistryReports : public ServicesTest {
 const std::vector<bool> kFreeOnce = {false};
 const std::vector<bool> kHeldOnce = {true};
 
-TEST_F(SRLRegistryReports, AreMadeWithoutTheLockWhereNothingIsLookedUp) {
+TEST_F(SRLRegistryReports, AreMadeWithoutTheLockOutsideOfLookUps) {
   const auto wrapper = SRLScopeTagSetCodableWrapper::initWithTagSet({});
   const std::function<void()> requests[] = {
       [this] { registry->internalService(&nullAPI, {}); },
@@ -54,12 +54,12 @@ TEST_F(SRLRegistryReports, AreMadeWithoutTheLockWhereNothingIsLookedUp) {
   };
   for (std::size_t i = 0; i < std::size(requests); ++i) {
     EXPECT_EQ(locksHeld(*registry, requests[i]), kFreeOnce) << i;
-    // What is there already by then changes nothing.
+    // The same request again, when instances may exist.
     EXPECT_EQ(locksHeld(*registry, requests[i]), kFreeOnce) << i;
   }
 }
 
-TEST_F(SRLRegistryReports, AreMadeWithTheLockWhereALookUpFails) {
+TEST_F(SRLRegistryReports, AreMadeWithTheLockIfALookUpFails) {
   EXPECT_EQ(locksHeld(*registry, [this] { registry->internalService(&unboundAPI, {}); }), kHeldOnce);
   EXPECT_EQ(locksHeld(*registry, [this] { registry->internalService(&unknownAPI, {}); }), kHeldOnce);
   const Ref<SRLRegistry> early = SRLRegistry::initPrivate();
@@ -70,15 +70,15 @@ TEST_F(SRLRegistryReports, AreMadeWithTheLockWhereALookUpFails) {
                         registry->implementationForSingleBoundService(nullptr);
                       }),
             kHeldOnce);
-  // That there is no API, and that nothing is bound to it.
+  // There are two reports: the API is null, and nothing is bound to it.
   EXPECT_EQ(locksHeld(*registry, [this] { registry->internalService(nullptr, {}); }),
             (std::vector<bool>{true, true}));
 }
 
-// Of the registry in the making, from a module's own callback.
+// The registry that is registering its modules, for a module's callback.
 SRLRegistry* inTheMaking = nullptr;
 
-TEST_F(SRLRegistryReports, AreMadeWithTheLockWhereALookUpComesTooEarly) {
+TEST_F(SRLRegistryReports, AreMadeWithTheLockIfALookUpComesTooEarly) {
   const SRLBindingsModuleData module{.bindingsBegin = kModule.bindingsBegin,
                                      .bindingsEnd = kModule.bindingsEnd,
                                      .addConfigurationFactories = [](SRLConfigurationFactories&) {

@@ -1,4 +1,4 @@
-// Scopes of services, their end, and requests by identifier.
+// The scopes of services, their end, and requests by identifier.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -42,7 +42,7 @@ class Delegate final : public rt::Implements<Delegate, rt::Object, SRLScopeLifec
   std::vector<Ref<rt::Object>> survivors;
 };
 
-// Does something when it is destroyed.
+// Runs an action when it is destroyed.
 class Farewell final : public rt::Implements<Farewell, rt::Object> {
  public:
   explicit Farewell(std::function<void()> action) : action_(std::move(action)) {}
@@ -52,7 +52,7 @@ class Farewell final : public rt::Implements<Farewell, rt::Object> {
   const std::function<void()> action_;
 };
 
-TEST_F(SRLRegistryScopes, AreToldApartByTheirTags) {
+TEST_F(SRLRegistryScopes, AreIdentifiedByTheirTags) {
   const Ref<SRLMemoizingScope> scope = registry->scopeWithTags(tags);
   ASSERT_TRUE(scope);
   EXPECT_EQ(registry->scopeWithTags(tagSet(rt::String::fromUTF8("account").object(), window)), scope);
@@ -63,7 +63,7 @@ TEST_F(SRLRegistryScopes, AreToldApartByTheirTags) {
   EXPECT_NE(registry->scopeWithTags({}), registry->configScope());
 }
 
-TEST_F(SRLRegistryScopes, KeepTheirTagsUntilTheyEnd) {
+TEST_F(SRLRegistryScopes, RetainTheirTagsUntilTheyEnd) {
   Ref<rt::Object> tag = rt::make<Farewell>([] {});
   const rt::Weak<rt::Object> weak = tag;
   registry->scopeWithTags(tagSet(tag, account));
@@ -90,7 +90,7 @@ TEST_F(SRLRegistryScopes, EndByAnyOfTheirTags) {
   }
 }
 
-TEST_F(SRLRegistryScopes, GiveUpTheirInstances) {
+TEST_F(SRLRegistryScopes, ReleaseTheirInstances) {
   Ref<rt::Object> thing = registry->internalService(&scopedAPI, tags);
   const rt::Weak<rt::Object> weak = thing;
   thing = nullptr;
@@ -101,8 +101,8 @@ TEST_F(SRLRegistryScopes, GiveUpTheirInstances) {
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-// Whichever was asked for last, and whichever of them has ended.
-TEST_F(SRLRegistryScopes, AreAskedForByTurns) {
+// A request finds its scope after requests for other scopes, and after scopes have ended.
+TEST_F(SRLRegistryScopes, AreFoundInAlternation) {
   const SRLScopeTagSet others = tagSet(window, window);
   const Ref<rt::Object> first = registry->internalService(&scopedAPI, tags);
   const Ref<rt::Object> second = registry->internalService(&scopedAPI, others);
@@ -119,15 +119,15 @@ TEST_F(SRLRegistryScopes, AreAskedForByTurns) {
   EXPECT_NE(again, first);
   EXPECT_EQ(registry->internalService(&scopedAPI, others), second);
   EXPECT_EQ(registry->internalService(&scopedAPI, tags), again);
-  // Another one ends than was asked for last.
+  // A scope ends that is not that of the last request.
   registry->removeScopesWithTag(window);
   EXPECT_EQ(registry->internalService(&scopedAPI, tags), again);
   EXPECT_NE(registry->internalService(&scopedAPI, others), second);
   EXPECT_EQ(registry->internalService(&globalAPI, {}), third);
 }
 
-// A tag of the request before may be gone, and another be where it was.
-TEST_F(SRLRegistryScopes, AreNotTakenForThoseOfTagsThatAreGone) {
+// A tag of an earlier request may be gone. Another tag may have its address.
+TEST_F(SRLRegistryScopes, AreNotFoundByTheAddressOfAnEarlierTag) {
   class Tag final : public rt::Implements<Tag, rt::Object> {
    public:
     explicit Tag(int number) : number_(number) {}
@@ -146,7 +146,7 @@ TEST_F(SRLRegistryScopes, AreNotTakenForThoseOfTagsThatAreGone) {
   const auto scopeWithTagAtPlace = [&](int number) {
     Tag* tag = new (place.data()) Tag(number);
     const Ref<SRLMemoizingScope> found = registry->scopeWithTags({{tag}});
-    // Where the scope is new it keeps the tag, which must then stay.
+    // A new scope has retained the tag, so the tag must stay.
     if (found == scope) tag->~Tag();
     return found;
   };
@@ -157,7 +157,7 @@ TEST_F(SRLRegistryScopes, AreNotTakenForThoseOfTagsThatAreGone) {
   reinterpret_cast<Tag*>(place.data())->~Tag();
 }
 
-TEST_F(SRLRegistryScopes, EndAndTheDelegateLearnsWhatOutlivesThem) {
+TEST_F(SRLRegistryScopes, TellTheDelegateWhichInstancesOutliveThem) {
   const Ref<Delegate> delegate = rt::make<Delegate>();
   registry->setScopeLifecycleDelegate(delegate);
   EXPECT_EQ(registry->scopeLifecycleDelegate().get(), delegate.get());
@@ -169,14 +169,14 @@ TEST_F(SRLRegistryScopes, EndAndTheDelegateLearnsWhatOutlivesThem) {
   EXPECT_EQ(delegate->instanceCount, 2U);
   EXPECT_THAT(delegate->survivors, ElementsAre(kept));
 
-  // Told also where there was nothing to remove.
+  // The delegate is called even if there is no scope to remove.
   registry->removeScopesWithTag(account);
   EXPECT_THAT(delegate->tags, ElementsAre(account, account));
   EXPECT_EQ(delegate->instanceCount, 0U);
 }
 
-// The tag that it was told of used to be gone by then.
-TEST_F(SRLRegistryScopes, EndByAnInstanceOfTheirOwnWhichHasTheTag) {
+// The tag used to be destroyed before the delegate was called with it.
+TEST_F(SRLRegistryScopes, EndByATagThatOneOfTheirInstancesOwns) {
   class Session final : public rt::Implements<Session, rt::Object> {
    public:
     explicit Session(Ref<rt::Object> given) : account(std::move(given)) {}
@@ -199,8 +199,8 @@ TEST_F(SRLRegistryScopes, EndByAnInstanceOfTheirOwnWhichHasTheTag) {
   EXPECT_EQ(delegate->tags[0].get(), address);
 }
 
-// The same where the reference itself becomes null.
-TEST_F(SRLRegistryScopes, EndByAReferenceThatOneOfTheirInstancesTakesBack) {
+// The caller's reference to the tag becomes null while the scopes end.
+TEST_F(SRLRegistryScopes, EndByAReferenceThatOneOfTheirInstancesClears) {
   const Ref<Delegate> delegate = rt::make<Delegate>();
   registry->setScopeLifecycleDelegate(delegate);
   Ref<rt::Object> tag = rt::make<Farewell>([] {});
@@ -214,7 +214,7 @@ TEST_F(SRLRegistryScopes, EndByAReferenceThatOneOfTheirInstancesTakesBack) {
   EXPECT_EQ(delegate->tags[0].get(), address);
 }
 
-TEST_F(SRLRegistryScopes, EndWithoutASlotForNull) {
+TEST_F(SRLRegistryScopes, DoNotTellTheDelegateOfNulls) {
   const Ref<Delegate> delegate = rt::make<Delegate>();
   registry->setScopeLifecycleDelegate(delegate);
   registry->scopeWithTags(tags)->instanceForIdentifier(this, nullptr, [] { return Ref<rt::Object>(); });
@@ -222,8 +222,8 @@ TEST_F(SRLRegistryScopes, EndWithoutASlotForNull) {
   EXPECT_EQ(delegate->instanceCount, 0U);
 }
 
-// Nothing is removed, retained or released where a tag throws when it is compared.
-TEST_F(SRLRegistryScopes, StayWhereATagThrows) {
+// If comparing a tag throws, nothing is removed, retained or released.
+TEST_F(SRLRegistryScopes, StayIfATagThrows) {
   struct Failed {};
   class Moody final : public rt::Implements<Moody, rt::Object> {
    public:
@@ -256,7 +256,7 @@ TEST_F(SRLRegistryScopes, StayWhereATagThrows) {
   EXPECT_FALSE(weak.lock());
 }
 
-TEST_F(SRLRegistryScopes, EndWithoutADelegateThatIsGone) {
+TEST_F(SRLRegistryScopes, EndIfTheDelegateIsGone) {
   registry->setScopeLifecycleDelegate(rt::make<Delegate>());
   EXPECT_FALSE(registry->scopeLifecycleDelegate());
   const Ref<SRLMemoizingScope> scope = registry->scopeWithTags(tags);
@@ -269,7 +269,7 @@ TEST_F(SRLRegistryScopes, EndWithoutADelegateThatIsGone) {
   EXPECT_THAT(delegate->tags, IsEmpty());
 }
 
-TEST_F(SRLRegistryScopes, EndBeforeTheDelegateIsLookedForAgain) {
+TEST_F(SRLRegistryScopes, EndBeforeTheDelegateIsReadAgain) {
   Ref<Delegate> late = rt::make<Delegate>();
   registry->scopeWithTags(tagSet(account))->instanceForIdentifier(this, nullptr, [&] {
     return rt::make<Farewell>([&] { registry->setScopeLifecycleDelegate(late); });
@@ -285,11 +285,11 @@ TEST_F(SRLRegistryScopes, EndBeforeTheDelegateIsLookedForAgain) {
   EXPECT_FALSE(late);
 }
 
-TEST_F(SRLRegistryScopes, EndWhileTheLockIsFree) {
+TEST_F(SRLRegistryScopes, EndWithTheLockReleased) {
   Ref<rt::Object> found;
   const auto ask = [&] { found = registry->internalService(&scopedAPI, tags); };
   const Ref<rt::Object> tag = rt::make<Farewell>([] {});
-  // Both an instance and a tag ask while they are destroyed.
+  // Both an instance and a tag request a service while they are destroyed.
   registry->scopeWithTags(tagSet(tag, rt::make<Farewell>(ask)))->instanceForIdentifier(this, nullptr, [&] {
     return rt::make<Farewell>(ask);
   });
@@ -322,7 +322,7 @@ TEST_F(SRLRegistryByIdentifier, FindsTheSameServices) {
   EXPECT_EQ(registry->eg_internalMultiBoundService("Many"_s, wrapper)->count(), 2U);
 }
 
-TEST_F(SRLRegistryByIdentifier, NeedsTags) {
+TEST_F(SRLRegistryByIdentifier, ReportsMissingTags) {
   const auto missing = ElementsAre("Missing tag set for service:\nScoped.");
   EXPECT_FALSE(registry->eg_internalService("Scoped"_s, nullptr));
   EXPECT_THAT(reportsOf("-[SRLRegistry eg_internalService:scopeTags:]"), missing);
@@ -332,7 +332,7 @@ TEST_F(SRLRegistryByIdentifier, NeedsTags) {
   EXPECT_THAT(reportsOf("-[SRLRegistry eg_internalMultiBoundService:scopeTags:]"), missing);
 }
 
-TEST_F(SRLRegistryByIdentifier, ReportsUnknownOnesWhereOneIsRequired) {
+TEST_F(SRLRegistryByIdentifier, ReportsUnknownIdentifiersOfRequiredServices) {
   EXPECT_FALSE(registry->eg_internalService("Unknown"_s, wrapper));
   EXPECT_THAT(reportsOf("-[SRLRegistry eg_internalService:scopeTags:]"), ElementsAre("Unknown API Unknown"));
   EXPECT_FALSE(registry->eg_internalHasImplementationForService("Unknown"_s));
@@ -345,8 +345,8 @@ TEST_F(SRLRegistryByIdentifier, ReportsUnknownOnesWhereOneIsRequired) {
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-// The tags are looked at before the identifier.
-TEST_F(SRLRegistryByIdentifier, ReportsMissingTagsAloneOfAnUnknownOne) {
+// Missing tags are found before the identifier is looked up.
+TEST_F(SRLRegistryByIdentifier, ReportsOnlyMissingTagsForAnUnknownIdentifier) {
   EXPECT_FALSE(registry->eg_internalService("Unknown"_s, nullptr));
   EXPECT_FALSE(registry->eg_internalOptionalService("Unknown"_s, nullptr));
   EXPECT_FALSE(registry->eg_internalMultiBoundService("Unknown"_s, nullptr));
@@ -354,19 +354,19 @@ TEST_F(SRLRegistryByIdentifier, ReportsMissingTagsAloneOfAnUnknownOne) {
   EXPECT_THAT(reports.texts(), ElementsAre(missing, missing, missing));
 }
 
-TEST_F(SRLRegistryByIdentifier, ReportsNull) {
+TEST_F(SRLRegistryByIdentifier, ReportsANullIdentifier) {
   EXPECT_FALSE(registry->eg_internalService(nullptr, wrapper));
   EXPECT_THAT(reports.texts(), ElementsAre("apiIdentifierString must not be nil", "Unknown API (null)"));
 }
 
-TEST_F(SRLRegistryByIdentifier, TakesFourTagsAtMost) {
+TEST_F(SRLRegistryByIdentifier, ReportsMoreThanFourTags) {
   const Ref<rt::Object> tag = rt::Number::of(1);
   const auto five = SRLScopeTagSetCodableWrapper::initWithTags(rt::Array::of(tag, tag, tag, tag, tag));
   EXPECT_TRUE(registry->eg_internalService("Global"_s, five));
   EXPECT_THAT(reports.texts(), ElementsAre("SRLScopeTagSet only supports up to 4 tags, but received 5."));
 }
 
-TEST_F(SRLRegistryByIdentifier, KeepsNoTagsOfItsOwn) {
+TEST_F(SRLRegistryByIdentifier, DoesNotRetainTagsAfterTheRequest) {
   Ref<rt::Object> tag = rt::make<Farewell>([] {});
   const rt::Weak<rt::Object> weak = tag;
   registry->eg_internalService("Fresh"_s, SRLScopeTagSetCodableWrapper::initWithTagSet(tagSet(tag, window)));
@@ -374,7 +374,8 @@ TEST_F(SRLRegistryByIdentifier, KeepsNoTagsOfItsOwn) {
   EXPECT_FALSE(weak.lock());
 }
 
-// The tags of a request by identifier, to which this is the only reference; what the request calls drops it.
+// The tags of a request by identifier. This is the only reference to them, and the request's callbacks drop
+// it.
 Ref<SRLScopeTagSetCodableWrapper> onlyTags;
 const Ref<SRLScopeTagSetCodableWrapper>& newTags(std::size_t count = 1) {
   std::vector<Ref<rt::Object>> tags;
@@ -393,7 +394,7 @@ Ref<SRLInstanceType> typeAndDropTags(const SRLAPIRegistrationData* /*api*/) {
   return SRLClassType::initWithClass(&rt::classInfo<Thing>());
 }
 
-TEST_F(SRLRegistryByIdentifier, KeepsTheTagsUntilItIsDone) {
+TEST_F(SRLRegistryByIdentifier, RetainsTheTagsDuringTheRequest) {
   static constexpr SRLImplementationRegistrationData freshly{.identifier = "Freshly",
                                                              .instanceType = {.className = "Thing"},
                                                              .factory = makeAndDropTags,
@@ -424,7 +425,7 @@ TEST_F(SRLRegistryByIdentifier, KeepsTheTagsUntilItIsDone) {
   other->internalRegisterBindings(std::array{&module});
   SRLRegistry::setSharedInstance(other);
 
-  // By the factory, and by the type that is asked for with the first request of an API.
+  // The factory drops the tags. In the first request for an API, the function of its type does, too.
   EXPECT_TRUE(other->eg_internalService("One"_s, newTags()));
   EXPECT_TRUE(other->eg_internalOptionalService("One"_s, newTags()));
   EXPECT_EQ(other->eg_internalMultiBoundService("Many"_s, newTags())->count(), 1U);
@@ -432,7 +433,7 @@ TEST_F(SRLRegistryByIdentifier, KeepsTheTagsUntilItIsDone) {
   EXPECT_TRUE(other->eg_internalService("First"_s, newTags()));
   EXPECT_TRUE(other->mutableCopy()->eg_internalOptionalService("First"_s, newTags()));
   EXPECT_THAT(reports.texts(), IsEmpty());
-  // By whoever is told that there are too many.
+  // Here the request reports too many tags before the factory drops them.
   EXPECT_TRUE(other->eg_internalService("One"_s, newTags(5)));
   EXPECT_EQ(reports.texts().size(), 2U);
   onlyTags = nullptr;

@@ -1,4 +1,4 @@
-// Instances of services: required, optional, many.
+// Requests for services: required, optional and multi-bound ones.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -38,7 +38,7 @@ std::string noBinding(const std::string& api) {
 
 class SRLRegistryServices : public ServicesTest {
  protected:
-  // The description of what is bound to an API for one.
+  // Returns the description of the implementation that is bound to a single-bound API.
   std::string metadataOf(const SRLAPIRegistrationData& api) {
     const rt::LockGuard guard(*registry->lock());
     return std::string(registry->implementationForSingleBoundService(&api)->description());
@@ -49,7 +49,7 @@ SRLScopeTagSet tagsOf(const Ref<rt::Object>& object) {
   return rt::cast<Thing>(object.get())->tags;
 }
 
-TEST_F(SRLRegistryServices, NewEachTimeForLifetimeOne) {
+TEST_F(SRLRegistryServices, WithLifetimeOneAreNewEachTime) {
   const Ref<rt::Object> first = registry->internalService(&freshAPI, tags);
   const Ref<rt::Object> second = registry->internalService(&freshAPI, tags);
   ASSERT_TRUE(first && second);
@@ -58,12 +58,12 @@ TEST_F(SRLRegistryServices, NewEachTimeForLifetimeOne) {
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-TEST_F(SRLRegistryServices, OncePerScopeForLifetimeZero) {
+TEST_F(SRLRegistryServices, WithLifetimeZeroAreMadeOncePerScope) {
   const Ref<rt::Object> first = registry->internalService(&scopedAPI, tags);
   ASSERT_TRUE(first);
   EXPECT_EQ(tagsOf(first).tags, tagSet(account).tags);
   EXPECT_EQ(registry->internalService(&scopedAPI, tags), first);
-  // The implementation's scope has no window, and equal tags are as good as the same.
+  // The implementation's scope ignores the window. Equal tags find the same instance.
   const Ref<rt::Object> otherWindow = rt::Number::of(2);
   const Ref<rt::Object> equalAccount = rt::String::fromUTF8("account").object();
   EXPECT_EQ(registry->internalService(&scopedAPI, tagSet(equalAccount, otherWindow)), first);
@@ -71,7 +71,7 @@ TEST_F(SRLRegistryServices, OncePerScopeForLifetimeZero) {
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-TEST_F(SRLRegistryServices, OfNoScopeAreInTheScopeWithoutTags) {
+TEST_F(SRLRegistryServices, OfNoScopeLiveInTheScopeWithoutTags) {
   const Ref<rt::Object> thing = registry->internalService(&globalAPI, {});
   ASSERT_TRUE(thing);
   EXPECT_EQ(registry->internalService(&globalAPI, {}), thing);
@@ -80,21 +80,21 @@ TEST_F(SRLRegistryServices, OfNoScopeAreInTheScopeWithoutTags) {
   EXPECT_EQ(instances->at(0), thing.get());
 }
 
-TEST_F(SRLRegistryServices, AreAskedForByFactories) {
+TEST_F(SRLRegistryServices, CanBeRequestedByFactories) {
   const Ref<rt::Object> nest = registry->internalService(&nestedAPI, tags);
   ASSERT_TRUE(rt::cast<Nest>(nest.get()) != nullptr);
   EXPECT_EQ(rt::cast<Nest>(nest.get())->inner, registry->internalService(&scopedAPI, tags));
 }
 
-TEST_F(SRLRegistryServices, GetNoTagsWhereTheirsDoNotFitTheScope) {
+TEST_F(SRLRegistryServices, GetNoTagsIfTheTagsDoNotFitTheScope) {
   const Ref<rt::Object> thing = registry->internalService(&freshAPI, tagSet(account));
   EXPECT_THAT(reports.texts(), ElementsAre("The tag set must contain all API scope tags."));
   ASSERT_TRUE(thing);
   EXPECT_EQ(tagsOf(thing).tags, SRLScopeTagSet().tags);
 }
 
-// They are then in the scope without tags, and the same for all.
-TEST_F(SRLRegistryServices, AreSharedWhereTagsDoNotFitTheScope) {
+// Their scope is then the one without tags, which all such requests share.
+TEST_F(SRLRegistryServices, AreSharedIfTheTagsDoNotFitTheScope) {
   const std::string report = "The tag set must contain all API scope tags.";
   const Ref<rt::Object> thing = registry->internalService(&scopedAPI, tagSet(account));
   EXPECT_THAT(reports.texts(), ElementsAre(report));
@@ -109,7 +109,7 @@ TEST_F(SRLRegistryServices, AreSharedWhereTagsDoNotFitTheScope) {
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-TEST_F(SRLRegistryServices, RequiredOnesAreReportedWhereNothingIsBound) {
+TEST_F(SRLRegistryServices, ThatAreRequiredAreReportedIfNothingIsBound) {
   for (int i = 0; i < 2; ++i) {
     EXPECT_FALSE(registry->internalService(&unboundAPI, {}));
     EXPECT_FALSE(registry->internalService(&unknownAPI, {}));
@@ -117,12 +117,12 @@ TEST_F(SRLRegistryServices, RequiredOnesAreReportedWhereNothingIsBound) {
   }
 }
 
-TEST_F(SRLRegistryServices, RequiredOnesAreReportedBeforeThereAreBindings) {
+TEST_F(SRLRegistryServices, ThatAreRequiredAreReportedBeforeThereAreModules) {
   EXPECT_FALSE(SRLRegistry::initPrivate()->internalService(&scopedAPI, tags));
   EXPECT_THAT(reportsOf(kService), ElementsAre(priorTo("Scoped")));
 }
 
-TEST_F(SRLRegistryServices, OptionalOnesNeedNotBeThere) {
+TEST_F(SRLRegistryServices, ThatAreOptionalMayBeMissing) {
   EXPECT_FALSE(registry->internalOptionalService(&unboundAPI, {}));
   EXPECT_FALSE(registry->internalOptionalService(&unknownAPI, {}));
   EXPECT_FALSE(registry->internalOptionalService(&nullAPI, {}));
@@ -132,7 +132,7 @@ TEST_F(SRLRegistryServices, OptionalOnesNeedNotBeThere) {
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-// Of the registry in the making, from a module's own callback.
+// The registry that is registering its modules, for a module's callback.
 SRLRegistry* inTheMaking = nullptr;
 
 TEST_F(SRLRegistryServices, AreReportedWhileModulesAreBeingRegistered) {
@@ -157,24 +157,24 @@ TEST_F(SRLRegistryServices, AreReportedWhileModulesAreBeingRegistered) {
   EXPECT_EQ(messages[1]->function(), kOptional);
   EXPECT_EQ(text(*messages[2]), priorTo("Many"));
   EXPECT_EQ(messages[2]->function(), kMultiBound);
-  // That there was nothing then is not remembered.
+  // The registry does not remember that these requests found nothing.
   EXPECT_TRUE(other->internalService(&scopedAPI, tags));
   EXPECT_TRUE(other->internalMultiBoundService(&manyAPI, tags));
 }
 
-TEST_F(SRLRegistryServices, NullIsReportedForARequiredOne) {
+TEST_F(SRLRegistryServices, ThatAreRequiredAreReportedIfTheyAreNull) {
   const std::string report =
       "Implementation of Thing, bound to required service Null, returned nil.\nImplementation metadata: " +
       metadataOf(nullAPI) + "\nSee docs/registry.md#initializer-return-nil.";
   EXPECT_FALSE(registry->internalService(&nullAPI, {}));
   EXPECT_THAT(reportsOf(kService), ElementsAre(report));
-  // Null is kept as any instance is, and reported each time.
+  // The scope keeps the null. Each request reports it.
   EXPECT_FALSE(registry->internalService(&nullAPI, {}));
   EXPECT_THAT(reportsOf(kService), ElementsAre(report));
   EXPECT_EQ(nullsMade, 1);
 }
 
-TEST_F(SRLRegistryServices, ManyComeWithoutNulls) {
+TEST_F(SRLRegistryServices, OfAMultiBoundAPIComeWithoutNulls) {
   const Ref<rt::Array> things = registry->internalMultiBoundService(&manyAPI, tags);
   const std::vector<std::string> texts = reportsOf(kMultiBound);
   ASSERT_EQ(texts.size(), 1U);
@@ -194,7 +194,7 @@ TEST_F(SRLRegistryServices, ManyComeWithoutNulls) {
   EXPECT_EQ(same, 1);
 }
 
-TEST_F(SRLRegistryServices, ManyMayBeNone) {
+TEST_F(SRLRegistryServices, OfAMultiBoundAPIMayBeEmptyOrUnknown) {
   const Ref<rt::Array> none = registry->internalMultiBoundService(&noneOfManyAPI, {});
   ASSERT_TRUE(none);
   EXPECT_TRUE(none->isEmpty());
@@ -202,20 +202,20 @@ TEST_F(SRLRegistryServices, ManyMayBeNone) {
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-// An API for one is known to both tables once it has been asked for as if it were for many.
-TEST_F(SRLRegistryServices, ManyAreNotWhatIsBoundToAnAPIForOne) {
+// The request puts the single-bound API into both tables.
+TEST_F(SRLRegistryServices, OfASingleBoundAPIAreNotFoundAsMultiBound) {
   EXPECT_FALSE(registry->internalMultiBoundService(&scopedAPI, tags));
   EXPECT_FALSE(registry->internalMultiBoundService(&scopedAPI, tags));
   EXPECT_TRUE(registry->internalService(&scopedAPI, tags));
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-TEST_F(SRLRegistryServices, OneIsNotWhatIsBoundToAnAPIForMany) {
+TEST_F(SRLRegistryServices, OfAMultiBoundAPIAreNotFoundAsSingleBound) {
   EXPECT_FALSE(registry->internalService(&manyAPI, tags));
   EXPECT_THAT(reportsOf(kService), ElementsAre(noBinding("Many")));
 }
 
-TEST_F(SRLRegistryServices, AreKnownToBeBound) {
+TEST_F(SRLRegistryServices, HaveAnImplementationIfOneIsBound) {
   EXPECT_TRUE(registry->internalHasImplementationForService(&scopedAPI));
   EXPECT_TRUE(registry->internalHasImplementationForService(&scopedAPI));
   EXPECT_TRUE(registry->internalHasImplementationForService(&nullAPI));
@@ -226,7 +226,7 @@ TEST_F(SRLRegistryServices, AreKnownToBeBound) {
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-TEST_F(SRLRegistryServices, NeedAnAPI) {
+TEST_F(SRLRegistryServices, ReportANullAPI) {
   {
     const rt::LockGuard guard(*registry->lock());
     EXPECT_FALSE(registry->implementationForSingleBoundService(nullptr));
@@ -238,12 +238,12 @@ TEST_F(SRLRegistryServices, NeedAnAPI) {
   EXPECT_FALSE(registry->internalHasImplementationForService(nullptr));
   EXPECT_THAT(reportsOf("-[SRLRegistry internalHasImplementationForService:]"),
               ElementsAre("|apiIdentifier| cannot be nil!"));
-  // A mistake of the caller's, which is at least no crash.
+  // The caller violates a precondition here. The result is a report, not a crash.
   EXPECT_FALSE(registry->internalService(nullptr, tags));
   EXPECT_THAT(reports.texts(), ElementsAre("|apiIdentifier| cannot be nil!", noBinding("(null)")));
 }
 
-TEST_F(SRLRegistryServices, AreImplementedByWhatIsBound) {
+TEST_F(SRLRegistryServices, HaveTheImplementationThatIsBound) {
   const rt::LockGuard guard(*registry->lock());
   EXPECT_FALSE(registry->implementationForSingleBoundService(&unknownAPI));
   EXPECT_FALSE(registry->implementationForSingleBoundService(&unboundAPI));
@@ -254,8 +254,8 @@ TEST_F(SRLRegistryServices, AreImplementedByWhatIsBound) {
   EXPECT_EQ(registry->implementationForSingleBoundService(&freshAPI), implementation);
 }
 
-// What was refused once is not looked at again.
-TEST_F(SRLRegistryServices, AreKnownToBeMissingWhereTheirImplementationWasRefused) {
+// The refused implementation is not looked at again.
+TEST_F(SRLRegistryServices, AreMissingIfTheirImplementationWasRefused) {
   static constexpr SRLImplementationRegistrationData notAThing{
       .identifier = "NotAThing", .instanceType = {.className = "String"}, .factory = makeThing};
   static constexpr Implementations list[] = {&notAThing, nullptr};
@@ -273,8 +273,8 @@ TEST_F(SRLRegistryServices, AreKnownToBeMissingWhereTheirImplementationWasRefuse
   EXPECT_THAT(reports.texts(), ElementsAre(noBinding("Refused")));
 }
 
-// Another record with the same identifier is another API, for which the module has nothing.
-TEST_F(SRLRegistryServices, AreBoundToARecordAndNotToItsText) {
+// Another record with the same identifier is another API. Nothing is bound to it.
+TEST_F(SRLRegistryServices, AreIdentifiedByTheRecordNotByItsText) {
   static constexpr SRLAPIRegistrationData twin{
       .identifier = "Global", .instanceType = kThingType, .identifierLength = 6};
   EXPECT_FALSE(registry->internalService(&twin, {}));
@@ -284,7 +284,7 @@ TEST_F(SRLRegistryServices, AreBoundToARecordAndNotToItsText) {
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-TEST_F(SRLRegistryServices, ThatAreThereCostNoAllocation) {
+TEST_F(SRLRegistryServices, ThatExistCostNoAllocation) {
   if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
   const Ref<rt::Object> thing = registry->internalService(&scopedAPI, tags);
   const AllocationCount count;
@@ -293,8 +293,8 @@ TEST_F(SRLRegistryServices, ThatAreThereCostNoAllocation) {
   EXPECT_EQ(count.allocations(), 0);
 }
 
-// The instance, and the entry that its scope keeps it in.
-TEST_F(SRLRegistryServices, ThatAreNewCostNoOtherAllocations) {
+// The instance is one allocation. The scope's entry for it is another.
+TEST_F(SRLRegistryServices, ThatAreNewCostNoFurtherAllocations) {
   if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
   registry->internalService(&freshAPI, tags);
   const AllocationCount fresh;
@@ -310,7 +310,7 @@ TEST_F(SRLRegistryServices, ThatAreNewCostNoOtherAllocations) {
   EXPECT_EQ(scoped.allocations(), 2);
 }
 
-TEST_F(SRLRegistryServices, ThatNoModuleKnowsCostNoAllocationAgain) {
+TEST_F(SRLRegistryServices, ThatAreUnknownCostNoAllocationAgain) {
   if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
   EXPECT_FALSE(registry->internalOptionalService(&unknownAPI, {}));
   EXPECT_FALSE(registry->internalMultiBoundService(&unknownManyAPI, {}));
@@ -321,8 +321,8 @@ TEST_F(SRLRegistryServices, ThatNoModuleKnowsCostNoAllocationAgain) {
   EXPECT_EQ(count.allocations(), 0);
 }
 
-// Modules do not change. This one does, so that it shows.
-TEST_F(SRLRegistryServices, ThatNoModuleKnowsAreLookedForAmongModulesOnce) {
+// A real module never changes. This one does, to show that it is not searched again.
+TEST_F(SRLRegistryServices, ThatAreUnknownAreSearchedForInModulesOnce) {
   std::string identifier = "Elsewise";
   const SRLAPIRegistrationData inModule{
       .identifier = identifier.c_str(), .instanceType = kThingType, .identifierLength = 8};
@@ -346,8 +346,8 @@ TEST_F(SRLRegistryServices, ThatNoModuleKnowsAreLookedForAmongModulesOnce) {
   EXPECT_TRUE(hasBound());
 }
 
-// That no module knows an API is true as long as there is none, and no longer.
-TEST_F(SRLRegistryServices, AreLookedForAgainOnceThereAreModules) {
+// A registry without modules does not remember which APIs are unknown.
+TEST_F(SRLRegistryServices, AreSearchedForAgainOnceThereAreModules) {
   const Ref<SRLRegistry> other = SRLRegistry::initPrivate();
   EXPECT_FALSE(other->internalOptionalService(&globalAPI, {}));
   EXPECT_FALSE(other->internalHasImplementationForService(&freshAPI));
@@ -358,7 +358,7 @@ TEST_F(SRLRegistryServices, AreLookedForAgainOnceThereAreModules) {
   EXPECT_TRUE(other->internalMultiBoundService(&manyAPI, tags));
 }
 
-TEST_F(SRLRegistryServices, ThatNoModuleKnowsMayBeBoundByHand) {
+TEST_F(SRLRegistryServices, ThatAreUnknownMayBeBoundByHand) {
   for (int i = 0; i < 2; ++i) {
     EXPECT_FALSE(registry->internalService(&unknownAPI, {}));
     EXPECT_THAT(reportsOf(kService), ElementsAre(noBinding("Unknown")));
@@ -380,21 +380,21 @@ TEST_F(SRLRegistryServices, ThatNoModuleKnowsMayBeBoundByHand) {
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-TEST_F(SRLRegistryServices, MayThrowAndLeaveTheRegistryWhole) {
+TEST_F(SRLRegistryServices, MayThrowAndLeaveTheRegistryUsable) {
   EXPECT_THROW(registry->internalService(&throwingAPI, {}), Failure);
   EXPECT_THROW(registry->internalOptionalService(&throwingAPI, {}), Failure);
   EXPECT_TRUE(registry->internalService(&globalAPI, {}));
 }
 
-// A thing for each account, the making of which fails as long as the test says so.
+// Makes a thing, or throws as long as the test wants that.
 bool shallThrow = false;
 Ref<rt::Object> makeThingAtTimes(SRLScopeTagSet given) {
   if (shallThrow) throw Failure();
   return makeThing(given);
 }
 
-// The instance stays pending as long as its scope is there. To ask for it again used to end the program.
-TEST_F(SRLRegistryServices, ThatAreScopedAndThrowAreBackInTheNextScope) {
+// The instance stays pending as long as its scope exists. Requesting it again used to end the program.
+TEST_F(SRLRegistryServices, ThatAreScopedAndThrowCanBeMadeInTheNextScope) {
   static constexpr SRLImplementationRegistrationData implementation{.identifier = "AtTimes",
                                                                     .instanceType = {.className = "Thing"},
                                                                     .factory = makeThingAtTimes,
@@ -423,15 +423,15 @@ TEST_F(SRLRegistryServices, ThatAreScopedAndThrowAreBackInTheNextScope) {
   EXPECT_TRUE(other->internalService(&api, tagSet(account)));
 }
 
-// A nest, with the making of which the scopes of its account end.
+// Makes a nest and ends the scopes of its account.
 Ref<rt::Object> makeNestAndEndScopes(SRLScopeTagSet given) {
   SRLRegistry::sharedInstance()->removeScopesWithTag(given.tags[0]);
   return rt::make<Nest>(given, nullptr);
 }
 
-// Used to be those of the scope that had been there when the request came, and the delegate to be told that
-// they had outlived it.
-TEST_F(SRLRegistryServices, OfManyAreNotOfAScopeThatOneOfThemHasEnded) {
+// One of the factories ends the scope. The instances after it used to come from the old scope, and the
+// delegate was told that they had outlived it.
+TEST_F(SRLRegistryServices, OfAMultiBoundAPIDoNotComeFromAScopeThatOneOfThemEnded) {
   static constexpr SRLImplementationRegistrationData ending{.identifier = "Ending",
                                                             .instanceType = {.className = "Nest"},
                                                             .factory = makeNestAndEndScopes,
@@ -495,8 +495,8 @@ constexpr SRLImplementationRegistrationData growing{.identifier = "Growing",
 constexpr SRLAPIRegistrationData growingAPI{
     .identifier = "Growing", .instanceType = kThingType, .identifierLength = 7, .isMultibound = 1};
 
-// What a factory binds to the API counts from the next request on.
-TEST_F(SRLRegistryServices, OfManyAreThoseThatWereBoundWhenTheRequestCame) {
+// An implementation that a factory binds to the API counts from the next request on.
+TEST_F(SRLRegistryServices, OfAMultiBoundAPIAreThoseBoundAtTheTimeOfTheRequest) {
   static constexpr Implementations list[] = {&growing, nullptr};
   static constexpr _SRLBindingRegistrationData bindings[] = {{&growingAPI, list}};
   const SRLBindingsModuleData module{.bindingsBegin = std::begin(bindings),
@@ -517,7 +517,7 @@ TEST_F(SRLRegistryServices, ThatAreScopedLiveInTheSharedRegistry) {
   EXPECT_TRUE(copy->scopeWithTags(tagSet(account))->instances()->isEmpty());
   EXPECT_EQ(registry->scopeWithTags(tagSet(account))->instances()->count(), 1U);
 
-  // The one that is shared when an instance is asked for.
+  // The registry that is shared at the time of the request counts.
   SRLRegistry::setSharedInstance(copy);
   EXPECT_NE(registry->internalService(&scopedAPI, tags), thing);
   SRLRegistry::setSharedInstance(nullptr);
@@ -527,7 +527,7 @@ TEST_F(SRLRegistryServices, ThatAreScopedLiveInTheSharedRegistry) {
 TEST_F(SRLRegistryServices, TellWhetherTheyAreNew) {
   const SRLFactoryBlock fresh = registry->scopedBlockForFactory(makeThing, &freshThing, 0b11, 0b10, 1);
   const SRLFactoryBlock scoped = registry->scopedBlockForFactory(makeThing, &scopedThing, 0b11, 0b01, 0);
-  // Any lifetime but 1 is that of a scope.
+  // Any lifetime but 1 means one instance per scope.
   const SRLFactoryBlock odd = registry->scopedBlockForFactory(makeThing, &scopedThing, 0b11, 0b01, 2);
   bool isNew = false;
   EXPECT_TRUE(fresh(tags, &isNew));

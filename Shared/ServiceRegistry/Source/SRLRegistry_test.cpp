@@ -1,5 +1,5 @@
-// The registry as an object: the shared one, copies, what it says of itself, and its end. What is in it is
-// in the other SRLRegistry_*_test.cpp.
+// The registry as an object: the shared registry, copies, the description, and destruction. The other
+// SRLRegistry_*_test.cpp test bindings and services.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -34,7 +34,7 @@ std::string descriptionOf(const Ref<SRLImplementation>& implementation) {
   return std::string(implementation->description().view());
 }
 
-// What it tells of its destruction.
+// What an object notes about its destruction.
 struct End {
   bool hasCome = false;
   bool wasOnMainThread = false;
@@ -59,7 +59,7 @@ TEST(SRLRegistrySharedInstance, IsTheSameAtEveryCall) {
   EXPECT_EQ(SRLRegistry::sharedInstance(), registry);
 }
 
-// This program has no module, and modules have been registered all the same.
+// This program has no module. The shared registry has completed its registration nevertheless.
 TEST(SRLRegistrySharedInstance, HasItsModulesFromTheStart) {
   TestReports reports;
   EXPECT_EQ(SRLRegistry::sharedInstance()->internalService(&testClockAPI, {}), nullptr);
@@ -93,8 +93,8 @@ TEST(SRLRegistrySharedInstance, IsRetained) {
   EXPECT_TRUE(end.hasCome);
 }
 
-// Neither asks for the registry's own lock.
-TEST(SRLRegistrySharedInstance, CanBeHadWithItsLockHeld) {
+// Neither function takes the registry's own lock.
+TEST(SRLRegistrySharedInstance, CanBeReadAndSetWithItsLockHeld) {
   const Ref<SRLRegistry> registry = SRLRegistry::sharedInstance();
   const rt::LockGuard guard(*registry->lock());
   EXPECT_EQ(SRLRegistry::sharedInstance(), registry);
@@ -109,7 +109,7 @@ TEST(SRLRegistryInitialize, DoesNothingForASubclass) {
   EXPECT_THAT(wholeReports(reports), IsEmpty());
 }
 
-TEST(SRLRegistry, KnowsNothingAtFirst) {
+TEST(SRLRegistry, IsEmptyAtFirst) {
   TestReports reports;
   const Ref<SRLRegistry> registry = SRLRegistry::initPrivate();
   EXPECT_NE(registry, SRLRegistry::initPrivate());
@@ -117,7 +117,7 @@ TEST(SRLRegistry, KnowsNothingAtFirst) {
   EXPECT_EQ(registry->apiIdentifierFromString("Clock"_s), nullptr);
   EXPECT_EQ(registry->internalImplementationConfigForIdentifier(&testClockAPI), nullptr);
   EXPECT_EQ(registry->scopeLifecycleDelegate(), nullptr);
-  // Only who requires a service is too early.
+  // Only a request for a required service is reported as too early.
   EXPECT_EQ(registry->internalOptionalService(&testClockAPI, {}), nullptr);
   EXPECT_EQ(registry->internalMultiBoundService(&testClocksAPI, {}), nullptr);
   EXPECT_THAT(wholeReports(reports), IsEmpty());
@@ -145,7 +145,7 @@ TEST(SRLRegistryDescription, OfAnEmptyRegistry) {
                                                 ">\nSingle bindings:\n{\n}\nMulti bindings:\n{\n}");
 }
 
-TEST(SRLRegistryDescription, HasTheBindings) {
+TEST(SRLRegistryDescription, ListsTheBindings) {
   const Ref<SRLRegistry> registry = SRLRegistry::initPrivate();
   const Ref<SRLImplementation> single = implementationOf<TestWallClock>("single");
   const Ref<SRLImplementation> multi = implementationOf<TestSundial>("multi");
@@ -170,8 +170,8 @@ TEST(SRLRegistryDescription, LeavesOutASingleBoundAPIThatIsUnbound) {
                 ">\nSingle bindings:\n{\n}\nMulti bindings:\n{\n    Clocks = {(\n    )};\n}");
 }
 
-// Only what has been asked for is in it.
-TEST(SRLRegistryDescription, LeavesOutWhatIsNotKnownYet) {
+// The description has only the APIs that were requested.
+TEST(SRLRegistryDescription, LeavesOutAPIsThatWereNotRequestedYet) {
   const TestModule module({{&testClockAPI, testWallClocks}});
   const Ref<SRLRegistry> registry = registryWith({&module});
   EXPECT_THAT(std::string(registry->description().view()), testing::HasSubstr("Single bindings:\n{\n}\n"));
@@ -213,7 +213,7 @@ TEST(SRLRegistryMutableCopy, HasTheModules) {
   EXPECT_NE(boundTo(testClockAPI, copy), nullptr);
 }
 
-TEST(SRLRegistryMutableCopy, IsAsFarAsTheOriginal) {
+TEST(SRLRegistryMutableCopy, HasTheStateOfTheOriginal) {
   TestReports reports;
   registryWith({})->mutableCopy()->internalService(&testClockAPI, {});
   EXPECT_THAT(reports.texts(), ElementsAre("No binding was found for required, single-bound service: Clock"));
@@ -222,7 +222,7 @@ TEST(SRLRegistryMutableCopy, IsAsFarAsTheOriginal) {
   EXPECT_THAT(reports.texts(),
               ElementsAre("A service injector was called prior to service bindings being registered.\n\n"
                           "Service: Clock"));
-  // Nothing has been registered with it either.
+  // The copy of a registry without modules can register some.
   const TestModule module({{&testClockAPI, testWallClocks}});
   const SRLBindingsModuleData* const modules[] = {module.data()};
   copy->internalRegisterBindings(modules);
@@ -231,7 +231,7 @@ TEST(SRLRegistryMutableCopy, IsAsFarAsTheOriginal) {
 
 const int configuration = 0;
 
-TEST(SRLRegistryMutableCopy, HasTheConfigurationFactoriesAndMakesItsOwn) {
+TEST(SRLRegistryMutableCopy, HasTheFactoriesButItsOwnConfigurations) {
   const TestModule module({}, [](SRLConfigurationFactories& factories) {
     factories[&configuration] = [] { return rt::make<TestStone>(); };
   });
@@ -264,7 +264,7 @@ TEST(SRLRegistryMutableCopy, HasALockOfItsOwn) {
   EXPECT_TRUE(copy->registeredAPIIdentifiers()->isEmpty());
 }
 
-// With something in each of its tables: a factory, and an instance in a scope.
+// A registry with a bound implementation, and with an instance in a scope.
 class SRLRegistryEnd : public testing::Test {
  protected:
   SRLRegistryEnd() {
@@ -285,14 +285,14 @@ class SRLRegistryEnd : public testing::Test {
   Ref<SRLRegistry> registry_ = SRLRegistry::initPrivate();
 };
 
-TEST_F(SRLRegistryEnd, ComesAtOnceOnTheMainThread) {
+TEST_F(SRLRegistryEnd, ReleasesAllAtOnceOnTheMainThread) {
   registry_ = nullptr;
   EXPECT_TRUE(instanceEnd_.hasCome);
   EXPECT_TRUE(factoryEnd_.hasCome);
   EXPECT_EQ(rt::MainQueue::drain(), 0U);
 }
 
-TEST_F(SRLRegistryEnd, WaitsForTheMainQueueOnAnotherThread) {
+TEST_F(SRLRegistryEnd, ReleasesOnTheMainQueueFromAnotherThread) {
   std::thread([this] { registry_ = nullptr; }).join();
   EXPECT_FALSE(instanceEnd_.hasCome);
   EXPECT_FALSE(factoryEnd_.hasCome);
@@ -301,7 +301,7 @@ TEST_F(SRLRegistryEnd, WaitsForTheMainQueueOnAnotherThread) {
   EXPECT_TRUE(factoryEnd_.hasCome && factoryEnd_.wasOnMainThread);
 }
 
-TEST_F(SRLRegistryEnd, OfItsConfigurationsComesAtOnceAnywhere) {
+TEST_F(SRLRegistryEnd, ReleasesConfigurationsAtOnceOnAnyThread) {
   End end;
   registry_->configScope()->instanceForIdentifier(&end, nullptr, [&] { return rt::make<Mortal>(&end); });
   std::thread([this] { registry_ = nullptr; }).join();
@@ -311,12 +311,12 @@ TEST_F(SRLRegistryEnd, OfItsConfigurationsComesAtOnceAnywhere) {
   rt::MainQueue::drain();
 }
 
-TEST_F(SRLRegistryEnd, GivesUpTheTagsOfItsScopes) {
+TEST_F(SRLRegistryEnd, ReleasesTheTagsOfItsScopes) {
   End end;
   {
     const Ref<rt::Array> tags = rt::Array::of(Ref<rt::Object>(rt::make<Mortal>(&end)));
     registry_->scopeWithTags(SRLScopeTagSetCreateWithTags(tags.get()));
-    // Asked for again, it does not retain them a second time.
+    // The second call does not retain the tags again.
     registry_->scopeWithTags(SRLScopeTagSetCreateWithTags(tags.get()));
   }
   EXPECT_FALSE(end.hasCome);
@@ -324,7 +324,7 @@ TEST_F(SRLRegistryEnd, GivesUpTheTagsOfItsScopes) {
   EXPECT_TRUE(end.hasCome);
 }
 
-// Notes when it ends whether something else has ended before.
+// Notes, when it is destroyed, whether another object was destroyed before.
 class Witness final : public rt::Implements<Witness, rt::Object> {
  public:
   Witness(const End* other, bool* isLater) : other_(other), isLater_(isLater) {}
@@ -335,7 +335,7 @@ class Witness final : public rt::Implements<Witness, rt::Object> {
   bool* const isLater_;
 };
 
-TEST_F(SRLRegistryEnd, GivesUpTheTagsBeforeTheInstances) {
+TEST_F(SRLRegistryEnd, ReleasesTheTagsBeforeTheInstances) {
   End end;
   bool isLater = false;
   {

@@ -1,4 +1,4 @@
-// One registry and many threads.
+// Many threads use one registry.
 
 #include <gtest/gtest.h>
 
@@ -32,10 +32,10 @@ constexpr std::size_t kLevels = 4;
 constexpr std::size_t kAPIsInLevel = 250;
 constexpr std::size_t kAPIs = kLevels * kAPIsInLevel;
 
-// What the thread is asking: the shared registry, or a copy.
+// The registry that the thread is using: the shared one or a copy.
 constinit thread_local SRLRegistry* askedHere = nullptr;
 
-// Taken by all that is the user's own: a registry that held its lock meanwhile would end the program here.
+// All callbacks of the registry take its lock. If it were held meanwhile, this would end the program.
 void takeTheLock() {
   const Ref<SRLRegistry> shared = SRLRegistry::sharedInstance();
   {
@@ -46,7 +46,7 @@ void takeTheLock() {
 
 std::atomic<int> tagsAlive{0};
 
-// An account or a window, equal by number.
+// A tag, equal to tags with the same number.
 class Tag final : public rt::Implements<Tag, rt::Object> {
  public:
   explicit Tag(std::size_t number) : number_(number) { ++tagsAlive; }
@@ -65,13 +65,13 @@ class Tag final : public rt::Implements<Tag, rt::Object> {
   const std::size_t number_;
 };
 
-// Counts all that happens.
+// A clock that ticks at each event.
 std::atomic<std::uint64_t> now{1};
 
 struct Account {
   std::atomic<std::uint64_t> removalsBegun{0};
   std::atomic<std::uint64_t> removalsEnded{0};
-  // When the last removal that is over had begun.
+  // The start of the latest removal that has ended.
   std::atomic<std::uint64_t> lastRemoval{0};
 };
 std::array<Account, kAccounts> accounts;
@@ -91,7 +91,7 @@ std::array<SRLAPIRegistrationData, kAPIs> apis;
 std::array<SRLImplementationRegistrationData, kAPIs> implementations;
 std::array<std::array<const SRLImplementationRegistrationData*, 2>, kAPIs> lists;
 std::array<_SRLBindingRegistrationData, kAPIs + 1> bindings;
-// Some of the lowest level, for one API.
+// A multi-bound API, to which some implementations of the lowest level are bound.
 constexpr std::size_t kMany = 8;
 constinit SRLAPIRegistrationData apiOfMany{.identifier = "APIsOfMany",
                                            .instanceType = {.names = {.className = "Instance"}},
@@ -102,13 +102,13 @@ std::array<const SRLImplementationRegistrationData*, kMany + 1> many{};
 std::array<std::string, kAPIs> identifiers;
 thread_local std::minstd_rand chance;
 
-// Each asks for a service of the level below, so that no instance needs itself.
+// Each factory requests a service of the level below, so that no instance needs itself.
 template <std::size_t level>
 Ref<rt::Object> makeInstance(SRLScopeTagSet tags) {
   takeTheLock();
   Ref<rt::Object> dependency;
   if constexpr (level > 0) {
-    // The API's scope is that of the account; services without one have none to give.
+    // Each API needs an account's tag. An implementation without a scope gets none, so it requests nothing.
     if (tags.tags[0] != nullptr) {
       const std::size_t below = ((level - 1) * kAPIsInLevel) + (chance() % kAPIsInLevel);
       dependency = SRLRegistry::sharedInstance()->internalService(&apis.at(below), tags);
@@ -120,11 +120,11 @@ Ref<rt::Object> makeInstance(SRLScopeTagSet tags) {
 constexpr std::array<Ref<rt::Object> (*)(SRLScopeTagSet), kLevels> kFactories = {
     makeInstance<0>, makeInstance<1>, makeInstance<2>, makeInstance<3>};
 
-// What the requests of all threads have got: an instance, by when it was made, of each API's implementation,
-// for an account while none of its scopes is removed.
+// The instances that the requests of all threads must get. An instance is identified by the time when it was
+// made. Its key is the API, the account, and the number of removals before.
 class Model {
  public:
-  // What has been got first for the same.
+  // Returns the instance that the first request for the same key got.
   std::uint64_t expect(std::size_t api, std::size_t account, std::uint64_t removals, std::uint64_t madeAt) {
     const std::scoped_lock guard(mutex_);
     return got_.try_emplace({api, account, removals}, madeAt).first->second;
@@ -166,7 +166,7 @@ const SRLBindingsModuleData& moduleOfAll() {
   return module;
 }
 
-// Ends the account's scopes, at times the same as other threads do.
+// Ends the account's scopes. Other threads may do so at the same time.
 void removeScopesOf(SRLRegistry& registry, std::size_t number) {
   Account& account = accounts.at(number);
   ++account.removalsBegun;
@@ -178,20 +178,22 @@ void removeScopesOf(SRLRegistry& registry, std::size_t number) {
   ++account.removalsEnded;
 }
 
-// What holds for every request, whatever the other threads do:
-// - a service comes out, however it is asked for, and nothing is reported;
-// - one that is made anew each time is another each time;
-// - one that lives in an account's scope was made after every removal that was over before the request;
-// - requests of all threads get the same one unless a removal was under way before, or has begun since;
-// - one that lives in no account's scope is the same for ever;
-// - user code, that is factories, destructors and the delegate, finds the registry's lock free;
-// and at the end, when all scopes have ended, no tag is left that the registry had retained.
+// Checks what holds for every request, whatever the other threads do:
+//
+// - Every kind of request returns an instance, and nothing is reported.
+// - A service with a new instance at every request has another instance each time.
+// - An instance in an account's scope was made after every removal that ended before the request.
+// - The requests of all threads get the same instance of an account, unless a removal overlaps with them.
+// - An instance in the scope without tags stays the same for ever.
+// - The registry's lock is free during callbacks: factories, destructors and the delegate.
+//
+// At the end, all scopes have ended. Then the registry has released all tags.
 void request(SRLRegistry& registry, std::size_t api, std::size_t number) {
   const Account& account = accounts.at(number);
   const std::uint64_t ended = account.removalsEnded;
   const std::uint64_t begun = account.removalsBegun;
   const std::uint64_t lastRemoval = account.lastRemoval;
-  // The tag lives as long as this request only, unless the registry keeps it.
+  // The tag lives only as long as this request, unless the registry retains it.
   const auto ask = [&] {
     const Ref<Tag> tag = rt::make<Tag>(number);
     const SRLScopeTagSet tags{{tag.get()}};
@@ -223,7 +225,7 @@ void request(SRLRegistry& registry, std::size_t api, std::size_t number) {
   }
 }
 
-// The same for an API for many: all of them come out, each as above.
+// Checks the same for the multi-bound API. A request returns an instance of each implementation.
 void requestMany(SRLRegistry& registry, std::size_t number) {
   const Account& account = accounts.at(number);
   const std::uint64_t ended = account.removalsEnded;
@@ -240,14 +242,14 @@ void requestMany(SRLRegistry& registry, std::size_t number) {
     madeAt.push_back(rt::cast<Instance>(instance.get())->madeAt());
     if (madeAt.back() > lastRemoval) ++madeSince;
   }
-  // All but those that live in no account's scope.
+  // All instances but those in the scope without tags.
   std::size_t expected = 0;
   for (std::size_t api = 0; api < kMany; ++api) {
     if (isNew(api) || isOfAccount(api)) ++expected;
   }
   EXPECT_GE(madeSince, expected);
   if (ended != begun || account.removalsBegun != begun) return;
-  // Those of the APIs for one, which have the same implementations, are among them.
+  // The single-bound APIs have the same implementations, so their instances are among these.
   for (std::size_t api = 0; api < kMany; ++api) {
     if (isNew(api)) continue;
     const Ref<rt::Object> one = registry.internalService(&apis.at(api), SRLScopeTagSet{{tag.get()}});
@@ -286,13 +288,13 @@ TEST(SRLRegistryThreads, KeepEveryPromise) {
       Ref<SRLRegistry> asked = registry;
       for (std::size_t i = 0; i < kRequests; ++i) {
         askedHere = asked.get();
-        // Every other request is for one of a few, so that threads meet in their making.
+        // Half of the requests are for one of a few APIs, so that threads make the same instances at once.
         const std::size_t choice = chance() % 2 == 0 ? kAPIs : kMany + (i / 100);
         const std::size_t api = chance() % choice;
         request(*asked, api, chance() % kAccounts);
         if (chance() % 8 == 0) requestMany(*asked, chance() % kAccounts);
         if (chance() % 50 == 0) removeScopesOf(*registry, chance() % kAccounts);
-        // Copies keep what is scoped in the shared registry, too.
+        // Copies use the scopes of the shared registry, too.
         askedHere = nullptr;
         if (chance() % 200 == 0) asked = chance() % 2 == 0 ? registry : registry->mutableCopy();
       }
@@ -307,9 +309,9 @@ TEST(SRLRegistryThreads, KeepEveryPromise) {
   PECErrorHandler::resetAfterTest();
 }
 
-// A request goes to the registry that is shared at some moment of it, which is whole however soon it is
-// replaced.
-TEST(SRLRegistryThreads, AskWhileTheSharedRegistryIsReplaced) {
+// A request uses the registry that is shared at some moment during the request. That registry stays alive
+// even if it is replaced meanwhile.
+TEST(SRLRegistryThreads, RequestWhileTheSharedRegistryIsReplaced) {
   const Ref<SRLRegistry> asked = SRLRegistry::initPrivate();
   asked->internalRegisterBindings(std::array{&moduleOfAll()});
   const Ref<SRLRegistry> before = SRLRegistry::setSharedInstance(asked);
@@ -319,7 +321,7 @@ TEST(SRLRegistryThreads, AskWhileTheSharedRegistryIsReplaced) {
   for (std::size_t thread = 0; thread < 3; ++thread) {
     threads.emplace_back([&] {
       const Ref<Tag> tag = rt::make<Tag>(std::size_t{0});
-      // One that lives in the account's scope, and needs no other.
+      // A service in the account's scope that needs no other service.
       for (std::size_t i = 0; i < kRequests; ++i) {
         EXPECT_TRUE(asked->internalService(&apis.at(1), SRLScopeTagSet{{tag.get()}}));
       }

@@ -1,7 +1,7 @@
-// An instance is had in two ways: by a request, which finds at one go what is there, and by the factory block
-// of an implementation. Programs made up at random run once by requests, once by blocks and once by both in
-// turns. All must leave the same trace: what was made, for which tags, in which order, what was new, and what
-// was reported.
+// There are two ways to an instance: a request, with its quick path to existing instances, and an
+// implementation's factory block. Random programs run three times: with requests, with blocks, and with both
+// in turns. All must leave the same trace: what was made, for which tags, in which order, what was new, and
+// what was reported.
 
 #include <gtest/gtest.h>
 
@@ -45,11 +45,11 @@ class Product final : public rt::Implements<Product, rt::Object> {
   Product(int theNumber, int theRequest) : number(theNumber), request(theRequest) {}
 
   const int number;
-  // The one in which it was made.
+  // The request that made it.
   const int request;
 };
 
-// A registry whose tables can be looked at.
+// A registry that gives access to its tables.
 class OpenRegistry final : public rt::Implements<OpenRegistry, SRLRegistry> {
  public:
   explicit OpenRegistry(std::unique_ptr<SRLRegistryIvars>&& ivars)
@@ -59,7 +59,7 @@ class OpenRegistry final : public rt::Implements<OpenRegistry, SRLRegistry> {
     return rt::make<OpenRegistry>(std::make_unique<SRLRegistryIvars>(*known_));
   }
 
-  // What is bound to an API for many; null where no module knows it.
+  // Returns the implementations of a multi-bound API. Null if no module knows it.
   Ref<rt::Set> manyBoundTo(const SRLAPIRegistrationData& api) RT_NO_THREAD_SAFETY_ANALYSIS {
     const rt::LockGuard guard(*lock());
     const bool isKnown = known_->multiBindings.find(&api) != nullptr;
@@ -75,7 +75,7 @@ class OpenRegistry final : public rt::Implements<OpenRegistry, SRLRegistry> {
   SRLRegistryIvars* const known_;
 };
 
-// Addresses differ from run to run.
+// Replaces addresses, which differ from run to run.
 std::string withoutAddresses(const std::string& text) {
   std::string kept;
   for (std::size_t at = 0; at < text.size();) {
@@ -159,7 +159,7 @@ class Program {
  private:
   std::uint32_t upTo(std::uint32_t count) { return static_cast<std::uint32_t>(random_() % count); }
 
-  // An implementation for an API, most often one that fits it, at times one that another API has already.
+  // Returns an implementation for an API. Most fit the API. Some are those of another API.
   const SRLImplementationRegistrationData* implement(std::size_t api) {
     if (records_.size() == kMostRecords || (!records_.empty() && upTo(6) == 0)) {
       return &records_[upTo(static_cast<std::uint32_t>(records_.size()))];
@@ -170,7 +170,7 @@ class Program {
                                     Habit::kThrows,    Habit::kShares};
     const std::size_t record = records_.size();
     Habit habit = kHabits[upTo(kHabits.size())];
-    // Services ask for those before them, never for each other.
+    // A service requests only earlier ones, so that there is no cycle.
     if (habit == Habit::kAsks && api == 0) habit = Habit::kMakes;
     habits_.push_back(habit);
     targets_.push_back(api == 0 ? 0 : upTo(static_cast<std::uint32_t>(api)));
@@ -187,7 +187,7 @@ class Program {
 
   void bind(std::size_t api) {
     const std::string& name = names_.emplace_back("API" + std::to_string(api));
-    // Those that are bound by hand are for one.
+    // The APIs that are bound by hand are single-bound.
     const bool isMany = api < kAPIs - kByHand && upTo(3) == 0;
     apis_.push_back({.identifier = name.c_str(),
                      .instanceType = {.names = {.protocolName = nullptr, .className = "Product"}},
@@ -203,7 +203,7 @@ class Program {
     bindings_.push_back({&apis_[api], list.data()});
   }
 
-  // One with a block of its own, and one with a block that the registry has made, for any lifetime.
+  // Binds an implementation with a block of its own, and one with a block that the registry made.
   void bindByHand() {
     const SRLAPIRegistrationData& own = apis_[kAPIs - 2];
     const SRLAPIRegistrationData& made = apis_[kAPIs - 1];
@@ -368,7 +368,7 @@ class Program {
   int lastNull_ = 0;
   int made_ = 0;
 
-  // One, a copy of it, and none; and which of them is shared.
+  // A registry, a copy of it, and null. `shared_` says which of them is shared.
   const Ref<OpenRegistry> first_ = rt::make<OpenRegistry>(std::make_unique<SRLRegistryIvars>());
   std::array<Ref<OpenRegistry>, 3> registries_{first_, first_->duplicate()};
   std::size_t shared_ = 0;
@@ -380,7 +380,7 @@ Ref<rt::Object> makeProduct(SRLScopeTagSet tags) {
   return running->make(Record, tags);
 }
 
-TEST(SRLRegistryWays, LeaveTheSameTrace) {
+TEST(SRLRegistryWays, LeaveEqualTraces) {
   std::size_t countKept = 0;
   std::size_t countReports = 0;
   for (unsigned seed = 0; seed < kPrograms; ++seed) {
@@ -392,7 +392,7 @@ TEST(SRLRegistryWays, LeaveTheSameTrace) {
       if (line.find("scope") != std::string::npos) ++countReports;
     }
   }
-  // Programs in which nothing happens would agree, too.
+  // Programs that do nothing would have equal traces, too.
   EXPECT_GT(countKept, 1000U);
   EXPECT_GT(countReports, 1000U);
 }

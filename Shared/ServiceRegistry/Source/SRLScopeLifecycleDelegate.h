@@ -1,6 +1,6 @@
 #pragma once
 
-/// Who is told of scopes that end, and which instances outlived them.
+/// An observer of the scopes that end. It learns which instances outlive their scope.
 ///
 ///     class LeakWatch final : public rt::Implements<LeakWatch, rt::Object, SRLScopeLifecycleDelegate> {
 ///      public:
@@ -12,7 +12,7 @@
 ///       }
 ///     };
 ///
-/// Not for: keeping instances alive.
+/// Not for: keeping instances alive. The observer gets weak references only.
 
 #include <vector>
 
@@ -23,10 +23,10 @@
 #include "Runtime/Objects/Weak.h"
 
 struct RT_VISIBLE SRLScopeLifecycleDelegate : rt::Protocol<SRLScopeLifecycleDelegate> {
-  /// The scopes with `tag` have been removed, and have given up the instances that they had:
-  /// `serviceInstances`, of which those that are still there are kept by somebody else. Called on the thread
-  /// that removed them, without a lock. `serviceInstances` is empty where the delegate was set only after the
-  /// removal had begun.
+  /// Called after the registry has removed and released the scopes with `tag`. `serviceInstances` refers to
+  /// the instances that they held. Something else retains those that still exist. The list is empty if the
+  /// delegate was set after the removal began.
+  /// Threads: called on the thread that removed the scopes. No lock is held.
   virtual void didRemoveScopesWithTag(const rt::Ref<rt::Object>& tag,
                                       const std::vector<rt::Weak<rt::Object>>& serviceInstances) = 0;
 

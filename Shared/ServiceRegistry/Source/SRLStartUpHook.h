@@ -1,16 +1,16 @@
 #pragma once
 
-/// Where a program can do something before the registry looks for bindings modules: it defines this function
-/// itself, in place of the library's own, which does nothing and returns true.
+/// A function that a program may define to do something before the registry looks for bindings modules. The
+/// library's own definition does nothing and returns true.
 ///
 ///     bool SRLStartUpHook() {
 ///       prepareConfigurations();
 ///       return true;
 ///     }
 ///
-/// It runs when the program is loaded, before `main` and before the program's static objects are made. Its
-/// result is not looked at.
+/// It runs when the program is loaded, before `main` and before the program's static objects are constructed.
+/// The registry ignores the result.
 ///
-/// Not for: what can wait until `main`.
+/// Not for: work that can wait until `main`.
 
 bool SRLStartUpHook();

@@ -5,26 +5,31 @@
 ///     const rt::LockGuard guard(*registry->lock());
 ///     registry->internalRegisterServiceAPI(&clockAPI, implementation);
 ///
-/// It is not recursive: what takes it itself must not be called with it held, which ends the program.
+/// The lock is not recursive. A thread that holds it must not call a function that takes it: this ends the
+/// program.
 ///
-/// Some errors are reported while it is held, so error callbacks, log filters and loggers must not ask a
-/// registry for anything. One thread that reports and another whose callback asks would wait for each other
-/// for ever; a callback that finds the lock held, or an instance in the making, ends the program instead,
-/// with a line on standard error. Nor must they wait for anybody who asks: not for a lock that some thread
-/// holds while it asks, and not for a queue, the main one included, whose tasks ask. That nothing can find
-/// out.
+/// Some errors are reported while the lock is held. So error callbacks, log filters and loggers must not call
+/// a registry. Otherwise a thread that reports and a thread whose callback calls a registry could deadlock.
+/// Instead, an error callback that needs a held lock, or an instance that is being made, ends the program. It
+/// prints a line to standard error first.
+///
+/// Nor may callbacks wait for another thread that calls a registry. They must not take a lock that any thread
+/// holds during such a call. They must not wait for a queue, including the main queue, whose tasks make such
+/// calls. These deadlocks are not detected.
 ///
 /// Not for: anything but registries.
 
 #include "Runtime/Locks/UnfairLock.h"
 
 struct RT_CAPABILITY("lock") SRLUnfairLock {
+  /// Takes the lock. Blocks while another thread holds it.
   void lock() noexcept RT_ACQUIRE() RT_NO_THREAD_SAFETY_ANALYSIS {
     if (!unfair_lock_.tryLock()) [[unlikely]]
       lockHeld();
   }
+  /// Releases the lock. Ends the program if the caller does not hold it.
   void unlock() noexcept RT_RELEASE() RT_NO_THREAD_SAFETY_ANALYSIS { unfair_lock_.unlock(); }
-  /// Ends the program when the caller does not hold the lock.
+  /// Ends the program if the caller does not hold the lock.
   void assertOwner() const noexcept RT_ASSERT_CAPABILITY(this) RT_NO_THREAD_SAFETY_ANALYSIS {
     unfair_lock_.assertOwner();
   }
@@ -32,6 +37,6 @@ struct RT_CAPABILITY("lock") SRLUnfairLock {
   rt::UnfairLock unfair_lock_;
 
  private:
-  // What `lock` does where somebody holds it.
+  // The slow path of `lock`, for a lock that is held.
   [[gnu::cold]] void lockHeld() noexcept;
 };

@@ -1,4 +1,4 @@
-// Modules whose bindings cannot be found.
+// Modules whose bindings are not sorted, or have a wrong length. Each macro selects one mistake.
 #include <iterator>
 
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLBindingsModuleData.h"

@@ -1,10 +1,10 @@
 #pragma once
 
-/// The identifier of an API, as bytes and as a string.
+/// Functions that return an API's identifier, as bytes or as a string.
 ///
 ///     PECReport(site, "Incorrect binding type for %@"_s, SRLAPIIdentifier(api));
 ///
-/// Not for: telling APIs apart in tables, which go by the records' addresses.
+/// Not for: identifying APIs in tables. The record's address does that.
 
 #include <algorithm>
 #include <cstddef>
@@ -15,13 +15,13 @@
 #include "Runtime/Objects/String.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"
 
-/// The identifier's bytes, as many as the record says.
+/// Returns the identifier's bytes, of the length that the record gives.
 constexpr std::string_view SRLIdentifierBytes(const SRLAPIRegistrationData& api) noexcept {
   return {api.identifier, api.identifierLength};
 }
 
-/// A hash of identifiers, for tables: made where it is asked for, eight bytes at a time. The standard
-/// library's is a call of a function that takes longer than the rest of a look-up.
+/// Hashes an identifier for a table. It is inline and takes eight bytes at a time. The standard library's
+/// hash is a function call that takes longer than the rest of a look-up.
 struct SRLIdentifierHash {
   std::size_t operator()(std::string_view identifier) const noexcept {
     constexpr std::uint64_t kMultiplier = 0x9E3779B97F4A7C15;
@@ -42,8 +42,8 @@ struct SRLIdentifierHash {
   }
 };
 
-/// The identifier over the record's own bytes, or, where they are not UTF-8, over a repaired copy; null for
-/// null. Throws std::bad_alloc.
+/// Returns the identifier as a string over the record's own bytes. If they are not UTF-8, returns a repaired
+/// copy. Null for null. Throws std::bad_alloc.
 inline rt::String SRLAPIIdentifier(const SRLAPIRegistrationData* api) {
   if (api == nullptr) return {};
   const std::string_view bytes = SRLIdentifierBytes(*api);

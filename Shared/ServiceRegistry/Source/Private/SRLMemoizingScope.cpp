@@ -37,7 +37,7 @@ SRLPendingCreation* beginCreation(SRLMemoizingScopeIvars& ivars, const void* ide
     RT_REQUIRES(ivars.lock) {
   SRLPendingCreation* creation = nullptr;
   if (const auto found = ivars.pendingCreations.find(identifier); found != ivars.pendingCreations.end()) {
-    creation = found->second.get();  // Abandoned.
+    creation = found->second.get();  // Abandoned by a fork.
   } else if (auto entry = std::move(ivars.spareCreation)) {
     entry.key() = identifier;
     creation = entry.mapped().get();
@@ -52,11 +52,12 @@ SRLPendingCreation* beginCreation(SRLMemoizingScopeIvars& ivars, const void* ide
 void endCreation(SRLMemoizingScopeIvars& ivars, const void* identifier) RT_REQUIRES(ivars.lock) {
   auto entry = ivars.pendingCreations.extract(identifier);
   entry.mapped()->end();
-  // One that threads wait for is theirs until they have woken up.
+  // Waiting threads use an entry until they have woken up, so it is not reused.
   if (!entry.mapped()->isAwaited()) ivars.spareCreation = std::move(entry);
 }
 
-// Who makes the instance may wait to report, until the callback returns.
+// A callback must not wait for the instance. The thread that makes it may be waiting, too: for this callback
+// to return, so that it can report an error.
 [[noreturn]] void endInCallback(const void* identifier) noexcept {
   std::fprintf(stderr,
                "SRLMemoizingScope: an error callback asks for the instance for %p, which is being made; "
@@ -79,14 +80,14 @@ rt::Ref<rt::Object> SRLMemoizingScope::makeOrAwaitInstance(const void* identifie
   decltype(ivars.instances)::Node entry;
   {
     const rt::LockGuard guard(ivars.lock);
-    // It may have been made since.
+    // Another thread may have made it since the look-up without the lock.
     if (const auto* made = ivars.instances.find(identifier)) return made->second;
     if (const auto found = ivars.pendingCreations.find(identifier);
         found != ivars.pendingCreations.end() && !found->second->isAbandoned()) {
       awaited = found->second;
       awaited->expectWaiter();
     } else {
-      // First what may fail, so that an instance that has been made can always be kept.
+      // Allocates before the factory runs, so that storing the instance cannot fail.
       entry = ivars.instances.prepare(identifier, ivars.pendingCreations.size() + 1);
       begun = beginCreation(ivars, identifier);
     }
@@ -110,13 +111,13 @@ rt::Ref<rt::Object> SRLMemoizingScope::makeOrAwaitInstance(const void* identifie
   try {
     instance = factory();
   } catch (...) {
-    // It stays pending, but nobody has to wait for it any more.
+    // The instance stays pending, but no thread waits for it any more.
     begun->end();
     throw;
   }
   entry.mapped() = instance;
   const rt::LockGuard guard(ivars.lock);
-  // Nobody else has made one: they would have waited.
+  // No other thread has made it, since it would have waited.
   ivars.instances.insert(std::move(entry));
   endCreation(ivars, identifier);
   return instance;

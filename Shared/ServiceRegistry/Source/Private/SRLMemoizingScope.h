@@ -1,24 +1,24 @@
 #pragma once
 
-/// The instances of a scope, each made when it is first asked for, once, whichever threads ask.
+/// Holds the instances of a scope. Each is made once, by the first request for it.
 ///
 ///     rt::Ref<SRLMemoizingScope> scope = SRLMemoizingScope::init();
 ///     rt::Ref<rt::Object> clock =
 ///         scope->instanceForIdentifier(&systemClock, nullptr, [] { return rt::make<SystemClock>(); });
 ///
-/// Any thread may use it. No lock is held while an instance is made, so that a factory may ask the scope for
-/// what it needs. Who asks for an instance in the making waits until it is made; a factory must not ask for
-/// the one that it makes, nor an error callback for any of them, which ends the program.
+/// Threads: any thread may use it. No lock is held while an instance is made, so a factory may request other
+/// instances from the scope. A request for an instance that is being made blocks until it is made. If the
+/// factory of that instance or an error callback makes such a request, this ends the program.
 ///
-/// What a factory throws comes out of the request that called it. Its instance stays pending, since nobody
-/// can tell whether the factory may be called again: whoever waits for the instance, or asks for it later,
-/// gets a report and null. Memory for an instance is there before its factory runs: without it, nothing has
-/// begun.
+/// Errors: a request throws what its factory throws. The instance then stays pending, since nothing says
+/// whether the factory can be called again. Requests that wait for the instance report this and return null.
+/// So do later requests. Memory for the instance is allocated before its factory runs: if there is none,
+/// nothing has begun.
 ///
-/// In the child of a fork, an instance that another thread was making counts as not begun: who asks for it
-/// first makes it.
+/// In the child of a fork, an instance that another thread was making counts as not begun. The first request
+/// makes it.
 ///
-/// Not for: hosts. They ask SRLRegistry, which has a scope for each set of tags.
+/// Not for: hosts. They use SRLRegistry, which has a scope for each set of tags.
 
 #include <concepts>
 #include <memory>
@@ -36,17 +36,19 @@
 
 class RT_VISIBLE SRLMemoizingScope final : public rt::Implements<SRLMemoizingScope, rt::Object> {
  public:
-  /// Without instances. Throws std::bad_alloc.
+  /// Returns a scope without instances. Throws std::bad_alloc.
   static rt::Ref<SRLMemoizingScope> init();
 
-  /// The instance for `identifier`, an address that is only compared; null where the factory gave none. If
-  /// there is none yet, `factoryBlock` is called, or, if another thread calls its own for the same
-  /// identifier, that one is waited for. Where there was none, `instanceCreated`, unless it is null, then
-  /// points to whether this call has called the factory; else it is left as it is. Where the factory has
-  /// thrown before, that is reported, and yields null. Throws what the factory and the error callback throw,
-  /// and std::bad_alloc; nothing once the factory has returned.
+  /// Returns the instance for `identifier`. If there is none yet, calls `factoryBlock` to make it, or blocks
+  /// while another thread makes it. Null if the factory returned null.
   ///
-  /// The factory is a block or any other callable object, not null, that returns a reference.
+  /// - `identifier` is an address that is only compared.
+  /// - `instanceCreated` may be null. If there was no instance yet, `*instanceCreated` becomes whether this
+  ///   call called the factory. Otherwise it stays unchanged.
+  /// - `factoryBlock` is a block or another callable object that returns a reference. It is not null.
+  ///
+  /// Errors: if the factory has thrown before, that is reported and yields null. Throws what the factory and
+  /// the error callback throw, and std::bad_alloc. Throws nothing once the factory has returned.
   template <class Factory>
     requires std::invocable<const Factory&>
   rt::Ref<rt::Object> instanceForIdentifier(const void* identifier, bool* instanceCreated,
@@ -61,8 +63,8 @@ class RT_VISIBLE SRLMemoizingScope final : public rt::Implements<SRLMemoizingSco
     }
   }
 
-  /// Has `instance` be the one for `identifier`, which may be null, and returns true; false where there is
-  /// none yet. Takes no lock.
+  /// Sets `instance` to the instance for `identifier`, which may be null, and returns true. Returns false if
+  /// there is none yet. Takes no lock.
   bool findInstance(const void* identifier,
                     rt::Ref<rt::Object>& instance) const RT_NO_THREAD_SAFETY_ANALYSIS {
     const auto* found = std::as_const(ivars_->instances).find(identifier);
@@ -71,7 +73,7 @@ class RT_VISIBLE SRLMemoizingScope final : public rt::Implements<SRLMemoizingSco
     return true;
   }
 
-  /// The instances that there are, without nulls, in no particular order. Throws std::bad_alloc.
+  /// Returns the instances that exist, without nulls, in no particular order. Throws std::bad_alloc.
   rt::Ref<rt::Array> instances() const;
 
  private:
@@ -79,8 +81,8 @@ class RT_VISIBLE SRLMemoizingScope final : public rt::Implements<SRLMemoizingSco
 
   SRLMemoizingScope() : ivars_(std::make_unique_for_overwrite<SRLMemoizingScopeIvars>()) {}
 
-  // What `instanceForIdentifier` does where it found no instance. It looks once more, under the lock. The
-  // factory is no block, which would have to be allocated.
+  // The slow path of `instanceForIdentifier`. Looks for the instance once more, under the lock. The factory
+  // is not a block, which would allocate even for an existing instance.
   [[gnu::noinline]] rt::Ref<rt::Object> makeOrAwaitInstance(const void* identifier, bool* instanceCreated,
                                                             rt::FunctionView<rt::Ref<rt::Object>()> factory);
 

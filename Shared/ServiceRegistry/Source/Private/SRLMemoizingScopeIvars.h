@@ -1,6 +1,6 @@
 #pragma once
 
-/// What an SRLMemoizingScope knows.
+/// The state of an SRLMemoizingScope.
 ///
 ///     SRLMemoizingScopeIvars ivars;
 ///     const rt::LockGuard guard(ivars.lock);
@@ -18,22 +18,22 @@
 #include "Runtime/Objects/Ref.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLTable.h"
 
-/// The making of an instance: a lock that whoever makes it holds meanwhile, and for which the others wait.
+/// An instance that is being made. The thread that makes it holds a lock, for which other threads wait.
 class RT_VISIBLE SRLPendingCreation final : public rt::Implements<SRLPendingCreation, rt::Object> {
  public:
-  // A thread takes and lets go the lock in different functions, and only for the time between them.
+  // Not analysed, since one function takes the lock and another one releases it.
   void begin() noexcept RT_NO_THREAD_SAFETY_ANALYSIS { lock_.lock(); }
   void end() noexcept RT_NO_THREAD_SAFETY_ANALYSIS { lock_.unlock(); }
 
-  /// Says that a thread is going to wait. Whoever calls this and `isAwaited` holds the scope's lock.
+  /// Notes that a thread is going to wait. The caller of this and of `isAwaited` holds the scope's lock.
   void expectWaiter() noexcept { isAwaited_ = true; }
   bool isAwaited() const noexcept { return isAwaited_; }
 
-  /// Whether the thread that makes the instance is in another process, which a fork has left it behind in.
-  /// Then another may begin.
+  /// Returns whether a fork has left the thread that makes the instance behind, in the parent process.
+  /// Another thread may then begin.
   bool isAbandoned() const noexcept { return lock_.isAbandoned(); }
 
-  /// Waits until nobody makes the instance any more.
+  /// Blocks until no thread is making the instance.
   void wait() noexcept { const rt::LockGuard guard(lock_); }
 
  private:
@@ -42,10 +42,10 @@ class RT_VISIBLE SRLPendingCreation final : public rt::Implements<SRLPendingCrea
 };
 
 struct SRLMemoizingScopeIvars {
-  /// Nothing is taken out or replaced, so that whoever looks for an instance needs no lock.
+  /// Entries are never removed or replaced, so that looking for an instance needs no lock.
   SRLTable<const void*, rt::Ref<rt::Object>> instances RT_GUARDED_BY(lock);
   std::unordered_map<const void*, rt::Ref<SRLPendingCreation>> pendingCreations RT_GUARDED_BY(lock);
-  /// An entry that was pending, and that no thread has waited for, to be used again; or none.
+  /// A former entry of `pendingCreations`, for reuse. No thread has waited for it. May be empty.
   std::unordered_map<const void*, rt::Ref<SRLPendingCreation>>::node_type spareCreation RT_GUARDED_BY(lock);
   rt::UnfairLock lock;
 };

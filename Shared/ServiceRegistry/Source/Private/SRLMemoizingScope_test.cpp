@@ -34,7 +34,7 @@ using testing::IsEmpty;
 using Access = SRLMemoizingScopeTestAccess;
 using Factory = rt::Block<Ref<rt::Object>()>;
 
-// What identifies instances: addresses, whatever is there.
+// Two identifiers. Only their addresses matter.
 struct Identifiers {
   int first = 1;
   int second = 1;
@@ -81,7 +81,7 @@ TEST_F(SRLMemoizingScopeTest, MakesAnInstanceAtTheFirstRequest) {
   }
 }
 
-TEST_F(SRLMemoizingScopeTest, ReturnsItEverAfterAndLeavesTheFlagAlone) {
+TEST_F(SRLMemoizingScopeTest, ReturnsAnExistingInstanceAndLeavesTheFlagAlone) {
   const Ref<rt::Object> made = ask(&identifiers_.first, makeInstance);
   for (const bool before : {false, true}) {
     bool isCreated = before;
@@ -91,7 +91,7 @@ TEST_F(SRLMemoizingScopeTest, ReturnsItEverAfterAndLeavesTheFlagAlone) {
   EXPECT_EQ(ask(&identifiers_.first, mustNotRun), made);
 }
 
-TEST_F(SRLMemoizingScopeTest, GoesByTheAddressOfTheIdentifier) {
+TEST_F(SRLMemoizingScopeTest, IdentifiesInstancesByAddress) {
   ASSERT_EQ(identifiers_.first, identifiers_.second);
   const Ref<rt::Object> first = ask(&identifiers_.first, makeInstance);
   const Ref<rt::Object> second = ask(&identifiers_.second, makeInstance);
@@ -103,13 +103,13 @@ TEST_F(SRLMemoizingScopeTest, GoesByTheAddressOfTheIdentifier) {
   EXPECT_EQ(ask(nullptr, mustNotRun), third);
 }
 
-TEST_F(SRLMemoizingScopeTest, SharesNothingWithAnother) {
+TEST_F(SRLMemoizingScopeTest, SharesNoInstanceWithAnotherScope) {
   const Ref<rt::Object> made = ask(&identifiers_.first, makeInstance);
   EXPECT_NE(SRLMemoizingScope::init()->instanceForIdentifier(&identifiers_.first, nullptr, makeInstance),
             made);
 }
 
-TEST_F(SRLMemoizingScopeTest, KeepsNullToo) {
+TEST_F(SRLMemoizingScopeTest, KeepsANullInstance) {
   bool isCreated = false;
   EXPECT_EQ(ask(&identifiers_.first, [] { return nullptr; }, &isCreated), nullptr);
   EXPECT_TRUE(isCreated);
@@ -120,7 +120,7 @@ TEST_F(SRLMemoizingScopeTest, KeepsNullToo) {
   }
 }
 
-TEST_F(SRLMemoizingScopeTest, ListsTheInstancesInTheOrderOfItsTable) {
+TEST_F(SRLMemoizingScopeTest, ListsItsInstancesWithoutNulls) {
   std::array<char, 50> places{};
   for (std::size_t i = 0; i < places.size(); ++i) {
     ask(&places[i], [i]() -> Ref<rt::Object> { return i % 3 == 0 ? nullptr : rt::make<Instance>(); });
@@ -140,7 +140,7 @@ TEST_F(SRLMemoizingScopeTest, ListsTheInstancesInTheOrderOfItsTable) {
   EXPECT_TRUE(std::ranges::equal(*listed, expected));
 }
 
-TEST_F(SRLMemoizingScopeTest, KeepsItsInstancesUntilItGoes) {
+TEST_F(SRLMemoizingScopeTest, OwnsItsInstances) {
   Ref<SRLMemoizingScope> scope = SRLMemoizingScope::init();
   const rt::Weak<rt::Object> weak = scope->instanceForIdentifier(&identifiers_.first, nullptr, makeInstance);
   EXPECT_NE(weak.lock(), nullptr);
@@ -148,7 +148,7 @@ TEST_F(SRLMemoizingScopeTest, KeepsItsInstancesUntilItGoes) {
   EXPECT_EQ(weak.lock(), nullptr);
 }
 
-// A lock held meanwhile would end the program.
+// If the scope held a lock meanwhile, this would end the program.
 TEST_F(SRLMemoizingScopeTest, LetsAFactoryUseTheScope) {
   Ref<rt::Object> inner;
   const Ref<rt::Object> outer = ask(&identifiers_.first, [&]() -> Ref<rt::Object> {
@@ -162,8 +162,8 @@ TEST_F(SRLMemoizingScopeTest, LetsAFactoryUseTheScope) {
   EXPECT_EQ(ask(&identifiers_.second, mustNotRun), inner);
 }
 
-// What others could wait for is used again, whichever instances are made within each other.
-TEST_F(SRLMemoizingScopeTest, MakesInstancesOneAfterAnotherAndWithinEachOther) {
+// The entries of pending creations are reused, also if instances are made within each other.
+TEST_F(SRLMemoizingScopeTest, MakesInstancesInSequenceAndNested) {
   std::array<char, 30> places{};
   std::vector<Ref<rt::Object>> made(places.size());
   const auto make = [&](std::size_t i) {
@@ -186,9 +186,9 @@ TEST_F(SRLMemoizingScopeTest, MakesInstancesOneAfterAnotherAndWithinEachOther) {
   EXPECT_FALSE(ivars.spareCreation.empty());
 }
 
-// A lock that a thread may still be about to wait for is left to it: with the next creation's it would wait
-// for that one, too, and perhaps for ever.
-TEST_F(SRLMemoizingScopeTest, LeavesALockToThoseWhoWaitForIt) {
+// A thread may still be about to wait for the lock. If the next creation reused it, the thread would also
+// wait for that one, and perhaps for ever.
+TEST_F(SRLMemoizingScopeTest, DoesNotReuseALockThatAThreadWaitsFor) {
   SRLMemoizingScopeIvars& ivars = Access::ivars(scope_);
   std::thread other;
   ask(&identifiers_.first, [&] {
@@ -213,7 +213,7 @@ Ref<rt::Object> fail() {
   throw std::out_of_range("no instance");
 }
 
-TEST_F(SRLMemoizingScopeTest, LetsAnExceptionOutAndTheInstanceBePending) {
+TEST_F(SRLMemoizingScopeTest, ThrowsWhatTheFactoryThrowsAndLeavesTheInstancePending) {
   bool isCreated = false;
   try {
     ask(&identifiers_.first, fail, &isCreated);
@@ -246,8 +246,8 @@ void expectReportOfNoInstance(TestReports& reports) {
   EXPECT_FALSE(messages[0]->safeParameters());
 }
 
-// Used to end the program, as the thread held what it waited for.
-TEST_F(SRLMemoizingScopeTest, ReportsToTheSameThreadWhatItFailedToMake) {
+// This used to end the program, since the thread still held the lock that it waited for.
+TEST_F(SRLMemoizingScopeTest, ReportsAFailedInstanceToTheSameThread) {
   EXPECT_THROW(ask(&identifiers_.first, fail), std::out_of_range);
   TestReports reports;
   for (const bool before : {false, true}) {
@@ -263,8 +263,8 @@ TEST_F(SRLMemoizingScopeTest, ReportsToTheSameThreadWhatItFailedToMake) {
   EXPECT_TRUE(ask(&identifiers_.second, makeInstance));
 }
 
-// Used to wait for ever.
-TEST_F(SRLMemoizingScopeTest, ReportsToOtherThreadsWhatOneFailedToMake) {
+// The other threads used to wait for ever.
+TEST_F(SRLMemoizingScopeTest, ReportsAFailedInstanceToOtherThreads) {
   EXPECT_THROW(ask(&identifiers_.first, fail), std::out_of_range);
   TestReports reports;
   for (int i = 0; i < 2; ++i) {
@@ -277,8 +277,8 @@ TEST_F(SRLMemoizingScopeTest, ReportsToOtherThreadsWhatOneFailedToMake) {
   }
 }
 
-// Used to wait for ever. The thread that waits is known to be about to do so when the factory throws.
-TEST_F(SRLMemoizingScopeTest, WakesThoseWhoWaitForWhatAnotherFailsToMake) {
+// The thread used to wait for ever. The factory throws only once that thread is about to wait.
+TEST_F(SRLMemoizingScopeTest, WakesThreadsThatWaitForAFailedInstance) {
   SRLMemoizingScopeIvars& ivars = Access::ivars(scope_);
   TestReports reports;
   std::thread waiting;
@@ -299,13 +299,13 @@ TEST_F(SRLMemoizingScopeTest, WakesThoseWhoWaitForWhatAnotherFailsToMake) {
   expectReportOfNoInstance(reports);
 }
 
-// Memory for an instance is there before it is made: used to be asked for afterwards, and where there was
-// none, the instance was lost and stayed in the making for ever.
+// Memory for an instance is allocated before the factory runs. It used to be allocated afterwards. If there
+// was none, the instance was lost and stayed pending for ever.
 TEST_F(SRLMemoizingScopeTest, AllocatesNothingOnceTheFactoryHasReturned) {
   if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
   std::array<char, 100> places{};
   std::int64_t allocations = 0;
-  // Each is made within the one before, so that all are pending at once.
+  // Each instance is made within the previous one, so that all are pending at once.
   const std::function<Ref<rt::Object>(std::size_t)> make = [&](std::size_t i) {
     AllocationCount count;
     const Ref<rt::Object> made = scope_->instanceForIdentifier(&places[i], nullptr, [&] {
@@ -327,11 +327,11 @@ TEST_F(SRLMemoizingScopeTest, AllocatesNothingOnceTheFactoryHasReturned) {
 constexpr const char* kTakenAgain =
     "rt: the lock at 0x[0-9a-f]+ is taken again by thread [0-9]+, which holds it";
 
-TEST_F(SRLMemoizingScopeDeathTest, AFactoryThatAsksForWhatItMakesEndsTheProgram) {
+TEST_F(SRLMemoizingScopeDeathTest, AFactoryThatRequestsItsOwnInstanceEndsTheProgram) {
   EXPECT_DEATH(ask(&identifiers_.first, [&] { return ask(&identifiers_.first, makeInstance); }), kTakenAgain);
 }
 
-TEST_F(SRLMemoizingScopeDeathTest, SoDoFactoriesThatAskForEachOthersInstances) {
+TEST_F(SRLMemoizingScopeDeathTest, FactoriesThatRequestEachOthersInstancesEndTheProgram) {
   const Factory outer = [&] {
     return ask(&identifiers_.second, [&] { return ask(&identifiers_.first, makeInstance); });
   };

@@ -1,4 +1,4 @@
-// Many threads that ask for the same instances, or for others, at the same time.
+// Many threads that request the same instances, or different ones, at the same time.
 
 #include <gtest/gtest.h>
 
@@ -24,8 +24,8 @@ namespace {
 using rt::Ref;
 using Factory = rt::Block<Ref<rt::Object>()>;
 
-// Each factory waits until the other one runs too.
-TEST(SRLMemoizingScopeThreads, MakesDifferentInstancesAtTheSameTime) {
+// Each factory waits until the other one runs, too.
+TEST(SRLMemoizingScopeThreads, MakeDifferentInstancesAtTheSameTime) {
   const Ref<SRLMemoizingScope> scope = SRLMemoizingScope::init();
   const std::array<char, 2> places{};
   std::latch bothRun(2);
@@ -39,9 +39,9 @@ TEST(SRLMemoizingScopeThreads, MakesDifferentInstancesAtTheSameTime) {
   EXPECT_EQ(scope->instances()->count(), 2U);
 }
 
-// This thread asks while the other one's factory runs. It may all the same come so late that it finds the
-// instance, which the flag tells: then once more.
-TEST(SRLMemoizingScopeThreads, WaitForTheInstance) {
+// This thread requests the instance while the other one's factory runs. It may still be so late that it finds
+// the finished instance. The flag tells that, and the test tries again.
+TEST(SRLMemoizingScopeThreads, WaitForAnInstanceThatIsBeingMade) {
   constexpr int kMostTries = 1000;
   bool hasWaited = false;
   for (int i = 0; i < kMostTries && !hasWaited; ++i) {
@@ -70,21 +70,21 @@ TEST(SRLMemoizingScopeThreads, WaitForTheInstance) {
   EXPECT_TRUE(hasWaited);
 }
 
-// Two scopes and the same identifiers in both, with factories of all kinds. Which ask for others ask only
-// for later ones, of either scope.
+// Two scopes with the same identifiers and with factories of several kinds. A nested factory requests only
+// later instances, of either scope.
 class Workshop {
  public:
   static constexpr std::size_t kIdentifiers = 10'000;
   static constexpr std::size_t kOrders = 2 * kIdentifiers;
 
-  // What is known of an identifier in a scope.
+  // The state of an identifier in a scope.
   struct Order {
     enum Kind : std::uint8_t { kPlain, kNull, kSlow, kYielding, kNested };
     Kind kind = kPlain;
     std::vector<std::size_t> needed;
     std::atomic<int> runs = 0;
     std::atomic<int> flags = 0;
-    // Written by the factory, read by whoever was given the instance.
+    // Written by the factory, and read by every thread that got the instance.
     Ref<rt::Object> made;
   };
 
@@ -149,9 +149,9 @@ class Workshop {
   std::atomic<int> strangers_ = 0;
 };
 
-// Invariant: each factory runs once, whoever asks gets what it made, and exactly one of those who ask sees
-// the flag true. Half of the threads ask in the same order, and so for the same at the same time.
-TEST(SRLMemoizingScopeThreads, MakesEachInstanceOnceWhoeverAsks) {
+// Invariant: each factory runs once, every request returns its result, and exactly one request sets the flag
+// to true. Half of the threads make their requests in the same order, and so at about the same time.
+TEST(SRLMemoizingScopeThreads, MakeEachInstanceOnce) {
   constexpr std::uint32_t kThreads = 8;
   const auto workshop = std::make_unique<Workshop>(41);
   std::latch start(kThreads);

@@ -1,6 +1,6 @@
 #pragma once
 
-/// Reports after which nothing can go on, since generated code is wrong.
+/// Reports a mistake in generated code, and ends the program.
 ///
 ///     switch (api->instanceTypeKind) {
 ///       ...
@@ -9,10 +9,10 @@
 ///                        "APIs cannot be of an unknown type"_s);
 ///     }
 ///
-/// Not for: what a program can do wrong while it runs (PECReport).
+/// Not for: mistakes that a program can survive (PECReport).
 
 #include "Libraries/Util/ErrorHandler/PECReport.h"
 #include "Runtime/Text/FormatString.h"
 
-/// Reports `message`, and ends the program, whether the error callback returns or throws.
+/// Reports `message` and ends the program, whether the error callback returns or throws.
 [[noreturn]] void SRLReportFatal(const PECReportSite& site, const rt::FormatString<>& message) noexcept;

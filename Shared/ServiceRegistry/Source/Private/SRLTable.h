@@ -1,24 +1,24 @@
 #pragma once
 
-/// A table that is quick to look into, also for threads that hold no lock.
+/// A hash table with fast look-ups, which need no lock.
 ///
 ///     SRLTable<const void*, rt::Ref<rt::Object>> instances;
 ///     instances.insert(identifier, instance);                                   // with the lock
 ///     if (const auto* found = instances.find(identifier)) use(found->second);   // with it or without
 ///
-/// It exists for two reasons. A thread may look for an instance without the lock while another inserts one,
-/// which no `std::unordered_map` allows. And that map finds an entry by a division: a look-up in 1 to 1000
-/// entries takes it 2.1 to 4.0 ns, and this table 1.1 to 1.9 ns (g++ 12, a busy virtual machine; trust the
-/// order). `script/bench Registry` compares whole requests with a container of such maps.
+/// It exists for two reasons. A thread may look for an instance without the lock while another one inserts
+/// one, which `std::unordered_map` does not allow. And that map needs a division to find an entry. A look-up
+/// in 1 to 1000 entries takes the map 2.1 to 4.0 ns, and this table 1.1 to 1.9 ns (g++ 12, on a busy virtual
+/// machine; trust the order). `script/bench Registry` compares whole requests with a container of such maps.
 ///
-/// The entries are those of a `std::unordered_map`, and an index finds them: a power of two of places, at
-/// least half of them free. When it grows, the one that was there is kept for those who may still look into
-/// it.
+/// A `std::unordered_map` owns the entries, and an index finds them. Its number of places is a power of two,
+/// and at least half of them are free. When the index grows, the old one is kept, since threads may still be
+/// reading it.
 ///
-/// Threads that change a table, or walk through it, take turns. Others may look into it meanwhile, as long as
-/// none takes entries out, or assigns to a value that another may look at.
+/// Threads: changing a table and iterating over it need a lock. Looking into it needs none, unless a thread
+/// removes entries or assigns to a value that another thread may read.
 ///
-/// Not for: tables that are rarely looked into.
+/// Not for: tables with few look-ups.
 
 // The index only grows, and keeps the arrays that it has replaced. So instances of a scope, and APIs by
 // identifier, are found without a lock, and a request takes one lock: the registry's. A scope's lock may be
@@ -53,16 +53,16 @@ class SRLTable {
   SRLTable& operator=(const SRLTable&) = delete;
   ~SRLTable() { delete index(); }
 
-  /// The entry for `key`, which stays where it is; null where there is none. Neither locks nor allocates.
-  /// Throws what comparing keys throws.
+  /// Returns the entry for `key`, whose address never changes. Null if there is none. Neither locks nor
+  /// allocates. Throws what comparing keys throws.
   const Entry* find(const Key& key) const {
     const Index* index = index_.load(std::memory_order_acquire);
     return index != nullptr ? index->find(key) : nullptr;
   }
   Entry* find(const Key& key) { return const_cast<Entry*>(std::as_const(*this).find(key)); }
 
-  /// The entry for `key`: the one that there is, or else a new one with `value`. Throws std::bad_alloc, and
-  /// what comparing keys throws; then nothing has changed.
+  /// Returns the entry for `key`. Adds one with `value` if there is none. Throws std::bad_alloc and what
+  /// comparing keys throws. Nothing has changed then.
   template <class Given>
   Entry& insert(const Key& key, Given&& value) {
     makeRoom(1);
@@ -71,44 +71,45 @@ class SRLTable {
     return *entry;
   }
 
-  /// An entry for `key` that is not in the table yet, to be given a value and inserted later. There is room
-  /// for `count` more entries from now on, so that inserting as many prepared ones cannot fail. Throws
-  /// std::bad_alloc; then nothing has changed.
+  /// Returns an entry for `key` that is not in the table yet. The caller sets its value and inserts it later.
+  /// Makes room for `count` more entries, so that inserting as many prepared ones cannot fail. Throws
+  /// std::bad_alloc. Nothing has changed then.
   Node prepare(const Key& key, std::size_t count) {
     makeRoom(count);
     return entries_.extract(entries_.try_emplace(key).first);
   }
 
-  /// Inserts an entry that `prepare` has made, for whose key there is none yet. Does not allocate.
+  /// Inserts an entry that `prepare` returned. The table has none for its key yet. Does not allocate.
   Entry& insert(Node&& prepared) noexcept {
     Entry& entry = *entries_.insert(std::move(prepared)).position;
     index()->insert(entry);
     return entry;
   }
 
-  /// The same where nobody minds if there is no entry: without memory there is none.
+  /// Does the same as `insert`, but nothing if there is no memory. For entries that are only caches.
   template <class Given>
   void tryInsert(const Key& key, Given&& value) {
     try {
       insert(key, std::forward<Given>(value));
-    } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): as it says
+    } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): then there is no entry
     }
   }
 
-  /// The value for `key`, made where there is none. Throws as `insert` does.
+  /// Returns the value for `key`. Adds an entry with a default value if there is none. Throws like `insert`.
   Value& operator[](const Key& key) {
     Entry* found = find(key);
     return (found != nullptr ? *found : insert(key, Value())).second;
   }
 
-  /// Takes the entry for `key` out, if there is one. No other thread may look into the table meanwhile.
+  /// Removes the entry for `key`, if there is one. No other thread may look into the table meanwhile.
   void erase(const Key& key) {
     if (entries_.erase(key) == 0) return;
     index()->clear();
     for (const Entry& entry : entries_) index()->insert(entry);
   }
 
-  /// Takes entries of the table out of it. Throws std::bad_alloc; then nothing has changed.
+  /// Removes entries of the table and returns them. No other thread may look into the table meanwhile. Throws
+  /// std::bad_alloc. Nothing has changed then.
   std::vector<Node> extract(const std::vector<typename Entries::const_iterator>& entries) {
     std::vector<Node> nodes;
     if (entries.empty()) return nodes;
@@ -120,13 +121,13 @@ class SRLTable {
     return nodes;
   }
 
-  /// The entries, to walk through.
+  /// Returns the entries, for iterating.
   const Entries& entries() const noexcept { return entries_; }
 
  private:
   class Index {
    public:
-    // With room for twice as many entries as `count`.
+    // Makes an empty index with room for twice as many entries as `count`.
     explicit Index(std::size_t count)
         : lastPlace_(std::bit_ceil(std::max(4 * count, kPlacesOfSmallest)) - 1),
           shift_(std::countl_zero(std::uint64_t{lastPlace_})),
@@ -141,7 +142,7 @@ class SRLTable {
       }
     }
 
-    // There is room, and no entry with its key.
+    // Precondition: there is room, and no entry with the same key.
     void insert(const Entry& entry) noexcept {
       std::size_t at = start(entry.first);
       while (places_[at].load(std::memory_order_relaxed) != nullptr) at = next(at);
@@ -154,19 +155,20 @@ class SRLTable {
       count_ = 0;
     }
 
-    // Owned from now on.
+    // Owns `replaced` from now on.
     void keep(const Index* replaced) noexcept { replaced_.reset(replaced); }
 
    private:
     static constexpr std::size_t kPlacesOfSmallest = 8;
 
-    // By the upper bits of a product, which depend on all bits of the hash: that of an address ends in zeros.
+    // Takes the upper bits of a product, which depend on all bits of the hash. An address's hash ends in
+    // zeros.
     std::size_t start(const Key& key) const noexcept { return Hash()(key) * 0x9E3779B97F4A7C15U >> shift_; }
     std::size_t next(std::size_t at) const noexcept { return (at + 1) & lastPlace_; }
 
     const std::size_t lastPlace_;
     const int shift_;
-    // Not a vector, which compares each place with its length where assertions are on.
+    // Not a vector, which checks each access against its size where assertions are on.
     // NOLINTNEXTLINE(modernize-avoid-c-arrays)
     const std::unique_ptr<std::atomic<const Entry*>[]> places_;
     std::size_t count_ = 0;
@@ -183,7 +185,7 @@ class SRLTable {
     index_.store(larger.release(), std::memory_order_release);
   }
 
-  // One with room for `count` more entries.
+  // Returns an index of all entries, with room for `count` more.
   std::unique_ptr<Index> makeIndex(std::size_t count) const {
     auto made = std::make_unique<Index>(entries_.size() + count);
     for (const Entry& entry : entries_) made->insert(entry);

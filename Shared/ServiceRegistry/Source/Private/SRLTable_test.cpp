@@ -45,7 +45,7 @@ TEST(SRLTable, KeepsTheFirstValueOfAKey) {
   EXPECT_THAT(table.entries(), UnorderedElementsAre(std::pair(1, "one")));
 }
 
-TEST(SRLTable, MakesAValueThatIsReferredTo) {
+TEST(SRLTable, AddsADefaultValueForANewKey) {
   Table table;
   EXPECT_EQ(table[1], "");
   table[1] = "one";
@@ -80,7 +80,7 @@ std::vector<Table::Entries::const_iterator> iteratorsOf(const Table& table, bool
   return wanted;
 }
 
-TEST(SRLTable, GivesUpEntries) {
+TEST(SRLTable, ExtractsEntries) {
   Table table;
   for (int i = 0; i < 100; ++i) table[i] = std::to_string(i);
   const Table::Entry* kept = table.find(50);
@@ -100,8 +100,8 @@ TEST(SRLTable, GivesUpEntries) {
   EXPECT_EQ(table.find(50), nullptr);
 }
 
-// Keys whose hashes all collide are told apart nevertheless.
-TEST(SRLTable, TellsKeysOfOneHashApart) {
+// All hashes collide.
+TEST(SRLTable, TellsKeysWithEqualHashesApart) {
   struct Constant {
     std::size_t operator()(int) const noexcept { return 42; }
   };
@@ -122,7 +122,7 @@ TEST(SRLTable, ErasesAnEntry) {
   EXPECT_EQ(table.insert(50, "again").second, "again");
 }
 
-TEST(SRLTable, DoesNotFindWhatIsOnlyPrepared) {
+TEST(SRLTable, DoesNotFindAPreparedEntry) {
   Table table;
   Table::Node node = table.prepare(1, 1);
   EXPECT_EQ(table.find(1), nullptr);
@@ -136,8 +136,8 @@ TEST(SRLTable, DoesNotFindWhatIsOnlyPrepared) {
   EXPECT_THAT(table.entries(), UnorderedElementsAre(std::pair(1, "one")));
 }
 
-// However many are prepared before the first comes in.
-TEST(SRLTable, HasRoomForWhatIsPrepared) {
+// For any number of entries that are prepared before the first is inserted.
+TEST(SRLTable, HasRoomForAllPreparedEntries) {
   if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
   for (std::size_t known = 0; known < 40; ++known) {
     for (std::size_t prepared = 1; prepared < 40; ++prepared) {
@@ -153,9 +153,9 @@ TEST(SRLTable, HasRoomForWhatIsPrepared) {
   }
 }
 
-// Whatever is done to both, a table and a map have the same entries, and the table finds them where they
-// were.
-TEST(SRLTable, DoesWhatAMapDoes) {
+// Random operations on a table and on a map leave the same entries in both. The table's entries stay at their
+// addresses.
+TEST(SRLTable, BehavesLikeAMap) {
   std::mt19937 random(20261121);
   Table table;
   std::map<int, std::string> model;
@@ -199,8 +199,8 @@ TEST(SRLTable, DoesWhatAMapDoes) {
   for (const auto& [key, value] : table.entries()) EXPECT_EQ(model.at(key), value);
 }
 
-// A key that cannot be compared changes nothing.
-TEST(SRLTable, IsAsItWasWhereAKeyThrows) {
+// Comparing the key 13 throws.
+TEST(SRLTable, IsUnchangedIfComparingKeysThrows) {
   struct Throwing {
     bool operator()(int first, int second) const {
       if (first == 13 || second == 13) throw std::runtime_error("13");
@@ -219,7 +219,7 @@ TEST(SRLTable, IsAsItWasWhereAKeyThrows) {
   EXPECT_EQ(table[3], 3);
 }
 
-TEST(SRLTable, IsAsItWasWhereThereIsNoMemory) {
+TEST(SRLTable, IsUnchangedIfThereIsNoMemory) {
   struct Key {
     explicit Key(int given) : number(given) {}
     Key(const Key& other) : number(other.number) {
@@ -254,9 +254,9 @@ TEST(SRLTable, FindsWithoutAllocating) {
   EXPECT_EQ(count.allocations(), 0);
 }
 
-// Who looks for a key finds it with its value once somebody has said that it is there, and before that finds
-// it with its value or not at all. Every few keys, all look for one.
-TEST(SRLTable, IsLookedIntoWhileItGrows) {
+// A reader finds each announced key with its value. It finds other keys with their value or not at all. Every
+// few keys, the writer waits until each reader has looked for a key.
+TEST(SRLTable, CanBeLookedIntoWhileItGrows) {
   constexpr int kKeys = 5000;
   constexpr int kKeysAtATime = 250;
   constexpr unsigned kReaders = 3;

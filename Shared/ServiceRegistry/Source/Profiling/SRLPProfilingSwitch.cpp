@@ -1,6 +1,6 @@
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingSwitch.h"
 
-// Weak, so that a program may define it, too.
+// Weak, so that a program can define its own.
 [[gnu::weak]] bool SRLPProfilingSwitch() {
   return MOUNT_POINT_PROFILING != 0;
 }

@@ -1,13 +1,13 @@
 #pragma once
 
-/// Whether this build measures how long services take to be made.
+/// The function that decides whether a program measures how long services take to be made.
 ///
 ///     bool SRLPProfilingSwitch() { return true; }       // in a source file of the program: it does
 ///
-/// The library's own answers what it was configured with, MOUNT_POINT_PROFILING, which is off unless it is
-/// set. A program that defines the function itself gets its own answer instead.
+/// The library's own definition returns the value of the CMake option MOUNT_POINT_PROFILING, which is off by
+/// default. A program can define the function itself and so replace that definition.
 ///
-/// Not for: asking whether profiling is on (SRLPProfilingEnabled.h). The registry asks this function once in
-/// a process, on whichever thread needs to know first.
+/// Not for: asking whether profiling is on (SRLPProfilingEnabled.h). The registry calls this function once
+/// per process, on the first thread that needs the answer.
 
 bool SRLPProfilingSwitch();

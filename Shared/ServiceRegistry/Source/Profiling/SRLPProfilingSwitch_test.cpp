@@ -1,4 +1,4 @@
-// What the switch answers in a program that defines none: what the build was configured with.
+// The switch in a program that does not define it: it returns what the build was configured with.
 
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingSwitch.h"
 
@@ -8,7 +8,7 @@
 
 namespace {
 
-TEST(SRLPProfilingSwitch, AnswersWhatTheBuildWasConfiguredWith) {
+TEST(SRLPProfilingSwitch, ReturnsWhatTheBuildWasConfiguredWith) {
   EXPECT_EQ(SRLPProfilingSwitch(), MOUNT_POINT_PROFILING != 0);
   EXPECT_EQ(SRLPProfilingEnabled(), MOUNT_POINT_PROFILING != 0);
 }

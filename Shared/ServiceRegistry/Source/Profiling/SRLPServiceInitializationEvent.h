@@ -1,15 +1,17 @@
 #pragma once
 
-/// That an instance which is shared in its scope was made.
+/// An event of profiling: an instance that is shared in its scope was made.
 ///
 ///     SRLProfilingStorage::sharedInstance()->storeServiceInitializationEvent(
 ///         SRLPServiceInitializationEvent::initWithAPIDescription(
 ///             "Clock"_s, implementation->description(), start, duration, rt::Thread::currentHandle(),
 ///             nullptr));
 ///
-/// Immutable: any thread may use it. Equal to itself only.
+/// An event is equal only to itself.
 ///
-/// Not for: hosts, which ask for the protocol that it conforms to.
+/// Threads: immutable; any thread may use it.
+///
+/// Not for: hosts. They use the protocol that it conforms to.
 
 #include <cstdint>
 #include <utility>
@@ -25,7 +27,7 @@ class RT_VISIBLE SRLPServiceInitializationEvent final
     : public rt::Implements<SRLPServiceInitializationEvent, rt::Object,
                             SRLPServiceInitializationEventProtocol> {
  public:
-  /// With what its accessors return. Each string may be null. Throws std::bad_alloc.
+  /// Returns an event with these values. Each string may be null. Throws std::bad_alloc.
   static rt::Ref<SRLPServiceInitializationEvent> initWithAPIDescription(
       rt::String apiDescription, rt::String implDescription, std::uint64_t monotonicRawClockStartTime,
       std::uint64_t durationNs, const void* callingThread, rt::String parentImplDescription);
@@ -37,7 +39,7 @@ class RT_VISIBLE SRLPServiceInitializationEvent final
   const void* callingThread() const noexcept override { return callingThread_; }
   const rt::String& parentImplDescription() const noexcept override { return parentImplDescription_; }
 
-  /// "SRLPServiceInitializationEvent<ADDRESS, apiDescription: API, implDescription: IMPLEMENTATION,
+  /// Returns "SRLPServiceInitializationEvent<ADDRESS, apiDescription: API, implDescription: IMPLEMENTATION,
   /// monotonicRawClockStartTime: 1, durationNs: 2, callingThread: HANDLE, parentImplDescription: (null)>".
   rt::String description() const override;
 

@@ -1,15 +1,16 @@
 #pragma once
 
-/// The making of an instance that is shared in its scope: what, when, for how long, on which thread, and for
-/// whom.
+/// An event of profiling: an instance that is shared in its scope was made. It says what was made, when, how
+/// long that took, on which thread, and what needed it.
 ///
 ///     void print(const SRLPServiceInitializationEventProtocol& event) {
 ///       std::cout << event.implDescription().view() << ": " << event.durationNs() << " ns\n";
 ///     }
 ///
-/// Immutable: any thread may ask.
+/// Threads: immutable; any thread may use it.
 ///
-/// Not for: instances of which every request makes one (SRLPServiceInitializationNewInstanceEventProtocol).
+/// Not for: implementations that make a new instance at every request
+/// (SRLPServiceInitializationNewInstanceEventProtocol).
 
 #include <cstdint>
 
@@ -19,18 +20,19 @@
 
 struct RT_VISIBLE SRLPServiceInitializationEventProtocol
     : rt::Protocol<SRLPServiceInitializationEventProtocol> {
-  /// The API's identifier; repaired where it is not UTF-8.
+  /// The API's identifier. Invalid UTF-8 in it is repaired.
   virtual const rt::String& apiDescription() const = 0;
-  /// The implementation, described in full.
+  /// The implementation's `description`.
   virtual const rt::String& implDescription() const = 0;
-  /// When the making began, by the clock of Runtime/Base/Private/MonotonicClock.h.
+  /// When the making began, in nanoseconds by the clock of Runtime/Base/Private/MonotonicClock.h.
   virtual std::uint64_t monotonicRawClockStartTime() const = 0;
-  /// How long it took, with what was made meanwhile.
+  /// How long the making took, including other instances that were made for it.
   virtual std::uint64_t durationNs() const = 0;
-  /// The handle of the thread on which it began. That thread may have ended, and another may have the same
-  /// handle since.
+  /// The handle of the thread on which the making began. After that thread ends, another one may get the same
+  /// handle.
   virtual const void* callingThread() const = 0;
-  /// What the implementation makes that needed this one, described by its type only; null where none did.
+  /// The instance type of the implementation that needed this instance. Null if none did, or if it has no
+  /// instance type.
   virtual const rt::String& parentImplDescription() const = 0;
 
  protected:

@@ -1,4 +1,4 @@
-// An event for a shared instance.
+// The event for an instance that is shared in its scope.
 
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationEvent.h"
 
@@ -27,7 +27,7 @@ std::string hexadecimal(const void* pointer) {
   return text;
 }
 
-TEST(SRLPServiceInitializationEvent, SaysWhatItWasMadeWith) {
+TEST(SRLPServiceInitializationEvent, ReturnsWhatItWasMadeWith) {
   const int thread = 0;
   const Ref<SRLPServiceInitializationEvent> event = SRLPServiceInitializationEvent::initWithAPIDescription(
       "Clock"_s, "SystemClock<...>"_s, 1, kGreatest, &thread, "Alarm"_s);
@@ -40,7 +40,7 @@ TEST(SRLPServiceInitializationEvent, SaysWhatItWasMadeWith) {
   EXPECT_EQ(asked.parentImplDescription(), "Alarm");
 }
 
-TEST(SRLPServiceInitializationEvent, IsDescribedByAllThatItSays) {
+TEST(SRLPServiceInitializationEvent, DescribesItselfWithAllItsValues) {
   const int thread = 0;
   const Ref<SRLPServiceInitializationEvent> event = SRLPServiceInitializationEvent::initWithAPIDescription(
       "Clock"_s, "SystemClock<...>"_s, kGreatest, 20, &thread, "Alarm"_s);
@@ -51,7 +51,7 @@ TEST(SRLPServiceInitializationEvent, IsDescribedByAllThatItSays) {
                 hexadecimal(&thread) + ", parentImplDescription: Alarm>");
 }
 
-TEST(SRLPServiceInitializationEvent, MayLackItsTexts) {
+TEST(SRLPServiceInitializationEvent, AcceptsNullStrings) {
   const Ref<SRLPServiceInitializationEvent> event =
       SRLPServiceInitializationEvent::initWithAPIDescription(nullptr, nullptr, 0, 0, nullptr, nullptr);
   EXPECT_TRUE(event->apiDescription().isNull());
@@ -64,7 +64,7 @@ TEST(SRLPServiceInitializationEvent, MayLackItsTexts) {
                 hexadecimal(nullptr) + ", parentImplDescription: (null)>");
 }
 
-TEST(SRLPServiceInitializationEvent, IsKnownByItsProtocolAndEqualToItselfOnly) {
+TEST(SRLPServiceInitializationEvent, ConformsToItsProtocolAndEqualsOnlyItself) {
   const auto make = [] {
     return SRLPServiceInitializationEvent::initWithAPIDescription("Clock"_s, "SystemClock"_s, 1, 2, nullptr,
                                                                   nullptr);

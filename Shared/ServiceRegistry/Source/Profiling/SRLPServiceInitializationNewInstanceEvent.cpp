@@ -5,9 +5,9 @@
 
 namespace {
 
-/// `value`, not negative, without what is behind the point.
+// Returns `value`, which is not negative, without its fraction.
 std::uint64_t truncated(double value) noexcept {
-  // The average of the largest durations is rounded up to 2^64, which no integer here can hold.
+  // In double precision, the average of the longest durations is 2^64, which does not fit into the result.
   constexpr double kEnd = 0x1p64;
   return value < kEnd ? static_cast<std::uint64_t>(value) : std::numeric_limits<std::uint64_t>::max();
 }
@@ -35,7 +35,7 @@ void SRLPServiceInitializationNewInstanceEvent::addInitializationWithDurationNs(
 }
 
 rt::Ref<rt::Object> SRLPServiceInitializationNewInstanceEvent::copy() const {
-  // Without the first duration, by which readers tell a copy.
+  // A first duration of 0 tells readers that this is a copy.
   const auto copied = initWithAPIDescription(apiDescription_, implDescription_, 0);
   copied->initializationCount_ = initializationCount_;
   copied->averageDurationNs_ = averageDurationNs_;

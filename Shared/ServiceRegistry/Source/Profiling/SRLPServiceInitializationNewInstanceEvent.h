@@ -1,14 +1,16 @@
 #pragma once
 
-/// The sum of the instances that an implementation made, where every request makes one.
+/// The statistics of profiling about an implementation that makes a new instance at every request.
 ///
 ///     auto event = SRLPServiceInitializationNewInstanceEvent::initWithAPIDescription("Clock"_s, text, 10);
 ///     event->addInitializationWithDurationNs(15);
 ///     event->averageDurationNs();                        // 12
 ///
-/// Threads that share one hold a lock, as SRLProfilingStorage does. Equal to itself only.
+/// An event is equal only to itself.
 ///
-/// Not for: hosts, which ask for the protocol that it conforms to.
+/// Threads: not thread-safe. Threads that share one must hold a lock, as SRLProfilingStorage does.
+///
+/// Not for: hosts. They use the protocol that it conforms to.
 
 #include <cstdint>
 #include <utility>
@@ -24,13 +26,14 @@ class RT_VISIBLE SRLPServiceInitializationNewInstanceEvent final
     : public rt::Implements<SRLPServiceInitializationNewInstanceEvent, rt::Object,
                             SRLPServiceInitializationNewInstanceEventProtocol> {
  public:
-  /// Of one instance, which took `durationNs`. Either string may be null. Throws std::bad_alloc.
+  /// Returns an event for one instance, which took `durationNs` to make. Either string may be null. Throws
+  /// std::bad_alloc.
   static rt::Ref<SRLPServiceInitializationNewInstanceEvent> initWithAPIDescription(rt::String apiDescription,
                                                                                    rt::String implDescription,
                                                                                    std::uint64_t durationNs);
 
-  /// Counts another instance, which took `durationNs`. The average is reckoned in double precision, and is
-  /// at most the largest number of 64 bits.
+  /// Counts another instance, which took `durationNs` to make. Computes the average in double precision. It
+  /// is at most 2^64 - 1.
   void addInitializationWithDurationNs(std::uint64_t durationNs) noexcept;
 
   const rt::String& apiDescription() const noexcept override { return apiDescription_; }
@@ -40,7 +43,7 @@ class RT_VISIBLE SRLPServiceInitializationNewInstanceEvent final
   std::uint64_t maximumDurationNs() const noexcept override { return maximumDurationNs_; }
   std::uint64_t firstDurationNs() const noexcept override { return firstDurationNs_; }
 
-  /// A new event that says the same, but for `firstDurationNs`, which is 0. Throws std::bad_alloc.
+  /// Returns a new event with the same values, but with a `firstDurationNs` of 0. Throws std::bad_alloc.
   rt::Ref<rt::Object> copy() const override;
 
  private:

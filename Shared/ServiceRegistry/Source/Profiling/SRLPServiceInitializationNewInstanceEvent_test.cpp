@@ -1,4 +1,4 @@
-// The sums of instances that are new at every request.
+// The statistics about an implementation that makes a new instance at every request.
 
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPServiceInitializationNewInstanceEvent.h"
 
@@ -35,7 +35,7 @@ Ref<Event> eventOf(std::uint64_t first, std::initializer_list<std::uint64_t> oth
   return event;
 }
 
-TEST(SRLPServiceInitializationNewInstanceEvent, BeginsWithOneInstance) {
+TEST(SRLPServiceInitializationNewInstanceEvent, StartsWithOneInstance) {
   const Ref<Event> event = eventOf(10);
   EXPECT_EQ(event->apiDescription(), "Clock");
   EXPECT_EQ(event->implDescription(), "SystemClock<...>");
@@ -44,7 +44,7 @@ TEST(SRLPServiceInitializationNewInstanceEvent, BeginsWithOneInstance) {
   expect(*eventOf(kGreatest), 1, kGreatest, kGreatest, kGreatest);
 }
 
-TEST(SRLPServiceInitializationNewInstanceEvent, AddsUp) {
+TEST(SRLPServiceInitializationNewInstanceEvent, ComputesCountAverageAndMaximum) {
   expect(*eventOf(10, {20}), 2, 15, 20, 10);
   expect(*eventOf(10, {20, 30}), 3, 20, 30, 10);
   expect(*eventOf(30, {20, 10}), 3, 20, 30, 30);
@@ -52,26 +52,26 @@ TEST(SRLPServiceInitializationNewInstanceEvent, AddsUp) {
   expect(*eventOf(0, {0}), 2, 0, 0, 0);
 }
 
-TEST(SRLPServiceInitializationNewInstanceEvent, DropsWhatIsBehindThePointEachTime) {
+TEST(SRLPServiceInitializationNewInstanceEvent, DropsTheFractionOfTheAverageEachTime) {
   expect(*eventOf(10, {15}), 2, 12, 15, 10);      // of 12.5
   expect(*eventOf(10, {15, 14}), 3, 12, 15, 10);  // of 38 / 3, not of 39 / 3
   expect(*eventOf(0, {1}), 2, 0, 1, 0);           // of 0.5
   expect(*eventOf(0, {1, 2}), 3, 0, 2, 0);        // of 2 / 3, not of 3 / 3
 }
 
-TEST(SRLPServiceInitializationNewInstanceEvent, ReckonsTheAverageInDoublePrecision) {
+TEST(SRLPServiceInitializationNewInstanceEvent, ComputesTheAverageInDoublePrecision) {
   constexpr std::uint64_t kLimit = std::uint64_t{1} << 53;  // beyond which not every integer is a double
   expect(*eventOf(kLimit, {kLimit}), 2, kLimit, kLimit, kLimit);
-  // Both are rounded to what has an even last bit, 2^53 and 2^53 + 4.
+  // As doubles, these are rounded to an even last bit: 2^53 and 2^53 + 4.
   expect(*eventOf(kLimit + 1, {kLimit + 3}), 2, kLimit + 2, kLimit + 3, kLimit + 1);
   expect(*eventOf(kLimit + 1, {kLimit + 1}), 2, kLimit, kLimit + 1, kLimit + 1);
 }
 
 TEST(SRLPServiceInitializationNewInstanceEvent, IsDefinedForTheLargestDurations) {
-  // As doubles these are 2^64, which is out of range.
+  // As doubles, these are 2^64, which is out of range.
   expect(*eventOf(kGreatest, {kGreatest}), 2, kGreatest, kGreatest, kGreatest);
   expect(*eventOf(kGreatest, {kGreatest, kGreatest}), 3, kGreatest, kGreatest, kGreatest);
-  // The largest double below stays as it is.
+  // The largest double below 2^64 stays as it is.
   constexpr std::uint64_t kBelow = kGreatest - 2047;
   expect(*eventOf(kBelow, {kBelow}), 2, kBelow, kBelow, kBelow);
   expect(*eventOf(0, {kGreatest}), 2, std::uint64_t{1} << 63, kGreatest, 0);
@@ -86,7 +86,7 @@ TEST(SRLPServiceInitializationNewInstanceEvent, IsCopiedWithoutItsFirstDuration)
   EXPECT_EQ(copy->apiDescription(), "Clock");
   EXPECT_EQ(copy->implDescription(), "SystemClock<...>");
   expect(*copy, 3, 20, 30, 0);
-  // Each goes on by itself.
+  // Both change independently.
   event->addInitializationWithDurationNs(40);
   expect(*event, 4, 25, 40, 10);
   expect(*copy, 3, 20, 30, 0);
@@ -95,7 +95,7 @@ TEST(SRLPServiceInitializationNewInstanceEvent, IsCopiedWithoutItsFirstDuration)
   expect(*event, 4, 25, 40, 10);
 }
 
-TEST(SRLPServiceInitializationNewInstanceEvent, IsKnownByItsProtocolAndEqualToItselfOnly) {
+TEST(SRLPServiceInitializationNewInstanceEvent, ConformsToItsProtocolAndEqualsOnlyItself) {
   const Ref<Event> event = eventOf(10);
   EXPECT_TRUE(event->conformsTo(rt::protocolInfo<SRLPServiceInitializationNewInstanceEventProtocol>()));
   EXPECT_TRUE(rt::isEqual(event, event));

@@ -49,7 +49,7 @@ rt::Ref<rt::Array> SRLProfilingStorage::serviceInitializationEvents() const {
     const rt::LockGuard guard(eventsLock_);
     events = events_;
   }
-  // The answer is the receiver's start time, and not a comparison: readers rely on the order that this makes.
+  // The answer is the receiver's start time and not a comparison, since readers rely on the resulting order.
   using Event = rt::Ref<SRLPServiceInitializationEvent>;
   return arrayOf(SRLPSelectorSort(std::move(events), [](const Event& receiver, const Event& /*argument*/) {
     return static_cast<std::int64_t>(receiver->monotonicRawClockStartTime());

@@ -1,14 +1,16 @@
 #pragma once
 
-/// The store of what was measured, in memory, for the life of the process.
+/// Stores the results of profiling in memory.
 ///
 ///     const rt::Ref<SRLProfilingStorage>& storage = SRLProfilingStorage::sharedInstance();
 ///     std::cout << storage->serviceInitializationEvents()->count() << " services were made.\n";
 ///
-/// Any thread may use it. It grows by every shared instance that is made, and by every implementation that
-/// makes a new one for each request.
+/// The storage grows with every instance that is made for a scope, and with every implementation that makes a
+/// new instance at every request. Nothing is ever removed.
 ///
-/// Not for: many of them in a program; what is measured goes into the shared one.
+/// Threads: any thread may use it.
+///
+/// Not for: several storages in a program. Profiling uses the shared one only.
 
 #include <cstdint>
 #include <unordered_map>
@@ -29,10 +31,10 @@
 class RT_VISIBLE SRLProfilingStorage final
     : public rt::Implements<SRLProfilingStorage, rt::Object, SRLProfilingStorageProtocol> {
  public:
-  /// The one that measurements go into; made when it is first asked for, and never destroyed.
+  /// Returns the storage that profiling uses. It is made by the first call and never destroyed.
   static const rt::Ref<SRLProfilingStorage>& sharedInstance();
 
-  /// Empty. Throws std::bad_alloc.
+  /// Returns an empty storage. Throws std::bad_alloc.
   static rt::Ref<SRLProfilingStorage> init();
 
   void storeServiceInitializationEvent(const rt::Ref<SRLPServiceInitializationEvent>& event) override;

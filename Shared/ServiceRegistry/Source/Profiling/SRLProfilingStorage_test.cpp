@@ -1,4 +1,4 @@
-// The store: what goes in comes out, in the order of the sort, whichever threads use it.
+// The storage returns what was stored, in the order of the sort, for any threads.
 
 #include "Shared/ServiceRegistry/Source/Profiling/SRLProfilingStorage.h"
 
@@ -27,7 +27,7 @@ Ref<SRLPServiceInitializationEvent> eventAt(std::uint64_t startTime) {
                                                                 nullptr, nullptr);
 }
 
-/// The start times in the order in which the events come out.
+// Returns the start times of the events, in the order in which the storage returns these.
 std::vector<std::uint64_t> startTimes(const SRLProfilingStorage& storage) {
   std::vector<std::uint64_t> times;
   const Ref<rt::Array> events = storage.serviceInitializationEvents();
@@ -42,7 +42,7 @@ std::vector<std::uint64_t> startTimesOf(const std::vector<std::uint64_t>& stored
   return startTimes(*storage);
 }
 
-/// The counts for an implementation; null where there are none.
+// Returns the statistics of an implementation. Null if there are none.
 Ref<NewInstanceEvent> eventOf(const SRLProfilingStorage& storage, const rt::String& implDescription) {
   Ref<NewInstanceEvent> result;
   const Ref<rt::Array> events = storage.serviceInitializationNewInstanceEvents();
@@ -55,14 +55,14 @@ Ref<NewInstanceEvent> eventOf(const SRLProfilingStorage& storage, const rt::Stri
   return result;
 }
 
-TEST(SRLProfilingStorage, BeginsEmpty) {
+TEST(SRLProfilingStorage, IsEmptyAtFirst) {
   const Ref<SRLProfilingStorage> storage = SRLProfilingStorage::init();
   EXPECT_TRUE(storage->serviceInitializationEvents()->isEmpty());
   EXPECT_TRUE(storage->serviceInitializationNewInstanceEvents()->isEmpty());
   EXPECT_TRUE(storage->conformsTo(rt::protocolInfo<SRLProfilingStorageProtocol>()));
 }
 
-TEST(SRLProfilingStorage, IsSharedByAll) {
+TEST(SRLProfilingStorage, SharesOneInstanceAmongThreads) {
   const Ref<SRLProfilingStorage> shared = SRLProfilingStorage::sharedInstance();
   ASSERT_NE(shared, nullptr);
   Ref<SRLProfilingStorage> ofAnotherThread;
@@ -71,7 +71,7 @@ TEST(SRLProfilingStorage, IsSharedByAll) {
   EXPECT_NE(SRLProfilingStorage::init(), shared);
 }
 
-TEST(SRLProfilingStorage, KeepsTheEventsThemselves) {
+TEST(SRLProfilingStorage, StoresTheEventsThemselves) {
   const Ref<SRLProfilingStorage> storage = SRLProfilingStorage::init();
   const Ref<SRLPServiceInitializationEvent> event = eventAt(1);
   storage->storeServiceInitializationEvent(event);
@@ -82,14 +82,14 @@ TEST(SRLProfilingStorage, KeepsTheEventsThemselves) {
   EXPECT_TRUE(storage->serviceInitializationNewInstanceEvents()->isEmpty());
 }
 
-TEST(SRLProfilingStorage, GivesTheLastStoredFirst) {
+TEST(SRLProfilingStorage, ReturnsTheLastStoredEventFirst) {
   EXPECT_THAT(startTimesOf({1, 2}), ElementsAre(2, 1));
   EXPECT_THAT(startTimesOf({10, 20, 30, 40, 50}), ElementsAre(50, 40, 30, 20, 10));
-  // Whatever the start times are: the two are not compared.
+  // This is so for any start times, since they are not compared.
   EXPECT_THAT(startTimesOf({30, 10, 20}), ElementsAre(20, 10, 30));
 }
 
-TEST(SRLProfilingStorage, TakesStartTimesForSignedAnswers) {
+TEST(SRLProfilingStorage, SortsByStartTimesAsSignedAnswers) {
   constexpr std::uint64_t kNegative = std::uint64_t{1} << 63;
   EXPECT_THAT(startTimesOf({0, 5}), ElementsAre(0, 5));
   EXPECT_THAT(startTimesOf({5, 0}), ElementsAre(0, 5));
@@ -97,19 +97,19 @@ TEST(SRLProfilingStorage, TakesStartTimesForSignedAnswers) {
   EXPECT_THAT(startTimesOf({kNegative - 1, 5}), ElementsAre(5, kNegative - 1));
 }
 
-TEST(SRLProfilingStorage, GivesWhatThereIsWhenItIsAsked) {
+TEST(SRLProfilingStorage, ReturnsASnapshot) {
   const Ref<SRLProfilingStorage> storage = SRLProfilingStorage::init();
   storage->storeServiceInitializationEvent(eventAt(1));
   const Ref<rt::Array> before = storage->serviceInitializationEvents();
   storage->storeServiceInitializationEvent(eventAt(2));
   storage->storeServiceInitializationEvent(eventAt(3));
   EXPECT_EQ(before->count(), 1U);
-  // What is stored keeps its order, however often it is sorted.
+  // Sorting does not change the order in which the events are stored.
   EXPECT_THAT(startTimes(*storage), ElementsAre(3, 2, 1));
   EXPECT_THAT(startTimes(*storage), ElementsAre(3, 2, 1));
 }
 
-TEST(SRLProfilingStorage, AddsUpByImplementation) {
+TEST(SRLProfilingStorage, CountsInstancesByImplementation) {
   const Ref<SRLProfilingStorage> storage = SRLProfilingStorage::init();
   for (const std::uint64_t duration : {10U, 20U, 30U})
     storage->storeServiceInitializationNewInstanceEventWithAPIDescription("Clock"_s, "SystemClock"_s,
@@ -134,7 +134,7 @@ TEST(SRLProfilingStorage, AddsUpByImplementation) {
 TEST(SRLProfilingStorage, KeepsTheDescriptionOfTheFirstAPI) {
   const Ref<SRLProfilingStorage> storage = SRLProfilingStorage::init();
   storage->storeServiceInitializationNewInstanceEventWithAPIDescription("Clock"_s, "SystemClock"_s, 10);
-  // Another string with the same letters is the same implementation.
+  // An equal string stands for the same implementation.
   storage->storeServiceInitializationNewInstanceEventWithAPIDescription(
       "Timer"_s, rt::String::fromUTF8(std::string("SystemClock")), 20);
   const Ref<NewInstanceEvent> event = eventOf(*storage, "SystemClock"_s);
@@ -143,7 +143,7 @@ TEST(SRLProfilingStorage, KeepsTheDescriptionOfTheFirstAPI) {
   EXPECT_EQ(event->initializationCount(), 2U);
 }
 
-TEST(SRLProfilingStorage, TellsNoTextFromAnEmptyOne) {
+TEST(SRLProfilingStorage, TellsANullDescriptionFromAnEmptyOne) {
   const Ref<SRLProfilingStorage> storage = SRLProfilingStorage::init();
   storage->storeServiceInitializationNewInstanceEventWithAPIDescription(nullptr, nullptr, 1);
   storage->storeServiceInitializationNewInstanceEventWithAPIDescription(nullptr, ""_s, 2);
@@ -153,7 +153,7 @@ TEST(SRLProfilingStorage, TellsNoTextFromAnEmptyOne) {
   EXPECT_EQ(eventOf(*storage, ""_s)->maximumDurationNs(), 2U);
 }
 
-TEST(SRLProfilingStorage, GivesCopiesOfTheCounts) {
+TEST(SRLProfilingStorage, ReturnsCopiesOfTheStatistics) {
   const Ref<SRLProfilingStorage> storage = SRLProfilingStorage::init();
   storage->storeServiceInitializationNewInstanceEventWithAPIDescription("Clock"_s, "SystemClock"_s, 10);
   const Ref<NewInstanceEvent> event = eventOf(*storage, "SystemClock"_s);
@@ -165,7 +165,7 @@ TEST(SRLProfilingStorage, GivesCopiesOfTheCounts) {
   EXPECT_EQ(eventOf(*storage, "SystemClock"_s)->maximumDurationNs(), 20U);
 }
 
-TEST(SRLProfilingStorage, IsUsedByManyThreads) {
+TEST(SRLProfilingStorage, IsThreadSafe) {
   constexpr std::uint64_t kThreads = 8;
   constexpr std::uint64_t kRounds = 200;
   const Ref<SRLProfilingStorage> storage = SRLProfilingStorage::init();

@@ -1,14 +1,15 @@
 #pragma once
 
-/// Instances of a class, or of one that derives from it, that conform to a protocol besides.
+/// The type of the instances of a class, and of the classes that derive from it, that also conform to a
+/// protocol.
 ///
 ///     rt::Ref<SRLClassProtocolType> type = SRLClassProtocolType::initWithClass(
 ///         &rt::classInfo<View>(), /*constrainedToProtocol=*/&rt::protocolInfo<Clock>());
 ///     type->description();                                 // "View<Clock>"
 ///
-/// Immutable: any thread may use it.
+/// Threads: immutable; any thread may use it.
 ///
-/// Not for: types of which only one is known (SRLClassType, SRLProtocolType).
+/// Not for: types that require only a class or only a protocol (SRLClassType, SRLProtocolType).
 
 #include <cstdint>
 
@@ -22,22 +23,23 @@
 class RT_VISIBLE SRLClassProtocolType final
     : public rt::Implements<SRLClassProtocolType, rt::Object, SRLInstanceType> {
  public:
-  /// For both. If either is null, that is reported, and yields null. Throws what the error callback throws,
-  /// and std::bad_alloc.
+  /// Returns the type of the instances of `concreteClass` that conform to `constrainedToProtocol`.
+  /// Errors: a null argument is reported and yields null. Throws what the error callback throws, and
+  /// std::bad_alloc.
   static rt::Ref<SRLClassProtocolType> initWithClass(const rt::ClassInfo* concreteClass,
                                                      const rt::ProtocolInfo* constrainedToProtocol);
 
   const rt::ProtocolInfo& concreteProtocol() const noexcept { return concreteProtocol_; }
   const rt::ClassInfo& concreteClass() const noexcept { return concreteClass_; }
 
-  /// Whether `aClass` conforms to the protocol, and is the class or derives from it.
+  /// Returns whether `aClass` conforms to the protocol, and is the class or derives from it.
   bool doesRepresentSupertypeOfClass(const rt::ClassInfo& aClass) const override;
 
-  /// Whether `other` is for the same two.
+  /// Returns whether `other` is an SRLClassProtocolType for the same class and protocol.
   bool isEqual(const rt::Object* other) const override;
-  /// 41 times that of the protocol's name, plus that of the class's address.
+  /// Returns 41 times the hash of the protocol's name, plus the hash of the class's address.
   std::uint64_t hash() const override;
-  /// "CLASS<PROTOCOL>" with both names.
+  /// Returns "CLASS<PROTOCOL>" with both names.
   rt::String description() const override;
 
  private:

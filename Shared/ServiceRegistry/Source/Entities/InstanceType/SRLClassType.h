@@ -1,13 +1,13 @@
 #pragma once
 
-/// Instances of a class, or of one that derives from it.
+/// The type of the instances of a class and of the classes that derive from it.
 ///
 ///     rt::Ref<SRLClassType> type = SRLClassType::initWithClass(rt::classNamed("SystemClock"));
 ///     if (!type) return;                                   // reported: there is no such class
 ///
-/// Immutable: any thread may use it.
+/// Threads: immutable; any thread may use it.
 ///
-/// Not for: types that a protocol says something about (SRLProtocolType, SRLClassProtocolType).
+/// Not for: types that require a protocol (SRLProtocolType, SRLClassProtocolType).
 
 #include <cstdint>
 
@@ -20,20 +20,20 @@
 
 class RT_VISIBLE SRLClassType final : public rt::Implements<SRLClassType, rt::Object, SRLInstanceType> {
  public:
-  /// For `concreteClass`. Null is reported, and yields null. Throws what the error callback throws, and
-  /// std::bad_alloc.
+  /// Returns the type of the instances of `concreteClass`.
+  /// Errors: null is reported and yields null. Throws what the error callback throws, and std::bad_alloc.
   static rt::Ref<SRLClassType> initWithClass(const rt::ClassInfo* concreteClass);
 
   const rt::ClassInfo& concreteClass() const noexcept { return concreteClass_; }
 
-  /// Whether `aClass` is the class or derives from it.
+  /// Returns whether `aClass` is the class or derives from it.
   bool doesRepresentSupertypeOfClass(const rt::ClassInfo& aClass) const override;
 
-  /// Whether `other` is for the same class.
+  /// Returns whether `other` is an SRLClassType for the same class.
   bool isEqual(const rt::Object* other) const override;
-  /// That of the class's address.
+  /// Returns the hash of the class's address.
   std::uint64_t hash() const override;
-  /// The class's name.
+  /// Returns the class's name.
   rt::String description() const override;
 
  private:

@@ -1,4 +1,4 @@
-// The three instance types, and the function that makes whichever fits.
+// The three instance types, and the function that makes the right one for its arguments.
 
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLInstanceType.h"
 
@@ -51,7 +51,7 @@ std::uint64_t hashOf(const rt::ClassInfo& info) {
   return std::hash<const rt::ClassInfo*>()(&info);
 }
 
-// What one message says of where it is from.
+// Expects that there is one report, and checks its text and its origin.
 void expectFrom(TestReports& reports, const std::string& file, const std::string& function,
                 const std::string& report) {
   const std::vector<Ref<LUMLogMessage>> messages = reports.messages();
@@ -64,7 +64,7 @@ void expectFrom(TestReports& reports, const std::string& file, const std::string
   EXPECT_FALSE(messages[0]->safeParameters());
 }
 
-TEST(SRLClassType, IsForAClassAndWhatDerivesFromIt) {
+TEST(SRLClassType, RepresentsTheClassAndItsSubclasses) {
   const Ref<SRLClassType> type = SRLClassType::initWithClass(&classInfo<ClockView>());
   EXPECT_EQ(&type->concreteClass(), &classInfo<ClockView>());
   EXPECT_TRUE(type->doesRepresentSupertypeOfClass(classInfo<ClockView>()));
@@ -73,7 +73,7 @@ TEST(SRLClassType, IsForAClassAndWhatDerivesFromIt) {
   EXPECT_FALSE(type->doesRepresentSupertypeOfClass(classInfo<OtherClock>()));
 }
 
-TEST(SRLClassType, IsAValue) {
+TEST(SRLClassType, HasValueEqualityHashAndDescription) {
   const Ref<SRLClassType> type = SRLClassType::initWithClass(&classInfo<View>());
   EXPECT_EQ(type->description(), "View");
   EXPECT_EQ(type->hash(), hashOf(classInfo<View>()));
@@ -88,7 +88,7 @@ TEST(SRLClassType, IsAValue) {
   EXPECT_TRUE(type->conformsTo(protocolInfo<SRLInstanceType>()));
 }
 
-TEST(SRLClassType, NeedsAClass) {
+TEST(SRLClassType, ReportsAMissingClassAndYieldsNull) {
   TestReports reports;
   EXPECT_EQ(SRLClassType::initWithClass(nullptr), nullptr);
   expectFrom(reports, "SRLClassType", "-[SRLClassType initWithClass:]",
@@ -97,7 +97,7 @@ TEST(SRLClassType, NeedsAClass) {
   EXPECT_THAT(reports.texts(), ElementsAre("SRLClassType's concreteClass must not be nil."));
 }
 
-TEST(SRLProtocolType, IsForWhateverConforms) {
+TEST(SRLProtocolType, RepresentsTheClassesThatConform) {
   const Ref<SRLProtocolType> type = SRLProtocolType::initWithProtocol(&protocolInfo<Clock>());
   EXPECT_EQ(&type->concreteProtocol(), &protocolInfo<Clock>());
   EXPECT_TRUE(type->doesRepresentSupertypeOfClass(classInfo<ClockView>()));
@@ -110,13 +110,13 @@ TEST(SRLProtocolType, IsForWhateverConforms) {
   EXPECT_FALSE(alarm->doesRepresentSupertypeOfClass(classInfo<ClockView>()));
 }
 
-TEST(SRLProtocolType, IsAValue) {
+TEST(SRLProtocolType, HasValueEqualityHashAndDescription) {
   const Ref<SRLProtocolType> type = SRLProtocolType::initWithProtocol(&protocolInfo<Clock>());
   EXPECT_EQ(type->description(), "id<Clock>");
   EXPECT_EQ(type->hash(), hashOf("Clock"));
   EXPECT_TRUE(isEqual(type, type));
   EXPECT_TRUE(isEqual(type, SRLProtocolType::initWithProtocol(&protocolInfo<Clock>())));
-  // Inherits it, and is another all the same.
+  // A protocol that inherits from it is a different one.
   EXPECT_FALSE(isEqual(type, SRLProtocolType::initWithProtocol(&protocolInfo<AlarmClock>())));
   EXPECT_FALSE(
       isEqual(type, SRLClassProtocolType::initWithClass(&classInfo<View>(), &protocolInfo<Clock>())));
@@ -125,14 +125,14 @@ TEST(SRLProtocolType, IsAValue) {
   EXPECT_EQ(classInfo<SRLProtocolType>().superclass, &classInfo<rt::Object>());
 }
 
-TEST(SRLProtocolType, NeedsAProtocol) {
+TEST(SRLProtocolType, ReportsAMissingProtocolAndYieldsNull) {
   TestReports reports;
   EXPECT_EQ(SRLProtocolType::initWithProtocol(nullptr), nullptr);
   expectFrom(reports, "SRLProtocolType", "-[SRLProtocolType initWithProtocol:]",
              "SRLProtocolType's concreteProtocol must not be nil.");
 }
 
-TEST(SRLClassProtocolType, IsForSubclassesThatConform) {
+TEST(SRLClassProtocolType, RepresentsTheSubclassesThatConform) {
   const Ref<SRLClassProtocolType> type =
       SRLClassProtocolType::initWithClass(&classInfo<View>(), &protocolInfo<Clock>());
   EXPECT_EQ(&type->concreteClass(), &classInfo<View>());
@@ -146,7 +146,7 @@ TEST(SRLClassProtocolType, IsForSubclassesThatConform) {
   EXPECT_FALSE(type->doesRepresentSupertypeOfClass(classInfo<rt::Object>()));
 }
 
-TEST(SRLClassProtocolType, IsAValue) {
+TEST(SRLClassProtocolType, HasValueEqualityHashAndDescription) {
   const auto typeOf = [](const rt::ClassInfo& aClass, const rt::ProtocolInfo& protocol) {
     return SRLClassProtocolType::initWithClass(&aClass, &protocol);
   };
@@ -164,7 +164,7 @@ TEST(SRLClassProtocolType, IsAValue) {
   EXPECT_EQ(classInfo<SRLClassProtocolType>().superclass, &classInfo<rt::Object>());
 }
 
-TEST(SRLClassProtocolType, NeedsBoth) {
+TEST(SRLClassProtocolType, ReportsAMissingPartAndYieldsNull) {
   TestReports reports;
   EXPECT_EQ(SRLClassProtocolType::initWithClass(nullptr, &protocolInfo<Clock>()), nullptr);
   expectFrom(reports, "SRLClassProtocolType", "-[SRLClassProtocolType initWithClass:constrainedToProtocol:]",
@@ -175,7 +175,7 @@ TEST(SRLClassProtocolType, NeedsBoth) {
                                            "concreteClass and concreteProtocol must be provided."));
 }
 
-TEST(SRLMakeInstanceTypeContainer, MakesWhatFits) {
+TEST(SRLMakeInstanceTypeContainer, MakesTheTypeForItsArguments) {
   TestReports reports;
   EXPECT_TRUE(isEqual(SRLMakeInstanceTypeContainer(&classInfo<View>(), &protocolInfo<Clock>()),
                       SRLClassProtocolType::initWithClass(&classInfo<View>(), &protocolInfo<Clock>())));
@@ -186,7 +186,7 @@ TEST(SRLMakeInstanceTypeContainer, MakesWhatFits) {
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-TEST(SRLMakeInstanceTypeContainer, NeedsEither) {
+TEST(SRLMakeInstanceTypeContainer, ReportsTwoNullsAndYieldsNull) {
   TestReports reports;
   EXPECT_EQ(SRLMakeInstanceTypeContainer(nullptr, nullptr), nullptr);
   expectFrom(reports, "SRLMakeInstanceTypeContainer", "SRLMakeInstanceTypeContainer",

@@ -1,13 +1,13 @@
 #pragma once
 
-/// Instances of any class that conforms to a protocol.
+/// The type of the instances that conform to a protocol, whatever their class.
 ///
 ///     rt::Ref<SRLProtocolType> type = SRLProtocolType::initWithProtocol(&rt::protocolInfo<Clock>());
 ///     type->description();                                 // "id<Clock>"
 ///
-/// Immutable: any thread may use it.
+/// Threads: immutable; any thread may use it.
 ///
-/// Not for: types that a class says something about (SRLClassType, SRLClassProtocolType).
+/// Not for: types that require a class (SRLClassType, SRLClassProtocolType).
 
 #include <cstdint>
 
@@ -20,20 +20,20 @@
 
 class RT_VISIBLE SRLProtocolType final : public rt::Implements<SRLProtocolType, rt::Object, SRLInstanceType> {
  public:
-  /// For `concreteProtocol`. Null is reported, and yields null. Throws what the error callback throws, and
-  /// std::bad_alloc.
+  /// Returns the type of the instances that conform to `concreteProtocol`.
+  /// Errors: null is reported and yields null. Throws what the error callback throws, and std::bad_alloc.
   static rt::Ref<SRLProtocolType> initWithProtocol(const rt::ProtocolInfo* concreteProtocol);
 
   const rt::ProtocolInfo& concreteProtocol() const noexcept { return concreteProtocol_; }
 
-  /// Whether `aClass` conforms to the protocol, by itself or by a superclass.
+  /// Returns whether `aClass` or one of its superclasses conforms to the protocol.
   bool doesRepresentSupertypeOfClass(const rt::ClassInfo& aClass) const override;
 
-  /// Whether `other` is for the same protocol.
+  /// Returns whether `other` is an SRLProtocolType for the same protocol.
   bool isEqual(const rt::Object* other) const override;
-  /// That of the protocol's name.
+  /// Returns the hash of the protocol's name.
   std::uint64_t hash() const override;
-  /// "id<NAME>" with the protocol's name.
+  /// Returns "id<NAME>" with the protocol's name.
   rt::String description() const override;
 
  private:

@@ -1,6 +1,6 @@
 #pragma once
 
-/// What a bindings module hands to the registry: its bindings, and what makes its configurations.
+/// The record of a bindings module: its bindings and its configuration factories.
 ///
 ///     constexpr _SRLBindingRegistrationData bindings[] = {{&clockAPI, clocks}, {&weatherAPI, weathers}};
 ///     static_assert(SRLAreBindingsSorted(bindings));
@@ -10,10 +10,10 @@
 ///     const SRLBindingsModuleData* networkBindings() { return &moduleData; }
 ///     template struct rt::AddedClassMethod<SRLRegistry, "srl_bindingsNetwork", &networkBindings>;
 ///
-/// The class method is what makes the registry know the module (SRLRegistry.h). The record is a constant of a
-/// fixed layout that lives as long as the process.
+/// The registry finds the module through the class method (SRLRegistry.h). The record is a constant with a
+/// fixed layout. It must live as long as the process.
 ///
-/// Not for: people; what they write is turned into these.
+/// Not for: handwritten code. A generator writes these records.
 
 #include <cstddef>
 #include <cstdint>
@@ -27,20 +27,20 @@
 #include "Runtime/Objects/Ref.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"
 
-/// For the addresses that stand for configurations, what makes them. A configuration is made once for each
-/// registry.
+/// The factory of each configuration. The key is the address that identifies the configuration. Each registry
+/// makes a configuration once.
 using SRLConfigurationFactories = std::unordered_map<const void*, rt::Block<rt::Ref<rt::Object>()>>;
 
 struct RT_VISIBLE SRLBindingsModuleData {
-  /// The module's bindings, sorted by their APIs' identifiers: see SRLAreBindingsSorted.
+  /// The module's bindings, sorted by their APIs' identifiers. SRLAreBindingsSorted checks the order.
   const _SRLBindingRegistrationData* bindingsBegin = nullptr;
   const _SRLBindingRegistrationData* bindingsEnd = nullptr;
-  /// Adds the module's configurations to a table, which is empty; null where there are none. Called once,
-  /// when the program is loaded.
+  /// Adds the module's configuration factories to `factories`, which is empty. Null if the module has none.
+  /// Called once, when the program is loaded.
   void (*addConfigurationFactories)(SRLConfigurationFactories& factories) = nullptr;
-  /// The generator's own. The registry does not read it.
+  /// Belongs to the generator. The registry does not read it.
   std::uint8_t generatorFlag = 0;
-  /// Whether the module may be one of several; any value but 0 says so.
+  /// Nonzero if the module may be one of several.
   std::uint8_t allowsMultipleModules = 0;
 
   std::span<const _SRLBindingRegistrationData> bindings() const noexcept {
@@ -48,7 +48,7 @@ struct RT_VISIBLE SRLBindingsModuleData {
   }
 };
 
-// The layout is part of the interface.
+// Generated code relies on this layout.
 static_assert(sizeof(SRLBindingsModuleData) == 32);
 static_assert(offsetof(SRLBindingsModuleData, bindingsBegin) == 0);
 static_assert(offsetof(SRLBindingsModuleData, bindingsEnd) == 8);
@@ -56,14 +56,14 @@ static_assert(offsetof(SRLBindingsModuleData, addConfigurationFactories) == 16);
 static_assert(offsetof(SRLBindingsModuleData, generatorFlag) == 24);
 static_assert(offsetof(SRLBindingsModuleData, allowsMultipleModules) == 25);
 
-/// The order of a module's bindings: whether the identifier `first` comes before `second`. A shorter one
-/// does; of equally long ones, the one whose bytes come first.
+/// Returns whether a module's binding of the identifier `first` comes before that of `second`. A shorter
+/// identifier comes first. Identifiers of equal length are in the order of their bytes.
 constexpr bool SRLIsIdentifierBefore(std::string_view first, std::string_view second) noexcept {
   return first.size() != second.size() ? first.size() < second.size() : first < second;
 }
 
-/// Whether a module's bindings are in order, each API once, and every API's identifier as long as it says.
-/// For a static_assert beside the bindings, since the registry finds nothing reliably where this is false.
+/// Returns whether a module's bindings are sorted, each API occurs once, and each `identifierLength` is
+/// right. Otherwise the registry may miss bindings. Assert this at compile time, beside the bindings.
 constexpr bool SRLAreBindingsSorted(std::span<const _SRLBindingRegistrationData> bindings) noexcept {
   std::string_view previous;
   for (const _SRLBindingRegistrationData& binding : bindings) {

@@ -36,19 +36,19 @@ constexpr bool areSorted(const APIs&... apis) {
 static_assert(SRLAreBindingsSorted({}));
 static_assert(areSorted(aa));
 static_assert(areSorted(none, b, high, aa, ab, ba));
-// A shorter one is first, whatever its bytes.
+// A shorter identifier comes first, whatever its bytes.
 static_assert(areSorted(b, aa));
 static_assert(!areSorted(aa, b));
-// Bytes have no sign.
+// Bytes are compared as unsigned numbers.
 static_assert(areSorted(b, high));
 static_assert(!areSorted(high, b));
 static_assert(!areSorted(ab, aa));
 static_assert(!areSorted(aa, ba, ab));
 static_assert(!areSorted(b, none));
-// Each once.
+// Each identifier may occur once.
 static_assert(!areSorted(ab, ab));
 static_assert(!areSorted(ab, anotherAb));
-// Each as long as it says.
+// Each `identifierLength` must be right.
 static_assert(!areSorted(tooLong));
 static_assert(!areSorted(tooShort));
 static_assert(!areSorted(b, tooShort));
@@ -60,7 +60,7 @@ static_assert(SRLIsIdentifierBefore("aa", "ab"));
 static_assert(SRLIsIdentifierBefore("a", "\x80"));
 static_assert(!SRLIsIdentifierBefore("a", "a"));
 
-// So that a module can be a constant, for which nothing runs at start-up or at exit.
+// A module can be a constant, for which no code runs at start-up or at exit.
 static_assert(std::is_standard_layout_v<SRLBindingsModuleData> &&
               std::is_trivially_copyable_v<SRLBindingsModuleData>);
 
@@ -83,10 +83,10 @@ std::uint64_t valueAt(const std::array<std::uint8_t, 32>& bytes, std::size_t off
   return value;
 }
 
-TEST(SRLBindingsModuleData, HasItsLayout) {
+TEST(SRLBindingsModuleData, PlacesItsFields) {
   ASSERT_EQ(sizeof(SRLBindingsModuleData), 32U);
   std::array<std::uint8_t, 32> bytes{};
-  // Not by bit_cast, which need not keep what is between the fields.
+  // Not by std::bit_cast, which need not keep the bytes between the fields.
   std::memcpy(bytes.data(), &module, sizeof module);
   EXPECT_EQ(valueAt(bytes, 0), reinterpret_cast<std::uintptr_t>(&bindings[0]));
   EXPECT_EQ(valueAt(bytes, 8), reinterpret_cast<std::uintptr_t>(&bindings[0]) + 2 * 16);
@@ -95,8 +95,8 @@ TEST(SRLBindingsModuleData, HasItsLayout) {
   EXPECT_EQ(bytes[25], 0x34U);
 }
 
-// As somebody else's generator writes them.
-TEST(SRLBindingsModuleData, IsReadFromBytes) {
+// The bytes are as another generator writes them.
+TEST(SRLBindingsModuleData, CanBeReadFromBytes) {
   alignas(8) std::array<std::uint8_t, 32> bytes{};
   const auto write = [&bytes](std::size_t offset, std::uint64_t value) {
     for (std::size_t i = 0; i < 8; ++i) bytes.at(offset + i) = static_cast<std::uint8_t>(value >> (8 * i));
@@ -113,7 +113,7 @@ TEST(SRLBindingsModuleData, IsReadFromBytes) {
   EXPECT_EQ(read.allowsMultipleModules, 0xFFU);
 }
 
-TEST(SRLBindingsModuleData, MayBeEmpty) {
+TEST(SRLBindingsModuleData, IsEmptyByDefault) {
   EXPECT_TRUE(SRLBindingsModuleData().bindings().empty());
   EXPECT_EQ(SRLBindingsModuleData().addConfigurationFactories, nullptr);
   EXPECT_EQ(module.bindings().size(), 2U);

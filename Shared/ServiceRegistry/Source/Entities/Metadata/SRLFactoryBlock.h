@@ -1,17 +1,18 @@
 #pragma once
 
-/// How the registry gets an instance: a block that takes the tags of the request, and returns an instance,
-/// new or kept, or null.
+/// A block from which the registry gets an implementation's instance. It takes the tags of the request. It
+/// returns a new instance, an existing one, or null.
 ///
 ///     SRLFactoryBlock block = [](const SRLScopeTagSet& tags, bool* instanceCreated) -> rt::Ref<rt::Object> {
 ///       if (instanceCreated != nullptr) *instanceCreated = true;
 ///       return rt::make<SystemClock>();
 ///     };
 ///
-/// Where `instanceCreated` is not null, it points to false, and to true afterwards if the instance is new.
+/// `instanceCreated` may be null. Otherwise the caller sets `*instanceCreated` to false, and the block sets
+/// it to true if the instance is new.
 ///
-/// Not for: the functions of generated code that make instances (SRLImplementationRegistrationData), which
-/// blocks of this kind call.
+/// Not for: the generated functions that make instances (SRLImplementationRegistrationData). Factory blocks
+/// call these.
 
 #include "Runtime/Objects/Block.h"
 #include "Runtime/Objects/Object.h"

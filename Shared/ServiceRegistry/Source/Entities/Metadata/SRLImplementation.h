@@ -1,14 +1,14 @@
 #pragma once
 
-/// What implements an API: an implementation's record, as an object that can be compared.
+/// Describes an implementation of an API, as an object that can be compared and put into a set.
 ///
 ///     rt::Ref<SRLImplementation> implementation = SRLImplementation::initWithIdentifier(
 ///         "SystemClock", type, /*lifetime=*/0, /*scope=*/0b1, factoryBlock, /*configuration=*/nullptr);
 ///     implementation->factoryBlock()(tags, nullptr);
 ///
-/// Immutable: any thread may use it.
+/// Threads: immutable; any thread may use it.
 ///
-/// Not for: the instances, which are whatever the factory makes.
+/// Not for: the instances. The factory makes these.
 
 #include <cstdint>
 #include <optional>
@@ -29,41 +29,45 @@
 
 class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementation, rt::Object> {
  public:
-  /// `identifier` is kept as it is, and outlives the implementation. `lifetime` is 0 for one instance in a
-  /// scope, 1 for a new one at every request. `instanceType` and `configuration` may be null. So may
-  /// `factoryBlock` of what is bound to an API for one, which then counts as not bound. Throws
-  /// std::bad_alloc.
+  /// Returns a new implementation. Throws std::bad_alloc.
+  ///
+  /// - `identifier` is not copied. Its bytes must outlive the implementation.
+  /// - `instanceType` and `configuration` may be null.
+  /// - `lifetime` is 0 for one instance per scope, and 1 for a new instance at every request.
+  /// - `factoryBlock` may be null for a single-bound API only. Requests then treat the API as unbound.
   static rt::Ref<SRLImplementation> initWithIdentifier(
       std::string_view identifier, rt::Ref<SRLInstanceType> instanceType, std::uint64_t lifetime,
       SRLScopeType scope, SRLFactoryBlock factoryBlock,
       const rt::Ref<SRLImplementationConfiguration>& configuration);
 
-  /// The same for a registry, with a block that does what `scopedFactory` does.
+  /// Does the same with a factory block that calls `scopedFactory`. For the registry.
   static rt::Ref<SRLImplementation> initWithIdentifier(
       std::string_view identifier, rt::Ref<SRLInstanceType> instanceType, std::uint64_t lifetime,
       SRLScopeType scope, const SRLScopedFactory& scopedFactory,
       const rt::Ref<SRLImplementationConfiguration>& configuration);
 
-  /// What the factory makes; may be null.
+  /// Returns the type of the instances that the factory makes. May be null.
   const rt::Ref<SRLInstanceType>& instanceType() const noexcept { return instanceType_; }
+  /// Returns 0 for one instance per scope, or 1 for a new instance at every request.
   std::uint64_t lifetime() const noexcept { return lifetime_; }
-  /// The scope in which an instance lives.
+  /// Returns the type of the scopes in which instances live.
   SRLScopeType scopeType() const noexcept { return scopeType_; }
+  /// Returns the block that gets an instance. May be null.
   const SRLFactoryBlock& factoryBlock() const noexcept { return factoryBlock_; }
-  /// What the factory block does, for a registry that looks first whether the instance is there; null where
-  /// the block is somebody's own.
+  /// Returns the scoped factory that the factory block calls, so that a registry can look for an existing
+  /// instance first. Null if the block is of another kind.
   const SRLScopedFactory* scopedFactory() const noexcept {
     return scopedFactory_ ? &*scopedFactory_ : nullptr;
   }
-  /// What the implementation wants to be configured with; may be null.
+  /// Returns the configuration that the implementation takes. Null if it takes none.
   const rt::Ref<SRLImplementationConfiguration>& configuration() const noexcept { return configuration_; }
 
-  /// Whether `other` is the same in everything but the factory.
+  /// Returns whether `other` equals this implementation in everything but the factory.
   bool isEqual(const rt::Object* other) const override;
-  /// That of the identifier's bytes by std::hash, plus 41 times the rest: of instance type, lifetime, scope
-  /// and configuration in this order, each added to 41 times what there is; that of null is 0.
+  /// Returns H(identifier) + 41 * (41 * (41 * (41 * hash(instanceType) + lifetime) + scopeType) +
+  /// hash(configuration)). H is std::hash of the bytes. The hash of null is 0.
   std::uint64_t hash() const override;
-  /// "SRLImplementation<ADDRESS, identifier: ID, instanceType: TYPE, lifetime: 0, scopeType: 1,
+  /// Returns "SRLImplementation<ADDRESS, identifier: ID, instanceType: TYPE, lifetime: 0, scopeType: 1,
   /// configuration: None>".
   rt::String description() const override;
 

@@ -1,13 +1,13 @@
 #pragma once
 
-/// What an implementation wants to be configured with: an object of a type, with or without which it works.
+/// Describes the configuration object that an implementation takes: its type, and whether it is required.
 ///
 ///     rt::Ref<SRLImplementationConfiguration> configuration =
 ///         SRLImplementationConfiguration::initWithConfigurationInstanceType(type, /*required=*/true);
 ///
-/// Immutable: any thread may use it.
+/// Threads: immutable; any thread may use it.
 ///
-/// Not for: the object itself, which is the host's.
+/// Not for: the configuration object itself. The host provides it.
 
 #include <cstdint>
 #include <utility>
@@ -22,22 +22,24 @@
 class RT_VISIBLE SRLImplementationConfiguration final
     : public rt::Implements<SRLImplementationConfiguration, rt::Object> {
  public:
-  /// For a configuration of the type `configurationInstanceType`. That it is null is reported, and yields
-  /// null. Throws what the error callback throws, and std::bad_alloc.
+  /// Returns the description of a configuration object of type `configurationInstanceType`.
+  /// Errors: a null type is reported and yields null. Throws what the error callback throws, and
+  /// std::bad_alloc.
   static rt::Ref<SRLImplementationConfiguration> initWithConfigurationInstanceType(
       rt::Ref<SRLInstanceType> configurationInstanceType, bool required);
 
-  /// The type; never null.
+  /// Returns the configuration object's type. Never null.
   const rt::Ref<SRLInstanceType>& instanceType() const noexcept { return instanceType_; }
 
-  /// Whether the implementation does not work without.
+  /// Returns whether the implementation needs the configuration object.
   bool isRequired() const noexcept { return required_; }
 
-  /// Whether `other` is of an equal type, and as required.
+  /// Returns whether `other` has an equal type and the same `isRequired`.
   bool isEqual(const rt::Object* other) const override;
-  /// 41 times that of the type, plus 1 where it is required.
+  /// Returns 41 * hash(instanceType) + isRequired.
   std::uint64_t hash() const override;
-  /// "SRLImplementationConfiguration<instanceType: TYPE, required: 1>"; 0 where it is not.
+  /// Returns "SRLImplementationConfiguration<instanceType: TYPE, required: 1>". An optional configuration has
+  /// 0 in place of 1.
   rt::String description() const override;
 
  private:

@@ -17,7 +17,7 @@ using rt::Ref;
 
 class Options final : public rt::Implements<Options, rt::Object> {};
 
-// A type that is not the registry's own, with a hash of the test's.
+// An instance type of generated code, with a given hash.
 class HashedType final : public rt::Implements<HashedType, rt::Object, SRLInstanceType> {
  public:
   explicit HashedType(std::uint64_t hash) : hash_(hash) {}
@@ -38,7 +38,7 @@ Ref<SRLImplementationConfiguration> configuration(std::uint64_t hash, bool requi
                                                                            required);
 }
 
-TEST(SRLImplementationConfiguration, KeepsWhatItIsMadeOf) {
+TEST(SRLImplementationConfiguration, ReturnsWhatItWasMadeWith) {
   const Ref<SRLInstanceType> type = SRLClassType::initWithClass(&rt::classInfo<Options>());
   for (const bool required : {false, true}) {
     const auto made = SRLImplementationConfiguration::initWithConfigurationInstanceType(type, required);
@@ -75,7 +75,7 @@ TEST(SRLImplementationConfiguration, ComparesBothFields) {
   EXPECT_FALSE(given->isEqual(nullptr));
 }
 
-TEST(SRLImplementationConfiguration, NeedsAType) {
+TEST(SRLImplementationConfiguration, ReportsAMissingTypeAndYieldsNull) {
   TestReports reports;
   EXPECT_EQ(SRLImplementationConfiguration::initWithConfigurationInstanceType(nullptr, true), nullptr);
   const std::vector<Ref<LUMLogMessage>> messages = reports.messages();

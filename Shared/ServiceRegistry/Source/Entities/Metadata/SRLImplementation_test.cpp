@@ -22,7 +22,7 @@ using rt::Ref;
 
 class Clock final : public rt::Implements<Clock, rt::Object> {};
 
-// A type with a hash of the test's, equal to those with the same. It tells who compares it.
+// An instance type with a given hash, equal to types with the same hash. It counts its comparisons.
 class TestType final : public rt::Implements<TestType, rt::Object, SRLInstanceType> {
  public:
   TestType(std::uint64_t hash, int* comparisons) : hash_(hash), comparisons_(comparisons) {}
@@ -49,7 +49,7 @@ Ref<SRLImplementationConfiguration> configuration(std::uint64_t hash, bool requi
   return SRLImplementationConfiguration::initWithConfigurationInstanceType(type(hash, comparisons), required);
 }
 
-// What an implementation is made of, each part to be changed by a test.
+// The parts of an implementation. A test can change each of them.
 struct Parts {
   std::string_view identifier = "SystemClock";
   Ref<SRLInstanceType> instanceType = type(7);
@@ -74,7 +74,7 @@ std::string descriptionOf(const Ref<SRLImplementation>& implementation) {
   return std::string(implementation->description().view());
 }
 
-TEST(SRLImplementation, KeepsWhatItIsMadeOf) {
+TEST(SRLImplementation, ReturnsWhatItWasMadeWith) {
   const Parts parts;
   const Ref<SRLImplementation> made = parts.make();
   EXPECT_EQ(made->instanceType(), parts.instanceType);
@@ -85,7 +85,7 @@ TEST(SRLImplementation, KeepsWhatItIsMadeOf) {
   EXPECT_EQ(rt::copy(made), made);
 }
 
-TEST(SRLImplementation, KeepsTheLargestNumbers) {
+TEST(SRLImplementation, ReturnsTheLargestLifetimeAndScope) {
   Parts parts;
   parts.lifetime = std::numeric_limits<std::uint64_t>::max();
   parts.scope = std::numeric_limits<SRLScopeType>::max();
@@ -93,7 +93,7 @@ TEST(SRLImplementation, KeepsTheLargestNumbers) {
   EXPECT_EQ(parts.make()->scopeType(), 4294967295U);
 }
 
-TEST(SRLImplementation, NeedsNeitherTypeNorConfigurationNorFactory) {
+TEST(SRLImplementation, AcceptsNullForTypeConfigurationAndFactory) {
   Parts parts;
   parts.instanceType = nullptr;
   parts.configuration = nullptr;
@@ -104,7 +104,7 @@ TEST(SRLImplementation, NeedsNeitherTypeNorConfigurationNorFactory) {
   EXPECT_EQ(made->factoryBlock(), nullptr);
 }
 
-TEST(SRLImplementation, HandsTagsAndFlagToItsFactory) {
+TEST(SRLImplementation, PassesTagsAndFlagToItsFactory) {
   const Ref<Clock> tag = rt::make<Clock>();
   const Ref<Clock> clock = rt::make<Clock>();
   SRLScopeTagSet given;
@@ -142,8 +142,8 @@ TEST(SRLImplementation, DescribesItselfWithoutTypeAndConfiguration) {
                                      "18446744073709551615, scopeType: 4294967295, configuration: None>");
 }
 
-// Of what stands in memory after the identifier nothing counts.
-TEST(SRLImplementation, TakesAnIdentifierWithoutNULAtItsEnd) {
+// The bytes after the identifier do not matter.
+TEST(SRLImplementation, AcceptsAnIdentifierWithoutATerminatingNUL) {
   const std::string text = "SystemClock";
   const std::vector<char> exact(text.begin(), text.end());
   Parts parts;
@@ -175,8 +175,8 @@ std::uint64_t hashOfText(std::string_view text) {
   return std::hash<std::string_view>()(text);
 }
 
-TEST(SRLImplementation, HashesAllItsFieldsAsAHandWorksItOut) {
-  // A configuration of a type of hash 9 has the hash 41 * 9 + 1 = 370.
+TEST(SRLImplementation, HashesAllFieldsAsWorkedOutByHand) {
+  // The hash of the configuration is 41 * 9 + 1 = 370.
   ASSERT_EQ(configuration(9, true)->hash(), 370U);
   // 41 * (41 * (41 * (41 * 7 + 1) + 5) + 370) = 41 * (41 * (41 * 288 + 5) + 370) = 41 * 484703
   EXPECT_EQ(Parts().make()->hash(), hashOfText("SystemClock") + 19872823U);
@@ -198,7 +198,7 @@ TEST(SRLImplementation, HashesAllItsFieldsAsAHandWorksItOut) {
   EXPECT_EQ(parts.make()->hash(), hashOfText("") + 68921U + 3362U + 15170U + 8477283U);
 }
 
-TEST(SRLImplementation, LetsItsHashRunOver) {
+TEST(SRLImplementation, WrapsItsHashAround) {
   Parts parts;
   parts.instanceType = type(std::numeric_limits<std::uint64_t>::max());
   parts.lifetime = std::numeric_limits<std::uint64_t>::max();
@@ -206,14 +206,14 @@ TEST(SRLImplementation, LetsItsHashRunOver) {
   parts.configuration = nullptr;
   // 2^64 - 1 counts as -1: -41^4 - 41^3 + 41^2 * (2^32 - 1) = -2825761 - 68921 + 7219840022895
   EXPECT_EQ(parts.make()->hash(), hashOfText("SystemClock") + 7219840022895U - 2894682U);
-  // The type's alone, a configuration's with 41 * (2^64 - 1) = -41, and 41 times that.
+  // The type adds -41^4 = -2825761. The configuration's hash is 41 * -1 = -41, which adds 41 * -41 = -1681.
   parts.lifetime = 0;
   parts.scope = 0;
   parts.configuration = configuration(std::numeric_limits<std::uint64_t>::max(), false);
   EXPECT_EQ(parts.make()->hash(), hashOfText("SystemClock") - 2825761U - 1681U);
 }
 
-TEST(SRLImplementation, EqualsOneOfEqualParts) {
+TEST(SRLImplementation, EqualsAnImplementationWithEqualParts) {
   const Ref<SRLImplementation> made = Parts().make();
   const Ref<SRLImplementation> same = Parts().make();
   ASSERT_NE(made, same);
@@ -222,14 +222,14 @@ TEST(SRLImplementation, EqualsOneOfEqualParts) {
   EXPECT_EQ(made->hash(), same->hash());
 }
 
-TEST(SRLImplementation, EqualsNothingElse) {
+TEST(SRLImplementation, EqualsNoObjectOfAnotherClass) {
   const Ref<SRLImplementation> made = Parts().make();
   EXPECT_FALSE(made->isEqual(nullptr));
   EXPECT_FALSE(rt::isEqual(made, made->configuration()));
   EXPECT_FALSE(rt::isEqual(made, rt::make<Clock>()));
 }
 
-// How often two implementations have their types compared, and their configurations.
+// How often a comparison of two implementations compares their types and their configurations.
 struct Comparisons {
   int ofTypes = 0;
   int ofConfigurations = 0;
@@ -264,14 +264,14 @@ TEST_F(SRLImplementationEquality, ComparesTypeAndConfigurationOnce) {
   EXPECT_EQ(comparisons_.ofConfigurations, 1);
 }
 
-TEST_F(SRLImplementationEquality, GoesByTheIdentifierFirst) {
+TEST_F(SRLImplementationEquality, ComparesTheIdentifierFirst) {
   for (const std::string_view other : {"SystemCloc", "SystemClock ", "QuartzClock", "systemClock", ""}) {
     second_.identifier = other;
     EXPECT_FALSE(areEqual()) << other;
     EXPECT_EQ(comparisons_.ofTypes, 0);
     EXPECT_EQ(comparisons_.ofConfigurations, 0);
   }
-  // Every byte counts, NUL and what follows too.
+  // Every byte counts, including a NUL and the bytes after it.
   using namespace std::literals;
   first_.identifier = "System\0Clock"sv;
   second_.identifier = "System\0Clack"sv;
@@ -280,7 +280,7 @@ TEST_F(SRLImplementationEquality, GoesByTheIdentifierFirst) {
   EXPECT_TRUE(areEqual());
 }
 
-TEST_F(SRLImplementationEquality, GoesByTheInstanceTypeSecond) {
+TEST_F(SRLImplementationEquality, ComparesTheInstanceTypeSecond) {
   second_.instanceType = type(8, &comparisons_.ofTypes);
   EXPECT_FALSE(areEqual());
   EXPECT_EQ(comparisons_.ofTypes, 1);
@@ -291,21 +291,21 @@ TEST_F(SRLImplementationEquality, GoesByTheInstanceTypeSecond) {
   EXPECT_TRUE(areEqual());
 }
 
-TEST_F(SRLImplementationEquality, GoesByTheLifetimeThird) {
+TEST_F(SRLImplementationEquality, ComparesTheLifetimeThird) {
   second_.lifetime = 0;
   EXPECT_FALSE(areEqual());
   EXPECT_EQ(comparisons_.ofTypes, 1);
   EXPECT_EQ(comparisons_.ofConfigurations, 0);
 }
 
-TEST_F(SRLImplementationEquality, GoesByTheScopeFourth) {
+TEST_F(SRLImplementationEquality, ComparesTheScopeFourth) {
   second_.scope = 0b100;
   EXPECT_FALSE(areEqual());
   EXPECT_EQ(comparisons_.ofTypes, 1);
   EXPECT_EQ(comparisons_.ofConfigurations, 0);
 }
 
-TEST_F(SRLImplementationEquality, GoesByTheConfigurationLast) {
+TEST_F(SRLImplementationEquality, ComparesTheConfigurationLast) {
   second_.configuration = configuration(8, true, &comparisons_.ofConfigurations);
   EXPECT_FALSE(areEqual());
   EXPECT_EQ(comparisons_.ofTypes, 1);

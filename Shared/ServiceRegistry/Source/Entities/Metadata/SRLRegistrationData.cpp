@@ -13,7 +13,7 @@ namespace {
 
 constexpr const char* kFile = "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData";
 
-// So that they can be constants, for which nothing runs at start-up or at exit.
+// Records can be constants, for which no code runs at start-up or at exit.
 static_assert(std::is_standard_layout_v<SRLAPIRegistrationData> &&
               std::is_trivially_copyable_v<SRLAPIRegistrationData>);
 static_assert(std::is_standard_layout_v<SRLImplementationRegistrationData> &&

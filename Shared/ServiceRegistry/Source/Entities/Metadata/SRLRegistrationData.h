@@ -1,7 +1,7 @@
 #pragma once
 
-/// What generated code says of services: a record for each API, for each implementation, and for each binding
-/// of an API to its implementations.
+/// The records by which generated code describes services. There is one for each API, one for each
+/// implementation, and one for each binding of an API to its implementations.
 ///
 ///     rt::Ref<rt::Object> makeClock(SRLScopeTagSet) { return rt::make<SystemClock>(); }
 ///
@@ -19,14 +19,14 @@
 ///     constexpr _SRLBindingRegistrationData bindings[] = {{&clockAPI, clocks}};
 ///     static_assert(SRLAreBindingsSorted(bindings));              // SRLBindingsModuleData.h
 ///
-/// The records are constants of a fixed layout, with texts of UTF-8 that end with NUL, and live as long as
-/// the process: the registry keeps pointers to them. Any thread may read them.
+/// The records are constants with a fixed layout. Their texts are UTF-8 and end with NUL. The registry keeps
+/// pointers to the records, so they must live as long as the process. Any thread may read them.
 ///
-/// The registry knows an API and an implementation by the address of the record, not by the identifier. A
-/// copy of an API's record is another API, to which nothing is bound. So define each record once; in a
-/// header, as `inline constexpr`.
+/// A record's address identifies the API or the implementation. Its identifier does not. A copy of an API's
+/// record is another API, and nothing is bound to it. Define each record once; in a header, make it `inline
+/// constexpr`.
 ///
-/// Not for: people; what they write is turned into these.
+/// Not for: handwritten code. A generator writes these records.
 
 // The records are one binary format, so they are in one header. Their bits are plain bit-fields, so that
 // generated code can name what it sets. The offsets are checked while compiling. No compiler tells where the
@@ -43,17 +43,17 @@
 
 // NOLINTBEGIN(bugprone-reserved-identifier,cert-dcl37-c,cert-dcl51-cpp): names that generated code uses
 
-/// How a record gives the type of what it is about: which arm of the union.
+/// How a record describes a type. The kind selects the member of the record's union.
 enum SRLInstanceTypeKind : std::uint8_t {
-  /// By name: of a class and, for APIs, a protocol.
+  /// By the name of a class or, for APIs, of a class, a protocol or both.
   SRLInstanceTypeKindNames = 0,
   /// By a function that makes the instance type.
   SRLInstanceTypeKindFunction = 1,
-  /// Not at all; for instances of implementations only.
+  /// Not at all. Valid only for the instances of an implementation.
   SRLInstanceTypeKindNone = 2,
 };
 
-/// The type of an API's instances.
+/// Describes the type of an API's instances.
 union SRLAPIInstanceType {
   /// Either may be null.
   struct Names {
@@ -62,66 +62,68 @@ union SRLAPIInstanceType {
   };
 
   Names names{};
-  /// Not null. Takes the record; returns a new instance type.
+  /// Not null. Takes the record and returns a new instance type.
   rt::Ref<SRLInstanceType> (*function)(const struct _SRLAPIRegistrationData* record);
 };
 
-/// A service interface.
+/// Describes a service interface (an API).
 struct _SRLAPIRegistrationData {
-  /// What the registry finds the API by.
+  /// The text by which the registry finds the API's bindings in the modules.
   const char* identifier = nullptr;
   SRLAPIInstanceType instanceType{};
-  /// The scope that must be given with a request.
+  /// The scope type. A request for the API gives one tag for each of its bits.
   SRLScopeType scopeType = 0;
-  /// In bytes, without the NUL.
+  /// The length of `identifier` in bytes, without the NUL.
   std::uint16_t identifierLength = 0;
-  /// An SRLInstanceTypeKind.
+  /// SRLInstanceTypeKindNames or SRLInstanceTypeKindFunction.
   std::uint16_t instanceTypeKind : 2 = SRLInstanceTypeKindNames;
-  /// Whether any number of implementations may be bound, and not just one.
+  /// 1 for a multi-bound API, which may have any number of implementations. 0 for a single-bound API, which
+  /// has at most one.
   std::uint16_t isMultibound : 1 = 0;
   std::uint16_t reserved : 13 = 0;
 };
 using SRLAPIRegistrationData = _SRLAPIRegistrationData;
 
-/// The type of an implementation's instances, or of their configuration.
+/// Describes the type of an implementation's instances, or of its configuration object.
 union SRLImplementationInstanceType {
   const char* className = nullptr;
-  /// Not null. Takes the record; returns a new instance type.
+  /// Not null. Takes the record and returns a new instance type.
   rt::Ref<SRLInstanceType> (*function)(const struct _SRLImplementationRegistrationData* record);
 };
 
-/// Something that implements an API.
+/// Describes an implementation of an API.
 struct _SRLImplementationRegistrationData {
   const char* identifier = nullptr;
   SRLImplementationInstanceType instanceType{};
   SRLImplementationInstanceType configInstanceType{};
-  /// Makes an instance for the scope with these tags. Returns null where there is none.
+  /// Returns a new instance for the scope with these tags, or null if there is no instance for it.
   rt::Ref<rt::Object> (*factory)(SRLScopeTagSet tags) = nullptr;
-  /// The scope in which an instance lives.
+  /// The type of the scopes in which instances live. Its bits are a subset of those of the API.
   SRLScopeType scopeType = 0;
-  /// An SRLInstanceTypeKind; 3 counts as SRLInstanceTypeKindNames.
+  /// An SRLInstanceTypeKind. The value 3 counts as SRLInstanceTypeKindNames.
   std::uint32_t instanceTypeKind : 2 = SRLInstanceTypeKindNames;
   /// SRLInstanceTypeKindNames or SRLInstanceTypeKindFunction.
   std::uint32_t configInstanceTypeKind : 2 = SRLInstanceTypeKindNames;
-  /// 0 for one instance in a scope, 1 for a new one at every request.
+  /// 0 for one instance per scope, 1 for a new instance at every request.
   std::uint32_t lifetime : 1 = 0;
-  /// Whether the implementation takes a configuration, and whether it needs one.
+  /// 1 if the implementation takes a configuration object.
   std::uint32_t hasConfiguration : 1 = 0;
+  /// 1 if the implementation needs the configuration object.
   std::uint32_t isConfigurationRequired : 1 = 0;
   std::uint32_t reserved : 25 = 0;
 };
 using SRLImplementationRegistrationData = _SRLImplementationRegistrationData;
 
-/// That implementations are bound to an API.
+/// Binds implementations to an API.
 struct _SRLBindingRegistrationData {
   const SRLAPIRegistrationData* api = nullptr;
-  /// Ends with null. With nothing before it, the API is known, and nothing is bound to it here.
+  /// A list that ends with null. An empty list declares the API and binds nothing to it.
   const SRLImplementationRegistrationData* const* implementations = nullptr;
 };
 
 // NOLINTEND(bugprone-reserved-identifier,cert-dcl37-c,cert-dcl51-cpp)
 
-// The layout is part of the interface. Where the bits are in their bytes a test looks at.
+// Generated code relies on this layout. A test checks the positions of the bit-fields.
 static_assert(sizeof(void*) == 8);
 
 static_assert(sizeof(SRLAPIInstanceType) == 16);
@@ -145,19 +147,21 @@ static_assert(sizeof(_SRLBindingRegistrationData) == 16);
 static_assert(offsetof(_SRLBindingRegistrationData, api) == 0);
 static_assert(offsetof(_SRLBindingRegistrationData, implementations) == 8);
 
-/// The type of an API's instances, as a new object. What the record's names stand for is given to
-/// SRLMakeInstanceTypeContainer, a name that is not known as none. A kind other than
-/// SRLInstanceTypeKindNames and SRLInstanceTypeKindFunction is reported, and ends the program. Throws what
-/// the record's function and the error callback throw, and std::bad_alloc.
+/// Returns the type of an API's instances as a new object. If the record gives names, this looks up the class
+/// and the protocol and calls SRLMakeInstanceTypeContainer with them. A name that is not found counts as
+/// null.
+/// Errors: a kind other than SRLInstanceTypeKindNames and SRLInstanceTypeKindFunction is reported and ends
+/// the program. Throws what the record's function and the error callback throw, and std::bad_alloc.
 rt::Ref<SRLInstanceType> SRLAPIRegistrationDataInstanceType(const SRLAPIRegistrationData* record);
 
-/// The type of an implementation's instances, as a new object; null where the record gives none. A class that
-/// is not known is reported, and yields null. Throws like the function above.
+/// Returns the type of an implementation's instances as a new object. Null if the record gives no type.
+/// Errors: a class name that is not found is reported and yields null. Throws like the function above.
 rt::Ref<SRLInstanceType> SRLImplementationRegistrationDataInstanceType(
     const SRLImplementationRegistrationData* record);
 
-/// The type of an implementation's configuration, as a new object; null where it takes none. A class that is
-/// not known is reported, and yields null. A kind other than SRLInstanceTypeKindNames and
-/// SRLInstanceTypeKindFunction is reported, and ends the program. Throws like the functions above.
+/// Returns the type of an implementation's configuration object as a new object. Null if it takes none.
+/// Errors: a class name that is not found is reported and yields null. A kind other than
+/// SRLInstanceTypeKindNames and SRLInstanceTypeKindFunction is reported and ends the program. Throws like the
+/// functions above.
 rt::Ref<SRLInstanceType> SRLImplementationRegistrationDataConfigInstanceType(
     const SRLImplementationRegistrationData* record);

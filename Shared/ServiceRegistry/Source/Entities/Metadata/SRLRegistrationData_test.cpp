@@ -50,7 +50,7 @@ Ref<rt::Object> makeView(SRLScopeTagSet) {
   return rt::make<ClockView>();
 }
 
-// As a generator writes them: all of them constants.
+// Records as a generator writes them. All of them are constants.
 constinit const SRLAPIRegistrationData clockAPI{
     .identifier = "Clock",
     .instanceType = {.names = {.protocolName = "Clock"}},
@@ -75,7 +75,7 @@ std::array<std::uint8_t, sizeof(Record)> bytesOf(const Record& record) {
   return std::bit_cast<std::array<std::uint8_t, sizeof(Record)>>(record);
 }
 
-// The value of some bytes, the least significant first.
+// Returns the little-endian value of some bytes.
 template <std::size_t size>
 std::uint64_t valueAt(const std::array<std::uint8_t, size>& bytes, std::size_t offset, std::size_t width) {
   std::uint64_t value = 0;
@@ -86,7 +86,7 @@ std::uint64_t addressOf(const void* pointer) {
   return reinterpret_cast<std::uintptr_t>(pointer);
 }
 
-TEST(SRLRegistrationDataLayout, OfAnAPI) {
+TEST(SRLRegistrationDataLayout, PlacesTheFieldsOfAnAPI) {
   ASSERT_EQ(sizeof(SRLAPIRegistrationData), 32U);
   const SRLAPIRegistrationData record{
       .identifier = "id",
@@ -106,8 +106,8 @@ TEST(SRLRegistrationDataLayout, OfAnAPI) {
             reinterpret_cast<std::uintptr_t>(&typeOfRecord<SRLAPIRegistrationData>));
 }
 
-// Each bit alone, and then that it is read back from there.
-TEST(SRLRegistrationDataLayout, OfAnAPIsBits) {
+// Sets each bit alone and looks at the bytes. Then reads the bits from given bytes.
+TEST(SRLRegistrationDataLayout, PlacesTheBitFieldsOfAnAPI) {
   for (std::uint8_t kind = 0; kind < 4; ++kind) {
     SRLAPIRegistrationData record;
     record.instanceTypeKind = kind & 3U;
@@ -125,7 +125,7 @@ TEST(SRLRegistrationDataLayout, OfAnAPIsBits) {
   EXPECT_EQ(read.reserved, 0);
 }
 
-TEST(SRLRegistrationDataLayout, OfAnImplementation) {
+TEST(SRLRegistrationDataLayout, PlacesTheFieldsOfAnImplementation) {
   ASSERT_EQ(sizeof(SRLImplementationRegistrationData), 40U);
   const SRLImplementationRegistrationData record{
       .identifier = "id",
@@ -149,7 +149,7 @@ TEST(SRLRegistrationDataLayout, OfAnImplementation) {
             reinterpret_cast<std::uintptr_t>(&configTypeOfRecord<SRLImplementationRegistrationData>));
 }
 
-TEST(SRLRegistrationDataLayout, OfAnImplementationsBits) {
+TEST(SRLRegistrationDataLayout, PlacesTheBitFieldsOfAnImplementation) {
   const auto bitsOf = [](const SRLImplementationRegistrationData& record) {
     return valueAt(bytesOf(record), 36, 4);
   };
@@ -176,18 +176,18 @@ TEST(SRLRegistrationDataLayout, OfAnImplementationsBits) {
   EXPECT_EQ(read.reserved, 0U);
 }
 
-TEST(SRLRegistrationDataLayout, OfABinding) {
+TEST(SRLRegistrationDataLayout, PlacesTheFieldsOfABinding) {
   ASSERT_EQ(sizeof(_SRLBindingRegistrationData), 16U);
   EXPECT_EQ(valueAt(bytesOf(clockBinding), 0, 8), addressOf(&clockAPI));
   EXPECT_EQ(valueAt(bytesOf(clockBinding), 8, 8), addressOf(clockViews));
   EXPECT_EQ(clockBinding.implementations[0], &clockView);
   EXPECT_EQ(clockBinding.implementations[1], nullptr);
-  // Nothing is bound, and the API known.
+  // An empty list still names the API.
   EXPECT_EQ(emptyBinding.implementations[0], nullptr);
   EXPECT_EQ(emptyBinding.api, &clockAPI);
 }
 
-TEST(SRLAPIRegistrationDataInstanceType, IsWhatTheNamesSay) {
+TEST(SRLAPIRegistrationDataInstanceType, LooksUpTheNames) {
   TestReports reports;
   const auto typeOf = [](const char* protocolName, const char* className) {
     const SRLAPIRegistrationData record{
@@ -201,7 +201,7 @@ TEST(SRLAPIRegistrationDataInstanceType, IsWhatTheNamesSay) {
   EXPECT_TRUE(rt::isEqual(
       both, SRLClassProtocolType::initWithClass(&rt::classInfo<View>(), &rt::protocolInfo<Clock>())));
   EXPECT_EQ(both->asObject()->description(), "View<Clock>");
-  // A name that is not known counts as none, if there is another.
+  // An unknown name is ignored if the other one is known.
   EXPECT_TRUE(rt::isEqual(typeOf("Clock", "NoSuchClass"),
                           SRLProtocolType::initWithProtocol(&rt::protocolInfo<Clock>())));
   EXPECT_TRUE(
@@ -210,12 +210,12 @@ TEST(SRLAPIRegistrationDataInstanceType, IsWhatTheNamesSay) {
   EXPECT_TRUE(rt::isEqual(SRLAPIRegistrationDataInstanceType(&clockAPI), typeOf("Clock", nullptr)));
 }
 
-TEST(SRLAPIRegistrationDataInstanceType, IsANewObjectEachTime) {
+TEST(SRLAPIRegistrationDataInstanceType, ReturnsANewObjectEachTime) {
   const Ref<SRLInstanceType> first = SRLAPIRegistrationDataInstanceType(&clockAPI);
   EXPECT_NE(SRLAPIRegistrationDataInstanceType(&clockAPI), first);
 }
 
-TEST(SRLAPIRegistrationDataInstanceType, IsReportedAndNullWhereNoNameIsKnown) {
+TEST(SRLAPIRegistrationDataInstanceType, ReportsThatNoNameIsKnownAndYieldsNull) {
   TestReports reports;
   for (const auto& names :
        {SRLAPIInstanceType::Names{}, SRLAPIInstanceType::Names{.className = "NoSuchClass"},
@@ -226,7 +226,7 @@ TEST(SRLAPIRegistrationDataInstanceType, IsReportedAndNullWhereNoNameIsKnown) {
   }
 }
 
-TEST(SRLAPIRegistrationDataInstanceType, IsWhatTheFunctionReturns) {
+TEST(SRLAPIRegistrationDataInstanceType, ReturnsTheFunctionsResult) {
   const SRLAPIRegistrationData record{.instanceType = {.function = typeOfRecord},
                                       .instanceTypeKind = SRLInstanceTypeKindFunction};
   const Ref<SRLInstanceType> type = SRLAPIRegistrationDataInstanceType(&record);
@@ -234,7 +234,7 @@ TEST(SRLAPIRegistrationDataInstanceType, IsWhatTheFunctionReturns) {
   EXPECT_TRUE(rt::isEqual(type, SRLProtocolType::initWithProtocol(&rt::protocolInfo<Clock>())));
 }
 
-TEST(SRLImplementationRegistrationDataInstanceType, IsTheClassOfTheName) {
+TEST(SRLImplementationRegistrationDataInstanceType, LooksUpTheClassName) {
   TestReports reports;
   const Ref<SRLClassType> expected = SRLClassType::initWithClass(&rt::classInfo<View>());
   for (const unsigned kind : {0U, 3U}) {
@@ -247,9 +247,9 @@ TEST(SRLImplementationRegistrationDataInstanceType, IsTheClassOfTheName) {
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-TEST(SRLImplementationRegistrationDataInstanceType, IsReportedAndNullWhereTheClassIsNotKnown) {
+TEST(SRLImplementationRegistrationDataInstanceType, ReportsAnUnknownClassNameAndYieldsNull) {
   TestReports reports;
-  // Nor is that of a protocol a class's name.
+  // "Clock" is a protocol, not a class.
   for (const char* name : {"NoSuchClass", "Clock", static_cast<const char*>(nullptr)}) {
     const SRLImplementationRegistrationData record{.instanceType = {.className = name}};
     EXPECT_EQ(SRLImplementationRegistrationDataInstanceType(&record), nullptr);
@@ -257,7 +257,7 @@ TEST(SRLImplementationRegistrationDataInstanceType, IsReportedAndNullWhereTheCla
   }
 }
 
-TEST(SRLImplementationRegistrationDataInstanceType, IsWhatTheFunctionReturns) {
+TEST(SRLImplementationRegistrationDataInstanceType, ReturnsTheFunctionsResult) {
   const SRLImplementationRegistrationData record{
       .instanceType = {.function = typeOfRecord},
       .configInstanceType = {.function = configTypeOfRecord},
@@ -268,7 +268,7 @@ TEST(SRLImplementationRegistrationDataInstanceType, IsWhatTheFunctionReturns) {
   EXPECT_EQ(type->asObject()->description(), "id<Clock>");
 }
 
-TEST(SRLImplementationRegistrationDataInstanceType, MayBeNone) {
+TEST(SRLImplementationRegistrationDataInstanceType, IsNullForTheKindNone) {
   TestReports reports;
   const SRLImplementationRegistrationData record{.instanceType = {.className = "View"},
                                                  .instanceTypeKind = SRLInstanceTypeKindNone};
@@ -276,7 +276,7 @@ TEST(SRLImplementationRegistrationDataInstanceType, MayBeNone) {
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-TEST(SRLImplementationRegistrationDataConfigInstanceType, IsNoneWithoutConfiguration) {
+TEST(SRLImplementationRegistrationDataConfigInstanceType, IsNullWithoutAConfiguration) {
   TestReports reports;
   for (const unsigned kind : {0U, 1U, 2U, 3U}) {
     const SRLImplementationRegistrationData record{.configInstanceType = {.className = "View"},
@@ -287,7 +287,7 @@ TEST(SRLImplementationRegistrationDataConfigInstanceType, IsNoneWithoutConfigura
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-TEST(SRLImplementationRegistrationDataConfigInstanceType, IsTheClassOfTheName) {
+TEST(SRLImplementationRegistrationDataConfigInstanceType, LooksUpTheClassName) {
   TestReports reports;
   SRLImplementationRegistrationData record{
       .instanceType = {.className = "ClockView"},
@@ -304,7 +304,7 @@ TEST(SRLImplementationRegistrationDataConfigInstanceType, IsTheClassOfTheName) {
   }
 }
 
-TEST(SRLImplementationRegistrationDataConfigInstanceType, IsWhatTheFunctionReturns) {
+TEST(SRLImplementationRegistrationDataConfigInstanceType, ReturnsTheFunctionsResult) {
   const SRLImplementationRegistrationData record{
       .instanceType = {.function = typeOfRecord},
       .configInstanceType = {.function = configTypeOfRecord},
@@ -316,7 +316,7 @@ TEST(SRLImplementationRegistrationDataConfigInstanceType, IsWhatTheFunctionRetur
   EXPECT_EQ(type->asObject()->description(), "View");
 }
 
-// The error callback writes the report, and returns: the program ends all the same.
+// The error callback prints the report and returns. The program ends nevertheless.
 class SRLRegistrationDataDeathTest : public testing::Test {
  protected:
   void SetUp() override { PECErrorHandler::sharedInstance()->setErrorHandlerBlock(print); }
@@ -354,8 +354,8 @@ TEST_F(SRLRegistrationDataDeathTest, AConfigurationOfUnknownTypeEndsTheProgram) 
   }
 }
 
-// Nobody can catch what the error callback throws, as the default one does.
-TEST_F(SRLRegistrationDataDeathTest, TheProgramEndsAlsoWhereTheCallbackThrows) {
+// The default error callback throws. No caller can catch that exception.
+TEST_F(SRLRegistrationDataDeathTest, TheProgramEndsEvenIfTheErrorCallbackThrows) {
   PECErrorHandler::sharedInstance()->setErrorHandlerBlock(nullptr);
   SRLAPIRegistrationData record = clockAPI;
   record.instanceTypeKind = 2;

@@ -1,6 +1,6 @@
 #pragma once
 
-/// What tells scopes of one kind apart: an object with value equality and a hash that suits it.
+/// The protocol of tags. A tag tells a scope from other scopes of the same type.
 ///
 ///     class AccountTag final : public rt::Implements<AccountTag, rt::Object, SRLScopeTag> {
 ///      public:
@@ -8,10 +8,10 @@
 ///       std::uint64_t hash() const override;
 ///     };
 ///
-/// Conforming only says what the class is meant for. Any object will do, a string or a number too, as long as
-/// neither its equality nor its hash ever changes.
+/// A tag has value equality and a consistent hash, and neither of them ever changes. Any such object will do,
+/// for example a string or a number. Conforming to the protocol only says what the class is meant for.
 ///
-/// Not for: objects that are equal to themselves alone, by which no scope is found again.
+/// Not for: objects that equal only themselves. No other tag object would find the scope again.
 
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Class.h"

@@ -47,7 +47,7 @@ SRLScopeTagSet SRLScopeTagSetDetail::maskedToPart(const SRLScopeTagSet& set, SRL
               "The API scope must be a superset of the implementation's scope"_s);
     return {};
   }
-  // The tags and the API's bits are in the same order, and as many.
+  // There are as many tags as bits in `apiScope`, and they are in the same order.
   SRLScopeTagSet masked;
   std::size_t count = 0;
   SRLScopeType rest = apiScope;

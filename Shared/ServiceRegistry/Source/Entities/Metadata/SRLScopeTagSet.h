@@ -1,6 +1,6 @@
 #pragma once
 
-/// The tags of a scope: up to four, by value, without an allocation.
+/// A set of up to four tags, which identifies a scope. It is passed by value and needs no allocation.
 ///
 ///     rt::Ref<rt::Array> tags = rt::Array::of(account, window);
 ///     SRLScopeTagSet set = SRLScopeTagSetCreateWithTags(tags.get());
@@ -8,11 +8,16 @@
 ///         SRLScopeTagSetMaskingWithScopes(set, /*apiScope=*/0b0110, /*implScope=*/0b0100);
 ///     SRLScopeTagSetCFRefTypeForIndex(masked, 0);          // window
 ///
-/// A set for a scope type has one tag for each of the type's bits, the lowest bit's first.
+/// A set for a scope type has one tag for each bit of the type. The tags are in the order of the bits, from
+/// the lowest one.
 ///
-/// A set does not own its tags. Who keeps one longer than whoever made it keeps the tags retains it
-/// (`SRLScopeTagSetRetain`), and releases it when done. The functions are safe on any thread where the tags'
-/// own `isEqual`, `hash` and counting are, take no lock, and throw what these and the error callback throw.
+/// Ownership: a set does not own its tags. Call SRLScopeTagSetRetain to store a set beyond the current call,
+/// and SRLScopeTagSetRelease when done.
+///
+/// Threads: the functions take no lock. They are as thread-safe as the tags' own `isEqual`, `hash` and
+/// reference counting.
+///
+/// Errors: the functions throw what the tags' functions and the error callback throw.
 ///
 /// Not for: passing tags to another process (SRLScopeTagSetCodableWrapper).
 
@@ -27,7 +32,7 @@
 #include "Runtime/Values/Array.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeType.h"
 
-/// The set. The first null ends it, and all that follow are null too.
+/// The set. The first null ends it, and all later elements are null too.
 struct SRLScopeTagSet {
   static constexpr std::size_t kCapacity = 4;
 
@@ -36,45 +41,46 @@ struct SRLScopeTagSet {
 
 static_assert(sizeof(SRLScopeTagSet) == 32 && std::is_trivially_copyable_v<SRLScopeTagSet>);
 
-/// The hash of no tags, from which the hash of those there are goes on.
+/// The hash of the empty set, with which every other hash starts.
 inline constexpr std::uint64_t kSRLScopeTagSetHashOfNone = 0x7FFFFFFF;
 
-/// A set of the elements of `tags`, in their order. Null counts as empty; more than four are reported and
-/// yield the empty set. Retains nothing.
+/// Returns a set of the elements of `tags`, in their order. Does not retain them. Null yields the empty set.
+/// Errors: more than four elements are reported and yield the empty set.
 inline SRLScopeTagSet SRLScopeTagSetCreateWithTags(const rt::Array* tags);
 
-/// The tag at `index`, not retained. That there is none is reported, and yields null.
+/// Returns the tag at `index`. Does not retain it.
+/// Errors: an index without a tag is reported and yields null.
 rt::Object* SRLScopeTagSetCFRefTypeForIndex(const SRLScopeTagSet& set, std::size_t index);
 
-/// Of `set`, the tags of a scope of the type `apiScope`, those whose bits `implScope` has. Retains nothing.
-/// That `set` has not exactly one tag for each bit of `apiScope`, or that `implScope` has a bit that
-/// `apiScope` lacks, is reported, and yields the empty set.
+/// Returns those tags of `set`, a set for the type `apiScope`, whose bits `implScope` has. Does not retain
+/// them.
+/// Errors: `set` must have exactly one tag for each bit of `apiScope`, and `implScope` no bit that `apiScope`
+/// lacks. A violation is reported and yields the empty set.
 inline SRLScopeTagSet SRLScopeTagSetMaskingWithScopes(const SRLScopeTagSet& set, SRLScopeType apiScope,
                                                       SRLScopeType implScope);
 
-/// Whether both have equal tags in the same order.
+/// Returns whether both sets have equal tags in the same order.
 inline bool SRLScopeTagSetEqual(const SRLScopeTagSet& first, const SRLScopeTagSet& second);
 
-/// A hash that suits SRLScopeTagSetEqual: from `kSRLScopeTagSetHashOfNone` on, for each tag in order, 41
-/// times what there is, plus the tag's own.
+/// Returns a hash consistent with SRLScopeTagSetEqual. It starts with kSRLScopeTagSetHashOfNone. Each tag, in
+/// order, multiplies it by 41 and adds the tag's own hash.
 inline std::uint64_t SRLScopeTagSetHash(const SRLScopeTagSet& set);
 
-/// Whether one of the set's tags equals `tag`; none equals null.
+/// Returns whether a tag of the set equals `tag`. False for null.
 bool SRLScopeTagSetContainsTag(const SRLScopeTagSet& set, const rt::Object* tag);
 
-/// Adds a reference to each tag of the set.
+/// Retains each tag of the set.
 void SRLScopeTagSetRetain(const SRLScopeTagSet& set) noexcept;
 
-/// Gives up a reference to each tag of the set; on the calling thread, tags may be destroyed.
+/// Releases each tag of the set. Destroys a tag if this was the last reference to it.
 void SRLScopeTagSetRelease(const SRLScopeTagSet& set);
 
-/// The tags, retained, in their order, in a list that the caller may change, with room for four. Throws
-/// std::bad_alloc.
+/// Returns the tags, retained, in their order. The vector has capacity for four. Throws std::bad_alloc.
 std::vector<rt::Ref<rt::Object>> SRLScopeTagSetToArray(const SRLScopeTagSet& set);
 
 namespace SRLScopeTagSetDetail {
 
-// Bit by bit, since counting the bits of a word is a call of a library function on the plainest processors.
+// Counts bit by bit, since std::popcount is a library call where the processor may lack the instruction.
 inline bool hasOneTagForEachBit(const SRLScopeTagSet& set, SRLScopeType scope) noexcept {
   constexpr auto withoutLowestBit = [](SRLScopeType bits) { return bits & (bits - 1); };
   if (set.tags[0] == nullptr) return scope == 0;
@@ -87,7 +93,7 @@ inline bool hasOneTagForEachBit(const SRLScopeTagSet& set, SRLScopeType scope) n
   return fourth != 0 && withoutLowestBit(fourth) == 0;
 }
 
-// The same for an implementation whose scope is another than the API's, and for what is reported.
+// The slow path of SRLScopeTagSetMaskingWithScopes: for different scope types, and for errors.
 SRLScopeTagSet maskedToPart(const SRLScopeTagSet& set, SRLScopeType apiScope, SRLScopeType implScope);
 
 void reportTooMany(std::size_t count);

@@ -1,6 +1,6 @@
 #pragma once
 
-/// A tag set as an object, which can be archived and so passed to another process.
+/// A tag set as an object that can be archived, and so passed to another process.
 ///
 ///     rt::Ref<SRLScopeTagSetCodableWrapper> wrapper = SRLScopeTagSetCodableWrapper::initWithTagSet(set);
 ///     std::vector<std::byte> bytes = rt::KeyedArchiver::archivedDataWithRootObject(wrapper);
@@ -9,18 +9,20 @@
 ///     wrapper = rt::KeyedUnarchiver::unarchivedObjectOfClass<SRLScopeTagSetCodableWrapper>(bytes, &error);
 ///     if (wrapper) use(SRLScopeTagSetCreateWithTags(wrapper->tags().get()));
 ///
-/// Tags are archived if they are strings or numbers, arrays or dictionaries, or conform to rt::SecureCoding
-/// (Runtime/Archive/Coding.h); others end archiving with an rt::Exception, as does all else that a
-/// KeyedArchiver refuses, also of what was unarchived. The archive has them in an array, under the key
-/// "kTagsID".
+/// The archive holds the tags in an array, under the key "kTagsID". Tags can be archived if they are strings,
+/// numbers, arrays or dictionaries, or conform to rt::SecureCoding (Runtime/Archive/Coding.h). Archiving
+/// other tags throws an rt::Exception, as does everything else that rt::KeyedArchiver refuses. It may refuse
+/// an unarchived wrapper, too.
 ///
-/// An archive of a wrapper without an array of tags is reported. Without an error callback the report throws
-/// an rt::InternalInconsistencyException, which passes through the unarchiver. So a host that unarchives
-/// foreign bytes sets a callback (PECErrorHandler), or catches this.
+/// Errors: unarchiving a wrapper without an array of tags is reported. Without an error callback the report
+/// throws an rt::InternalInconsistencyException, which passes through the unarchiver. A host that unarchives
+/// foreign bytes must set an error callback (PECErrorHandler) or catch this exception.
 ///
-/// Owns its tags. Immutable: any thread may use it if the tags bear that.
+/// Ownership: the wrapper owns its tags.
 ///
-/// Not for: keys of tables, for which SRLScopeTagSet is smaller and quicker.
+/// Threads: immutable. Any thread may use it if the tags allow that.
+///
+/// Not for: keys of tables. SRLScopeTagSet is smaller and faster.
 
 #include <cstdint>
 #include <utility>
@@ -37,36 +39,37 @@
 class RT_VISIBLE SRLScopeTagSetCodableWrapper final
     : public rt::Implements<SRLScopeTagSetCodableWrapper, rt::Object, rt::SecureCoding> {
  public:
-  /// With a copy of `tags`, of any number. That it is null is reported, and yields null. Throws what the
-  /// error callback throws, and std::bad_alloc.
+  /// Returns a wrapper of a copy of `tags`, which may be of any length.
+  /// Errors: null is reported and yields null. Throws what the error callback throws, and std::bad_alloc.
   static rt::Ref<SRLScopeTagSetCodableWrapper> initWithTags(const rt::Ref<rt::Array>& tags);
 
-  /// The same with the tags of `tagSet`.
+  /// Returns a wrapper of the tags of `tagSet`. Throws std::bad_alloc.
   static rt::Ref<SRLScopeTagSetCodableWrapper> initWithTagSet(const SRLScopeTagSet& tagSet);
 
-  /// The array under "kTagsID" in an archive. Nothing else is made of what is there. The elements may be of
-  /// any class that can be unarchived, since hosts bring the classes of their tags. Where there is no array,
-  /// or an element cannot be unarchived, the absence of tags is reported, and null is returned. The coder's
-  /// `error` says what is wrong. Called by rt::KeyedUnarchiver.
+  /// Returns a wrapper of the array under "kTagsID" in an archive. Decodes nothing but an array there. Its
+  /// elements may be of any class that can be unarchived, since hosts define the classes of their tags.
+  /// rt::KeyedUnarchiver calls this function.
+  /// Errors: if there is no array, or an element cannot be unarchived, this reports that the tags are missing
+  /// and returns null. The coder's `error` says why.
   static rt::Ref<SRLScopeTagSetCodableWrapper> initWithCoder(rt::KeyedUnarchiver& coder);
 
-  /// Archives the tags under "kTagsID". Throws what archiving them throws.
+  /// Archives the tags under "kTagsID". Throws what archiving a tag throws.
   void encodeWithCoder(rt::KeyedArchiver& coder) const override;
 
-  /// That the class may be unarchived from anywhere.
+  /// Returns true: wrappers may be unarchived from bytes of any origin.
   static constexpr bool supportsSecureCoding() noexcept { return true; }
 
-  /// That between processes an object of the class is passed as a copy, not as a reference.
+  /// Returns true: between processes, wrappers are passed by copy, not by reference.
   static constexpr bool isValueType() noexcept { return true; }
 
-  /// The tags, in the order of their slots; never null.
+  /// Returns the tags in the order of the set. Never null.
   const rt::Ref<rt::Array>& tags() const noexcept { return tags_; }
 
-  /// Whether `other` has equal tags in the same order.
+  /// Returns whether `other` is a wrapper of equal tags in the same order.
   bool isEqual(const rt::Object* other) const override;
-  /// As SRLScopeTagSetHash of the tags, also of more than four.
+  /// Returns a hash that is computed like SRLScopeTagSetHash, also for more than four tags.
   std::uint64_t hash() const override;
-  /// "SRLScopeTagSetCodableWrapper<tags: TAGS>" with the array's description.
+  /// Returns "SRLScopeTagSetCodableWrapper<tags: TAGS>", where TAGS is the array's description.
   rt::String description() const override;
 
  private:

@@ -36,7 +36,7 @@ using testing::IsEmpty;
 using Wrapper = SRLScopeTagSetCodableWrapper;
 using Bytes = std::vector<std::byte>;
 
-// A tag that a host made up.
+// A host's own tag.
 class AccountTag final : public rt::Implements<AccountTag, rt::Object, SRLScopeTag, rt::SecureCoding> {
  public:
   explicit AccountTag(rt::String name) : name_(std::move(name)) {}
@@ -58,19 +58,19 @@ class AccountTag final : public rt::Implements<AccountTag, rt::Object, SRLScopeT
   const rt::String name_;
 };
 
-// One that cannot be archived.
+// A tag that cannot be archived.
 class WindowTag final : public rt::Implements<WindowTag, rt::Object, SRLScopeTag> {
  public:
   std::uint64_t hash() const override { return 5; }
 };
 
-// One that can be archived, and not unarchived.
+// A tag that can be archived, but not unarchived.
 class LostTag final : public rt::Implements<LostTag, rt::Object, SRLScopeTag, rt::SecureCoding> {
  public:
   void encodeWithCoder(KeyedArchiver& coder) const override { coder.encodeObject(nullptr, "nothing"); }
 };
 
-// An archive of the class that has something else under the key, or nothing.
+// Archives a value under a key, in place of a wrapper.
 class Forged final : public rt::Implements<Forged, rt::Object, rt::SecureCoding> {
  public:
   Forged(const char* key, Ref<rt::Object> value) : key_(key), value_(std::move(value)) {}
@@ -89,7 +89,7 @@ namespace {
 
 constexpr const char* kNeedsTags = "SRLScopeTagSetCodableWrapper requires non-nil tags.";
 
-// What an archive of the class would be with `value` under `key`.
+// Returns an archive of a wrapper that has `value` under `key` instead of its tags.
 Bytes forgedArchive(const char* key, const Ref<rt::Object>& value) {
   rt::PropertyList list =
       rt::PropertyList::decoded(KeyedArchiver::archivedDataWithRootObject(rt::make<Forged>(key, value)));
@@ -104,7 +104,7 @@ Ref<Wrapper> read(std::span<const std::byte> bytes, rt::String* error = nullptr)
   return KeyedUnarchiver::unarchivedObjectOfClass<Wrapper>(bytes, error);
 }
 
-TEST(SRLScopeTagSetCodableWrapper, IsMadeOfAnArray) {
+TEST(SRLScopeTagSetCodableWrapper, HoldsTheTagsOfAnArray) {
   const Ref<rt::Array> tags = rt::Array::of("a"_s, "b"_s, "c"_s, "d"_s, "e"_s);
   const Ref<Wrapper> wrapper = Wrapper::initWithTags(tags);
   EXPECT_TRUE(rt::isEqual(wrapper->tags(), tags));
@@ -114,7 +114,7 @@ TEST(SRLScopeTagSetCodableWrapper, IsMadeOfAnArray) {
   EXPECT_TRUE(Wrapper::isValueType());
 }
 
-// An array that is copied as another object.
+// An array whose copy is another object.
 class CopiedArray final : public rt::Implements<CopiedArray, rt::Array> {
  public:
   using Implements::Implements;
@@ -123,21 +123,21 @@ class CopiedArray final : public rt::Implements<CopiedArray, rt::Array> {
   }
 };
 
-TEST(SRLScopeTagSetCodableWrapper, KeepsACopyOfItsArray) {
+TEST(SRLScopeTagSetCodableWrapper, CopiesItsArray) {
   const Ref<rt::Array> tags = rt::make<CopiedArray>(std::vector<Ref<rt::Object>>{"a"_s});
   const Ref<Wrapper> wrapper = Wrapper::initWithTags(tags);
   EXPECT_NE(wrapper->tags(), tags);
   EXPECT_TRUE(rt::isEqual(wrapper->tags(), tags));
 }
 
-TEST(SRLScopeTagSetCodableWrapper, IsMadeOfATagSet) {
+TEST(SRLScopeTagSetCodableWrapper, HoldsTheTagsOfATagSet) {
   const Ref<rt::Array> tags = rt::Array::of("a"_s, rt::Number::of(2));
   const Ref<Wrapper> wrapper = Wrapper::initWithTagSet(SRLScopeTagSetCreateWithTags(tags.get()));
   EXPECT_TRUE(rt::isEqual(wrapper->tags(), tags));
   EXPECT_TRUE(Wrapper::initWithTagSet({})->tags()->isEmpty());
 }
 
-TEST(SRLScopeTagSetCodableWrapper, NeedsTags) {
+TEST(SRLScopeTagSetCodableWrapper, ReportsMissingTagsAndYieldsNull) {
   TestReports reports;
   EXPECT_EQ(Wrapper::initWithTags(nullptr), nullptr);
   const std::vector<Ref<LUMLogMessage>> messages = reports.messages();
@@ -156,12 +156,12 @@ TEST(SRLScopeTagSetCodableWrapper, DescribesItself) {
   EXPECT_EQ(Wrapper::initWithTagSet({})->description(), "SRLScopeTagSetCodableWrapper<tags: (\n)>");
 }
 
-TEST(SRLScopeTagSetCodableWrapper, HashesAsItsTagSetDoes) {
+TEST(SRLScopeTagSetCodableWrapper, HashesLikeItsTagSet) {
   EXPECT_EQ(Wrapper::initWithTagSet({})->hash(), 2147483647U);
   const Ref<rt::Array> tags = rt::Array::of("a"_s, "b"_s, "c"_s, "d"_s);
   const std::uint64_t hash = Wrapper::initWithTags(tags)->hash();
   EXPECT_EQ(hash, SRLScopeTagSetHash(SRLScopeTagSetCreateWithTags(tags.get())));
-  // A fifth, which no set has room for, counts too.
+  // A fifth tag counts, too, although a set has no room for it.
   const Ref<WindowTag> fifth = rt::make<WindowTag>();
   EXPECT_EQ(Wrapper::initWithTags(rt::Array::of("a"_s, "b"_s, "c"_s, "d"_s, fifth))->hash(), (hash * 41) + 5);
   EXPECT_EQ(Wrapper::initWithTags(rt::Array::of(fifth))->hash(), 88046829532U);  // 2147483647 * 41 + 5
@@ -180,7 +180,7 @@ TEST(SRLScopeTagSetCodableWrapper, ComparesItsTags) {
   EXPECT_FALSE(wrapper->isEqual(nullptr));
 }
 
-TEST(SRLScopeTagSetCodableWrapperArchive, IsReadBack) {
+TEST(SRLScopeTagSetCodableWrapperArchive, CanBeReadBack) {
   TestReports reports;
   const Ref<rt::Object> account = rt::make<AccountTag>("ü"_s);
   for (const Ref<rt::Array>& tags :
@@ -198,13 +198,13 @@ TEST(SRLScopeTagSetCodableWrapperArchive, IsReadBack) {
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-TEST(SRLScopeTagSetCodableWrapperArchive, IsRefusedToTagsThatCannotBeArchived) {
+TEST(SRLScopeTagSetCodableWrapperArchive, IsRefusedForTagsThatCannotBeArchived) {
   EXPECT_THROW(
       KeyedArchiver::archivedDataWithRootObject(Wrapper::initWithTags(rt::Array::of(rt::make<WindowTag>()))),
       rt::Exception);
 }
 
-TEST(SRLScopeTagSetCodableWrapperArchive, YieldsNullWithAReportWithoutTags) {
+TEST(SRLScopeTagSetCodableWrapperArchive, YieldsNullAndAReportWithoutTags) {
   TestReports reports;
   ASSERT_TRUE(read(forgedArchive("kTagsID", rt::Array::of("a"_s))));
   EXPECT_THAT(reports.texts(), IsEmpty());
@@ -216,7 +216,7 @@ TEST(SRLScopeTagSetCodableWrapperArchive, YieldsNullWithAReportWithoutTags) {
   EXPECT_THAT(errorOf(forgedArchive("tags", rt::Array::of("a"_s))),
               HasSubstr("there is nothing under the key \"kTagsID\""));
   EXPECT_THAT(reports.texts(), ElementsAre(kNeedsTags));
-  // Another class, of which nothing is made.
+  // An object of another class. It is not decoded.
   AccountTag::decodedCount = 0;
   const Ref<rt::Object> account = rt::make<AccountTag>("a"_s);
   for (const Ref<rt::Object>& other : {Ref<rt::Object>("text"_s), Ref<rt::Object>(rt::Number::of(1)), account,
@@ -233,18 +233,18 @@ TEST(SRLScopeTagSetCodableWrapperArchive, YieldsNullWithAReportWithoutTags) {
   // A tag that cannot be unarchived.
   EXPECT_THAT(errorOf(forgedArchive("kTagsID", rt::Array::of(rt::make<LostTag>()))), testing::Not(IsEmpty()));
   EXPECT_THAT(reports.texts(), ElementsAre(kNeedsTags));
-  // Another object altogether.
+  // An archive of another object.
   EXPECT_THAT(errorOf(KeyedArchiver::archivedDataWithRootObject(account)), HasSubstr("was asked for"));
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-TEST(SRLScopeTagSetCodableWrapperArchive, ThrowsWithoutTagsWhereThereIsNoErrorCallback) {
+TEST(SRLScopeTagSetCodableWrapperArchive, ThrowsWithoutTagsIfThereIsNoErrorCallback) {
   const TestReports reports;
   PECErrorHandler::sharedInstance()->setErrorHandlerBlock(nullptr);
   EXPECT_THROW(read(forgedArchive("kTagsID", rt::Number::of(3))), rt::InternalInconsistencyException);
 }
 
-TEST(SRLScopeTagSetCodableWrapperArchive, MayBeTruncatedOrDamagedAnywhere) {
+TEST(SRLScopeTagSetCodableWrapperArchive, YieldsNullOrAWrapperWhenTruncatedOrDamaged) {
   TestReports reports;
   const Bytes bytes = KeyedArchiver::archivedDataWithRootObject(
       Wrapper::initWithTags(rt::Array::of(rt::make<AccountTag>("a"_s), "b"_s)));
@@ -266,7 +266,7 @@ TEST(SRLScopeTagSetCodableWrapperArchive, MayBeTruncatedOrDamagedAnywhere) {
 
 class SRLScopeTagSetCodableWrapperAndPython : public PlistlibTest {};
 
-TEST_F(SRLScopeTagSetCodableWrapperAndPython, PythonReadsOurs) {
+TEST_F(SRLScopeTagSetCodableWrapperAndPython, PythonReadsAnArchive) {
   writeFile(KeyedArchiver::archivedDataWithRootObject(
       Wrapper::initWithTags(rt::Array::of(rt::make<AccountTag>("Ann"_s), rt::Number::of(7)))));
   EXPECT_EQ(python(R"(
@@ -282,7 +282,7 @@ print(at(account['$class'])['$classname'], at(account['name']), at(tags['objects
             "['$class', 'kTagsID'] SRLScopeTagSetCodableWrapper\nArray 2\nAccountTag Ann 7\n");
 }
 
-TEST_F(SRLScopeTagSetCodableWrapperAndPython, ReadsPythons) {
+TEST_F(SRLScopeTagSetCodableWrapperAndPython, ReadsAnArchiveThatPythonWrote) {
   python(R"(
 uid = plistlib.UID
 plistlib.dump({'$archiver': 'PythonArchiver', '$version': 100000, '$top': {'root': uid(1)}, '$objects': [

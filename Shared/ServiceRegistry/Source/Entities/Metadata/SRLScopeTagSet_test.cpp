@@ -24,7 +24,7 @@ using rt::Ref;
 using testing::ElementsAre;
 using testing::IsEmpty;
 
-// A tag with a hash of the test's, and equal to those with the same.
+// A tag with a given hash, equal to tags with the same hash.
 class Tag final : public rt::Implements<Tag, rt::Object, SRLScopeTag> {
  public:
   explicit Tag(std::uint64_t hash) : hash_(hash) {}
@@ -51,7 +51,7 @@ SRLScopeTagSet setOf(const Tags& tags) {
   return SRLScopeTagSetCreateWithTags(rt::make<rt::Array>(tags).get());
 }
 
-// The slots, whatever the functions say of them.
+// Looks at the slots directly, without the functions under test.
 bool hasSlots(const SRLScopeTagSet& set, std::array<rt::Object*, 4> slots) {
   return set.tags == slots;
 }
@@ -65,11 +65,11 @@ TEST(SRLScopeTagSetCreateWithTags, FillsTheSlotsInOrder) {
   EXPECT_TRUE(hasSlots(SRLScopeTagSetCreateWithTags(nullptr), {}));
   EXPECT_TRUE(hasSlots(setOf({tags[1]}), {tags[1].get()}));
   EXPECT_TRUE(hasSlots(setOf(tags), {tags[0].get(), tags[1].get(), tags[2].get(), tags[3].get()}));
-  // One tag may be there twice.
+  // A tag may occur twice.
   EXPECT_TRUE(hasSlots(setOf({tags[0], tags[0]}), {tags[0].get(), tags[0].get()}));
 }
 
-TEST(SRLScopeTagSetCreateWithTags, TakesFourAtMost) {
+TEST(SRLScopeTagSetCreateWithTags, ReportsMoreThanFourTagsAndYieldsTheEmptySet) {
   TestReports reports;
   EXPECT_TRUE(hasSlots(setOf(tagsWith({1, 2, 3, 4, 5})), {}));
   const std::vector<Ref<LUMLogMessage>> messages = reports.messages();
@@ -92,7 +92,7 @@ TEST(SRLScopeTagSetCreateWithTags, RetainsNothing) {
   EXPECT_EQ(weak.lock(), nullptr);
 }
 
-TEST(SRLScopeTagSetCFRefTypeForIndex, GivesTheTagOfASlot) {
+TEST(SRLScopeTagSetCFRefTypeForIndex, ReturnsTheTagOfASlot) {
   TestReports reports;
   const Tags tags = tagsWith({1, 2, 3, 4});
   for (std::size_t i = 0; i < 4; ++i)
@@ -100,7 +100,7 @@ TEST(SRLScopeTagSetCFRefTypeForIndex, GivesTheTagOfASlot) {
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-TEST(SRLScopeTagSetCFRefTypeForIndex, ReportsASlotThatIsEmptyOrNone) {
+TEST(SRLScopeTagSetCFRefTypeForIndex, ReportsAnEmptySlotAndAnIndexOutOfRange) {
   TestReports reports;
   const Tags tags = tagsWith({1, 2, 3, 4});
   EXPECT_EQ(SRLScopeTagSetCFRefTypeForIndex(setOf(tags), 4), nullptr);
@@ -129,7 +129,7 @@ TEST(SRLScopeTagSetMaskingWithScopes, KeepsTheTagsOfTheImplementation) {
   EXPECT_TRUE(hasSlots(SRLScopeTagSetMaskingWithScopes(set, 0b1011, 0b1010), {b, c}));
   EXPECT_TRUE(hasSlots(SRLScopeTagSetMaskingWithScopes(set, 0b1011, 0b1000), {c}));
   EXPECT_TRUE(hasSlots(SRLScopeTagSetMaskingWithScopes(set, 0b1011, 0), {}));
-  // The highest of the bits, too.
+  // With the highest bit.
   EXPECT_TRUE(hasSlots(SRLScopeTagSetMaskingWithScopes(set, 0xC0000001, 0x80000001), {a, c}));
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
@@ -143,7 +143,7 @@ TEST(SRLScopeTagSetMaskingWithScopes, ChangesNothingForEqualScopes) {
   EXPECT_THAT(reports.texts(), IsEmpty());
 }
 
-TEST(SRLScopeTagSetMaskingWithScopes, NeedsATagForEachBit) {
+TEST(SRLScopeTagSetMaskingWithScopes, ReportsASetWithoutOneTagForEachBit) {
   TestReports reports;
   const Tags tags = tagsWith({1, 2, 3, 4});
   const auto expectRefused = [&](const SRLScopeTagSet& set, SRLScopeType apiScope, SRLScopeType implScope) {
@@ -159,12 +159,12 @@ TEST(SRLScopeTagSetMaskingWithScopes, NeedsATagForEachBit) {
   expectRefused(setOf(tags), 0b11111, 0b00001);
   expectRefused({}, 0b1, 0);
   expectRefused(setOf({tags[0]}), 0, 0);
-  // Also where nothing is to be left out; and before anything is said of the implementation's scope.
+  // Also if both scopes are equal. And this error comes before that of the implementation's scope.
   expectRefused(setOf({tags[0]}), 0b11, 0b11);
   expectRefused(setOf({tags[0]}), 0b11, 0b100);
 }
 
-TEST(SRLScopeTagSetMaskingWithScopes, NeedsASupersetOfTheImplementationsScope) {
+TEST(SRLScopeTagSetMaskingWithScopes, ReportsAnImplementationScopeThatIsNoSubset) {
   TestReports reports;
   const Tags tags = tagsWith({1, 2});
   EXPECT_TRUE(hasSlots(SRLScopeTagSetMaskingWithScopes(setOf(tags), 0b0101, 0b0111), {}));
@@ -178,7 +178,7 @@ TEST(SRLScopeTagSetMaskingWithScopes, NeedsASupersetOfTheImplementationsScope) {
   EXPECT_THAT(reports.texts(), ElementsAre(kNoSuperset, kNoSuperset));
 }
 
-// Bit by bit, as a table of which tag belongs to which bit.
+// A slow model, which lists the API's bits and takes their tags one by one.
 std::pair<Tags, std::string> maskedByTheModel(const Tags& tags, SRLScopeType apiScope,
                                               SRLScopeType implScope) {
   std::vector<SRLScopeType> apiBits;
@@ -244,7 +244,7 @@ TEST(SRLScopeTagSetEqual, ComparesSlotBySlot) {
   EXPECT_FALSE(SRLScopeTagSetEqual(setOf({tags[0], tags[1]}), setOf({tags[1], tags[0]})));
 }
 
-TEST(SRLScopeTagSetHash, IsWhatAHandWorksOut) {
+TEST(SRLScopeTagSetHash, EqualsValuesWorkedOutByHand) {
   EXPECT_EQ(SRLScopeTagSetHash({}), 2147483647U);
   const Tags zero = tagsWith({0});
   EXPECT_EQ(SRLScopeTagSetHash(setOf(zero)), 0x147FFFFFD7U);  // 2147483647 * 41
@@ -252,7 +252,7 @@ TEST(SRLScopeTagSetHash, IsWhatAHandWorksOut) {
   EXPECT_EQ(SRLScopeTagSetHash(setOf(two)), 3609920010819U);  // (88046829527 + 5) * 41 + 7
   const Tags reversed = tagsWith({7, 5});
   EXPECT_EQ(SRLScopeTagSetHash(setOf(reversed)), 3609920010899U);  // (88046829527 + 7) * 41 + 5
-  // 41^4 * 2147483647 = 6068275537830367, and 41^3 + 41^2 + 41 + 1 = 70644 times 2^64 - 1 is 70644 less.
+  // 41^4 * 2147483647 = 6068275537830367. The tags add (41^3 + 41^2 + 41 + 1) * -1 = -70644, modulo 2^64.
   const Tags wrapping = tagsWith({UINT64_MAX, UINT64_MAX, UINT64_MAX, UINT64_MAX});
   EXPECT_EQ(SRLScopeTagSetHash(setOf(wrapping)), 6068275537830367U - 70644U);
 }
@@ -297,7 +297,7 @@ TEST(SRLScopeTagSetRetain, KeepsTheTagsUntilRelease) {
   }
 }
 
-TEST(SRLScopeTagSetToArray, HasTheUsedSlotsAndRoomForMore) {
+TEST(SRLScopeTagSetToArray, ReturnsTheTagsWithCapacityForFour) {
   const Tags tags = tagsWith({1, 2, 3, 4});
   for (std::ptrdiff_t count = 0; count <= 4; ++count) {
     const Tags used(tags.begin(), tags.begin() + count);
@@ -307,7 +307,7 @@ TEST(SRLScopeTagSetToArray, HasTheUsedSlotsAndRoomForMore) {
   }
 }
 
-TEST(SRLScopeTagSetToArray, KeepsItsTags) {
+TEST(SRLScopeTagSetToArray, RetainsTheTags) {
   Ref<Tag> tag = rt::make<Tag>(1U);
   const rt::Weak<Tag> weak = tag;
   SRLScopeTagSet set;

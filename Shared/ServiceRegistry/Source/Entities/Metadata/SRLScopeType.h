@@ -1,9 +1,9 @@
 #pragma once
 
-/// A scope, as the dimensions in which services that live in it are told apart: one bit for each. What the
-/// bits mean is the matter of whoever generates the bindings.
+/// The type of a scope: a bit mask with one bit for each dimension of the scope, for example the account or
+/// the window. The generator of the bindings decides what each bit means.
 ///
-/// Not for: one scope of its kind, which a SRLScopeTagSet is: a tag for each bit.
+/// Not for: identifying one scope of a type. An SRLScopeTagSet does, with one tag for each bit.
 
 #include <cstdint>
 

@@ -1,30 +1,30 @@
 #pragma once
 
-/// Whether the making of services is measured.
+/// Tells whether the making of services is measured.
 ///
 ///     if (SRLPProfilingEnabled()) partial = SRLPCaptureInjectionStart(implementation);
 ///
-/// What SRLPProfilingSwitch answered the first time; never changes afterwards. Where profiling is off, asking
-/// costs one branch that always goes the same way.
+/// The answer is what SRLPProfilingSwitch returned the first time. It never changes afterwards. If profiling
+/// is off, a call costs one branch that always goes the same way.
 ///
-/// Not for: turning profiling on, which a build does (SRLPProfilingSwitch.h).
+/// Not for: turning profiling on. The build or the program does that (SRLPProfilingSwitch.h).
 
 #include <atomic>
 
 namespace SRLPProfilingDetail {
 
-/// Whether it is known that profiling is off.
+// True once profiling is known to be off.
 extern constinit std::atomic<bool> isOff;
 
-/// Asks the switch, the first time.
+// Returns whether profiling is on. Calls the switch the first time.
 bool isOn();
 
 }  // namespace SRLPProfilingDetail
 
-/// Whether profiling is on. Any thread may ask. Throws what a program's own switch throws; the next call
-/// asks it again then.
+/// Returns whether profiling is on. Any thread may call this.
+/// Errors: throws what a program's own switch throws. The next call then calls the switch again.
 inline bool SRLPProfilingEnabled() {
-  // Nothing else is read on the strength of it.
+  // Relaxed, since the flag guards no other data.
   if (SRLPProfilingDetail::isOff.load(std::memory_order_relaxed)) [[likely]]
     return false;
   return SRLPProfilingDetail::isOn();

@@ -1,4 +1,4 @@
-// Whether profiling is on, as this program's own switch says: SWITCH_ANSWER.
+// Whether profiling is on. This program defines its own switch, which returns SWITCH_ANSWER.
 
 #include "Shared/ServiceRegistry/Source/Profiling/Private/SRLPProfilingEnabled.h"
 
@@ -24,7 +24,7 @@ bool SRLPProfilingSwitch() {
 
 namespace {
 
-TEST(SRLPProfilingEnabled, IsWhatTheSwitchSaysTheFirstTimeWhicheverThreadsAsk) {
+TEST(SRLPProfilingEnabled, CallsTheSwitchOnceForAllThreads) {
   std::array<bool, 8> answers{};
   answers.fill(!SWITCH_ANSWER);
   std::latch start(std::ptrdiff_t{answers.size()});
@@ -40,7 +40,7 @@ TEST(SRLPProfilingEnabled, IsWhatTheSwitchSaysTheFirstTimeWhicheverThreadsAsk) {
   for (const bool answer : answers) EXPECT_EQ(answer, SWITCH_ANSWER);
   EXPECT_EQ(SRLPProfilingEnabled(), SWITCH_ANSWER);
   EXPECT_EQ(questions, 1);
-  // Where it is off, nobody need go any further.
+  // If profiling is off, the quick answer is set.
   EXPECT_EQ(SRLPProfilingDetail::isOff, !SWITCH_ANSWER);
 }
 

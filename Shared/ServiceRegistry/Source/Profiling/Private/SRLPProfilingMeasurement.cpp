@@ -21,11 +21,12 @@ namespace {
 
 constexpr const char* kFile = "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingMeasurement";
 
-// Constants, unlike what they guard: threads that run on at exit may still ask.
+// Never destroyed, unlike the stacks: threads that run on at exit may still use these two.
 constinit rt::UnfairLock lock;
 constinit bool areStacksThere RT_GUARDED_BY(lock) = false;
 
-/// What each thread is making, the latest last. A thread that makes nothing has no stack.
+// The implementations whose instances each thread is making, the latest last. A thread that makes none has no
+// stack.
 struct Stacks {
   Stacks() noexcept {
     const rt::LockGuard guard(lock);
@@ -33,7 +34,7 @@ struct Stacks {
   }
   Stacks(const Stacks&) = delete;
   Stacks& operator=(const Stacks&) = delete;
-  // The lock is let go before the implementations are.
+  // Releases the lock before `byThread` releases the implementations.
   ~Stacks() {
     const rt::LockGuard guard(lock);
     areStacksThere = false;
@@ -42,10 +43,10 @@ struct Stacks {
   std::unordered_map<const void*, std::vector<rt::Ref<SRLImplementation>>> byThread;
 };
 
-// Load hooks are called at priority 102.
+// Constructed before load hooks run, which do so at priority 102.
 [[gnu::init_priority(101)]] Stacks stacks RT_GUARDED_BY(lock);
 
-/// Returns what `thread` was making before.
+// Returns what was on top of the thread's stack before. Null if there was nothing.
 rt::Ref<SRLImplementation> push(const void* thread, const rt::Ref<SRLImplementation>& implementation) {
   const rt::LockGuard guard(lock);
   if (!areStacksThere) return nullptr;
@@ -55,7 +56,7 @@ rt::Ref<SRLImplementation> push(const void* thread, const rt::Ref<SRLImplementat
   return parent;
 }
 
-/// Returns what was on the top of the calling thread's stack, for the caller to give up without the lock.
+// Returns what was on top of the calling thread's stack, so that the caller releases it without the lock.
 rt::Ref<SRLImplementation> pop() noexcept {
   const rt::LockGuard guard(lock);
   if (!areStacksThere) return nullptr;
@@ -63,12 +64,12 @@ rt::Ref<SRLImplementation> pop() noexcept {
   if (found == stacks.byThread.end()) return nullptr;
   std::vector<rt::Ref<SRLImplementation>>& stack = found->second;
   rt::Ref<SRLImplementation> top;
-  // Empty where there was no memory for the first.
+  // The stack is empty if `push` had no memory for its first element.
   if (!stack.empty()) {
     top = std::move(stack.back());
     stack.pop_back();
   }
-  // Or else the map would keep something for each thread that there ever was.
+  // Otherwise the map would grow with every new thread.
   if (stack.empty()) stacks.byThread.erase(found);
   return top;
 }
@@ -87,7 +88,7 @@ rt::String descriptionOf(const rt::Ref<SRLImplementation>& implementation) {
   return "SRL profiling error placeholder key"_s;
 }
 
-/// By its type alone, unlike the implementation that is measured.
+// Describes the parent by its instance type alone, unlike the measured implementation.
 rt::String descriptionOfParent(const rt::Ref<SRLImplementation>& parent) {
   return parent && parent->instanceType() ? parent->instanceType()->asObject()->description() : nullptr;
 }
@@ -108,7 +109,7 @@ SRLPProfilingMeasurementPartial SRLPCaptureInjectionStart(const rt::Ref<SRLImple
   return partial;
 }
 
-// NOLINTNEXTLINE(performance-unnecessary-value-param): what has ended is given back
+// NOLINTNEXTLINE(performance-unnecessary-value-param): takes over the measurement that it ends
 void SRLPCaptureInjectionEnd(SRLPProfilingMeasurementPartial partial, const SRLAPIRegistrationData* api,
                              const rt::Ref<SRLImplementation>& implementation) {
   const std::uint64_t duration = rt::MonotonicClock::nanoseconds() - partial.startTime;

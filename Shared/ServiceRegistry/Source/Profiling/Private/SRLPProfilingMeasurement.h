@@ -1,6 +1,6 @@
 #pragma once
 
-/// Measures the making of services: how long each takes, and which other one needs it.
+/// Measures how long each service takes to be made, and which other service needed it.
 ///
 ///     const SRLPProfilingMeasurementPartial partial = SRLPCaptureInjectionStart(implementation);
 ///     bool instanceCreated = false;
@@ -11,15 +11,17 @@
 ///       SRLPCaptureInjectionCancel();
 ///     }
 ///
-/// Each thread has a stack of what it is making, so that each start is followed, on its thread, by one end or
-/// one cancel, also where the factory throws. One too many does no harm. The stacks hold their
-/// implementations; no lock is held when one is given up or described.
+/// Each thread has a stack of the implementations whose instances it is making. One end or one cancel must
+/// follow each start on the same thread, also if the factory throws. One too many of them does no harm.
 ///
-/// The stacks are there before any load hook runs, and until static objects have been destroyed at exit
-/// (on macOS possibly not before the hooks run). Whoever starts or ends outside of that time, as threads do
-/// that go on while the program exits, is measured without a parent.
+/// Ownership: the stacks retain their implementations. No lock is held while one is released or described.
 ///
-/// Not for: hosts. The registry measures, where SRLPProfilingEnabled; the results are in SRLProfilingStorage.
+/// The stacks exist before any load hook runs, and until static objects are destroyed at exit. On macOS they
+/// may not exist yet when the hooks run. Starts and ends are safe at other times too, for example on a thread
+/// that runs on while the program exits. A measurement that starts at such a time has no parent.
+///
+/// Not for: hosts. The registry measures if SRLPProfilingEnabled returns true. SRLProfilingStorage holds the
+/// results.
 
 #include <cstddef>
 #include <cstdint>
@@ -30,36 +32,39 @@
 
 /// A measurement that has begun.
 struct SRLPProfilingMeasurementPartial {
-  /// By the clock of Runtime/Base/Private/MonotonicClock.h.
+  /// When it began, in nanoseconds by the clock of Runtime/Base/Private/MonotonicClock.h.
   std::uint64_t startTime = 0;
   /// The handle of the thread that began it (Runtime/Process/Thread.h).
   const void* callingThread = nullptr;
-  /// What that thread was making then; null where it was making nothing.
+  /// The implementation whose instance that thread was making then. Null if there was none.
   rt::Ref<SRLImplementation> parent;
 };
 
-/// Begins to measure what `implementation` makes, on the calling thread. Throws std::bad_alloc; nothing has
-/// begun then.
+/// Starts to measure, on the calling thread, the making of an instance of `implementation`.
+/// Errors: throws std::bad_alloc. The measurement has not started then.
 SRLPProfilingMeasurementPartial SRLPCaptureInjectionStart(const rt::Ref<SRLImplementation>& implementation);
 
-/// Ends the latest measurement on the calling thread, and stores it in SRLProfilingStorage, as begun in
-/// `partial` for the API at `api`, which is not null: as an event of its own where `implementation` makes
-/// one instance for each scope, in the counts for the implementation where it makes a new one at every
-/// request. Another lifetime is reported, once in a process, and nothing is stored. An implementation
-/// without description, which is null itself, is reported, too, stored under another text, and counts as
-/// one of the first kind.
+/// Ends the latest measurement on the calling thread and stores it in SRLProfilingStorage. `partial` is what
+/// the start returned. `api`, not null, is the API for which the instance was made. How the measurement is
+/// stored depends on the lifetime of `implementation`:
 ///
-/// Throws what a description and the error callback throw, and std::bad_alloc; nothing is stored then, but
-/// the measurement has ended.
+/// - 0, one instance per scope: as an event of its own.
+/// - 1, a new instance at every request: in the statistics of the implementation.
+/// - Another value: not at all. The first time in a process, this is reported.
+///
+/// A null `implementation` is reported, described by a placeholder, and counts as one with the lifetime 0.
+///
+/// Errors: throws what a description and the error callback throw, and std::bad_alloc. The measurement has
+/// ended then, but nothing is stored.
 void SRLPCaptureInjectionEnd(SRLPProfilingMeasurementPartial partial, const SRLAPIRegistrationData* api,
                              const rt::Ref<SRLImplementation>& implementation);
 
-/// Ends the latest measurement on the calling thread, and forgets it.
+/// Ends the latest measurement on the calling thread and discards it.
 void SRLPCaptureInjectionCancel() noexcept;
 
 namespace SRLPProfilingDetail {
 
-/// How many threads are making something that is measured; for tests.
+// Returns how many threads have a measurement under way. For tests.
 std::size_t countOfStacks() noexcept;
 
 }  // namespace SRLPProfilingDetail

@@ -1,5 +1,5 @@
-// The stacks are there when load hooks run, and nobody finds them when they are gone: a thread goes on
-// measuring while its program exits.
+// How long the stacks exist. They do so when load hooks run. A thread may go on measuring at exit, when they
+// are destroyed.
 
 #include <gtest/gtest.h>
 #include <unistd.h>
@@ -50,7 +50,7 @@ template struct rt::LoadHook<ProfilingLoadHook>;
 
 namespace {
 
-TEST(SRLPProfilingMeasurementLifetime, HasItsStacksWhenLoadHooksRun) {
+TEST(SRLPProfilingMeasurementLifetime, StacksExistWhenLoadHooksRun) {
 #ifdef __APPLE__
   GTEST_SKIP() << "the order of what runs when a program is loaded is the linker's";
 #endif
@@ -58,7 +58,7 @@ TEST(SRLPProfilingMeasurementLifetime, HasItsStacksWhenLoadHooksRun) {
   EXPECT_EQ(SRLPProfilingDetail::countOfStacks(), 0U);
 }
 
-// What goes on in the program that exits, in this order.
+// The steps of the program that exits, in order.
 enum Step : int {
   kNothing,
   kMeasuring,  // the thread has begun to make something
@@ -74,12 +74,12 @@ void setStep(Step next) {
   step.notify_all();
 }
 
-/// In the stack only, and destroyed with it.
+// Only the stack retains this object, so it is destroyed with the stack.
 class LastWords final : public rt::Implements<LastWords, rt::Object> {
  public:
   ~LastWords() override {
     isGivenUp = true;
-    // No lock is held, and there is nothing to find.
+    // No lock is held, and there are no stacks any more.
     SRLPCaptureInjectionCancel();
   }
 };
@@ -100,7 +100,7 @@ void goOnMeasuring() {
   if (SRLProfilingStorage::sharedInstance()->serviceInitializationEvents()->count() != 1) problems += 80;
   SRLPCaptureInjectionCancel();
   setStep(kMeasured);
-  // It ends with the program.
+  // The thread ends with the program.
   for (;;) step.wait(kMeasured);
 }
 
@@ -115,11 +115,11 @@ void goOnMeasuring() {
 [[noreturn]] void exitWhileAThreadGoesOn() {
   std::thread(goOnMeasuring).detach();
   step.wait(kNothing);
-  // A status that shows whether the end was reached by way of the function above.
+  // The status shows if the program ended without the function above.
   std::exit(255);
 }
 
-TEST(SRLPProfilingMeasurementLifetime, LeavesThreadsAloneThatGoOnAtExit) {
+TEST(SRLPProfilingMeasurementLifetime, ThreadsMayGoOnMeasuringAtExit) {
 #ifdef __APPLE__
   GTEST_SKIP() << "nothing is called after static objects have been destroyed";
 #endif

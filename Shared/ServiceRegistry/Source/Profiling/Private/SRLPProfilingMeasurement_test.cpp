@@ -1,5 +1,5 @@
-// Measuring: what is recorded, of whom each service is a part, what is reported, and that no lock is held
-// while anybody else's code runs.
+// Measuring: what is recorded, which parent each measurement has, and what is reported. No lock is held while
+// other code runs.
 
 #include "Shared/ServiceRegistry/Source/Profiling/Private/SRLPProfilingMeasurement.h"
 
@@ -41,7 +41,7 @@ using NewInstanceEvent = SRLPServiceInitializationNewInstanceEvent;
 
 constexpr const char* kUnknownLifetime = "Unknown lifetime of implementation in SRLProfilingMeasurement.";
 
-TEST(SRLPCaptureInjectionStart, TellsTimeThreadAndParent) {
+TEST(SRLPCaptureInjectionStart, ReturnsTimeThreadAndParent) {
   const Ref<SRLImplementation> outer = makesClocks();
   const Ref<SRLImplementation> inner = makesCalendars();
   const std::uint64_t before = rt::MonotonicClock::nanoseconds();
@@ -61,7 +61,7 @@ TEST(SRLPCaptureInjectionStart, TellsTimeThreadAndParent) {
   SRLPCaptureInjectionCancel();
 }
 
-TEST(SRLPCaptureInjectionStart, KeepsTheImplementationUntilItEnds) {
+TEST(SRLPCaptureInjectionStart, RetainsTheImplementationUntilTheEnd) {
   Ref<SRLImplementation> implementation = makesClocks();
   const rt::Weak<SRLImplementation> known = implementation;
   SRLPCaptureInjectionStart(implementation);
@@ -71,7 +71,7 @@ TEST(SRLPCaptureInjectionStart, KeepsTheImplementationUntilItEnds) {
   EXPECT_EQ(known.lock(), nullptr);
 }
 
-TEST(SRLPCaptureInjectionEnd, RecordsAnInstanceThatIsShared) {
+TEST(SRLPCaptureInjectionEnd, RecordsAnEventForASharedInstance) {
   const SRLAPIRegistrationData api = apiNamed("a shared instance");
   const Ref<SRLImplementation> implementation = makesClocks();
   const std::uint64_t beforeStart = rt::MonotonicClock::nanoseconds();
@@ -93,7 +93,7 @@ TEST(SRLPCaptureInjectionEnd, RecordsAnInstanceThatIsShared) {
   EXPECT_EQ(countOfStacks(), 0U);
 }
 
-TEST(SRLPCaptureInjectionEnd, CountsInstancesThatAreNewAtEveryRequest) {
+TEST(SRLPCaptureInjectionEnd, CountsNewInstancesByImplementation) {
   const SRLAPIRegistrationData api = apiNamed("new instances");
   const Ref<SRLImplementation> implementation = makesNewClocks("NewClock");
   const Ref<SRLImplementation> other = makesNewClocks("OtherNewClock");
@@ -115,7 +115,7 @@ TEST(SRLPCaptureInjectionEnd, CountsInstancesThatAreNewAtEveryRequest) {
   EXPECT_EQ(countOfStacks(), 0U);
 }
 
-TEST(SRLPCaptureInjectionEnd, MeasuresFromTheStartThatItIsGiven) {
+TEST(SRLPCaptureInjectionEnd, MeasuresFromTheGivenStart) {
   const SRLAPIRegistrationData api = apiNamed("a start long ago");
   const Ref<SRLImplementation> implementation = makesClocks();
   SRLPProfilingMeasurementPartial partial = SRLPCaptureInjectionStart(implementation);
@@ -131,7 +131,7 @@ TEST(SRLPCaptureInjectionEnd, MeasuresFromTheStartThatItIsGiven) {
   EXPECT_EQ(events[0]->callingThread(), &thread);
 }
 
-TEST(SRLPCaptureInjectionEnd, TakesTheIdentifierAsItStands) {
+TEST(SRLPCaptureInjectionEnd, DoesNotCopyTheIdentifier) {
   SRLAPIRegistrationData api = apiNamed("identifier and more");
   api.identifierLength = 10;
   const Ref<SRLImplementation> implementation = makesClocks();
@@ -141,7 +141,7 @@ TEST(SRLPCaptureInjectionEnd, TakesTheIdentifierAsItStands) {
   EXPECT_EQ(events[0]->apiDescription().view().data(), api.identifier);  // not copied
 }
 
-TEST(SRLPCaptureInjectionEnd, RepairsAnIdentifierThatIsNoText) {
+TEST(SRLPCaptureInjectionEnd, RepairsAnIdentifierThatIsNotUTF8) {
   SRLAPIRegistrationData api = apiNamed("\xff");
   const Ref<SRLImplementation> implementation = makesClocks();
   SRLPCaptureInjectionEnd(SRLPCaptureInjectionStart(implementation), &api, implementation);
@@ -183,7 +183,7 @@ TEST(SRLPCaptureInjectionEnd, DescribesTheParentByItsType) {
   EXPECT_EQ(countOfStacks(), 0U);
 }
 
-TEST(SRLPCaptureInjectionEnd, PopsTheStackOfTheThreadThatEnds) {
+TEST(SRLPCaptureInjectionEnd, PopsTheStackOfTheCallingThread) {
   const SRLAPIRegistrationData api = apiNamed("ended by another thread");
   const Ref<SRLImplementation> outer = makesCalendars();
   const Ref<SRLImplementation> inner = makesClocks();
@@ -203,7 +203,7 @@ TEST(SRLPCaptureInjectionEnd, PopsTheStackOfTheThreadThatEnds) {
   EXPECT_EQ(countOfStacks(), 0U);
 }
 
-TEST(SRLPCaptureInjectionEnd, ReportsAnImplementationWithoutDescription) {
+TEST(SRLPCaptureInjectionEnd, ReportsANullImplementation) {
   const SRLAPIRegistrationData api = apiNamed("no implementation");
   const Ref<SRLImplementation> none;
   TestReports reports;
@@ -222,7 +222,7 @@ TEST(SRLPCaptureInjectionEnd, ReportsAnImplementationWithoutDescription) {
   EXPECT_EQ(events[0]->implDescription(), "SRL profiling error placeholder key");
   EXPECT_EQ(countOfStacks(), 0U);
 
-  // Every time.
+  // It is reported every time.
   SRLPCaptureInjectionEnd(SRLPCaptureInjectionStart(none), &api, none);
   EXPECT_THAT(reports.texts(), ElementsAre("SRL profiling: nil implDescription"));
 }
@@ -245,7 +245,7 @@ TEST(SRLPCaptureInjectionEnd, ReportsAnUnknownLifetimeOnce) {
   EXPECT_THAT(countsFor(api), IsEmpty());
 }
 
-TEST(SRLPCaptureInjectionEnd, EndsAlsoWhereADescriptionOrACallbackThrows) {
+TEST(SRLPCaptureInjectionEnd, EndsEvenIfADescriptionOrACallbackThrows) {
   const SRLAPIRegistrationData api = apiNamed("exceptions");
   const Ref<SRLImplementation> implementation =
       makes(rt::make<TalkingType>([]() -> rt::String { throw std::runtime_error("no words"); }));
@@ -253,7 +253,7 @@ TEST(SRLPCaptureInjectionEnd, EndsAlsoWhereADescriptionOrACallbackThrows) {
                std::runtime_error);
   EXPECT_EQ(countOfStacks(), 0U);
 
-  // The parent's, of which only the type is described.
+  // Now the description of the parent's type throws.
   const Ref<SRLImplementation> inner = makesClocks();
   SRLPCaptureInjectionStart(implementation);
   EXPECT_THROW(SRLPCaptureInjectionEnd(SRLPCaptureInjectionStart(inner), &api, inner), std::runtime_error);
@@ -271,7 +271,7 @@ TEST(SRLPCaptureInjectionEnd, EndsAlsoWhereADescriptionOrACallbackThrows) {
   EXPECT_THAT(eventsFor(api), IsEmpty());
 }
 
-TEST(SRLPCaptureInjectionEnd, DescribesBeforeItPopsAndWithoutTheLock) {
+TEST(SRLPCaptureInjectionEnd, DescribesBeforeItPopsAndWithoutALock) {
   const SRLAPIRegistrationData api = apiNamed("described");
   Ref<SRLImplementation> implementation;
   Ref<SRLImplementation> parent;
@@ -286,7 +286,7 @@ TEST(SRLPCaptureInjectionEnd, DescribesBeforeItPopsAndWithoutTheLock) {
   EXPECT_EQ(eventsFor(api).size(), 1U);
 }
 
-TEST(SRLPCaptureInjectionCancel, LeavesNothing) {
+TEST(SRLPCaptureInjectionCancel, RecordsNothing) {
   const Ref<SRLImplementation> outer = makesCalendars();
   const Ref<SRLImplementation> inner = makesClocks();
   const auto countOfEvents = [] {
@@ -306,12 +306,12 @@ TEST(SRLPCaptureInjectionCancel, LeavesNothing) {
   EXPECT_EQ(countOfEvents(), before);
 }
 
-TEST(SRLPCaptureInjectionCancel, GivesTheImplementationUpWithoutTheLock) {
+TEST(SRLPCaptureInjectionCancel, ReleasesTheImplementationWithoutALock) {
   bool isGivenUp = false;
   Ref<SRLImplementation> parentFound;
   Ref<SRLImplementation> outer = makesCalendars();
   SRLPCaptureInjectionStart(outer);
-  // The stack alone has this one.
+  // Only the stack retains this implementation.
   SRLPCaptureInjectionStart(makes(nullptr, 0, rt::make<AtEnd>([&] {
                                     isGivenUp = true;
                                     parentFound = SRLPCaptureInjectionStart(nullptr).parent;
@@ -324,7 +324,7 @@ TEST(SRLPCaptureInjectionCancel, GivesTheImplementationUpWithoutTheLock) {
   SRLPCaptureInjectionCancel();
 }
 
-TEST(SRLPCaptureInjectionCancel, DoesNoHarmWhereNothingHasBegun) {
+TEST(SRLPCaptureInjectionCancel, IsHarmlessWithoutAStart) {
   const SRLAPIRegistrationData api = apiNamed("ended twice");
   const Ref<SRLImplementation> implementation = makesClocks();
   SRLPCaptureInjectionCancel();

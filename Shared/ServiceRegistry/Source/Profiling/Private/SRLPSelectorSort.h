@@ -1,21 +1,29 @@
 #pragma once
 
-/// A list in the order that answers of 64 bits give, whatever they are.
+/// Sorts a list by 64-bit answers about pairs of its elements, even if the answers define no order.
 ///
 ///     const auto difference = [](int receiver, int argument) { return std::int64_t{receiver} - argument; };
 ///     std::vector<int> sorted = SRLPSelectorSort(std::vector{3, 1, 2}, difference);      // 1, 2, 3
 ///
-/// An element is asked about another that stands behind it: over 0 puts it after that one, 0 leaves both as
-/// they stand, and less than 0 as well. Answers that make an order sort the list by it, and equal elements
-/// keep theirs. Answers that make none, such as an accessor's, which tells of one of the two only, give some
-/// order of the same elements all the same, and always the same one: the list is halved, the first half being
-/// the shorter one if they differ; each half is sorted; and as long as both have elements left, the first
-/// of the first half is asked about the first of the second, which goes before it if the answer is over 0.
-/// So the list comes out reversed if every answer is over 0, and as it was if none is.
+/// Each answer is one element's, the receiver's, about another one, the argument. The receiver stands before
+/// the argument in the list. An answer over 0 puts the receiver behind the argument. Any other answer keeps
+/// their order.
 ///
-/// Asks for n elements at most n times the binary logarithm of n, rounded up.
+/// If the answers define an order, the list is sorted by it, and equal elements keep their order. Otherwise
+/// the result is some permutation of the list. This is so for an accessor, whose answer depends on the
+/// receiver alone. The steps are always the same, and so is the result:
 ///
-/// Not for: orders, for which there is std::stable_sort.
+/// - The list is halved. The first half is the shorter one if the length is odd.
+/// - Each half is sorted.
+/// - The halves are merged. While both have elements left, the receiver is the first element of the first
+///   half, and the argument that of the second. The argument comes next if the answer is over 0, otherwise
+///   the receiver.
+///
+/// So the list is reversed if every answer is over 0, and unchanged if no answer is.
+///
+/// Asks for n elements at most n * ceil(log2(n)) times.
+///
+/// Not for: sorting by an order (std::stable_sort).
 
 // The comparison of measured events answers with a start time, which is not an order. With such a comparison
 // `std::sort` has undefined behaviour. This merge sort is defined for every answer.
@@ -31,7 +39,7 @@
 
 namespace SRLPSelectorSortDetail {
 
-/// Sorts `list`; `spare` has room for half of it.
+// Sorts `list`. `spare` has room for half of its elements.
 template <class T, class Answer>
 void sort(std::span<T> list, std::span<T> spare, Answer& answer) {
   if (list.size() < 2) return;
@@ -40,7 +48,7 @@ void sort(std::span<T> list, std::span<T> spare, Answer& answer) {
   sort(firstHalf, spare, answer);
   sort(secondHalf, spare, answer);
 
-  // With the first half out of the way, what is written never overtakes the second.
+  // Moves the first half away, so that the merge never overwrites an unread element of the second.
   auto first = spare.begin();
   const auto firstEnd = std::ranges::move(firstHalf, first).out;
   auto second = secondHalf.begin();
@@ -54,8 +62,8 @@ void sort(std::span<T> list, std::span<T> spare, Answer& answer) {
 
 }  // namespace SRLPSelectorSortDetail
 
-/// The elements of `list`, sorted. `answer` takes two of them, the receiver and the argument. Throws what it
-/// throws, what moving an element throws, and std::bad_alloc.
+/// Returns the elements of `list`, sorted. `answer` takes two of them: the receiver and the argument. Throws
+/// what `answer` and moving an element throw, and std::bad_alloc.
 template <std::default_initializable T, class Answer>
   requires std::same_as<std::invoke_result_t<Answer&, const T&, const T&>, std::int64_t>
 std::vector<T> SRLPSelectorSort(std::vector<T> list, Answer answer) {

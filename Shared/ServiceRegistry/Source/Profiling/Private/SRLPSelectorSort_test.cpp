@@ -1,4 +1,4 @@
-// The sort: right with answers that make an order, and harmless with all others.
+// The sort. It is right for answers that define an order, and harmless for all others.
 
 #include "Shared/ServiceRegistry/Source/Profiling/Private/SRLPSelectorSort.h"
 
@@ -29,20 +29,20 @@ std::int64_t difference(int receiver, int argument) {
   return std::int64_t{receiver} - argument;
 }
 
-/// 0, 1, 2 and so on.
+// Returns 0, 1, 2 and so on.
 std::vector<int> numbers(std::size_t count) {
   std::vector<int> numbers(count);
   std::iota(numbers.begin(), numbers.end(), 0);
   return numbers;
 }
 
-TEST(SRLPSelectorSort, AsksNothingOfListsThatHaveNothingToSort) {
+TEST(SRLPSelectorSort, AsksNothingForLessThanTwoElements) {
   const auto fail = [](int, int) -> std::int64_t { throw std::logic_error("was asked"); };
   EXPECT_THAT(SRLPSelectorSort(std::vector<int>(), fail), IsEmpty());
   EXPECT_THAT(SRLPSelectorSort(std::vector{7}, fail), ElementsAre(7));
 }
 
-TEST(SRLPSelectorSort, PutsTheReceiverWhereItsAnswerSays) {
+TEST(SRLPSelectorSort, MovesTheReceiverBehindTheArgumentForAnAnswerOverZero) {
   const auto sortedBy = [](std::int64_t answer) {
     return SRLPSelectorSort(std::vector{1, 2}, [=](int, int) { return answer; });
   };
@@ -54,17 +54,17 @@ TEST(SRLPSelectorSort, PutsTheReceiverWhereItsAnswerSays) {
   EXPECT_THAT(sortedBy(kLeast), ElementsAre(1, 2));
 }
 
-TEST(SRLPSelectorSort, AsksWhatStandsBeforeAboutWhatStandsBehind) {
+TEST(SRLPSelectorSort, AsksTheEarlierElementAboutTheLaterOne) {
   std::vector<std::pair<int, int>> questions;
   SRLPSelectorSort(std::vector{1, 2, 3}, [&](int receiver, int argument) -> std::int64_t {
     questions.emplace_back(receiver, argument);
     return 1;
   });
-  // 3 comes before 2, then before 1, which then has nothing before it but both.
+  // The second half becomes 3, 2. The first half is 1, which is then compared with both.
   EXPECT_THAT(questions, ElementsAre(std::pair(2, 3), std::pair(1, 3), std::pair(1, 2)));
 }
 
-TEST(SRLPSelectorSort, ReversesWhatAlwaysAnswersOverZeroAndLeavesTheRest) {
+TEST(SRLPSelectorSort, ReversesTheListIfAllAnswersAreOverZeroAndKeepsItIfNoneIs) {
   for (std::size_t count = 0; count < 100; ++count) {
     const std::vector<int> list = numbers(count);
     std::vector<int> reversed = list;
@@ -75,14 +75,14 @@ TEST(SRLPSelectorSort, ReversesWhatAlwaysAnswersOverZeroAndLeavesTheRest) {
   }
 }
 
-TEST(SRLPSelectorSort, SortsByAnOrderAndKeepsThatOfEqualElements) {
+TEST(SRLPSelectorSort, IsAStableSortForAnOrder) {
   using Pair = std::pair<int, int>;
   std::mt19937 random(1);  // NOLINT(bugprone-random-generator-seed): the same every time
   for (std::size_t count = 0; count < 200; ++count) {
     std::vector<Pair> list;
     for (std::size_t i = 0; i < count; ++i)
       list.emplace_back(std::uniform_int_distribution(-9, 9)(random), static_cast<int>(i));
-    // The second number is the place in the list, so that the order of pairs keeps that of equal ones.
+    // The second number is the place in the list. So the model keeps the order of equal elements.
     std::vector<Pair> model = list;
     std::ranges::sort(model);
     EXPECT_EQ(SRLPSelectorSort(list,
@@ -93,7 +93,7 @@ TEST(SRLPSelectorSort, SortsByAnOrderAndKeepsThatOfEqualElements) {
   }
 }
 
-TEST(SRLPSelectorSort, AsksNoMoreThanItSays) {
+TEST(SRLPSelectorSort, AsksAtMostAsOftenAsPromised) {
   for (std::size_t count = 1; count < 300; ++count) {
     std::size_t questions = 0;
     SRLPSelectorSort(numbers(count), [&](int receiver, int argument) {
@@ -106,10 +106,10 @@ TEST(SRLPSelectorSort, AsksNoMoreThanItSays) {
   }
 }
 
-TEST(SRLPSelectorSort, KeepsEveryElementWhateverTheAnswersAre) {
+TEST(SRLPSelectorSort, KeepsEveryElementForRandomAnswers) {
   std::mt19937_64 random(2);  // NOLINT(bugprone-random-generator-seed): the same every time
   for (int round = 0; round < 2000; ++round) {
-    // On the heap, so that the sanitizers see it where anything is read or written beside the list.
+    // The strings are on the heap, so that the sanitizers notice every access outside of the list.
     std::vector<std::string> list;
     for (std::size_t i = random() % 70; i > 0; --i)
       list.push_back("a string of many letters: " + std::to_string(i));
@@ -121,7 +121,7 @@ TEST(SRLPSelectorSort, KeepsEveryElementWhateverTheAnswersAre) {
   }
 }
 
-TEST(SRLPSelectorSort, NeedsNoCopies) {
+TEST(SRLPSelectorSort, SortsElementsThatCannotBeCopied) {
   std::vector<std::unique_ptr<int>> list;
   for (const int number : {2, 3, 1}) list.push_back(std::make_unique<int>(number));
   list = SRLPSelectorSort(std::move(list),
@@ -133,7 +133,7 @@ TEST(SRLPSelectorSort, NeedsNoCopies) {
   EXPECT_EQ(*list[2], 3);
 }
 
-TEST(SRLPSelectorSort, LetsExceptionsPass) {
+TEST(SRLPSelectorSort, ThrowsWhatAnAnswerThrows) {
   int questions = 0;
   EXPECT_THROW(SRLPSelectorSort(numbers(50),
                                 [&](int, int) -> std::int64_t {

@@ -16,7 +16,7 @@ class AllocationCountTest : public testing::Test {
   }
 };
 
-// What the compiler must not take out.
+// Keeps the compiler from optimising the block away.
 void use(const void* block) {
   asm volatile("" : : "r"(block) : "memory");
 }

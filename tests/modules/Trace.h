@@ -1,4 +1,4 @@
 #pragma once
 
-/// Adds a line to what happens in the program. It may be called before any static object is made.
+/// Adds the line `text` `name` to the program's trace. May be called before static objects are constructed.
 [[gnu::visibility("default")]] void trace(const char* text, const char* name = "");

@@ -1,4 +1,4 @@
-// The child of a fork in a process with many threads: all locks are free, and everything is of use.
+// Forks a process with many threads. In the child, no lock stays held, and all libraries can be used.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <unistd.h>
@@ -38,10 +38,10 @@ using namespace rt::literals;
 using namespace TestServices;
 using rt::Ref;
 
-/// Something to wait in, and from outside to wait for that somebody does.
+/// A place in which a thread waits until it is told to leave. Other threads can wait until it has arrived.
 class Parking {
  public:
-  /// For the one who parks: returns when it is told to.
+  /// Waits until `end` is called.
   void park() {
     isTaken_ = true;
     isTaken_.notify_one();
@@ -58,7 +58,7 @@ class Parking {
   std::atomic<bool> mayLeave_ = false;
 };
 
-/// A thread that does something in which it parks, from when that has begun.
+/// Runs `work`, which parks, on a new thread. The constructor returns when that thread has parked.
 class ParkedThread {
  public:
   ParkedThread(Parking& parking, std::function<void()> work) : parking_(parking), thread_(std::move(work)) {
@@ -97,7 +97,7 @@ void log(LUMLogLevel level) {
 class Forks : public ZEBLoggerTest {
  protected:
   Forks() {
-    // The system's log is not for tests.
+    // Keeps the messages of the tests out of the system's log.
     LUMLogMultiplexer::sharedInstance()->addSyncLogger(
         LUMSystemLogger::initWithFilter(LUMLogDropAllFilter::init()));
     LUMLogMultiplexer::sharedInstance()->addSyncLogger(logger_);
@@ -126,10 +126,10 @@ class Forks : public ZEBLoggerTest {
   Ref<SRLRegistry> before_;
 };
 
-/// A tag like any other.
+/// A tag with the default hash.
 class Tag final : public rt::Implements<Tag, rt::Object> {};
 
-/// One whose hash is not to be had before somebody says so.
+/// A tag whose `hash` parks.
 class SlowTag final : public rt::Implements<SlowTag, rt::Object> {
  public:
   explicit SlowTag(Parking& parking) : parking_(parking) {}
@@ -142,7 +142,7 @@ class SlowTag final : public rt::Implements<SlowTag, rt::Object> {
   Parking& parking_;
 };
 
-// One thread after another is parked with a lock held, and the process forks.
+// In each of these tests, another thread parks while it holds a lock. Then the process forks.
 
 TEST_F(Forks, AnInstanceThatAnotherThreadWasMakingCountsAsNotBegun) {
   const Ref<SRLMemoizingScope> scope = registry_->scopeWithTags({});
@@ -171,7 +171,7 @@ TEST_F(Forks, AnInstanceThatAnotherThreadWasMakingCountsAsNotBegun) {
   EXPECT_EQ(made, ofParent);
 }
 
-// Those who ask in the child wait for the one of them that makes it.
+// In the child, one thread makes the instance, and the other requesting threads wait for it.
 TEST_F(Forks, AnInstanceThatCountsAsNotBegunIsMadeOnceInTheChild) {
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer allows no new threads in the child";
   const Ref<SRLMemoizingScope> scope = registry_->scopeWithTags({});
@@ -248,7 +248,7 @@ TEST_F(Forks, AnArrayOfWritersWritesThoughAnotherThreadDoes) {
             0);
 }
 
-// The other thread is in the midst of a line that nobody reads.
+// The other thread blocks in the middle of a line, because nobody reads its pipe.
 TEST_F(Forks, ALineIsWrittenThoughAnotherThreadWritesOne) {
   std::array<int, 2> ends{};
   ASSERT_EQ(pipe(ends.data()), 0);
@@ -276,7 +276,7 @@ TEST_F(Forks, ALineIsWrittenThoughAnotherThreadWritesOne) {
 }
 
 TEST_F(Forks, AServiceIsFoundThoughTheHashOfAnotherThreadsTagTakesForEver) {
-  // The registry's lock is held meanwhile, and the fork does not wait for ever.
+  // The other thread holds the registry's lock. The fork waits for it only for a limited time.
   if (RT_TEST_IS_APPLE) GTEST_SKIP() << "the system's lock stays held";
   Parking parking;
   const Ref<rt::Object> slow = rt::make<SlowTag>(parking);
@@ -304,7 +304,7 @@ TEST_F(Forks, DefaultsAreChangedThoughAnotherThreadIsInAnObserver) {
   observation.remove();
 }
 
-// Eight busy threads and a thousand children.
+// Eight threads are busy while the process makes a thousand children.
 
 class BusyForks : public Forks {
  protected:
@@ -329,13 +329,13 @@ class BusyForks : public Forks {
     for (std::thread& each : threads_) each.join();
   }
 
-  /// Has the threads work, or wait, so that children have the processors.
+  /// Makes the threads work or wait. While they wait, the children have the processors.
   void beBusy(bool isBusy) {
     isBusy_ = isBusy;
     isBusy_.notify_all();
   }
 
-  /// What a child does; 0 where all of it worked.
+  /// Uses the libraries in a child. Returns 0 if everything worked.
   int useAll() {
     const Ref<rt::Object>& tag = tags_[0];
     const Ref<rt::Object> own = rt::make<Tag>();
@@ -423,12 +423,12 @@ class BusyForks : public Forks {
   std::vector<std::thread> threads_;
 };
 
-// Invariant: whatever the other threads were doing, a child does all of it, and ends.
+// Whatever the other threads were doing at the fork, a child can use everything and ends.
 TEST_F(BusyForks, ChildrenUseEverything) {
   constexpr int kBursts = RT_TEST_THREAD_SANITIZER || RT_TEST_ADDRESS_SANITIZER ? 10 : 100;
   std::array<pid_t, 10> children{};
   for (int burst = 0; burst < kBursts; ++burst) {
-    rt::MainQueue::drain();  // Registries that have ended elsewhere.
+    rt::MainQueue::drain();  // This destroys registries whose last reference went on another thread.
     beBusy(true);
     const std::uint64_t before = rounds_;
     while (rounds_ < before + kThreads) std::this_thread::yield();

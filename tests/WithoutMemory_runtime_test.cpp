@@ -1,4 +1,4 @@
-// What the runtime's parts do where there is no memory.
+// Tests the parts of the runtime when allocations fail.
 
 #include <gtest/gtest.h>
 #include <unistd.h>
@@ -44,11 +44,11 @@ using WithoutMemory::tryEachAllocation;
 constexpr const char* kLong =
     "a text that is too long to be kept in a string of the language's library itself";
 
-// A folder for a test, which the test's children share.
+// A folder that a test and its children share.
 class Folder {
  public:
   Folder() {
-    // In memory, as a disk takes long to say that something is on it.
+    // The folder is in memory if possible, because syncing a file to a disk is slow.
     const std::string parent = std::filesystem::is_directory("/dev/shm") ? "/dev/shm/" : testing::TempDir();
     std::string name = parent + "without-memory.XXXXXX";
     if (mkdtemp(name.data()) == nullptr) throw std::runtime_error("no temporary folder");
@@ -64,7 +64,7 @@ class Folder {
   std::filesystem::path path_;
 };
 
-// The lowest number that a new descriptor would have.
+// Returns the number that the next new descriptor would have.
 int nextDescriptor() {
   const int next = dup(STDIN_FILENO);
   close(next);
@@ -105,7 +105,7 @@ TEST(WithoutMemory, RefersWeakly) {
   });
 }
 
-// Used to jump into garbage where there was no memory for the copy of a property list.
+// If there was no memory to copy a property list, the program used to jump to an invalid address.
 TEST(WithoutMemory, ArchivesAndUnarchives) {
   tryEachAllocation([] {
     const Ref<Tag> tag = rt::make<Tag>("shared"_s);
@@ -153,7 +153,7 @@ TEST(WithoutMemory, Queues) {
   });
 }
 
-// Used to end the program, which the C library does where it has no memory to note a destructor.
+// This used to end the program: the C library does so if it has no memory to register a destructor.
 TEST(WithoutMemory, NamesThreads) {
   tryEachAllocation([] {
     onNewThread([] {
@@ -186,7 +186,7 @@ TEST(WithoutMemory, FailsAssertions) {
   });
 }
 
-// Used to leave the descriptor open.
+// A failed allocation used to leave the descriptor open.
 TEST(WithoutMemory, WritesFiles) {
   const Folder folder;
   const std::string path = folder.at("log");
@@ -211,7 +211,7 @@ TEST(WithoutMemory, DescribesCallStacks) {
     std::array<std::uint64_t, 64> addresses{};
     std::size_t count = std::min<std::size_t>(rt::CallStack::capture(addresses), 2);
     if (RT_TEST_ADDRESS_SANITIZER || RT_TEST_THREAD_SANITIZER) {
-      // Instrumented programs have so many symbols that reading them over and over takes minutes.
+      // Instrumented programs have so many symbols that reading them again and again takes minutes.
       addresses[0] = reinterpret_cast<std::uint64_t>(&std::getenv);
       count = 1;
     }
@@ -229,19 +229,19 @@ TEST(WithoutMemory, DescribesCallStacks) {
 
 std::atomic<int> changesSeen = 0;
 
-// An observer for which there was no memory used never to be called again, and the thread that waits for
-// changes to end the program.
+// If there was no memory to call an observer, it used never to be called again. If the thread that waits for
+// changes had no memory, the program used to end.
 TEST(WithoutMemory, KeepsAndObservesDefaults) {
   const Folder folder;
   const std::string path = folder.at("defaults.conf");
   std::ofstream(path) << "kept = " << kLong << "\n";
-  // That the file cannot be watched is reported.
+  // Drops the reports that the file cannot be watched.
   rt::UserDefaults::setReportHandler([](const rt::String&) {});
   tryEachAllocation([&] {
     changesSeen = 0;
     const Ref<rt::UserDefaults> defaults = rt::UserDefaults::initWithPath(rt::String::fromUTF8(path.c_str()));
     EXPECT_EQ(defaults->stringForKey("kept").view(), kLong);
-    // Whatever an earlier run has left.
+    // An earlier run may have left this key.
     defaults->remove("key");
     rt::UserDefaults::Observation observation =
         defaults->observe("key", rt::UserDefaults::Notify::kAlsoNow, [] { ++changesSeen; });
@@ -249,7 +249,7 @@ TEST(WithoutMemory, KeepsAndObservesDefaults) {
     try {
       defaults->setString(rt::String::fromUTF8(kLong), "key");
     } catch (const std::bad_alloc&) {
-      // By this thread or by the one that waits for changes.
+      // This thread or the one that waits for changes calls the observer.
       const AllocationFailure::Pause pause;
       const int before = changesSeen;
       defaults->setString("again"_s, "key");

@@ -1,5 +1,5 @@
-// What the mount-point command does within limits that its caller sets: it ends with its work done and said,
-// or it ends before it has touched anything.
+// Tests the mount-point command under resource limits that its caller sets. The command either does its work
+// and reports the result, or ends before it has changed anything.
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
@@ -22,7 +22,7 @@ std::function<void()> limiting(__rlimit_resource resource, rlim_t limit) {
   return [resource, limit] {
     const rlimit both{limit, limit};
     require(setrlimit(resource, &both) == 0);
-    // The environment lies on the stack.
+    // The environment would use a part of the stack.
     clearenv();
   };
 }
@@ -41,7 +41,7 @@ class MountPointFileLimitTest : public MountPointTest {
       GTEST_SKIP() << "the sanitizer makes files of its own before the command starts";
   }
 
-  // With a file as `stream`, which takes `limit` bytes.
+  // Redirects `stream` to a file that may have at most `limit` bytes.
   static std::function<void()> intoFile(int stream, rlim_t limit) {
     return [stream, limit] {
       const int file = open(kFile, O_WRONLY | O_CREAT | O_TRUNC, 0600);
@@ -61,7 +61,7 @@ class MountPointFileLimitTest : public MountPointTest {
   }
 };
 
-// A signal used to end it, which left no status.
+// A signal used to end the command, so that it had no exit status.
 TEST_F(MountPointFileLimitTest, TellsThatItsMessageDoesNotFitTheFile) {
   expectSuccess(run({"a"}, intoFile(STDERR_FILENO, 0)));
   expectResult(run({"a"}, intoFile(STDERR_FILENO, 0)), EFBIG, "");
@@ -95,7 +95,7 @@ class MountPointMemoryLimitTest : public MountPointTest {
 
   static bool isWhole(const ProcessResult& result) { return result.exitStatus == 0 && result.signal == 0; }
 
-  // Whatever ended the command said nothing in its name.
+  // Expects that the command itself printed nothing before it was ended.
   static void expectNoMessageOfItsOwn(const ProcessResult& result) {
     EXPECT_EQ(result.standardError.find("/Volumes"), std::string::npos) << result.standardError;
     EXPECT_EQ(result.standardOutput, "");
@@ -126,7 +126,7 @@ class MountPointMemoryLimitTest : public MountPointTest {
     expectSuccess(run({"a"}, limiting(resource, limit)));
     expectResult(run({"a"}, limiting(resource, limit)), 17, "Failed to create [/Volumes/a], errno: 17\n");
     expectSuccess(run({"a", "--remove"}, limiting(resource, limit)));
-    if (resource == RLIMIT_STACK) return;  // which holds the arguments
+    if (resource == RLIMIT_STACK) return;  // The stack holds the arguments.
     expectResult(run({name}, limiting(resource, limit)), 36,
                  "Failed to create [/Volumes/" + name + "], errno: 36\n");
   }
@@ -138,7 +138,7 @@ TEST_F(MountPointMemoryLimitTest, DoesItsWorkOrNothing) {
   for (rlim_t limit = 0; limit < 6144; limit += 512) expectAllOrNothing(RLIMIT_AS, limit << 10);
 }
 
-// The figures of the manual. It used to take 1,284 KiB of data.
+// The limits are those of the manual. The command used to need 1,284 KiB of data.
 TEST_F(MountPointMemoryLimitTest, WorksWithinTheLimitsOfTheManual) {
   expectToWork(RLIMIT_STACK, rlim_t{32} << 10);
   expectToWork(RLIMIT_DATA, rlim_t{768} << 10);

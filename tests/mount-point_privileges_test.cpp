@@ -1,5 +1,5 @@
-// The mount-point command with more rights than its caller has, as it is installed set-user-ID root; and what
-// a hostile caller makes of it. docs/security.md names these cases.
+// Tests the mount-point command when it is installed set-user-ID root and so has more rights than its caller.
+// Shows that a hostile caller gains nothing. docs/security.md names these cases.
 
 #include <fcntl.h>
 #include <gmock/gmock.h>
@@ -40,10 +40,10 @@ struct User {
 constexpr User kCaller = {PrivateRoot::kOrdinaryUser, PrivateRoot::kOrdinaryGroup};
 constexpr User kOther = {1002, 1003};
 
-// The command set-user-ID root, and /Volumes as the manual asks for it.
+// Installs the command set-user-ID root and sets up /Volumes as the manual requires.
 class MountPointPrivilegesTest : public MountPointTest {
  protected:
-  // The command without the bit, for whoever may start it.
+  // A copy of the command without the set-user-ID bit. Every user may run it.
   static constexpr const char* kPlainCommand = "/mount-point.plain";
 
   void SetUp() override {
@@ -67,7 +67,7 @@ class MountPointPrivilegesTest : public MountPointTest {
     return run(std::move(arguments), as(user));
   }
 
-  // Root's effective identity and `caller`'s real one, without the bit.
+  // Removes the bit and runs the command with root as its effective user and `caller` as its real user.
   static std::function<void()> onBehalfOf(User caller) {
     return [caller] {
       leaveLeaksAlone();
@@ -75,7 +75,7 @@ class MountPointPrivilegesTest : public MountPointTest {
               setresgid(caller.group, 0, 0) == 0 && setresuid(caller.user, 0, 0) == 0);
     };
   }
-  // The same without the right `capability`, as setpriv names it.
+  // Runs the command in the same way on behalf of kCaller, but without `capability` (a name of setpriv).
   static ProcessResult runWithout(const std::string& capability, const std::vector<std::string>& arguments) {
     std::vector<std::string> whole = {"setpriv",    "--bounding-set", "-" + capability,
                                       "--inh-caps", "-" + capability, kCommand};
@@ -88,7 +88,7 @@ class MountPointPrivilegesTest : public MountPointTest {
     EXPECT_EQ(statusOf(path).st_gid, owner.group) << path;
   }
 
-  // What `action` returns in a process of `user`'s: 0 to 255.
+  // Runs `action` in a process of `user` and returns its result, which is from 0 to 255.
   static int inProcessOf(User user, const std::function<int()>& action) {
     const pid_t child = fork();
     if (child == 0) {
@@ -101,7 +101,7 @@ class MountPointPrivilegesTest : public MountPointTest {
     return WEXITSTATUS(status);
   }
 
-  // The number with which `user` fails to open `path`; 0 where that works.
+  // Lets `user` open `path` for reading. Returns the error's number, or 0 if it succeeds.
   static int openingFailure(User user, const std::string& path) {
     return inProcessOf(user, [&] { return open(path.c_str(), O_RDONLY) >= 0 ? 0 : errno; });
   }
@@ -170,8 +170,8 @@ TEST_F(MountPointPrivilegesTest, NarrowsTheModeByTheCallersUmask) {
   expectSuccess(runAs(kCaller, {"a", "--remove"}));
 }
 
-// The C library fills what its caller has closed with streams that take nothing, lest another file stand for
-// one.
+// If the caller has closed a standard stream, the C library opens one that accepts no bytes in its place.
+// Otherwise the next file that is opened would become that stream.
 TEST_F(MountPointPrivilegesTest, TellsTheFailureOfItsMessageWhereItsStreamsAreClosed) {
   const auto closed = [] {
     as(kCaller)();
@@ -212,8 +212,8 @@ TEST_F(MountPointPrivilegesTest, AsksTheSystemForTheSameOnBehalfOfACallerAsOfRoo
   }
 }
 
-// Without raised privileges the C library takes this apart before the command begins, and this one is more
-// than the command has memory for.
+// Without raised privileges, the C library parses LD_LIBRARY_PATH before `main`. The command has too little
+// memory for the value of this test.
 TEST_F(MountPointPrivilegesTest, WorksWhateverTheLengthOfTheSearchPathForLibraries) {
   const auto searching = [] {
     as(kCaller)();
@@ -246,7 +246,7 @@ TEST_F(MountPointPrivilegesTest, RemovesOnlyTheCallersOwnDirectoriesWhereVolumes
 
 // ---- The caller's identity ----
 
-// The line of a process's /proc/…/status that begins with `name`, without tabs.
+// Returns the value of `name` in the process's /proc/…/status, with tabs replaced by spaces.
 std::string statusLine(pid_t process, const std::string& name) {
   std::ifstream file("/proc/" + std::to_string(process) + "/status");
   for (std::string line; std::getline(file, line);) {
@@ -292,7 +292,8 @@ TEST_F(MountPointStoppedTest, IsItsCallerToTheFileSystemWhereTheGroupIsRaisedToo
   EXPECT_EQ(statusLine(stopped.identifier(), "Gid"), "1001 0 0 1001");
 }
 
-// So that no directory of root's is left where a limit or a signal of the caller's ends the command half-way.
+// The caller can end the command half-way by a limit or a signal. No directory that root owns may remain
+// then.
 TEST_F(MountPointStoppedTest, LeavesTheCallersDirectoryWhereItIsKilled) {
   {
     const StoppedProcess killed(SYS_mkdir, {kCommand, "a"}, as(kCaller));
@@ -306,7 +307,8 @@ TEST_F(MountPointStoppedTest, IsItsCallerToTheFileSystemWhenItRemovesToo) {
   EXPECT_EQ(statusLine(stopped.identifier(), "CapEff"), hexadecimal(1UL << CAP_DAC_OVERRIDE));
 }
 
-// How a process of the caller's fares that would read and change the memory of another.
+// The ways in which a process can read or change another one. `accessTo` tries all of them and returns those
+// that work.
 enum Access : std::uint8_t { attached = 1, readMemory = 2, openedMemory = 4, sawProgram = 8 };
 int accessTo(pid_t process) {
   int access = 0;
@@ -314,7 +316,7 @@ int accessTo(pid_t process) {
   if (open((folder + "/mem").c_str(), O_RDWR) >= 0) access |= openedMemory;
   std::array<char, 64> text{};
   if (readlink((folder + "/exe").c_str(), text.data(), text.size()) > 0) access |= sawProgram;
-  // An address that nothing has: the right is looked at first.
+  // The address does not exist in the other process. The kernel checks the permission first.
   iovec local{text.data(), 1};
   iovec remote{text.data(), 1};
   if (process_vm_readv(process, &local, 1, &remote, 1, 0) >= 0 || errno == EFAULT) access |= readMemory;
@@ -333,11 +335,10 @@ TEST_F(MountPointStoppedTest, LetsItsCallerStopItButNotTraceIt) {
   EXPECT_EQ(inProcessOf(kCaller, [&] { return kill(stopped.identifier(), SIGSTOP); }), 0);
 }
 
-// ---- A name that becomes another's while the command stands still ----
+// ---- Attacks: the name is reused while the command is stopped ----
 
-// The attack: the caller stops the command as soon as it has made "a", removes "a" through the command, waits
-// until `another` has put something else there, and lets the command go on. `start` is how the command is
-// begun.
+// The caller stops the command as soon as it has made "a", and removes "a" by running the command again. Then
+// `another` puts something else there. Finally the caller lets the first command continue.
 class MountPointAttackTest : public MountPointStoppedTest {
  protected:
   static void attack(const std::function<void()>& another, const char* command = kCommand) {
@@ -395,7 +396,8 @@ TEST_F(MountPointAttackTest, DoesNotGetAnothersDirectoryByRightsThatComeWithTheF
   expectOwner("/Volumes/a", kOther);
 }
 
-// Who may write in /Volumes may also make root, when it calls the command, hand something else to itself.
+// A user who may write in /Volumes could replace the directory when root itself runs the command. Root must
+// not become the owner of what the user put there.
 TEST_F(MountPointAttackTest, DoesNotMakeRootTakeWhatIsAnothers) {
   fs::create_directory("/others");
   ASSERT_EQ(chown("/others", kOther.user, kOther.group), 0);
@@ -408,7 +410,7 @@ TEST_F(MountPointAttackTest, DoesNotMakeRootTakeWhatIsAnothers) {
   fs::remove("/others");
 }
 
-// ---- /Volumes not as the manual asks for it ----
+// ---- /Volumes is not as the manual requires ----
 
 TEST_F(MountPointPrivilegesTest, KeepsVolumesInItsPlaceWhereAnEntryOfRootsIsInIt) {
   PrivateRoot::removeVolumes();
@@ -420,15 +422,16 @@ TEST_F(MountPointPrivilegesTest, KeepsVolumesInItsPlaceWhereAnEntryOfRootsIsInIt
   expectResult(runAs(kCaller, {"..", "--remove"}), 39, "Failed to remove [/Volumes/..], errno: 39\n");
 }
 
-// An empty /Volumes can be made its caller's own, who can then put a link in the place of what the command
-// has made. It used to hand over what the link led to.
+// If /Volumes is empty, a caller can become its owner and then replace the new directory by a link. The
+// command used to give the caller the target of that link.
 TEST_F(MountPointStoppedTest, GivesNothingElseAwayWhereItsCallerHasVolumes) {
   PrivateRoot::removeVolumes();
   fs::create_directory("/Volumes");
   expectSuccess(runAs(kCaller, {"", "--remove"}));
   expectSuccess(runAs(kCaller, {""}));
   expectOwner("/Volumes", kCaller);
-  // In the private root itself: what is bound into it is the machine's, and would be lost if this failed.
+  // The targets are new files in the private root itself. Other directories there are the machine's, so a
+  // failure of this test would damage them.
   fs::create_directory("/roots-directory");
   makeFile("/roots-file");
   for (const std::string target : {"/roots-file", "/roots-directory"}) {
@@ -447,11 +450,11 @@ TEST_F(MountPointStoppedTest, GivesNothingElseAwayWhereItsCallerHasVolumes) {
   }
 }
 
-// ---- Where the identity cannot be taken on ----
+// ---- The command cannot adopt its caller's identity ----
 
 TEST_F(MountPointPrivilegesTest, WorksAsEverWhereTheSystemRefusesAPartOfTheIdentity) {
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
-  // Half an identity would show: only root may write here.
+  // Only root may write here, so a partly adopted identity would make the command fail.
   ASSERT_EQ(chmod("/Volumes", 0700), 0);
   for (const std::string call : {"capget", "capset", "setfsuid", "setfsgid"}) {
     for (const std::string error : {"EPERM", "ENOSYS"}) {
@@ -467,7 +470,7 @@ TEST_F(MountPointPrivilegesTest, WorksAsEverWhereTheSystemRefusesAPartOfTheIdent
 TEST_F(MountPointPrivilegesTest, WorksAsEverWithoutTheRightToWriteAnywhere) {
   expectSuccess(runWithout("dac_override", {"a"}));
   expectOwner("/Volumes/a", kCaller);
-  // Where only root's group may write.
+  // Now only root's group may write.
   ASSERT_EQ(chown("/Volumes", kOther.user, 0), 0);
   ASSERT_EQ(chmod("/Volumes", 0770), 0);
   expectSuccess(runWithout("dac_override", {"b"}));
@@ -479,7 +482,8 @@ TEST_F(MountPointPrivilegesTest, FailsToHandTheDirectoryOverWithoutTheRight) {
   EXPECT_EQ(statusOf("/Volumes/a").st_uid, 0U);
 }
 
-// An ordinary user must set this to filter system calls.
+// An ordinary user must set PR_SET_NO_NEW_PRIVS before filtering system calls. The set-user-ID bit then has
+// no effect.
 TEST_F(MountPointPrivilegesTest, HasNoRightsWhereItsCallerMayFilterItsCalls) {
   if (kInstrumentation == "coverage") {
     GTEST_SKIP() << "a coverage build writes its counts where only its builder may";
@@ -491,9 +495,9 @@ TEST_F(MountPointPrivilegesTest, HasNoRightsWhereItsCallerMayFilterItsCalls) {
   expectResult(result, 13, "Failed to create [/Volumes/a], errno: 13\n");
 }
 
-// ---- What only root may write ----
+// ---- Blocks and files that only root may write ----
 
-// /Volumes as a file system of which 40 % are reserved for root, and the caller has filled the rest.
+// Makes /Volumes a file system with 40 % of its blocks reserved for root. The caller has filled the rest.
 class MountPointFullFileSystemTest : public MountPointPrivilegesTest {
  protected:
   static constexpr const char* kFile = "/Volumes/full/file";
@@ -517,7 +521,7 @@ class MountPointFullFileSystemTest : public MountPointPrivilegesTest {
   }
 
  private:
-  // Until nothing is left even once the file system has settled what it had put off.
+  // Writes until no block is free. The file system delays some work until fsync, which may free more blocks.
   static int fill() {
     const int file = open(kFile, O_WRONLY | O_CREAT, 0600);
     const std::string block(1024, '.');
@@ -535,7 +539,8 @@ TEST_F(MountPointFullFileSystemTest, GetsNoBlockThatIsReservedForRoot) {
   expectSuccess(run({"roots"}));
 }
 
-// Messages about the arguments used to be root's writing: up to 128 KiB of the caller's bytes for each.
+// Messages about the arguments used to be written as root: each could put up to 128 KiB of the caller's bytes
+// there.
 TEST_F(MountPointFullFileSystemTest, GetsNoBlockThatIsReservedForRootForItsMessages) {
   const off_t size = statusOf(kFile).st_size;
   const auto intoFile = [] {
@@ -550,7 +555,8 @@ TEST_F(MountPointFullFileSystemTest, GetsNoBlockThatIsReservedForRootForItsMessa
   EXPECT_EQ(statusOf(kFile).st_size, size);
 }
 
-// A program that raises the rights of whoever runs it loses that when somebody else than root writes into it.
+// If a user other than root writes to a program, the kernel removes its set-user-ID and set-group-ID bits. A
+// message that the command writes for its caller must have the same effect.
 TEST_F(MountPointPrivilegesTest, LetsNoFileKeepTheBitsThatItsCallersWritingTakesAway) {
   const auto intoProgram = [] {
     as(kCaller)();

@@ -1,4 +1,4 @@
-// What the mount-point command does where its messages, or its caller's limits, stand in its way.
+// Tests the mount-point command when its messages cannot be written.
 
 #include <fcntl.h>
 #include <gmock/gmock.h>
@@ -37,8 +37,8 @@ TEST_F(MountPointTest, WorksWithoutStandardStreams) {
   expectResult(run({"a/b"}, closeAll), 22, "");
 }
 
-// The status is errno as it stands after the message was written: where the message itself fails, the
-// status tells that failure and not the one of the directory.
+// The exit status is the value of errno after the message was written. If the message itself cannot be
+// written, the status is the error of that write, not the directory's error.
 TEST_F(MountPointTest, TellsTheFailureOfItsMessageWhereThatFails) {
   expectSuccess(run({"a"}));
   expectResult(run({"a"}, [] { close(STDERR_FILENO); }), EBADF, "");
@@ -57,7 +57,7 @@ TEST_F(MountPointTest, TellsTheFailureOfItsMessageWhereThatFailsAfterChown) {
                EBADF, "");
 }
 
-// A pipe that holds all it can.
+// A full pipe.
 struct FullPipe {
   std::array<int, 2> ends{};
   std::size_t size = 0;
@@ -115,18 +115,19 @@ TEST_F(MountPointTest, WaitsForAFullPipeWithOneThreadAndLosesNothing) {
   }
   close(pipe.ends[1]);
 
-  // It sleeps in its write: system call 1 with descriptor 2 as its first argument.
+  // Waits until the command sleeps in its write: system call 1 with descriptor 2 as its first argument.
   const std::string process = "/proc/" + std::to_string(child);
   int status = 0;
   for (std::string call; !call.starts_with("1 0x2 ");) {
     ASSERT_EQ(waitpid(child, &status, WNOHANG), 0) << "it ended without waiting";
     std::ifstream file(process + "/syscall");
-    if (!file.is_open()) break;  // kernels may be built without it; the thread count stands all the same
+    if (!file.is_open())
+      break;  // Some kernels lack this file. The number of threads is checked nevertheless.
     std::getline(file, call);
     usleep(1000);
   }
   const auto threads = std::distance(fs::directory_iterator(process + "/task"), fs::directory_iterator());
-  EXPECT_TRUE(threads == 1 || kInstrumentation == "thread") << threads;  // which may start one of its own
+  EXPECT_TRUE(threads == 1 || kInstrumentation == "thread") << threads;  // The sanitizer may start a thread.
 
   std::string text;
   std::array<char, 65536> buffer{};

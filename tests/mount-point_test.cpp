@@ -1,4 +1,4 @@
-// The mount-point command as its callers meet it: the built program, run in a private root on a real
+// Tests the mount-point command as its callers use it. Runs the built program in a private root with a real
 // /Volumes.
 
 #include <gmock/gmock.h>
@@ -138,8 +138,8 @@ TEST_F(MountPointTest, KeepsEveryByteOfTheName) {
 }
 
 TEST_F(MountPointTest, ReportsANameThatIsTooLongWhole) {
-  // The limit counts bytes: 128 characters of two bytes are one too many as well. Linux takes arguments of up
-  // to 131,071 bytes.
+  // The limit of 255 counts bytes, so 128 characters of two bytes each exceed it too. Linux accepts arguments
+  // of up to 131,071 bytes.
   std::string accents;
   for (int count = 0; count < 128; ++count) accents += "\xc3\xa9";
   for (const std::string& name :
@@ -209,15 +209,16 @@ TEST_F(MountPointTest, LeavesTheDirectoryWhereItCouldNotBeHandedOver) {
   }
 }
 
-// ---- What it asks of the system, and nothing else ----
+// ---- System calls ----
 
-// What every run begins with. The libraries' start ends with signals blocked for a moment. Then the caller's
-// identity is taken on, and the signal of a limit on the size of files is ignored.
+// The calls at the start of every run. At the end of their start-up, the libraries block signals for a
+// moment. Then the command adopts its caller's identity and ignores SIGXFSZ, the signal of the limit on the
+// size of files.
 const std::vector<std::string> kPreparation = {"rt_sigprocmask", "rt_sigprocmask", "capget",      "getgid",
                                                "getuid",         "setfsgid",       "setfsuid",    "setfsgid",
                                                "setfsuid",       "capset",         "rt_sigaction"};
 
-// `calls` without the preparation.
+// Expects that `calls` begins with kPreparation, and returns the other calls.
 std::vector<std::string> withoutPreparation(std::vector<std::string> calls) {
   std::vector<std::string> names;
   for (std::size_t index = 0; index < std::min(kPreparation.size(), calls.size()); ++index) {
@@ -235,7 +236,7 @@ TEST_F(MountPointTest, AsksTheSystemForItsWorkAndNothingElse) {
     return withoutPreparation(systemCalls(arguments));
   };
   using Calls = std::vector<std::string>;
-  // The identifiers may be asked for in any order.
+  // The command may ask for the two identifiers in any order.
   Calls making = callsOf({"a"});
   ASSERT_EQ(making.size(), 5U) << testing::PrintToString(making);
   std::sort(making.begin() + 1, making.begin() + 3);
@@ -250,7 +251,7 @@ TEST_F(MountPointTest, AsksTheSystemForItsWorkAndNothingElse) {
   const std::vector<std::string> missing = callsOf({"a", "--remove"});
   ASSERT_EQ(missing.size(), 4U) << testing::PrintToString(missing);
   EXPECT_EQ(missing[0], "rmdir(\"/Volumes/a\") = -1 ENOENT (No such file or directory)");
-  // Standard output is buffered; the C library looks at what it is first.
+  // Standard output is buffered, so the C library checks the kind of file first.
   EXPECT_THAT(missing[1], testing::ContainsRegex("^(new)?fstat"));
   EXPECT_EQ(missing[2], "write(1, \"Path already does not exist: [/Volumes/a]\\n\", 42) = 42");
 }
@@ -329,8 +330,8 @@ TEST_F(MountPointTest, ReportsWhateverTheSystemSaysToRemovingADirectory) {
   EXPECT_EQ(volumes(), std::vector<std::string>{"a"});
 }
 
-// Lines of commands that run at once do not mix: each line of up to 8 KiB is handed to the kernel in one
-// piece.
+// The lines of commands that run at the same time do not mix: the command writes each line of up to 8 KiB in
+// one call.
 TEST_F(MountPointTest, WritesEachLineInOnePiece) {
   if (kInstrumentation == "coverage") GTEST_SKIP() << "writing its counts hides what came before";
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
@@ -343,7 +344,7 @@ TEST_F(MountPointTest, WritesEachLineInOnePiece) {
   }
 }
 
-// The README shows what script/run shows.
+// The README contains the output of script/run.
 TEST_F(MountPointTest, DoesWhatTheReadmeShows) {
   const ProcessResult result =
       runProcess({"bash", SOURCE_DIRECTORY "/examples/mount-point/demonstration.sh", kCommand});

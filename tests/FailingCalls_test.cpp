@@ -303,23 +303,23 @@ class FailingCalls : public testing::Test {
   std::string trace_;
 };
 
-TEST_F(FailingCalls, OfFiles) {
+TEST_F(FailingCalls, AreHandledByFiles) {
   tryEachCall("file");
 }
 
-TEST_F(FailingCalls, OfDefaults) {
+TEST_F(FailingCalls, AreHandledByUserDefaults) {
   tryEachCall("defaults");
 }
 
-TEST_F(FailingCalls, OfStandardError) {
+TEST_F(FailingCalls, AreHandledByStandardError) {
   tryEachCall("error");
 }
 
-TEST_F(FailingCalls, OfCallStacks) {
+TEST_F(FailingCalls, AreHandledByCallStacks) {
   tryEachCall("stack");
 }
 
-TEST_F(FailingCalls, OfTheJournal) {
+TEST_F(FailingCalls, AreHandledByTheSystemLog) {
   if (!PrivateJournal::entered()) GTEST_SKIP() << journalRefusal;
   PrivateJournal journal;
   journal.start();

@@ -144,7 +144,7 @@ class SlowTag final : public rt::Implements<SlowTag, rt::Object> {
 
 // In each of these tests, another thread parks while it holds a lock. Then the process forks.
 
-TEST_F(Forks, AnInstanceThatAnotherThreadWasMakingCountsAsNotBegun) {
+TEST_F(Forks, ChildMakesAnInstanceThatAnotherThreadWasMaking) {
   const Ref<SRLMemoizingScope> scope = registry_->scopeWithTags({});
   static constexpr char kPlace = 0;
   Parking parking;
@@ -172,7 +172,7 @@ TEST_F(Forks, AnInstanceThatAnotherThreadWasMakingCountsAsNotBegun) {
 }
 
 // In the child, one thread makes the instance, and the other requesting threads wait for it.
-TEST_F(Forks, AnInstanceThatCountsAsNotBegunIsMadeOnceInTheChild) {
+TEST_F(Forks, ThreadsOfTheChildMakeAnInterruptedInstanceOnce) {
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer allows no new threads in the child";
   const Ref<SRLMemoizingScope> scope = registry_->scopeWithTags({});
   static constexpr char kPlace = 0;
@@ -201,7 +201,7 @@ TEST_F(Forks, AnInstanceThatCountsAsNotBegunIsMadeOnceInTheChild) {
             0);
 }
 
-TEST_F(Forks, AnErrorIsReportedThoughAnotherThreadIsInTheCallback) {
+TEST_F(Forks, ChildReportsErrorsWhileAnotherThreadRunsTheCallback) {
   Parking parking;
   PECErrorHandler::sharedInstance()->setErrorHandlerBlock(
       [&](const Ref<PECErrorDescription>&) { parking.park(); });
@@ -217,7 +217,7 @@ TEST_F(Forks, AnErrorIsReportedThoughAnotherThreadIsInTheCallback) {
             0);
 }
 
-TEST_F(Forks, AFilterIsSetThoughAnotherThreadSetsOne) {
+TEST_F(Forks, ChildSetsAFilterWhileAnotherThreadSetsOne) {
   Parking parking;
   const auto filter = rt::make<FunctionFilter>();
   filter->attached = [&] { parking.park(); };
@@ -233,7 +233,7 @@ TEST_F(Forks, AFilterIsSetThoughAnotherThreadSetsOne) {
             0);
 }
 
-TEST_F(Forks, AnArrayOfWritersWritesThoughAnotherThreadDoes) {
+TEST_F(Forks, ChildUsesACompositeWriterWhileAnotherThreadDoes) {
   Parking parking;
   const auto recorder = rt::make<Recorder>();
   const auto parent = rt::make<FunctionWriter>([&, thread = std::this_thread::get_id()](const rt::String&) {
@@ -249,7 +249,7 @@ TEST_F(Forks, AnArrayOfWritersWritesThoughAnotherThreadDoes) {
 }
 
 // The other thread blocks in the middle of a line, because nobody reads its pipe.
-TEST_F(Forks, ALineIsWrittenThoughAnotherThreadWritesOne) {
+TEST_F(Forks, ChildWritesALineWhileAnotherThreadWritesOne) {
   std::array<int, 2> ends{};
   ASSERT_EQ(pipe(ends.data()), 0);
   const auto handle = rt::make<rt::FileHandle>(ends[1], rt::FileHandle::Closing::closes);
@@ -275,7 +275,7 @@ TEST_F(Forks, ALineIsWrittenThoughAnotherThreadWritesOne) {
   close(ends[0]);
 }
 
-TEST_F(Forks, AServiceIsFoundThoughTheHashOfAnotherThreadsTagTakesForEver) {
+TEST_F(Forks, ChildFindsAServiceWhileAnotherThreadHashesATag) {
   // The other thread holds the registry's lock. The fork waits for it only for a limited time.
   if (RT_TEST_IS_APPLE) GTEST_SKIP() << "the system's lock stays held";
   Parking parking;
@@ -286,7 +286,7 @@ TEST_F(Forks, AServiceIsFoundThoughTheHashOfAnotherThreadsTagTakesForEver) {
             0);
 }
 
-TEST_F(Forks, DefaultsAreChangedThoughAnotherThreadIsInAnObserver) {
+TEST_F(Forks, ChildChangesDefaultsWhileAnotherThreadRunsAnObserver) {
   const auto defaults = rt::UserDefaults::initWithPath(pathText("defaults"));
   Parking parking;
   const auto thread = std::this_thread::get_id();
@@ -424,7 +424,7 @@ class BusyForks : public Forks {
 };
 
 // Whatever the other threads were doing at the fork, a child can use everything and ends.
-TEST_F(BusyForks, ChildrenUseEverything) {
+TEST_F(BusyForks, ChildrenCanUseAllLibraries) {
   constexpr int kBursts = RT_TEST_THREAD_SANITIZER || RT_TEST_ADDRESS_SANITIZER ? 10 : 100;
   std::array<pid_t, 10> children{};
   for (int burst = 0; burst < kBursts; ++burst) {

@@ -452,7 +452,7 @@ void expectAccountedFor(World& world, const PrivateJournal& journal, const std::
   for (const Worker& each : workers) each.expectSettingKept();
 }
 
-TEST_F(Soak, LosesNothingAndKeepsNothing) {
+TEST_F(Soak, LosesNoMessagesAndLeaksNoResources) {
   World world;
   std::atomic<int> changes = 0;
   const rt::UserDefaults::Observation observation =

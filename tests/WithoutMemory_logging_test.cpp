@@ -67,7 +67,7 @@ void waitForLoggers(const Ref<LaterLogger>& logger) {
 }
 
 // A failed allocation on a logger's queue used to end the program.
-TEST(WithoutMemory, Logs) {
+TEST(WithoutMemory, LogsMessages) {
   tryEachAllocation([] {
     quietSystemLog();
     const Ref<LUMLogMultiplexer>& multiplexer = LUMLogMultiplexer::sharedInstance();
@@ -130,7 +130,7 @@ TEST(WithoutMemory, LogsToTheSystem) {
 
 // The first use of the shared logger used to throw. The shared logger never throws. Without memory it is
 // null, and lines are lost.
-TEST(WithoutMemory, LogsTheOldWay) {
+TEST(WithoutMemory, LogsWithTheOlderLogger) {
   const std::string parent = std::filesystem::is_directory("/dev/shm") ? "/dev/shm/" : testing::TempDir();
   const std::string path = parent + "without-memory." + std::to_string(getpid());
   tryEachAllocation([&] {
@@ -159,7 +159,7 @@ TEST(WithoutMemory, LogsTheOldWay) {
   unlink(path.c_str());
 }
 
-TEST(WithoutMemory, Reroutes) {
+TEST(WithoutMemory, ReroutesTheOlderLogger) {
   tryEachAllocation([] {
     quietSystemLog();
     const Ref<ZEBLogger> logger =
@@ -170,7 +170,7 @@ TEST(WithoutMemory, Reroutes) {
   });
 }
 
-TEST(WithoutMemory, Reports) {
+TEST(WithoutMemory, ReportsErrors) {
   tryEachAllocation([] {
     quietSystemLog();
     const Ref<PECErrorHandler>& handler = PECErrorHandler::sharedInstance();

@@ -152,7 +152,7 @@ TEST(WithoutMemory, RegistersBindings) {
 // A request by another record of an API begins to register implementations. When it failed, those that it had
 // registered used to stay, and the rest was missing for ever. What was registered before the request must
 // stay.
-TEST(WithoutMemory, UndoesWhatItRegistersForAnotherRecord) {
+TEST(WithoutMemory, UndoesAFailedRegistrationForAnotherRecord) {
   tryEachAllocation(
       [] {
         const Shared shared;
@@ -248,7 +248,7 @@ TEST(WithoutMemory, ResolvesServicesByIdentifier) {
       kGrowth);
 }
 
-TEST(WithoutMemory, Provides) {
+TEST(WithoutMemory, ProvidesObjects) {
   tryEachAllocation(
       [] {
         const Ref<AVOProvider> provider = AVOProvider::providerWithObject("object"_s.object());

@@ -86,7 +86,7 @@ TEST(WithoutMemory, Formats) {
   });
 }
 
-TEST(WithoutMemory, TellsTheTime) {
+TEST(WithoutMemory, FormatsTimes) {
   tryEachAllocation([] {
     const Ref<rt::LocalTimeFormatter> formatter =
         rt::LocalTimeFormatter::initWithPattern("yyyy-MM-dd'T'HH:mm:ss.SSS"_s);
@@ -95,7 +95,7 @@ TEST(WithoutMemory, TellsTheTime) {
   });
 }
 
-TEST(WithoutMemory, RefersWeakly) {
+TEST(WithoutMemory, TakesWeakReferences) {
   tryEachAllocation([] {
     Ref<Plain> object = rt::make<Plain>();
     const rt::Weak<Plain> weak = object;
@@ -133,7 +133,7 @@ TEST(WithoutMemory, ArchivesAndUnarchives) {
 
 std::atomic<int> tasksRun = 0;
 
-TEST(WithoutMemory, Queues) {
+TEST(WithoutMemory, RunsQueuedTasks) {
   tryEachAllocation([] {
     tasksRun = 0;
     const Ref<rt::Queue> queue = rt::make<rt::Queue>("Tasks"_s);
@@ -171,7 +171,7 @@ TEST(WithoutMemory, NamesThreads) {
   });
 }
 
-TEST(WithoutMemory, FailsAssertions) {
+TEST(WithoutMemory, HandlesFailedAssertions) {
   tryEachAllocation([] {
     onNewThread([] {
       const Ref<rt::AssertionHandler> own = rt::make<rt::AssertionHandler>();
@@ -231,7 +231,7 @@ std::atomic<int> changesSeen = 0;
 
 // If there was no memory to call an observer, it used never to be called again. If the thread that waits for
 // changes had no memory, the program used to end.
-TEST(WithoutMemory, KeepsAndObservesDefaults) {
+TEST(WithoutMemory, SetsAndObservesUserDefaults) {
   const Folder folder;
   const std::string path = folder.at("defaults.conf");
   std::ofstream(path) << "kept = " << kLong << "\n";

@@ -77,13 +77,13 @@ class MountPointBinaryTest : public testing::Test {
   }
 };
 
-TEST_F(MountPointBinaryTest, LoadsNothing) {
+TEST_F(MountPointBinaryTest, LoadsNoLibraries) {
   EXPECT_THAT(outputOf({"readelf", "--wide", "--dynamic", MOUNT_POINT}), Not(HasSubstr("(NEEDED)")));
   EXPECT_THAT(outputOf({"readelf", "--wide", "--program-headers", MOUNT_POINT}), Not(HasSubstr("INTERP")));
 }
 
 // The executable contains the libraries, including the load hook that sets up the registry.
-TEST_F(MountPointBinaryTest, CarriesTheLibraries) {
+TEST_F(MountPointBinaryTest, ContainsTheLibraries) {
   const std::string symbols = outputOf({"nm", "--demangle", "--defined-only", MOUNT_POINT_SYMBOLS});
   for (const char* const name :
        {"SRLRegistry::load()", "LUMLogMultiplexer::logWithMessage(", "PECErrorHandler::register_()",
@@ -99,7 +99,7 @@ TEST_F(MountPointBinaryTest, IsPositionIndependent) {
   EXPECT_THAT(dynamic, Not(HasSubstr("TEXTREL")));
 }
 
-TEST_F(MountPointBinaryTest, HasReadOnlyRelocationsAllBoundAtItsStart) {
+TEST_F(MountPointBinaryTest, BindsAllRelocationsAtStartUpAndMakesThemReadOnly) {
   EXPECT_THAT(outputOf({"readelf", "--wide", "--program-headers", MOUNT_POINT}), HasSubstr("GNU_RELRO"));
   EXPECT_THAT(outputOf({"readelf", "--wide", "--dynamic", MOUNT_POINT}), HasSubstr("BIND_NOW"));
 }
@@ -118,7 +118,7 @@ TEST_F(MountPointBinaryTest, HasNoMemoryThatIsBothWritableAndExecutable) {
   EXPECT_TRUE(hasStack);
 }
 
-TEST_F(MountPointBinaryTest, ProtectsItsStackAndChecksItsCallsOfTheStandardLibrary) {
+TEST_F(MountPointBinaryTest, UsesStackProtectionAndFortification) {
   const std::string command = outputOf({"nm", commandObject("/MountPointCommand.")});
   EXPECT_THAT(command, HasSubstr("__stack_chk_fail"));
 #if defined(__OPTIMIZE__) && !defined(__clang__)  // clang cannot check calls with variable arguments
@@ -127,7 +127,7 @@ TEST_F(MountPointBinaryTest, ProtectsItsStackAndChecksItsCallsOfTheStandardLibra
 }
 
 // A debugger finds the executable's symbols in the file beside it.
-TEST_F(MountPointBinaryTest, IsStrippedAndLeadsToItsSymbols) {
+TEST_F(MountPointBinaryTest, IsStrippedAndRefersToItsSymbolFile) {
   const std::string sections = outputOf({"readelf", "--wide", "--sections", MOUNT_POINT});
   EXPECT_THAT(sections, HasSubstr(".gnu_debuglink"));
   EXPECT_THAT(sections, Not(HasSubstr(".symtab")));
@@ -138,7 +138,7 @@ TEST_F(MountPointBinaryTest, IsStrippedAndLeadsToItsSymbols) {
 // There are two marks of control-flow enforcement. SHSTK (shadow stacks) only needs calls that return
 // normally. IBT needs every object to be compiled for it. The command's objects are, but the C library's are
 // not.
-TEST_F(MountPointBinaryTest, BearsTheMarkOfShadowStacks) {
+TEST_F(MountPointBinaryTest, IsMarkedForShadowStacks) {
   EXPECT_THAT(outputOf({"readelf", "--notes", MOUNT_POINT}), HasSubstr("SHSTK"));
   for (const std::string& object : commandObjects()) {
     EXPECT_THAT(outputOf({"readelf", "--notes", object}), HasSubstr("IBT, SHSTK")) << object;
@@ -163,7 +163,7 @@ TEST_F(MountPointBinaryTest, HasFewInitialisers) {
   EXPECT_LE(std::stoul(size, nullptr, 16) / sizeof(void*), 10U);
 }
 
-TEST_F(MountPointBinaryTest, CarriesNoPrivilegeByItself) {
+TEST_F(MountPointBinaryTest, IsBuiltWithoutSetIdBits) {
   struct stat status{};
   ASSERT_EQ(stat(MOUNT_POINT, &status), 0);
   EXPECT_EQ(status.st_mode & (S_ISUID | S_ISGID), 0U);
@@ -187,7 +187,7 @@ class MountPointTracedTest : public MountPointBinaryTest {
 // - ignoring SIGXFSZ, the signal of the limit on the size of files (rt_sigaction)
 //
 // The command opens no file and starts no thread or process.
-TEST_F(MountPointTracedTest, AsksTheSystemForNothingThatIsNotAccountedFor) {
+TEST_F(MountPointTracedTest, MakesOnlyExpectedSystemCalls) {
   const std::vector<std::string> calls = runTraced("NOTHING").systemCalls;
   const std::set<std::string> accounted = {
       "execve",     "brk",      "arch_prctl", "set_tid_address", "set_robust_list", "rseq",
@@ -200,7 +200,7 @@ TEST_F(MountPointTracedTest, AsksTheSystemForNothingThatIsNotAccountedFor) {
 
 // The statically linked C library reads the variables of its dynamic loader. They have no effect, because the
 // command loads nothing. Each addition to this list needs an equally good reason.
-TEST_F(MountPointTracedTest, ReadsNoEnvironmentVariableThatIsNotAccountedFor) {
+TEST_F(MountPointTracedTest, ReadsOnlyExpectedEnvironmentVariables) {
   const std::set<std::string> accounted = {"LD_LIBRARY_PATH", "LD_WARN",         "LD_BIND_NOW",
                                            "LD_BIND_NOT",     "LD_DYNAMIC_WEAK", "LD_PROFILE_OUTPUT"};
   for (const std::vector<std::string>& arguments :
@@ -213,7 +213,7 @@ TEST_F(MountPointTracedTest, ReadsNoEnvironmentVariableThatIsNotAccountedFor) {
 
 // The traced runs make no directory, so they do not cover all code. Therefore this test shows that the
 // command's own code does not refer to the environment at all.
-TEST_F(MountPointBinaryTest, RefersToNoEnvironment) {
+TEST_F(MountPointBinaryTest, DoesNotReferToTheEnvironment) {
   for (const std::string& object : commandObjects()) {
     const std::string symbols = outputOf({"nm", "--undefined-only", object});
     EXPECT_THAT(symbols, HasSubstr(" U "));

@@ -62,7 +62,7 @@ class MountPointFileLimitTest : public MountPointTest {
 };
 
 // A signal used to end the command, so that it had no exit status.
-TEST_F(MountPointFileLimitTest, TellsThatItsMessageDoesNotFitTheFile) {
+TEST_F(MountPointFileLimitTest, ReportsThatItsMessageDoesNotFitTheFile) {
   expectSuccess(run({"a"}, intoFile(STDERR_FILENO, 0)));
   expectResult(run({"a"}, intoFile(STDERR_FILENO, 0)), EFBIG, "");
   EXPECT_EQ(written(), "");
@@ -74,7 +74,7 @@ TEST_F(MountPointFileLimitTest, TellsThatItsMessageDoesNotFitTheFile) {
   expectResult(run({"a", "--remove"}, intoFile(STDERR_FILENO, 0)), EFBIG, "");
 }
 
-TEST_F(MountPointFileLimitTest, KeepsTheStatusThatIsNoErrnoWhereItsMessageDoesNotFitTheFile) {
+TEST_F(MountPointFileLimitTest, KeepsAStatusThatIsNotErrnoIfItsMessageDoesNotFit) {
   expectResult(run({}, intoFile(STDERR_FILENO, 0)), 22, "");
   expectResult(run({"a/b"}, intoFile(STDERR_FILENO, 0)), 22, "");
   expectSuccess(run({"a", "--remove"}, intoFile(STDOUT_FILENO, 0)));
@@ -132,7 +132,7 @@ class MountPointMemoryLimitTest : public MountPointTest {
   }
 };
 
-TEST_F(MountPointMemoryLimitTest, DoesItsWorkOrNothing) {
+TEST_F(MountPointMemoryLimitTest, DoesAllOfItsWorkOrNothing) {
   for (rlim_t limit = 0; limit < 32; limit += 4) expectAllOrNothing(RLIMIT_STACK, limit << 10);
   for (rlim_t limit = 0; limit < 1024; limit += 64) expectAllOrNothing(RLIMIT_DATA, limit << 10);
   for (rlim_t limit = 0; limit < 6144; limit += 512) expectAllOrNothing(RLIMIT_AS, limit << 10);
@@ -147,7 +147,7 @@ TEST_F(MountPointMemoryLimitTest, WorksWithinTheLimitsOfTheManual) {
 
 // ---- Open files ----
 
-TEST_F(MountPointTest, OpensNothing) {
+TEST_F(MountPointTest, OpensNoFiles) {
   if (!kInstrumentation.empty()) GTEST_SKIP() << "built with instrumentation, which opens files";
   expectSuccess(run({"a"}, limiting(RLIMIT_NOFILE, 0)));
   expectResult(run({"a"}, limiting(RLIMIT_NOFILE, 0)), 17, "Failed to create [/Volumes/a], errno: 17\n");

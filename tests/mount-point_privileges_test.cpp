@@ -109,13 +109,13 @@ class MountPointPrivilegesTest : public MountPointTest {
 
 // ---- Ordinary use ----
 
-TEST_F(MountPointPrivilegesTest, HandsTheDirectoryToTheRealUserAndGroup) {
+TEST_F(MountPointPrivilegesTest, GivesTheDirectoryToTheRealUserAndGroup) {
   expectSuccess(run({"a"}, onBehalfOf(kCaller)));
   expectOwner("/Volumes/a", kCaller);
   EXPECT_EQ(statusOf("/Volumes/a").st_mode & 07777U, 0700U);
 }
 
-TEST_F(MountPointPrivilegesTest, WorksForAnOrdinaryUserWhenInstalledSetUserIdentifier) {
+TEST_F(MountPointPrivilegesTest, WorksForAnOrdinaryUserIfSetUserId) {
   expectSuccess(runAs(kCaller, {"a"}));
   expectOwner("/Volumes/a", kCaller);
   EXPECT_EQ(statusOf("/Volumes/a").st_mode & 07777U, 0700U);
@@ -126,14 +126,14 @@ TEST_F(MountPointPrivilegesTest, WorksForAnOrdinaryUserWhenInstalledSetUserIdent
   EXPECT_EQ(volumes(), std::vector<std::string>{".keep"});
 }
 
-TEST_F(MountPointPrivilegesTest, WorksWhereTheGroupIsRaisedToo) {
+TEST_F(MountPointPrivilegesTest, WorksIfSetGroupIdToo) {
   ASSERT_EQ(chmod(kCommand, 06755), 0);
   expectSuccess(runAs(kCaller, {"a"}));
   expectOwner("/Volumes/a", kCaller);
   expectSuccess(runAs(kCaller, {"a", "--remove"}));
 }
 
-TEST_F(MountPointPrivilegesTest, HandsTheDirectoryOverWhereItsGroupWouldBeInherited) {
+TEST_F(MountPointPrivilegesTest, SetsTheCallersGroupIfVolumesIsSetGroupId) {
   ASSERT_EQ(chown("/Volumes", 0, kOther.group), 0);
   ASSERT_EQ(chmod("/Volumes", 02755), 0);
   expectSuccess(runAs(kCaller, {"a"}));
@@ -141,14 +141,14 @@ TEST_F(MountPointPrivilegesTest, HandsTheDirectoryOverWhereItsGroupWouldBeInheri
   EXPECT_EQ(statusOf("/Volumes/a").st_mode & 07777U, 02700U);
 }
 
-TEST_F(MountPointPrivilegesTest, WorksWhereOnlyRootMayLookIntoVolumes) {
+TEST_F(MountPointPrivilegesTest, WorksIfOnlyRootMaySearchVolumes) {
   ASSERT_EQ(chmod("/Volumes", 0700), 0);
   expectSuccess(runAs(kCaller, {"a"}));
   expectOwner("/Volumes/a", kCaller);
   expectSuccess(runAs(kCaller, {"a", "--remove"}));
 }
 
-TEST_F(MountPointPrivilegesTest, WorksWhereVolumesIsALinkOfRoots) {
+TEST_F(MountPointPrivilegesTest, WorksIfVolumesIsALinkOwnedByRoot) {
   PrivateRoot::removeVolumes();
   fs::create_directory("/elsewhere");
   fs::create_directory_symlink("/elsewhere", "/Volumes");
@@ -160,7 +160,7 @@ TEST_F(MountPointPrivilegesTest, WorksWhereVolumesIsALinkOfRoots) {
   EXPECT_TRUE(fs::remove("/Volumes") && fs::remove("/elsewhere"));
 }
 
-TEST_F(MountPointPrivilegesTest, NarrowsTheModeByTheCallersUmask) {
+TEST_F(MountPointPrivilegesTest, AppliesTheCallersUmask) {
   expectSuccess(run({"a"}, [] {
     umask(0777);
     as(kCaller)();
@@ -172,7 +172,7 @@ TEST_F(MountPointPrivilegesTest, NarrowsTheModeByTheCallersUmask) {
 
 // If the caller has closed a standard stream, the C library opens one that accepts no bytes in its place.
 // Otherwise the next file that is opened would become that stream.
-TEST_F(MountPointPrivilegesTest, TellsTheFailureOfItsMessageWhereItsStreamsAreClosed) {
+TEST_F(MountPointPrivilegesTest, ReportsTheFailureOfItsMessageIfItsStreamsAreClosed) {
   const auto closed = [] {
     as(kCaller)();
     for (const int stream : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO}) close(stream);
@@ -183,7 +183,7 @@ TEST_F(MountPointPrivilegesTest, TellsTheFailureOfItsMessageWhereItsStreamsAreCl
   expectSuccess(run({"a", "--remove"}, closed));
 }
 
-TEST_F(MountPointPrivilegesTest, DoesNothingWhereAClosedStreamCannotBeFilled) {
+TEST_F(MountPointPrivilegesTest, DoesNothingIfAClosedStreamCannotBeReplaced) {
   if (!kInstrumentation.empty()) GTEST_SKIP() << "built with instrumentation, which opens files";
   const ProcessResult result = run({"a"}, [] {
     as(kCaller)();
@@ -195,7 +195,7 @@ TEST_F(MountPointPrivilegesTest, DoesNothingWhereAClosedStreamCannotBeFilled) {
   EXPECT_FALSE(fs::exists("/Volumes/a"));
 }
 
-TEST_F(MountPointPrivilegesTest, AsksTheSystemForTheSameOnBehalfOfACallerAsOfRoot) {
+TEST_F(MountPointPrivilegesTest, MakesTheSameSystemCallsForACallerAsForRoot) {
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
   if (!kInstrumentation.empty()) GTEST_SKIP() << "built with instrumentation, which asks for more";
   const auto namesOf = [](const std::vector<std::string>& calls) {
@@ -214,7 +214,7 @@ TEST_F(MountPointPrivilegesTest, AsksTheSystemForTheSameOnBehalfOfACallerAsOfRoo
 
 // Without raised privileges, the C library parses LD_LIBRARY_PATH before `main`. The command has too little
 // memory for the value of this test.
-TEST_F(MountPointPrivilegesTest, WorksWhateverTheLengthOfTheSearchPathForLibraries) {
+TEST_F(MountPointPrivilegesTest, WorksWithALongLibrarySearchPath) {
   const auto searching = [] {
     as(kCaller)();
     std::string path;
@@ -229,12 +229,12 @@ TEST_F(MountPointPrivilegesTest, WorksWhateverTheLengthOfTheSearchPathForLibrari
   expectSuccess(run({"a", "--remove"}, searching));
 }
 
-TEST_F(MountPointPrivilegesTest, RemovesAnothersEmptyDirectory) {
+TEST_F(MountPointPrivilegesTest, RemovesAnotherUsersEmptyDirectory) {
   expectSuccess(runAs(kOther, {"a"}));
   expectSuccess(runAs(kCaller, {"a", "--remove"}));
 }
 
-TEST_F(MountPointPrivilegesTest, RemovesOnlyTheCallersOwnDirectoriesWhereVolumesIsSticky) {
+TEST_F(MountPointPrivilegesTest, RemovesOnlyTheCallersDirectoriesIfVolumesIsSticky) {
   ASSERT_EQ(chmod("/Volumes", 01755), 0);
   expectSuccess(runAs(kOther, {"a"}));
   expectResult(runAs(kCaller, {"a", "--remove"}), 1, "Failed to remove [/Volumes/a], errno: 1\n");
@@ -274,7 +274,7 @@ class MountPointStoppedTest : public MountPointPrivilegesTest {
   }
 };
 
-TEST_F(MountPointStoppedTest, IsItsCallerToTheFileSystemAndKeepsTheRightToWriteAnywhere) {
+TEST_F(MountPointStoppedTest, HasItsCallersFileSystemIdentityAndOneCapability) {
   const StoppedProcess stopped(SYS_mkdir, {kCommand, "a"}, as(kCaller));
   expectOwner("/Volumes/a", kCaller);
   EXPECT_EQ(statusLine(stopped.identifier(), "Uid"), "1000 0 0 1000");
@@ -286,7 +286,7 @@ TEST_F(MountPointStoppedTest, IsItsCallerToTheFileSystemAndKeepsTheRightToWriteA
   EXPECT_EQ(statusLine(stopped.identifier(), "CapAmb"), hexadecimal(0));
 }
 
-TEST_F(MountPointStoppedTest, IsItsCallerToTheFileSystemWhereTheGroupIsRaisedToo) {
+TEST_F(MountPointStoppedTest, HasItsCallersFileSystemIdentityIfSetGroupIdToo) {
   ASSERT_EQ(chmod(kCommand, 06755), 0);
   const StoppedProcess stopped(SYS_mkdir, {kCommand, "a"}, as(kCaller));
   EXPECT_EQ(statusLine(stopped.identifier(), "Gid"), "1001 0 0 1001");
@@ -294,14 +294,14 @@ TEST_F(MountPointStoppedTest, IsItsCallerToTheFileSystemWhereTheGroupIsRaisedToo
 
 // The caller can end the command half-way by a limit or a signal. No directory that root owns may remain
 // then.
-TEST_F(MountPointStoppedTest, LeavesTheCallersDirectoryWhereItIsKilled) {
+TEST_F(MountPointStoppedTest, LeavesTheCallersDirectoryIfItIsKilled) {
   {
     const StoppedProcess killed(SYS_mkdir, {kCommand, "a"}, as(kCaller));
   }
   expectOwner("/Volumes/a", kCaller);
 }
 
-TEST_F(MountPointStoppedTest, IsItsCallerToTheFileSystemWhenItRemovesToo) {
+TEST_F(MountPointStoppedTest, HasOneCapabilityWhenItRemoves) {
   expectSuccess(runAs(kCaller, {"a"}));
   const StoppedProcess stopped(SYS_rmdir, {kCommand, "a", "--remove"}, as(kCaller));
   EXPECT_EQ(statusLine(stopped.identifier(), "CapEff"), hexadecimal(1UL << CAP_DAC_OVERRIDE));
@@ -350,7 +350,7 @@ class MountPointAttackTest : public MountPointStoppedTest {
   }
 };
 
-TEST_F(MountPointAttackTest, DoesNotGetAnothersDirectory) {
+TEST_F(MountPointAttackTest, CallerDoesNotGetAnotherUsersDirectory) {
   attack([] {
     expectSuccess(runAs(kOther, {"a"}));
     makeFile("/Volumes/a/secret");
@@ -359,7 +359,7 @@ TEST_F(MountPointAttackTest, DoesNotGetAnothersDirectory) {
   EXPECT_EQ(openingFailure(kCaller, "/Volumes/a/secret"), EACCES);
 }
 
-TEST_F(MountPointAttackTest, DoesNotGetTheRootOfAMountedFileSystem) {
+TEST_F(MountPointAttackTest, CallerDoesNotGetTheRootOfAMountedFileSystem) {
   attack([] {
     fs::create_directory("/Volumes/a");
     ASSERT_EQ(mount("tmpfs", "/Volumes/a", "tmpfs", 0, "mode=0755"), 0);
@@ -370,7 +370,7 @@ TEST_F(MountPointAttackTest, DoesNotGetTheRootOfAMountedFileSystem) {
             EACCES);
 }
 
-TEST_F(MountPointAttackTest, DoesNotGetWhatALinkOfRootsLeadsTo) {
+TEST_F(MountPointAttackTest, CallerDoesNotGetTheTargetOfRootsLink) {
   fs::create_directory("/root-only");
   ASSERT_EQ(chmod("/root-only", 0700), 0);
   attack([] { fs::create_directory_symlink("/root-only", "/Volumes/a"); });
@@ -380,7 +380,7 @@ TEST_F(MountPointAttackTest, DoesNotGetWhatALinkOfRootsLeadsTo) {
   fs::remove("/root-only");
 }
 
-TEST_F(MountPointAttackTest, DoesNotGetAnothersDirectoryByRightsThatComeWithTheFile) {
+TEST_F(MountPointAttackTest, CallerDoesNotGetAnotherUsersDirectoryWithFileCapabilities) {
   vfs_cap_data capabilities{};
   capabilities.magic_etc = VFS_CAP_REVISION_2 | VFS_CAP_FLAGS_EFFECTIVE;
   capabilities.data[0].permitted = 1U << CAP_CHOWN | 1U << CAP_DAC_OVERRIDE;
@@ -398,7 +398,7 @@ TEST_F(MountPointAttackTest, DoesNotGetAnothersDirectoryByRightsThatComeWithTheF
 
 // A user who may write in /Volumes could replace the directory when root itself runs the command. Root must
 // not become the owner of what the user put there.
-TEST_F(MountPointAttackTest, DoesNotMakeRootTakeWhatIsAnothers) {
+TEST_F(MountPointAttackTest, RootDoesNotTakeAnotherUsersDirectory) {
   fs::create_directory("/others");
   ASSERT_EQ(chown("/others", kOther.user, kOther.group), 0);
   StoppedProcess stopped(SYS_mkdir, {kPlainCommand, "a"}, leaveLeaksAlone);
@@ -412,7 +412,7 @@ TEST_F(MountPointAttackTest, DoesNotMakeRootTakeWhatIsAnothers) {
 
 // ---- /Volumes is not as the manual requires ----
 
-TEST_F(MountPointPrivilegesTest, KeepsVolumesInItsPlaceWhereAnEntryOfRootsIsInIt) {
+TEST_F(MountPointPrivilegesTest, DoesNotRemoveVolumesIfItContainsAnEntryOfRoot) {
   PrivateRoot::removeVolumes();
   fs::create_directories("/Volumes/.keep");
   makeFile("/Volumes/.keep/file");
@@ -424,7 +424,7 @@ TEST_F(MountPointPrivilegesTest, KeepsVolumesInItsPlaceWhereAnEntryOfRootsIsInIt
 
 // If /Volumes is empty, a caller can become its owner and then replace the new directory by a link. The
 // command used to give the caller the target of that link.
-TEST_F(MountPointStoppedTest, GivesNothingElseAwayWhereItsCallerHasVolumes) {
+TEST_F(MountPointStoppedTest, GivesAwayNothingElseIfItsCallerOwnsVolumes) {
   PrivateRoot::removeVolumes();
   fs::create_directory("/Volumes");
   expectSuccess(runAs(kCaller, {"", "--remove"}));
@@ -452,7 +452,7 @@ TEST_F(MountPointStoppedTest, GivesNothingElseAwayWhereItsCallerHasVolumes) {
 
 // ---- The command cannot adopt its caller's identity ----
 
-TEST_F(MountPointPrivilegesTest, WorksAsEverWhereTheSystemRefusesAPartOfTheIdentity) {
+TEST_F(MountPointPrivilegesTest, WorksIfTheSystemRefusesAPartOfTheIdentity) {
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
   // Only root may write here, so a partly adopted identity would make the command fail.
   ASSERT_EQ(chmod("/Volumes", 0700), 0);
@@ -467,7 +467,7 @@ TEST_F(MountPointPrivilegesTest, WorksAsEverWhereTheSystemRefusesAPartOfTheIdent
   }
 }
 
-TEST_F(MountPointPrivilegesTest, WorksAsEverWithoutTheRightToWriteAnywhere) {
+TEST_F(MountPointPrivilegesTest, WorksWithoutTheCapabilityToWriteAnywhere) {
   expectSuccess(runWithout("dac_override", {"a"}));
   expectOwner("/Volumes/a", kCaller);
   // Now only root's group may write.
@@ -477,14 +477,14 @@ TEST_F(MountPointPrivilegesTest, WorksAsEverWithoutTheRightToWriteAnywhere) {
   expectOwner("/Volumes/b", kCaller);
 }
 
-TEST_F(MountPointPrivilegesTest, FailsToHandTheDirectoryOverWithoutTheRight) {
+TEST_F(MountPointPrivilegesTest, FailsToChangeTheOwnerWithoutTheCapability) {
   expectResult(runWithout("chown", {"a"}), 1, "Failed to chown [/Volumes/a], errno: 1\n");
   EXPECT_EQ(statusOf("/Volumes/a").st_uid, 0U);
 }
 
 // An ordinary user must set PR_SET_NO_NEW_PRIVS before filtering system calls. The set-user-ID bit then has
 // no effect.
-TEST_F(MountPointPrivilegesTest, HasNoRightsWhereItsCallerMayFilterItsCalls) {
+TEST_F(MountPointPrivilegesTest, HasNoPrivilegesIfItsCallerMayFilterSystemCalls) {
   if (kInstrumentation == "coverage") {
     GTEST_SKIP() << "a coverage build writes its counts where only its builder may";
   }
@@ -534,14 +534,14 @@ class MountPointFullFileSystemTest : public MountPointPrivilegesTest {
   }
 };
 
-TEST_F(MountPointFullFileSystemTest, GetsNoBlockThatIsReservedForRoot) {
+TEST_F(MountPointFullFileSystemTest, MakesNoDirectoryWithBlocksReservedForRoot) {
   expectResult(runAs(kCaller, {"a"}), 28, "Failed to create [/Volumes/a], errno: 28\n");
   expectSuccess(run({"roots"}));
 }
 
 // Messages about the arguments used to be written as root: each could put up to 128 KiB of the caller's bytes
 // there.
-TEST_F(MountPointFullFileSystemTest, GetsNoBlockThatIsReservedForRootForItsMessages) {
+TEST_F(MountPointFullFileSystemTest, WritesNoMessageWithBlocksReservedForRoot) {
   const off_t size = statusOf(kFile).st_size;
   const auto intoFile = [] {
     as(kCaller)();
@@ -557,7 +557,7 @@ TEST_F(MountPointFullFileSystemTest, GetsNoBlockThatIsReservedForRootForItsMessa
 
 // If a user other than root writes to a program, the kernel removes its set-user-ID and set-group-ID bits. A
 // message that the command writes for its caller must have the same effect.
-TEST_F(MountPointPrivilegesTest, LetsNoFileKeepTheBitsThatItsCallersWritingTakesAway) {
+TEST_F(MountPointPrivilegesTest, ClearsTheSetIdBitsOfTheFileThatItsMessageGoesTo) {
   const auto intoProgram = [] {
     as(kCaller)();
     const int file = open("/Volumes/program", O_WRONLY | O_APPEND);

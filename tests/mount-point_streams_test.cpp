@@ -39,7 +39,7 @@ TEST_F(MountPointTest, WorksWithoutStandardStreams) {
 
 // The exit status is the value of errno after the message was written. If the message itself cannot be
 // written, the status is the error of that write, not the directory's error.
-TEST_F(MountPointTest, TellsTheFailureOfItsMessageWhereThatFails) {
+TEST_F(MountPointTest, ReportsTheFailureOfItsMessage) {
   expectSuccess(run({"a"}));
   expectResult(run({"a"}, [] { close(STDERR_FILENO); }), EBADF, "");
   expectResult(run({"a"}, [] { replaceStream(STDERR_FILENO, "/dev/full"); }), ENOSPC, "");
@@ -48,7 +48,7 @@ TEST_F(MountPointTest, TellsTheFailureOfItsMessageWhereThatFails) {
   expectResult(run({"a", "--remove"}, [] { replaceStream(STDERR_FILENO, "/dev/full"); }), ENOSPC, "");
 }
 
-TEST_F(MountPointTest, TellsTheFailureOfItsMessageWhereThatFailsAfterChown) {
+TEST_F(MountPointTest, ReportsTheFailureOfItsMessageAfterChown) {
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
   expectResult(runInjected("chown,fchown,lchown,fchownat", "EPERM", {"a"},
                            [] { replaceStream(STDERR_FILENO, "/dev/full"); }),
@@ -73,14 +73,14 @@ struct FullPipe {
   }
 };
 
-TEST_F(MountPointTest, TakesAMissingDirectoryForRemovedEvenWhereTheNoticeIsLost) {
+TEST_F(MountPointTest, TreatsAMissingDirectoryAsRemovedEvenIfTheNoticeIsLost) {
   expectSuccess(run({"a", "--remove"}, [] { close(STDOUT_FILENO); }));
   expectSuccess(run({"a", "--remove"}, [] { replaceStream(STDOUT_FILENO, "/dev/full"); }));
   const FullPipe pipe;
   expectSuccess(run({"a", "--remove"}, [&] { dup2(pipe.ends[1], STDOUT_FILENO); }));
 }
 
-TEST_F(MountPointTest, DoesItsWorkBeforeAReaderThatIsGoneEndsIt) {
+TEST_F(MountPointTest, DoesItsWorkBeforeABrokenPipeEndsIt) {
   const auto withoutReader = [](int stream, bool ignored) {
     return [stream, ignored] {
       std::array<int, 2> ends{};
@@ -96,7 +96,7 @@ TEST_F(MountPointTest, DoesItsWorkBeforeAReaderThatIsGoneEndsIt) {
   expectSuccess(run({"b", "--remove"}, withoutReader(STDOUT_FILENO, true)));
 }
 
-TEST_F(MountPointTest, DoesNotWaitForAFullPipeThatDoesNotBlock) {
+TEST_F(MountPointTest, DoesNotWaitForAFullNonBlockingPipe) {
   FullPipe pipe;
   expectSuccess(run({"a"}));
   expectResult(run({"a"}, [&] { dup2(pipe.ends[1], STDERR_FILENO); }), EAGAIN, "");

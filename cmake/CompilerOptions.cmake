@@ -26,8 +26,8 @@ target_compile_options(compiler-options INTERFACE
 # (`--gc-sections`).
 target_compile_options(compiler-options INTERFACE -ffunction-sections -fdata-sections)
 
-# Every build has the hardening that costs next to nothing. Fortification needs the optimiser. Instrumented builds
-# leave it out because it would hide the sanitizers' own checks.
+# Every build has the hardening that costs next to nothing. Fortification needs the optimiser, so only optimised builds
+# have it. Instrumented builds do not, because it would hide the sanitizers' own checks.
 target_compile_options(compiler-options INTERFACE
   -fstack-protector-strong
   $<$<PLATFORM_ID:Linux>:-fstack-clash-protection>

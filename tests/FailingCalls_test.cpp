@@ -49,7 +49,7 @@ std::string journalRefusal;
 constexpr int kIsWrong = 3;
 constexpr unsigned kPatience = 60;
 
-// Mark the calls to test, which lie between `begin` and `end`. The programs make no other calls of getppid.
+// `begin` and `end` mark the system calls to test. The programs do not call getppid elsewhere.
 void begin() {
   static_cast<void>(getppid());
 }

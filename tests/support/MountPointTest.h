@@ -15,8 +15,8 @@
 /// Throws std::system_error with `errno` if `succeeded` is false.
 void require(bool succeeded);
 
-/// Runs the built command in a private root. Its /Volumes is real, and empty at the start of each case. The
-/// source file defines `main`.
+/// Runs the built command in a private root. Its /Volumes is real, and empty at the start of each case.
+/// MountPointTest.cpp defines `main`.
 ///
 /// With the argument --as-ordinary-user, a test program that root starts runs as an ordinary user. A case
 /// that needs another user is skipped.

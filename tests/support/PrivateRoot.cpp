@@ -98,8 +98,8 @@ void becomeOrdinaryUser() {
   if (geteuid() != 0) throw std::runtime_error("this is an ordinary user already, as whom the suite runs");
   require(setgroups(0, nullptr) == 0 && setgid(kOrdinaryGroup) == 0 && setuid(kOrdinaryUser) == 0,
           "cannot become an ordinary user");
-  // A process that changes its identity may no longer write its own entries in /proc. Setting up a namespace
-  // needs them.
+  // A process that changes its identity may no longer write its own entries in /proc, which `enter` needs.
+  // This call restores that right.
   require(prctl(PR_SET_DUMPABLE, 1) == 0, "cannot take the say over /proc back");
 }
 

@@ -26,7 +26,7 @@ namespace WithoutMemory {
 
 using Program = std::function<void()>;
 
-/// Whether growth is a leak: the process has more blocks after each run of the program.
+/// Says whether it is a leak if the process has more blocks after each run of the program.
 enum class Growth : bool { kIsLeak, kIsWanted };
 
 void tryEachAllocation(const Program& program, Growth growth = Growth::kIsLeak);

@@ -198,7 +198,7 @@ class FailingCalls : public testing::Test {
  protected:
   void SetUp() override {
     if (RT_TEST_ADDRESS_SANITIZER || RT_TEST_THREAD_SANITIZER)
-      GTEST_SKIP() << "calls of the sanitizer's own would fail as well";
+      GTEST_SKIP() << "the sanitizer's own system calls would fail too";
     const std::string refused = tracingRefusal();
     if (!refused.empty()) GTEST_SKIP() << refused;
   }
@@ -229,7 +229,8 @@ class FailingCalls : public testing::Test {
     for (const Call& call : calls) {
       const bool isInterruptible = kInterruptible.contains(call.name);
       if (!isInterruptible && !kOthers.contains(call.name)) {
-        EXPECT_TRUE(kLeftAlone.contains(call.name)) << "nothing says what " << call.name << " may do";
+        EXPECT_TRUE(kLeftAlone.contains(call.name))
+            << "the lists above lack " << call.name << ", which the program calls";
         continue;
       }
       if (isInterruptible) {

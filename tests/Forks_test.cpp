@@ -277,7 +277,7 @@ TEST_F(Forks, ChildWritesALineWhileAnotherThreadWritesOne) {
 
 TEST_F(Forks, ChildFindsAServiceWhileAnotherThreadHashesATag) {
   // The other thread holds the registry's lock. The fork waits for it only for a limited time.
-  if (RT_TEST_IS_APPLE) GTEST_SKIP() << "the system's lock stays held";
+  if (RT_TEST_IS_APPLE) GTEST_SKIP() << "on macOS, the lock stays held in the child";
   Parking parking;
   const Ref<rt::Object> slow = rt::make<SlowTag>(parking);
   const Ref<rt::Object> tag = rt::make<Tag>();

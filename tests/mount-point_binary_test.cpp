@@ -27,7 +27,7 @@ class MountPointBinaryTest : public testing::Test {
  protected:
   void SetUp() override {
     if (!kInstrumentation.empty()) {
-      GTEST_SKIP() << "built with instrumentation (" << kInstrumentation << "), which is never installed";
+      GTEST_SKIP() << "instrumented builds (" << kInstrumentation << ") are never installed";
     }
   }
 
@@ -150,7 +150,7 @@ TEST_F(MountPointBinaryTest, IsMarkedForShadowStacks) {
 // in all.
 TEST_F(MountPointBinaryTest, HasFewInitialisers) {
 #if defined(__clang__)
-  GTEST_SKIP() << "clang leaves one call for each source file";
+  GTEST_SKIP() << "clang keeps an initialiser for each source file";
 #endif
   const std::string sections = outputOf({"readelf", "--wide", "--sections", MOUNT_POINT});
   std::istringstream words(sections.substr(sections.find(".init_array")));

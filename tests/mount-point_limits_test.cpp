@@ -36,9 +36,8 @@ class MountPointFileLimitTest : public MountPointTest {
   void SetUp() override {
     MountPointTest::SetUp();
     if (IsSkipped()) return;
-    if (kInstrumentation == "coverage") GTEST_SKIP() << "the limit would cut the files of its counts short";
-    if (kInstrumentation == "thread")
-      GTEST_SKIP() << "the sanitizer makes files of its own before the command starts";
+    if (kInstrumentation == "coverage") GTEST_SKIP() << "the limit would truncate the coverage counts";
+    if (kInstrumentation == "thread") GTEST_SKIP() << "the sanitizer writes files before the command starts";
   }
 
   // Redirects `stream` to a file that may have at most `limit` bytes.
@@ -89,8 +88,7 @@ class MountPointMemoryLimitTest : public MountPointTest {
   void SetUp() override {
     MountPointTest::SetUp();
     if (IsSkipped()) return;
-    if (!kInstrumentation.empty())
-      GTEST_SKIP() << "built with instrumentation, which takes memory of its own";
+    if (!kInstrumentation.empty()) GTEST_SKIP() << "instrumented builds need more memory";
   }
 
   static bool isWhole(const ProcessResult& result) { return result.exitStatus == 0 && result.signal == 0; }
@@ -148,7 +146,7 @@ TEST_F(MountPointMemoryLimitTest, WorksWithinTheLimitsOfTheManual) {
 // ---- Open files ----
 
 TEST_F(MountPointTest, OpensNoFiles) {
-  if (!kInstrumentation.empty()) GTEST_SKIP() << "built with instrumentation, which opens files";
+  if (!kInstrumentation.empty()) GTEST_SKIP() << "instrumented builds open files";
   expectSuccess(run({"a"}, limiting(RLIMIT_NOFILE, 0)));
   expectResult(run({"a"}, limiting(RLIMIT_NOFILE, 0)), 17, "Failed to create [/Volumes/a], errno: 17\n");
   expectSuccess(run({"a", "--remove"}, limiting(RLIMIT_NOFILE, 0)));

@@ -49,7 +49,7 @@ class MountPointPrivilegesTest : public MountPointTest {
   void SetUp() override {
     MountPointTest::SetUp();
     if (IsSkipped()) return;
-    if (!isMachineRoot()) GTEST_SKIP() << "more than one user needs root: only one is mapped here";
+    if (!isMachineRoot()) GTEST_SKIP() << "this needs root: a user namespace maps only one user";
     fs::copy_file(kCommand, kPlainCommand, fs::copy_options::overwrite_existing);
     ASSERT_EQ(chmod(kCommand, 04755), 0);
     makeFile("/Volumes/.keep");
@@ -184,7 +184,7 @@ TEST_F(MountPointPrivilegesTest, ReportsTheFailureOfItsMessageIfItsStreamsAreClo
 }
 
 TEST_F(MountPointPrivilegesTest, DoesNothingIfAClosedStreamCannotBeReplaced) {
-  if (!kInstrumentation.empty()) GTEST_SKIP() << "built with instrumentation, which opens files";
+  if (!kInstrumentation.empty()) GTEST_SKIP() << "instrumented builds open files";
   const ProcessResult result = run({"a"}, [] {
     as(kCaller)();
     const rlimit none{0, 0};
@@ -197,7 +197,7 @@ TEST_F(MountPointPrivilegesTest, DoesNothingIfAClosedStreamCannotBeReplaced) {
 
 TEST_F(MountPointPrivilegesTest, MakesTheSameSystemCallsForACallerAsForRoot) {
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
-  if (!kInstrumentation.empty()) GTEST_SKIP() << "built with instrumentation, which asks for more";
+  if (!kInstrumentation.empty()) GTEST_SKIP() << "instrumented builds make more system calls";
   const auto namesOf = [](const std::vector<std::string>& calls) {
     std::vector<std::string> names;
     for (const std::string& call : calls) names.push_back(call.substr(0, call.find('(')));
@@ -385,7 +385,7 @@ TEST_F(MountPointAttackTest, CallerDoesNotGetAnotherUsersDirectoryWithFileCapabi
   capabilities.magic_etc = VFS_CAP_REVISION_2 | VFS_CAP_FLAGS_EFFECTIVE;
   capabilities.data[0].permitted = 1U << CAP_CHOWN | 1U << CAP_DAC_OVERRIDE;
   if (setxattr(kPlainCommand, "security.capability", &capabilities, XATTR_CAPS_SZ_2, 0) != 0) {
-    GTEST_SKIP() << "no file has capabilities here: " << std::strerror(errno);
+    GTEST_SKIP() << "files cannot have capabilities here: " << std::strerror(errno);
   }
   attack(
       [] {
@@ -486,7 +486,7 @@ TEST_F(MountPointPrivilegesTest, FailsToChangeTheOwnerWithoutTheCapability) {
 // no effect.
 TEST_F(MountPointPrivilegesTest, HasNoPrivilegesIfItsCallerMayFilterSystemCalls) {
   if (kInstrumentation == "coverage") {
-    GTEST_SKIP() << "a coverage build writes its counts where only its builder may";
+    GTEST_SKIP() << "only its builder may write the counts of a coverage build";
   }
   const ProcessResult result = run({"a"}, [] {
     as(kCaller)();

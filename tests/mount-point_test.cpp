@@ -83,7 +83,7 @@ TEST_F(MountPointTest, MakesADirectoryThatOnlyItsOwnerMayUse) {
 }
 
 TEST_F(MountPointTest, SetsTheCallersGroupIfVolumesIsSetGroupId) {
-  if (!isMachineRoot()) GTEST_SKIP() << "another group than one's own needs root: only one is mapped here";
+  if (!isMachineRoot()) GTEST_SKIP() << "this needs root: a user namespace maps only one group";
   ASSERT_EQ(chmod("/Volumes", 02755), 0);
   ASSERT_EQ(chown("/Volumes", 0, kOrdinaryGroup), 0);
   expectSuccess(run({"a"}));
@@ -230,7 +230,7 @@ std::vector<std::string> withoutPreparation(std::vector<std::string> calls) {
 }
 
 TEST_F(MountPointTest, MakesNoUnneededSystemCalls) {
-  if (!kInstrumentation.empty()) GTEST_SKIP() << "built with instrumentation, which asks for more";
+  if (!kInstrumentation.empty()) GTEST_SKIP() << "instrumented builds make more system calls";
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
   const auto callsOf = [](const std::vector<std::string>& arguments) {
     return withoutPreparation(systemCalls(arguments));
@@ -333,7 +333,8 @@ TEST_F(MountPointTest, ReportsEveryErrorOfRmdir) {
 // The lines of commands that run at the same time do not mix: the command writes each line of up to 8 KiB in
 // one call.
 TEST_F(MountPointTest, WritesEachLineInOneCall) {
-  if (kInstrumentation == "coverage") GTEST_SKIP() << "writing its counts hides what came before";
+  if (kInstrumentation == "coverage")
+    GTEST_SKIP() << "the calls that write the coverage counts hide the earlier ones";
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
   expectSuccess(run({"a"}));
   for (const std::string& name : {std::string("a"), std::string(8000, 'x')}) {

@@ -12,7 +12,7 @@ namespace {
 class AllocationCountTest : public testing::Test {
  protected:
   void SetUp() override {
-    if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations on this system";
+    if (!AllocationCount::isSupported()) GTEST_SKIP() << "allocations cannot be counted on this system";
   }
 };
 

@@ -48,7 +48,7 @@ Address loadAddress(pid_t process, const std::string& path) {
   for (std::string line; std::getline(maps, line);) {
     if (line.find(path) != std::string::npos) return std::stoul(line, nullptr, 16);
   }
-  throw std::runtime_error("the program is not where it should be");
+  throw std::runtime_error("the program's file is not mapped");
 }
 
 Address readWord(pid_t process, Address address) {

@@ -69,7 +69,7 @@ class OnlyCoding final : public rt::Implements<OnlyCoding, rt::Object, rt::Codin
  public:
   void encodeWithCoder(rt::KeyedArchiver& coder) const override { coder.encodeObject(nullptr, "key"); }
   static rt::Ref<OnlyCoding> initWithCoder(rt::KeyedUnarchiver&) {
-    ADD_FAILURE() << "made of an archive";
+    ADD_FAILURE() << "the object must not be decoded";
     return rt::make<OnlyCoding>();
   }
 };

@@ -134,7 +134,7 @@ namespace {
 // first. Throws if the machine does not allow this.
 void enterPrivateRoot(const char* command, bool asOrdinaryUser) {
   if (asOrdinaryUser && std::string_view(INSTRUMENTATION) == "coverage") {
-    throw std::runtime_error("a coverage build writes its counts where only its builder may");
+    throw std::runtime_error("only its builder may write the counts of a coverage build");
   }
   std::ifstream built(MOUNT_POINT, std::ios::binary);
   if (asOrdinaryUser) PrivateRoot::becomeOrdinaryUser();

@@ -31,7 +31,7 @@ class PlistlibTest : public testing::Test {
  protected:
   void SetUp() override {
     if (runProcess({"python3", "-c", "import plistlib"}).exitStatus != 0) {
-      GTEST_SKIP() << "python3 with its plistlib is not here";
+      GTEST_SKIP() << "python3 with plistlib is missing";
     }
     std::string directory = testing::TempDir() + "plistlib.XXXXXX";
     ASSERT_NE(mkdtemp(directory.data()), nullptr);

@@ -95,7 +95,7 @@ bool entered() {
 }
 
 void becomeOrdinaryUser() {
-  if (geteuid() != 0) throw std::runtime_error("this is an ordinary user already, as whom the suite runs");
+  if (geteuid() != 0) throw std::runtime_error("the suite already runs as an ordinary user");
   require(setgroups(0, nullptr) == 0 && setgid(kOrdinaryGroup) == 0 && setuid(kOrdinaryUser) == 0,
           "cannot become an ordinary user");
   // A process that changes its identity may no longer write its own entries in /proc, which `enter` needs.

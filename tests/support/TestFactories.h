@@ -18,6 +18,6 @@ inline rt::Ref<rt::Object> makeInstance() {
 
 /// A factory that must not be called. It is for requests that find an existing instance.
 inline rt::Ref<rt::Object> mustNotRun() {
-  ADD_FAILURE() << "a factory ran";
+  ADD_FAILURE() << "the factory must not run";
   return nullptr;
 }

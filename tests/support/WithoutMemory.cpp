@@ -163,7 +163,7 @@ std::int64_t tryLaterRuns(const Program& program, Extent extent, Growth growth) 
 }  // namespace
 
 void tryEachAllocation(const Program& program, Growth growth) {
-  if (!AllocationFailure::isSupported()) GTEST_SKIP() << "no way to have allocations fail here";
+  if (!AllocationFailure::isSupported()) GTEST_SKIP() << "allocations cannot be made to fail on this system";
   for (const Extent extent : {Extent::kOnce, Extent::kFromThenOn}) {
     const std::int64_t first = tryFirstRuns(program, extent);
     if (testing::Test::HasFailure()) return;

@@ -1,6 +1,6 @@
-// The private root is a tmpfs. Every top-level directory but /Volumes is bound into it. Then follows
-// `pivot_root`. Root needs a mount namespace for it, an ordinary user also a user namespace. `chroot` would
-// not do, because no further user namespace can be made inside of it.
+// The private root is a tmpfs. Every top-level directory except /Volumes is bound into it. Then `pivot_root`
+// makes it the process's root. Root needs a mount namespace for this, an ordinary user also a user namespace.
+// `chroot` would not suffice, because a process in a chroot cannot create user namespaces.
 
 #include "tests/support/PrivateRoot.h"
 
@@ -76,8 +76,7 @@ void enter() {
   require(mkdtemp(scratch.data()) != nullptr, "cannot make " + scratch);
   require(mount("tmpfs", scratch.c_str(), "tmpfs", 0, "mode=0755") == 0, "cannot mount a tmpfs");
   mirrorRoot(scratch);
-  // pivot_root moves the old root below the new one, where it is detached. chroot would not suffice: a
-  // process in a chroot cannot create user namespaces.
+  // pivot_root moves the old root below the new one, where it is detached.
   fs::create_directory(scratch + "/old-root");
   require(syscall(SYS_pivot_root, scratch.c_str(), (scratch + "/old-root").c_str()) == 0,
           "cannot pivot the root");

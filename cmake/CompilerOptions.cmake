@@ -1,5 +1,5 @@
-# How everything here is compiled: the language, the warnings, the hardening and the instrumentation
-# (a sanitizer or coverage). Link `MountPoint::Options` privately; it is never installed.
+# Defines the compiler options of the whole project: the language, the warnings, the hardening and the
+# instrumentation (a sanitizer or coverage). Link `MountPoint::Options` privately. It is never installed.
 
 set(CMAKE_CXX_STANDARD 20)
 set(CMAKE_CXX_STANDARD_REQUIRED ON)
@@ -17,17 +17,17 @@ target_compile_options(compiler-options INTERFACE
   $<$<CXX_COMPILER_ID:Clang,AppleClang>:-Wthread-safety -Wthread-safety-beta>
   $<$<BOOL:${MOUNT_POINT_WARNINGS_AS_ERRORS}>:-Werror>)
 
-# Nobody replaces a function of the libraries when a program starts, so calls among them may be direct.
-# (clang takes that for granted.)
+# No host interposes functions of the libraries, so g++ may call them directly and inline them. clang always
+# assumes this.
 target_compile_options(compiler-options INTERFACE
   $<$<CXX_COMPILER_ID:GNU>:-fno-semantic-interposition>)
 
-# Each function and variable in a section of its own, so that a program's linker can leave out what it never uses
+# These options put each function and variable into its own section. A program's linker can then drop unused ones
 # (`--gc-sections`).
 target_compile_options(compiler-options INTERFACE -ffunction-sections -fdata-sections)
 
-# Hardening that costs next to nothing, in every build. Fortification needs the optimiser, and the
-# sanitizers bring checks of their own that it would hide.
+# Every build has the hardening that costs next to nothing. Fortification needs the optimiser, so only optimised builds
+# have it. Instrumented builds do not, because it would hide the sanitizers' own checks.
 target_compile_options(compiler-options INTERFACE
   -fstack-protector-strong
   $<$<PLATFORM_ID:Linux>:-fstack-clash-protection>
@@ -49,7 +49,7 @@ elseif(MOUNT_POINT_INSTRUMENTATION STREQUAL "coverage")
   set(instrumentation --coverage -fprofile-update=atomic)
 elseif(MOUNT_POINT_INSTRUMENTATION)
   message(FATAL_ERROR "MOUNT_POINT_INSTRUMENTATION is \"${MOUNT_POINT_INSTRUMENTATION}\"; "
-    "it takes address, thread, coverage or nothing.")
+    "valid values are address, thread, coverage and the empty string.")
 endif()
 target_compile_options(compiler-options INTERFACE ${instrumentation})
 target_link_options(compiler-options INTERFACE ${instrumentation})

@@ -1,14 +1,14 @@
-# Fuzzers: libFuzzer programs in fuzz/, built where the address sanitizer is (the preset `address`).
+# Defines how the fuzzers in fuzz/ are built and run. They use libFuzzer and are part of the preset `address`.
 
 include_guard(GLOBAL)
 
 # mount_point_fuzzer(NAME SOURCES FILE… [LIBRARIES TARGET…] [RUNS COUNT] [DEFINITIONS DEFINITION…])
 #
-# Adds the fuzzer NAME, and the ctest entry NAME.short-run, which runs it COUNT times (20000 unless given;
-# choose a few seconds' worth) over what grows from the files in corpus/NAME, always the same way. The
-# corpus itself is only read. The libraries are instrumented, so that the fuzzer sees their branches.
+# Adds the fuzzer NAME and the ctest entry NAME.short-run. The entry runs COUNT inputs, by default 20000; choose COUNT
+# so that a run takes a few seconds. The inputs are mutations of the files in corpus/NAME. The seed is fixed, so
+# every run is the same. The corpus is only read. The libraries are instrumented, so the fuzzer sees their branches.
 #
-# To look for longer, and keep what is found in a folder of one's own:
+# To run a fuzzer for longer and keep the inputs that it finds in FOLDER:
 #
 #     build/address/fuzz/NAME -max_total_time=300 FOLDER fuzz/corpus/NAME
 function(mount_point_fuzzer name)

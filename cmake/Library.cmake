@@ -1,21 +1,21 @@
-# Libraries: how they are linked and installed.
+# Defines how the libraries are linked and installed.
 
 include_guard(GLOBAL)
 include(CMakePackageConfigHelpers)
 
 # mount_point_library(NAME PUBLIC_NAME DESCRIPTION TEXT [LIBRARIES NAME…])
 #
-# Adds the static library NAME, without sources, and MountPoint::PUBLIC_NAME, which is what to link. It
-# links the library whole: classes are found by name and class methods by selector, so that a file of the
-# library may matter to which no symbol leads. LIBRARIES are those of these libraries that it stands on.
-# Installed, it is of the package MountPoint, and pkg-config knows it as mount-point-NAME.
+# Adds the static library NAME, without sources, and the target MountPoint::PUBLIC_NAME. Programs link that target,
+# which links the whole library. A program may need an object file that no symbol refers to: classes are found by
+# name, and class methods by selector. LIBRARIES are the libraries that this one depends on, by their NAME. The library
+# is installed as a part of the package MountPoint, and for pkg-config as mount-point-NAME.
 function(mount_point_library name public_name)
   cmake_parse_arguments(PARSE_ARGV 2 library "" "DESCRIPTION" "LIBRARIES")
   add_library(${name} STATIC)
   target_include_directories(${name} PUBLIC
     "$<BUILD_INTERFACE:${PROJECT_SOURCE_DIR}>" "$<INSTALL_INTERFACE:${CMAKE_INSTALL_INCLUDEDIR}/mount-point>")
   target_compile_features(${name} PUBLIC cxx_std_20)
-  # Not linked, since programs would then be linked with the options too: they choose theirs.
+  # The options are not linked, because programs would then inherit the link options. Hosts choose their own.
   target_compile_options(${name} PRIVATE $<TARGET_PROPERTY:MountPoint::Options,INTERFACE_COMPILE_OPTIONS>)
   target_compile_definitions(${name} PRIVATE $<TARGET_PROPERTY:MountPoint::Options,INTERFACE_COMPILE_DEFINITIONS>)
   set_target_properties(${name} PROPERTIES OUTPUT_NAME mount-point-${name} EXPORT_NAME ${public_name}Archive)
@@ -39,8 +39,8 @@ function(mount_point_library name public_name)
     FILE_SET HEADERS DESTINATION "${CMAKE_INSTALL_INCLUDEDIR}/mount-point"
     FILE_SET needed_headers DESTINATION "${CMAKE_INSTALL_INCLUDEDIR}/mount-point")
 
-  # The prefix is told from where the file is, so that the whole may be moved. One word for what is
-  # linked whole: pkg-config reorders words.
+  # The prefix is relative to the .pc file, so that the installed tree can be moved. The options that link the whole
+  # library are a single word, because pkg-config reorders words.
   set(file "mount-point-${name}")
   list(TRANSFORM library_LIBRARIES PREPEND "mount-point-" OUTPUT_VARIABLE requires)
   list(JOIN requires ", " requires)
@@ -69,7 +69,7 @@ endfunction()
 
 # mount_point_install_package()
 #
-# Installs what find_package(MountPoint) needs. Called once, after all libraries.
+# Installs what find_package(MountPoint) needs. Call it once, after all libraries have been added.
 function(mount_point_install_package)
   set(destination "${CMAKE_INSTALL_LIBDIR}/cmake/MountPoint")
   install(EXPORT MountPoint NAMESPACE MountPoint:: DESTINATION "${destination}" FILE MountPointTargets.cmake

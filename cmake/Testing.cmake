@@ -1,12 +1,13 @@
-# Tests: GoogleTest programs beside what they test, as entries of ctest.
+# Defines how the test programs are built and become entries of ctest. They use GoogleTest and stand beside the code
+# that they test.
 
 include_guard(GLOBAL)
 find_package(GTest REQUIRED)
 include(GoogleTest)
 
-# What a test takes to compile is mostly GoogleTest's headers, which are compiled once for all, and what becomes of
-# its many temporaries: but in the build for the debugger, tests get few symbols, and they are optimised, like what
-# is shipped, by g++ alone. The libraries are compiled as ever.
+# Two things make tests slow to compile: GoogleTest's headers, which are therefore precompiled once for all tests, and
+# the many temporaries. So tests get few debug symbols, except in the preset `development`. With clang and in
+# instrumented builds, they are not optimised either. This does not change the options of the libraries.
 add_library(test-options INTERFACE)
 if(MOUNT_POINT_INSTRUMENTATION OR CMAKE_CXX_COMPILER_ID STREQUAL "Clang")
   target_compile_options(test-options INTERFACE -g1 -O0)
@@ -19,15 +20,14 @@ if(MOUNT_POINT_INSTRUMENTATION STREQUAL "coverage")
   target_link_libraries(coverage-at-end PRIVATE MountPoint::Options)
   target_sources(test-options INTERFACE $<TARGET_OBJECTS:coverage-at-end>)
 endif()
-# A program like the tests, since it must be compiled as they are.
+# The owner of the precompiled headers must be compiled with the same options as the tests.
 add_executable(test-headers "${PROJECT_SOURCE_DIR}/cmake/test-headers.cpp")
 target_precompile_headers(test-headers PRIVATE <gtest/gtest.h> <gmock/gmock.h>)
 target_link_libraries(test-headers PRIVATE test-options)
 
 # mount_point_test(NAME SOURCES FILE… [LIBRARIES TARGET…] [DEFINITIONS DEFINITION…])
 #
-# Adds the test program NAME with GoogleTest's own main (name another one by not linking it: a source
-# that defines main wins).
+# Adds the test program NAME. It uses GoogleTest's `main`, unless one of its sources defines `main`.
 function(mount_point_test name)
   cmake_parse_arguments(PARSE_ARGV 1 test "" "" "SOURCES;LIBRARIES;DEFINITIONS")
   add_executable(${name} ${test_SOURCES})
@@ -39,8 +39,9 @@ endfunction()
 
 # mount_point_test_entries(NAME ENTRY [ARGUMENT…])
 #
-# Adds the cases of the test program NAME, run with these arguments, to ctest as ENTRY.SUITE.CASE, each in a
-# process of its own; in an instrumented build, which takes longer to start than a case to run, all in one, as ENTRY.
+# Adds the cases of the test program NAME to ctest. Each is an entry ENTRY.SUITE.CASE and runs in its own process, with
+# the given arguments. In an instrumented build, starting a process takes longer than running a case. So there, a
+# single entry ENTRY runs all cases in one process.
 function(mount_point_test_entries name entry)
   if(MOUNT_POINT_INSTRUMENTATION)
     add_test(NAME ${entry} COMMAND ${name} ${ARGN})
@@ -51,11 +52,14 @@ endfunction()
 
 # mount_point_must_not_compile(TEST SOURCE FILE [COMPILER ID] MISTAKES MACRO REGEX…)
 #
-# FILE holds what is right and, between `#ifdef MACRO` and `#endif`, mistakes. Adds for each MACRO the ctest entry
-# TEST.must-not-compile.MACRO: with MACRO defined FILE does not compile, and the compiler's complaint matches
-# REGEX; and the entry must-compile.FILE: it compiles as it is. Nothing is linked; includes are from the
-# repository's root. With COMPILER (GNU or Clang) all are left out under any other; so are they in an instrumented
-# build, where the compiler would say the same once more.
+# FILE contains valid code and, between `#ifdef MACRO` and `#endif`, mistakes. Adds these entries to ctest:
+#
+#   must-compile.FILE                 checks that FILE compiles if no MACRO is defined
+#   TEST.must-not-compile.MACRO       checks that FILE does not compile if MACRO is defined, and that the compiler's
+#                                     error matches REGEX; there is one such entry for each MACRO
+#
+# Nothing is linked. Includes are relative to the repository's root. With COMPILER (GNU or Clang), no other compiler
+# has these entries. Instrumented builds leave them out, because the compiler would only report the same again.
 function(mount_point_must_not_compile test)
   cmake_parse_arguments(PARSE_ARGV 1 given "" "SOURCE;COMPILER" "MISTAKES")
   if(MOUNT_POINT_INSTRUMENTATION OR (given_COMPILER AND NOT CMAKE_CXX_COMPILER_ID STREQUAL given_COMPILER))

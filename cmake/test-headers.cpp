@@ -1,1 +1,1 @@
-// Compiled for the headers that the tests share; see Testing.cmake.
+// Owns the precompiled headers that all tests share; see Testing.cmake.

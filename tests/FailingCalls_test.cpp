@@ -1,9 +1,9 @@
-// Files, user defaults, the system's log and call stacks, where a call of the system fails or is interrupted.
+// Tests files, user defaults, the system's log and call stacks when a system call fails or is interrupted.
 //
-// The program runs itself once for each call that a small program makes, and strace fails that call. After an
-// interruption it must finish its work. After an error it must do what is documented, keep what it had, and
-// leave nothing open. The calls are those of the thread that runs the program; the one that watches user
-// defaults is left alone.
+// There is a small program for each of them. The test runs it once for each of its system calls, and strace
+// makes that call fail. After an interruption, the program must finish its work. After an error, it must do
+// what is documented, lose no data and leave no descriptor open. Only the calls of the program's thread fail;
+// those of the thread that watches user defaults do not.
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
@@ -42,14 +42,14 @@ using namespace rt::literals;
 using rt::Ref;
 namespace fs = std::filesystem;
 
-// Why there is no private journal; empty when there is one.
+// The reason why there is no private journal. Empty if there is one.
 std::string journalRefusal;
 
-// How a program ends that has found something wrong.
+// The exit status of a program that finds a mistake.
 constexpr int kIsWrong = 3;
 constexpr unsigned kPatience = 60;
 
-// Between these the calls count: nothing else makes them.
+// `begin` and `end` mark the system calls to test. The programs do not call getppid elsewhere.
 void begin() {
   static_cast<void>(getppid());
 }
@@ -72,7 +72,7 @@ std::string contentOf(const fs::path& path) {
   return {std::istreambuf_iterator<char>(stream), {}};
 }
 
-// Appends to a file. What was written is whole lines, or the start of one where an error was thrown.
+// Appends two lines to a file. The file must contain both, unless an error was reported.
 void writeFile(const fs::path& folder, bool isInterrupted) {
   const fs::path path = folder / "log";
   begin();
@@ -120,7 +120,7 @@ void observeDefaults(const fs::path& folder, bool isInterrupted) {
 
 void logToSystem(const fs::path& /*folder*/, bool isInterrupted) {
   const rt::SystemLog log("com.example.test"_s, "calls"_s);
-  // Larger than a datagram.
+  // This text is larger than a datagram.
   const std::string large(1000000, 'x');
   begin();
   errno = EXDEV;
@@ -158,19 +158,20 @@ const std::map<std::string_view, Program> kPrograms = {{"file", writeFile},
                                                        {"stack", describeCallStack}};
 
 int runProgram(std::string_view name, const fs::path& folder, std::string_view call, std::string_view error) {
-  // For what would wait for ever.
+  // SIGALRM ends a program that hangs.
   alarm(kPatience);
   const std::size_t before = countOfDescriptors();
   kPrograms.at(name)(folder, error == "EINTR");
-  // The log keeps a socket for each daemon. A call of `close` that fails on strace's word closes nothing.
+  // The log keeps a socket open for each daemon. A call of `close` that strace makes fail closes no
+  // descriptor.
   if (call == "close" || name == "log") return 0;
-  // The thread that watches for changes of defaults closes what it has when it ends.
+  // The thread that watches user defaults closes its descriptors when it ends.
   while (name == "defaults" && countOfDescriptors() > before) std::this_thread::yield();
   require(countOfDescriptors() == before, "a file is open");
   return 0;
 }
 
-// A call of the system, by its name and as the how-manieth of that name.
+// A system call: its name, and its number among the calls of that name, counted from 1.
 struct Call {
   std::string name;
   int number = 0;
@@ -181,14 +182,14 @@ class FailingCalls : public testing::Test {
  protected:
   void SetUp() override {
     if (RT_TEST_ADDRESS_SANITIZER || RT_TEST_THREAD_SANITIZER)
-      GTEST_SKIP() << "calls of the sanitizer's own would fail as well";
+      GTEST_SKIP() << "the sanitizer's own system calls would fail too";
     const std::string refused = tracingRefusal();
     if (!refused.empty()) GTEST_SKIP() << refused;
   }
 
   void TearDown() override { forgetTrace(); }
 
-  // Has each call fail that the program `name` makes.
+  // Runs the program `name` once for each of its calls and makes that call fail.
   void tryEachCall(const std::string& name) {
     static const std::set<std::string> kInterruptible = {"open",  "openat",  "read",     "pread64",
                                                          "write", "writev",  "pwritev2", "close",
@@ -209,7 +210,8 @@ class FailingCalls : public testing::Test {
                                                   "setsockopt",
                                                   "socket",
                                                   "stat"};
-    // Of memory, threads and signals, which tests of allocations have fail; and calls that cannot fail.
+    // These calls never fail here. Some cannot fail. The others concern memory, threads and signals, and fail
+    // in the tests of allocations.
     static const std::set<std::string> kLeftAlone = {
         "brk",       "clone3",       "exit_group",    "futex",          "getpid",          "getppid",
         "getrandom", "gettid",       "madvise",       "mmap",           "mprotect",        "munmap",
@@ -222,7 +224,8 @@ class FailingCalls : public testing::Test {
     for (const Call& call : calls) {
       const bool isInterruptible = kInterruptible.contains(call.name);
       if (!isInterruptible && !kOthers.contains(call.name)) {
-        EXPECT_TRUE(kLeftAlone.contains(call.name)) << "nothing says what " << call.name << " may do";
+        EXPECT_TRUE(kLeftAlone.contains(call.name))
+            << "the lists above lack " << call.name << ", which the program calls";
         continue;
       }
       if (isInterruptible) {
@@ -284,7 +287,7 @@ class FailingCalls : public testing::Test {
       if (name == "getppid") {
         ++marks;
       } else if (marks == 1) {
-        // A thread is woken by a counter in memory, to which adding 1 cannot fail.
+        // This wakes a thread through an eventfd. Adding 1 to its counter cannot fail.
         const bool wakes = name == "write" && line.find("[eventfd]") != std::string::npos;
         calls.push_back({name, number, !wakes});
       }
@@ -296,23 +299,23 @@ class FailingCalls : public testing::Test {
   std::string trace_;
 };
 
-TEST_F(FailingCalls, OfFiles) {
+TEST_F(FailingCalls, AreHandledByFiles) {
   tryEachCall("file");
 }
 
-TEST_F(FailingCalls, OfDefaults) {
+TEST_F(FailingCalls, AreHandledByUserDefaults) {
   tryEachCall("defaults");
 }
 
-TEST_F(FailingCalls, OfStandardError) {
+TEST_F(FailingCalls, AreHandledByStandardError) {
   tryEachCall("error");
 }
 
-TEST_F(FailingCalls, OfCallStacks) {
+TEST_F(FailingCalls, AreHandledByCallStacks) {
   tryEachCall("stack");
 }
 
-TEST_F(FailingCalls, OfTheJournal) {
+TEST_F(FailingCalls, AreHandledByTheSystemLog) {
   if (!PrivateJournal::entered()) GTEST_SKIP() << journalRefusal;
   PrivateJournal journal;
   journal.start();

@@ -1,4 +1,4 @@
-// The child of a fork in a process with many threads: all locks are free, and everything is of use.
+// Forks a process with many threads. In the child, no lock stays held, and all libraries can be used.
 #include <fcntl.h>
 #include <gtest/gtest.h>
 #include <unistd.h>
@@ -39,10 +39,10 @@ using namespace rt::literals;
 using namespace TestServices;
 using rt::Ref;
 
-/// Something to wait in, and from outside to wait for that somebody does.
+/// A place in which a thread waits until it is told to leave. Other threads can wait until it has arrived.
 class Parking {
  public:
-  /// For the one who parks: returns when it is told to.
+  /// Waits until `end` is called.
   void park() {
     isTaken_ = true;
     isTaken_.notify_one();
@@ -59,7 +59,7 @@ class Parking {
   std::atomic<bool> mayLeave_ = false;
 };
 
-/// A thread that does something in which it parks, from when that has begun.
+/// Runs `work`, which parks, on a new thread. The constructor returns when that thread has parked.
 class ParkedThread {
  public:
   ParkedThread(Parking& parking, std::function<void()> work) : parking_(parking), thread_(std::move(work)) {
@@ -98,7 +98,7 @@ void log(LUMLogLevel level) {
 class Forks : public ZEBLoggerTest {
  protected:
   Forks() {
-    // The system's log is not for tests.
+    // Keeps the messages of the tests out of the system's log.
     LUMLogMultiplexer::sharedInstance()->addSyncLogger(
         LUMSystemLogger::initWithFilter(LUMLogDropAllFilter::init()));
     LUMLogMultiplexer::sharedInstance()->addSyncLogger(logger_);
@@ -127,10 +127,10 @@ class Forks : public ZEBLoggerTest {
   Ref<SRLRegistry> before_;
 };
 
-/// A tag like any other.
+/// A tag with the default hash.
 class Tag final : public rt::Implements<Tag, rt::Object> {};
 
-/// One whose hash is not to be had before somebody says so.
+/// A tag whose `hash` parks.
 class SlowTag final : public rt::Implements<SlowTag, rt::Object> {
  public:
   explicit SlowTag(Parking& parking) : parking_(parking) {}
@@ -143,9 +143,9 @@ class SlowTag final : public rt::Implements<SlowTag, rt::Object> {
   Parking& parking_;
 };
 
-// One thread after another is parked with a lock held, and the process forks.
+// In each of these tests, another thread parks while it holds a lock. Then the process forks.
 
-TEST_F(Forks, AnInstanceThatAnotherThreadWasMakingCountsAsNotBegun) {
+TEST_F(Forks, ChildMakesAnInstanceThatAnotherThreadWasMaking) {
   const Ref<SRLMemoizingScope> scope = registry_->scopeWithTags({});
   static constexpr char kPlace = 0;
   Parking parking;
@@ -172,8 +172,8 @@ TEST_F(Forks, AnInstanceThatAnotherThreadWasMakingCountsAsNotBegun) {
   EXPECT_EQ(made, ofParent);
 }
 
-// Those who ask in the child wait for the one of them that makes it.
-TEST_F(Forks, AnInstanceThatCountsAsNotBegunIsMadeOnceInTheChild) {
+// In the child, one thread makes the instance, and the other requesting threads wait for it.
+TEST_F(Forks, ThreadsOfTheChildMakeAnInterruptedInstanceOnce) {
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer allows no new threads in the child";
   const Ref<SRLMemoizingScope> scope = registry_->scopeWithTags({});
   static constexpr char kPlace = 0;
@@ -202,7 +202,7 @@ TEST_F(Forks, AnInstanceThatCountsAsNotBegunIsMadeOnceInTheChild) {
             0);
 }
 
-TEST_F(Forks, AnErrorIsReportedThoughAnotherThreadIsInTheCallback) {
+TEST_F(Forks, ChildReportsErrorsWhileAnotherThreadRunsTheCallback) {
   Parking parking;
   PECErrorHandler::sharedInstance()->setErrorHandlerBlock(
       [&](const Ref<PECErrorDescription>&) { parking.park(); });
@@ -218,7 +218,7 @@ TEST_F(Forks, AnErrorIsReportedThoughAnotherThreadIsInTheCallback) {
             0);
 }
 
-TEST_F(Forks, AFilterIsSetThoughAnotherThreadSetsOne) {
+TEST_F(Forks, ChildSetsAFilterWhileAnotherThreadSetsOne) {
   Parking parking;
   const auto filter = rt::make<FunctionFilter>();
   filter->attached = [&] { parking.park(); };
@@ -234,7 +234,7 @@ TEST_F(Forks, AFilterIsSetThoughAnotherThreadSetsOne) {
             0);
 }
 
-TEST_F(Forks, AnArrayOfWritersWritesThoughAnotherThreadDoes) {
+TEST_F(Forks, ChildUsesACompositeWriterWhileAnotherThreadDoes) {
   Parking parking;
   const auto recorder = rt::make<Recorder>();
   const auto parent = rt::make<FunctionWriter>([&, thread = std::this_thread::get_id()](const rt::String&) {
@@ -249,8 +249,8 @@ TEST_F(Forks, AnArrayOfWritersWritesThoughAnotherThreadDoes) {
             0);
 }
 
-// The other thread is in the midst of a line that nobody reads.
-TEST_F(Forks, ALineIsWrittenThoughAnotherThreadWritesOne) {
+// The other thread blocks in the middle of a line, because nobody reads its pipe.
+TEST_F(Forks, ChildWritesALineWhileAnotherThreadWritesOne) {
   std::array<int, 2> ends{};
   ASSERT_EQ(pipe(ends.data()), 0);
   const auto handle = rt::make<rt::FileHandle>(ends[1], rt::FileHandle::Closing::closes);
@@ -276,9 +276,9 @@ TEST_F(Forks, ALineIsWrittenThoughAnotherThreadWritesOne) {
   close(ends[0]);
 }
 
-TEST_F(Forks, AServiceIsFoundThoughTheHashOfAnotherThreadsTagTakesForEver) {
-  // The registry's lock is held meanwhile, and the fork does not wait for ever.
-  if (RT_TEST_IS_APPLE) GTEST_SKIP() << "the system's lock stays held";
+TEST_F(Forks, ChildFindsAServiceWhileAnotherThreadHashesATag) {
+  // The other thread holds the registry's lock. The fork waits for it only for a limited time.
+  if (RT_TEST_IS_APPLE) GTEST_SKIP() << "on macOS, the lock stays held in the child";
   Parking parking;
   const Ref<rt::Object> slow = rt::make<SlowTag>(parking);
   const Ref<rt::Object> tag = rt::make<Tag>();
@@ -302,7 +302,7 @@ TEST_F(Forks, DefaultsAreReadThoughAnotherThreadIsInAnObserver) {
   observation.remove();
 }
 
-// Eight busy threads and a thousand children.
+// Eight threads are busy while the process makes a thousand children.
 
 class BusyForks : public Forks {
  protected:
@@ -327,13 +327,13 @@ class BusyForks : public Forks {
     for (std::thread& each : threads_) each.join();
   }
 
-  /// Has the threads work, or wait, so that children have the processors.
+  /// Makes the threads work or wait. While they wait, the children have the processors.
   void beBusy(bool isBusy) {
     isBusy_ = isBusy;
     isBusy_.notify_all();
   }
 
-  /// What a child does; 0 where all of it worked.
+  /// Uses the libraries in a child. Returns 0 if everything worked.
   int useAll() {
     const Ref<rt::Object>& tag = tags_[0];
     const Ref<rt::Object> own = rt::make<Tag>();
@@ -421,12 +421,12 @@ class BusyForks : public Forks {
   std::vector<std::thread> threads_;
 };
 
-// Invariant: whatever the other threads were doing, a child does all of it, and ends.
-TEST_F(BusyForks, ChildrenUseEverything) {
+// Whatever the other threads were doing at the fork, a child can use everything and ends.
+TEST_F(BusyForks, ChildrenCanUseAllLibraries) {
   constexpr int kBursts = RT_TEST_THREAD_SANITIZER || RT_TEST_ADDRESS_SANITIZER ? 10 : 100;
   std::array<pid_t, 10> children{};
   for (int burst = 0; burst < kBursts; ++burst) {
-    rt::MainQueue::drain();  // Registries that have ended elsewhere.
+    rt::MainQueue::drain();  // This destroys registries whose last reference went on another thread.
     beBusy(true);
     const std::uint64_t before = rounds_;
     while (rounds_ < before + kThreads) std::this_thread::yield();

@@ -1,15 +1,14 @@
-// Everything at once, for as long as one likes: `Soak_test --seconds=N`.
+// Uses everything at once for a chosen time: `Soak_test --seconds=N`.
 //
-// Eight threads resolve services, log, end scopes and change user defaults. Meanwhile the process forks and
-// starts programs, the journal is started anew, and the clock jumps. That goes on in rounds. After each
-// round:
+// Eight threads resolve services, log, remove scopes and change user defaults. Meanwhile the process forks
+// and starts programs, the journal restarts, and the clock jumps. This happens in rounds. After each round:
 //
 // - every message to a logger has arrived once, in its thread's order
-// - every entry of the journal has arrived once, or is counted as dropped
-// - every service of a scope that has ended is gone
-// - the process has no more descriptors than after the first rounds, at most 128 KiB more memory, and at most
-// 8
-//   threads more, which are those of the queues' pool
+// - every entry for the journal has arrived once, or is counted as dropped
+// - every service of a removed scope has been destroyed
+// - since the first rounds, the number of descriptors has not changed
+// - since the first rounds, the process has gained at most 128 KiB of memory
+// - since the first rounds, the process has gained at most 8 threads, which belong to the queues' pool
 
 #include <gtest/gtest.h>
 #include <malloc.h>
@@ -62,18 +61,18 @@ using rt::Ref;
 
 constexpr std::size_t kWorkers = 8;
 constexpr std::chrono::seconds kRound(2);
-// In a tmpfs, so that no disk has to be waited for.
+// The folder is in a tmpfs, so that no test waits for a disk.
 constexpr const char* kFolder = "/run/soak";
 
 std::chrono::seconds duration(SOAK_SECONDS);
 std::string refusal;
 
-/// Numbers that a worker's messages bear, one row for each way that messages go.
+/// Numbers the messages of each worker that go one way, and checks that they arrive.
 class Ledger {
  public:
   std::uint64_t next(std::size_t worker) { return given_[worker]++; }
 
-  /// Takes a message of `worker` that has arrived: the next in its order.
+  /// Notes that the message `number` of `worker` has arrived.
   void take(std::size_t worker, std::uint64_t number) {
     if (taken_[worker].fetch_add(1) != number) isInOrder_ = false;
   }
@@ -96,7 +95,7 @@ class Ledger {
   std::atomic<bool> isInOrder_ = true;
 };
 
-// What a message is about: its worker, and its number in the ledger of its level.
+// Notes in `ledger` that the message has arrived. Its text is the worker and the number.
 void takeInto(Ledger& ledger, const LUMLogMessage& message) {
   std::istringstream words(text(message));
   std::size_t worker = 0;
@@ -109,7 +108,7 @@ Ref<LUMLogFilter> onlyLevel(LUMLogLevel level) {
   return rt::make<TestFilter>([level](const LUMLogMessage& message) { return message.level() == level; });
 }
 
-/// A service that knows its tag and is counted.
+/// A service that stores its tag. The living services are counted.
 class Part final : public rt::Implements<Part, rt::Object> {
  public:
   explicit Part(const SRLScopeTagSet& tags) : tag(tags.tags[0]) { ++living; }
@@ -168,7 +167,7 @@ constexpr const Record* kFreshBinding[] = {&kFresh, nullptr};
 constexpr const Record* kManyBinding[] = {&kScoped, &kFresh, nullptr};
 constexpr const Record* kNullBinding[] = {&kNothing, nullptr};
 
-/// What all workers use, set up once.
+/// Sets up what all workers share.
 struct World {
   World() {
     SRLRegistry::setSharedInstance(registryWith({&module}));
@@ -203,7 +202,7 @@ struct World {
     SRLRegistry::setSharedInstance(nullptr);
   }
 
-  /// Begins to count anew.
+  /// Resets all counts.
   void beginRound() {
     synchronous.emplace();
     asynchronous.emplace();
@@ -215,7 +214,7 @@ struct World {
     droppedBefore = rt::SystemLog::droppedCount();
   }
 
-  /// Waits until everything that was logged has arrived.
+  /// Waits until all logged messages have arrived.
   void settle() const {
     LUMLogMultiplexer::sharedInstance()->waitForLogging();
     for (const auto& logger : asyncLoggers) logger->operationQueue()->sync([] {});
@@ -250,7 +249,7 @@ struct World {
   const Ref<LUMLogMetadata> metadata = LUMLogMetadata::metadataWithComponent(component);
 };
 
-/// Does one thing after another, always the same for the same seed.
+/// Performs random steps. The same seed yields the same steps.
 class Worker {
  public:
   Worker(World& world, std::size_t number, unsigned seed) : world_(world), number_(number), random_(seed) {}
@@ -318,7 +317,7 @@ class Worker {
     }
   }
 
-  /// What the worker has written last is what anybody reads.
+  /// Expects to read the value that this worker has set last.
   void expectSettingKept() const { EXPECT_EQ(readSetting(), setting_); }
 
  private:
@@ -341,7 +340,7 @@ class Worker {
   std::string setting_ = readSetting();
 };
 
-/// What the process has of what must not grow.
+/// The resources of the process that must not grow.
 struct Holdings {
   static Holdings now() {
     const auto entries = [](const char* folder) {
@@ -365,7 +364,8 @@ struct Holdings {
   std::ptrdiff_t descriptors;
 };
 
-// All that a child must be able to do while other threads were at work when it was made.
+// Uses the libraries in a child that was forked while other threads were busy. Returns 0 if everything
+// worked.
 int workInChild(World& world) {
   Worker worker(world, 0, 1);
   const SRLScopeTagSet tags{{world.tags[0].get()}};
@@ -380,19 +380,19 @@ int workInChild(World& world) {
   return 0;
 }
 
-// How many descriptors the process has but the standard streams.
+// Returns how many descriptors the process has, without the standard streams.
 int countDescriptors() {
   int count = 0;
   for (const auto& entry : std::filesystem::directory_iterator("/proc/self/fd")) {
     if (std::stoi(entry.path().filename()) > STDERR_FILENO) ++count;
   }
-  return count - 1;  // The folder itself is open meanwhile.
+  return count - 1;  // The iterator has the folder itself open.
 }
 
-// How many of them it was started with.
+// The number of descriptors that the process inherited.
 int inheritedDescriptors = 0;
 
-// How many of its own the process hands on to programs that it starts.
+// Returns how many of its own descriptors the process passes on to programs that it starts.
 int descriptorsHandedOn() {
   const ProcessResult result = runProcess({"/proc/self/exe", "--descriptors"});
   return result.exitStatus.value_or(-1) - inheritedDescriptors;
@@ -414,7 +414,7 @@ void disturb(World& world, PrivateJournal& journal) {
   const auto end = std::chrono::steady_clock::now() + kRound;
   while (std::chrono::steady_clock::now() < end) {
     secondsAhead = static_cast<std::int64_t>(random() % 200'000) - 100'000;
-    // The thread sanitizer's own locks are not made for children that do more than start a program.
+    // The thread sanitizer's own locks do not support a child that does more than start a program.
     if (!RT_TEST_THREAD_SANITIZER) {
       EXPECT_EQ(statusOfChild([&] { return workInChild(world); }), 0);
     }
@@ -431,7 +431,7 @@ void expectAccountedFor(World& world, const PrivateJournal& journal, const std::
   world.blocking->expectComplete("blocking");
   EXPECT_EQ(world.reports, world.expectedReports);
 
-  // What the workers logged, once each, and the reports.
+  // The journal must contain each message of the workers once, and the reports.
   std::set<std::string> texts;
   std::uint64_t entries = 0;
   for (PrivateJournal::Entry& entry : journal.entries("SYSLOG_IDENTIFIER=Soak_test")) {
@@ -456,12 +456,12 @@ void expectAccountedFor(World& world, const PrivateJournal& journal, const std::
   for (const Worker& each : workers) each.expectSettingKept();
 }
 
-TEST_F(Soak, LosesNothingAndKeepsNothing) {
+TEST_F(Soak, LosesNoMessagesAndLeaksNoResources) {
   World world;
   std::atomic<int> changes = 0;
   const rt::UserDefaults::Observation observation =
       world.defaults->observe("worker0", rt::UserDefaults::Notify::kOnChange, [&] { ++changes; });
-  // Tables and pools grow to their size in the first rounds.
+  // Tables and pools reach their final size in the first rounds.
   constexpr int kFirstRounds = 2;
   constexpr std::size_t kToleratedBytes = 128 * 1024;
   constexpr std::ptrdiff_t kToleratedThreads = 8;

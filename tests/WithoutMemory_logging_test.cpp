@@ -1,4 +1,4 @@
-// What the loggers and reports do where there is no memory.
+// Tests loggers and reports when allocations fail.
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
@@ -41,7 +41,7 @@ constexpr const char* kLong =
 std::atomic<int> seen = 0;
 std::atomic<int> seenLater = 0;
 
-// Takes its messages later, and those of level 4 at once. Its queue says when all are there.
+// Receives messages asynchronously, and faults synchronously. After a barrier on its queue, all have arrived.
 class LaterLogger final : public rt::Implements<LaterLogger, rt::Object, LUMAsyncLogger> {
  public:
   void logWithMessage(const Ref<LUMLogMessage>& /*message*/) override { ++seenLater; }
@@ -55,7 +55,7 @@ class LaterLogger final : public rt::Implements<LaterLogger, rt::Object, LUMAsyn
   const Ref<rt::Queue> queue_ = rt::make<rt::Queue>("LaterLogger"_s);
 };
 
-// Without the log of the system, which would have a line for each attempt.
+// Keeps the messages out of the system's log, which would get a line for each attempt.
 void quietSystemLog() {
   static const Ref<LUMSystemLogger> quiet = LUMSystemLogger::initWithFilter(LUMLogDropAllFilter::init());
   LUMLogMultiplexer::sharedInstance()->addSyncLogger(quiet);
@@ -66,8 +66,8 @@ void waitForLoggers(const Ref<LaterLogger>& logger) {
   logger->operationQueue()->barrierSync();
 }
 
-// What goes wrong with the loggers' own queues used to end the program.
-TEST(WithoutMemory, Logs) {
+// A failed allocation on a logger's queue used to end the program.
+TEST(WithoutMemory, LogsMessages) {
   tryEachAllocation([] {
     quietSystemLog();
     const Ref<LUMLogMultiplexer>& multiplexer = LUMLogMultiplexer::sharedInstance();
@@ -109,7 +109,7 @@ TEST(WithoutMemory, Logs) {
 }
 
 TEST(WithoutMemory, LogsToTheSystem) {
-  // To no daemon but the one that is there, and to nobody's terminal.
+  // Keeps the lines for standard error off the terminal.
   const int nowhere = open("/dev/null", O_WRONLY | O_CLOEXEC);
   tryEachAllocation([&] {
     const int before = dup(STDERR_FILENO);
@@ -128,9 +128,9 @@ TEST(WithoutMemory, LogsToTheSystem) {
   close(nowhere);
 }
 
-// The first use of the shared logger used to throw. The shared logger never throws; without memory there is
-// none, and lines get lost.
-TEST(WithoutMemory, LogsTheOldWay) {
+// The first use of the shared logger used to throw. The shared logger never throws. Without memory it is
+// null, and lines are lost.
+TEST(WithoutMemory, LogsWithTheOlderLogger) {
   const std::string parent = std::filesystem::is_directory("/dev/shm") ? "/dev/shm/" : testing::TempDir();
   const std::string path = parent + "without-memory." + std::to_string(getpid());
   tryEachAllocation([&] {
@@ -150,7 +150,7 @@ TEST(WithoutMemory, LogsTheOldWay) {
     ZEBLogger::setSharedLogger(logger);
     ZEBLogDebug("through the shared logger"_s);
     ZEBLogger::setSharedLogger(nullptr);
-    // Each is whole, or not there.
+    // Each logger is null or complete.
     for (const Ref<ZEBLogger>& each : {ZEBLogger::standardLoggerWithStderr(), ZEBLogger::standardLogger(),
                                        ZEBLogger::standardLoggerWithStdoutAndStderr(), ZEBLogger::logger()}) {
       EXPECT_TRUE(!each || (each->writer() && each->formatter() && each->filter()));
@@ -159,7 +159,7 @@ TEST(WithoutMemory, LogsTheOldWay) {
   unlink(path.c_str());
 }
 
-TEST(WithoutMemory, Reroutes) {
+TEST(WithoutMemory, ReroutesTheOlderLogger) {
   tryEachAllocation([] {
     quietSystemLog();
     const Ref<ZEBLogger> logger =
@@ -170,7 +170,7 @@ TEST(WithoutMemory, Reroutes) {
   });
 }
 
-TEST(WithoutMemory, Reports) {
+TEST(WithoutMemory, ReportsErrors) {
   tryEachAllocation([] {
     quietSystemLog();
     const Ref<PECErrorHandler>& handler = PECErrorHandler::sharedInstance();

@@ -1,4 +1,4 @@
-// What a service registry does where there is no memory: each request throws, or has its instance, and no
+// Tests a service registry when allocations fail. Each request throws or returns its instance, and no
 // instance is made twice.
 
 #include <gtest/gtest.h>
@@ -23,7 +23,7 @@
 #include "tests/support/TestReports.h"
 #include "tests/support/WithoutMemory.h"
 
-// The test is built twice, once with profiling.
+// The test is built twice: with and without profiling.
 bool SRLPProfilingSwitch() {
   return SWITCH_ANSWER;
 }
@@ -34,7 +34,7 @@ using namespace rt::literals;
 using rt::Ref;
 using WithoutMemory::tryEachAllocation;
 
-// Measurements are kept.
+// Profiling keeps its measurements, so growth is expected.
 constexpr auto kGrowth = SWITCH_ANSWER ? WithoutMemory::Growth::kIsWanted : WithoutMemory::Growth::kIsLeak;
 
 class Thing final : public rt::Implements<Thing, rt::Object> {};
@@ -42,7 +42,7 @@ class Thing final : public rt::Implements<Thing, rt::Object> {};
 int scopedMade = 0;
 int othersMade = 0;
 
-// Factories have memory: one that throws leaves its instance pending, as it should.
+// Allocations in factories do not fail, because a factory that throws leaves its instance pending by design.
 Ref<rt::Object> makeScoped(SRLScopeTagSet /*tags*/) {
   const AllocationFailure::Pause pause;
   ++scopedMade;
@@ -63,7 +63,7 @@ constexpr SRLAPIRegistrationData unboundAPI{
     .identifier = "Unbound", .instanceType = kType, .identifierLength = 7};
 constexpr SRLAPIRegistrationData manyAPI{
     .identifier = "Many", .instanceType = kType, .scopeType = 0b01, .identifierLength = 4, .isMultibound = 1};
-// Other records of the API.
+// Other records of the API `manyAPI`.
 constexpr SRLAPIRegistrationData otherManyAPIs[] = {manyAPI, manyAPI};
 constexpr SRLAPIRegistrationData unknownAPI{
     .identifier = "Unknown", .instanceType = kType, .identifierLength = 7};
@@ -99,7 +99,8 @@ class Delegate final : public rt::Implements<Delegate, rt::Object, SRLScopeLifec
   int outlived = 0;
 };
 
-// What `request` gives, which is asked once more where there was no memory: so a registry goes on.
+// Returns the result of `request`. Repeats the request once if it throws for want of memory: the registry
+// must still work.
 template <class Request>
 auto persistently(Request request) {
   try {
@@ -109,7 +110,7 @@ auto persistently(Request request) {
   }
 }
 
-// A registry with the module in the place of the program's own.
+// Replaces the shared registry with one that has the module's bindings.
 class Shared {
  public:
   Shared() {
@@ -129,7 +130,7 @@ class Shared {
   Ref<SRLRegistry> before_;
 };
 
-// Registers what is bound, and knows it.
+// The registry registers the bindings on request and then knows them.
 TEST(WithoutMemory, RegistersBindings) {
   tryEachAllocation(
       [] {
@@ -148,9 +149,10 @@ TEST(WithoutMemory, RegistersBindings) {
       kGrowth);
 }
 
-// What a request by another record of an API had begun to register used to stay: of many, the rest was
-// missing for ever. What was known before that request stays.
-TEST(WithoutMemory, UndoesWhatItRegistersForAnotherRecord) {
+// A request by another record of an API begins to register implementations. When it failed, those that it had
+// registered used to stay, and the rest was missing for ever. What was registered before the request must
+// stay.
+TEST(WithoutMemory, UndoesAFailedRegistrationForAnotherRecord) {
   tryEachAllocation(
       [] {
         const Shared shared;
@@ -160,7 +162,7 @@ TEST(WithoutMemory, UndoesWhatItRegistersForAnotherRecord) {
         const auto ask = [&](const SRLAPIRegistrationData& other) {
           try {
             EXPECT_FALSE(registry.internalHasImplementationForService(&other));
-          } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): it is asked once
+          } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): it is asked only once
           }
         };
         ask(otherManyAPIs[0]);
@@ -176,9 +178,9 @@ TEST(WithoutMemory, UndoesWhatItRegistersForAnotherRecord) {
       kGrowth);
 }
 
-// An instance that was made used to be lost where the scope had no memory to keep it, and to be in the making
-// for ever. Of an API for many, those used to be missing for ever that there was no memory for at its first
-// request.
+// If a scope had no memory to store a new instance, the instance used to be lost and to count as pending for
+// ever. If the first request of an API for many ran out of memory, some implementations used to be missing
+// for ever.
 TEST(WithoutMemory, ResolvesServices) {
   tryEachAllocation(
       [] {
@@ -208,7 +210,7 @@ TEST(WithoutMemory, ResolvesServices) {
         const Ref<SRLMemoizingScope> scope = persistently([&] { return registry.scopeWithTags(one); });
         EXPECT_EQ(persistently([&] { return scope->instances(); })->count(), 1U);
         EXPECT_EQ(delegate->removals, 0);
-        // Where it throws, the scopes are there still; or they are gone, and the delegate has not been told.
+        // If this throws, either the scopes still exist, or they are removed and the delegate was not told.
         persistently([&] { return registry.removeScopesWithTag(account), true; });
         EXPECT_LE(delegate->removals, 1);
         EXPECT_TRUE(persistently([&] { return registry.internalService(&scopedAPI, two); }) != first);
@@ -246,7 +248,7 @@ TEST(WithoutMemory, ResolvesServicesByIdentifier) {
       kGrowth);
 }
 
-TEST(WithoutMemory, Provides) {
+TEST(WithoutMemory, ProvidesObjects) {
   tryEachAllocation(
       [] {
         const Ref<AVOProvider> provider = AVOProvider::providerWithObject("object"_s.object());
@@ -256,7 +258,7 @@ TEST(WithoutMemory, Provides) {
       kGrowth);
 }
 
-// Of what goes wrong, too: without memory for a report it throws.
+// A request that has no memory for its report throws.
 TEST(WithoutMemory, ReportsMisuse) {
   TestReports reports;
   tryEachAllocation(

@@ -1,4 +1,4 @@
-// What the runtime's parts do where there is no memory.
+// Tests the parts of the runtime when allocations fail.
 
 #include <gtest/gtest.h>
 #include <unistd.h>
@@ -45,11 +45,11 @@ using WithoutMemory::tryEachAllocation;
 constexpr const char* kLong =
     "a text that is too long to be kept in a string of the language's library itself";
 
-// A folder for a test, which the test's children share.
+// A folder that a test and its children share.
 class Folder {
  public:
   Folder() {
-    // In memory, as a disk takes long to say that something is on it.
+    // The folder is in memory if possible, because syncing a file to a disk is slow.
     const std::string parent = std::filesystem::is_directory("/dev/shm") ? "/dev/shm/" : testing::TempDir();
     std::string name = parent + "without-memory.XXXXXX";
     if (mkdtemp(name.data()) == nullptr) throw std::runtime_error("no temporary folder");
@@ -65,7 +65,7 @@ class Folder {
   std::filesystem::path path_;
 };
 
-// The lowest number that a new descriptor would have.
+// Returns the number that the next new descriptor would have.
 int nextDescriptor() {
   const int next = dup(STDIN_FILENO);
   close(next);
@@ -87,7 +87,7 @@ TEST(WithoutMemory, Formats) {
   });
 }
 
-TEST(WithoutMemory, TellsTheTime) {
+TEST(WithoutMemory, FormatsTimes) {
   tryEachAllocation([] {
     const Ref<rt::LocalTimeFormatter> formatter =
         rt::LocalTimeFormatter::initWithPattern("yyyy-MM-dd'T'HH:mm:ss.SSS"_s);
@@ -96,7 +96,7 @@ TEST(WithoutMemory, TellsTheTime) {
   });
 }
 
-TEST(WithoutMemory, RefersWeakly) {
+TEST(WithoutMemory, TakesWeakReferences) {
   tryEachAllocation([] {
     Ref<Plain> object = rt::make<Plain>();
     const rt::Weak<Plain> weak = object;
@@ -106,7 +106,7 @@ TEST(WithoutMemory, RefersWeakly) {
   });
 }
 
-// Used to jump into garbage where there was no memory for the copy of a property list.
+// If there was no memory to copy a property list, the program used to jump to an invalid address.
 TEST(WithoutMemory, ArchivesAndUnarchives) {
   tryEachAllocation([] {
     const Ref<Tag> tag = rt::make<Tag>("shared"_s);
@@ -134,7 +134,7 @@ TEST(WithoutMemory, ArchivesAndUnarchives) {
 
 std::atomic<int> tasksRun = 0;
 
-TEST(WithoutMemory, Queues) {
+TEST(WithoutMemory, RunsQueuedTasks) {
   tryEachAllocation([] {
     tasksRun = 0;
     const Ref<rt::Queue> queue = rt::make<rt::Queue>("Tasks"_s);
@@ -154,7 +154,7 @@ TEST(WithoutMemory, Queues) {
   });
 }
 
-// Used to end the program, which the C library does where it has no memory to note a destructor.
+// This used to end the program: the C library does so if it has no memory to register a destructor.
 TEST(WithoutMemory, NamesThreads) {
   tryEachAllocation([] {
     onNewThread([] {
@@ -172,7 +172,7 @@ TEST(WithoutMemory, NamesThreads) {
   });
 }
 
-TEST(WithoutMemory, FailsAssertions) {
+TEST(WithoutMemory, HandlesFailedAssertions) {
   tryEachAllocation([] {
     onNewThread([] {
       const Ref<rt::AssertionHandler> own = rt::make<rt::AssertionHandler>();
@@ -187,7 +187,7 @@ TEST(WithoutMemory, FailsAssertions) {
   });
 }
 
-// Used to leave the descriptor open.
+// A failed allocation used to leave the descriptor open.
 TEST(WithoutMemory, WritesFiles) {
   const Folder folder;
   const std::string path = folder.at("log");
@@ -212,7 +212,7 @@ TEST(WithoutMemory, DescribesCallStacks) {
     std::array<std::uint64_t, 64> addresses{};
     std::size_t count = std::min<std::size_t>(rt::CallStack::capture(addresses), 2);
     if (RT_TEST_ADDRESS_SANITIZER || RT_TEST_THREAD_SANITIZER) {
-      // Instrumented programs have so many symbols that reading them over and over takes minutes.
+      // Instrumented programs have so many symbols that reading them again and again takes minutes.
       addresses[0] = reinterpret_cast<std::uint64_t>(&std::getenv);
       count = 1;
     }
@@ -232,7 +232,7 @@ TEST(WithoutMemory, ReadsAndObservesDefaults) {
   const Folder folder;
   const std::string path = folder.at("defaults.conf");
   std::ofstream(path) << "kept = " << kLong << "\n";
-  // That the file cannot be watched is reported.
+  // Drops the reports that the file cannot be watched.
   rt::UserDefaults::setReportHandler([](const rt::String&) {});
   tryEachAllocation([&] {
     int calls = 0;

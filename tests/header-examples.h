@@ -1,7 +1,8 @@
 #pragma once
 
-// The program in which the examples in the comments of headers stand: what they use without declaring it. It
-// is never linked, so functions and variables are only declared. tests/check-header-examples compiles it.
+// Declares the names that the examples in the comments of headers use without declaring them.
+// tests/check-header-examples compiles this header with the examples. The program is never linked, so
+// functions and variables need no definitions.
 
 #include <fcntl.h>
 #include <poll.h>
@@ -46,7 +47,7 @@ namespace program {
 
 using namespace rt::literals;
 
-// What it does with things.
+// Actions.
 template <class... Things>
 void print(const Things&... things);
 template <class... Things>

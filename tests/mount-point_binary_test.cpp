@@ -1,5 +1,5 @@
-// The mount-point executable as it is installed, perhaps with raised privileges: what it is linked
-// from, how it is hardened, and what it does besides its work.
+// Tests the executable of the mount-point command, which may be installed with raised privileges: what it
+// links, how it is hardened, and what it does besides its work.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -27,11 +27,11 @@ class MountPointBinaryTest : public testing::Test {
  protected:
   void SetUp() override {
     if (!kInstrumentation.empty()) {
-      GTEST_SKIP() << "built with instrumentation (" << kInstrumentation << "), which is never installed";
+      GTEST_SKIP() << "instrumented builds (" << kInstrumentation << ") are never installed";
     }
   }
 
-  // The files that our own code was compiled to.
+  // Returns the object files of the command's own code.
   static std::vector<std::string> commandObjects() {
     std::istringstream list(COMMAND_OBJECTS " " MAIN_OBJECT);
     return {std::istream_iterator<std::string>(list), {}};
@@ -50,13 +50,14 @@ class MountPointBinaryTest : public testing::Test {
     return result.standardOutput;
   }
 
-  // What the command did when asked to make a directory with a slash in its name, which it does without
-  // touching a file: how it ended, what it said, and its system calls by name and in order.
+  // A run of the command with a name that contains a slash, which the command rejects without touching a
+  // file. Has the result and the names of the system calls, in order.
   struct Run {
     ProcessResult result;
     std::vector<std::string> systemCalls;
   };
-  // All that its environment has is PATH and `variable`, which is a name with or without a value.
+  // Runs the command with strace. Its environment contains only PATH and `variable`, a name with or without a
+  // value.
   static Run runTraced(const std::string& variable) {
     const std::string trace =
         testing::TempDir() + "/mount-point_binary_test.trace." + std::to_string(getpid());
@@ -76,13 +77,13 @@ class MountPointBinaryTest : public testing::Test {
   }
 };
 
-TEST_F(MountPointBinaryTest, LoadsNothing) {
+TEST_F(MountPointBinaryTest, LoadsNoLibraries) {
   EXPECT_THAT(outputOf({"readelf", "--wide", "--dynamic", MOUNT_POINT}), Not(HasSubstr("(NEEDED)")));
   EXPECT_THAT(outputOf({"readelf", "--wide", "--program-headers", MOUNT_POINT}), Not(HasSubstr("INTERP")));
 }
 
-// The libraries are there, with what sets the registry up when the program is loaded.
-TEST_F(MountPointBinaryTest, CarriesTheLibraries) {
+// The executable contains the libraries, including the load hook that sets up the registry.
+TEST_F(MountPointBinaryTest, ContainsTheLibraries) {
   const std::string symbols = outputOf({"nm", "--demangle", "--defined-only", MOUNT_POINT_SYMBOLS});
   for (const char* const name :
        {"SRLRegistry::load()", "LUMLogMultiplexer::logWithMessage(", "PECErrorHandler::register_()",
@@ -98,7 +99,7 @@ TEST_F(MountPointBinaryTest, IsPositionIndependent) {
   EXPECT_THAT(dynamic, Not(HasSubstr("TEXTREL")));
 }
 
-TEST_F(MountPointBinaryTest, HasReadOnlyRelocationsAllBoundAtItsStart) {
+TEST_F(MountPointBinaryTest, BindsAllRelocationsAtStartUpAndMakesThemReadOnly) {
   EXPECT_THAT(outputOf({"readelf", "--wide", "--program-headers", MOUNT_POINT}), HasSubstr("GNU_RELRO"));
   EXPECT_THAT(outputOf({"readelf", "--wide", "--dynamic", MOUNT_POINT}), HasSubstr("BIND_NOW"));
 }
@@ -117,7 +118,7 @@ TEST_F(MountPointBinaryTest, HasNoMemoryThatIsBothWritableAndExecutable) {
   EXPECT_TRUE(hasStack);
 }
 
-TEST_F(MountPointBinaryTest, ProtectsItsStackAndChecksItsCallsOfTheStandardLibrary) {
+TEST_F(MountPointBinaryTest, UsesStackProtectionAndFortification) {
   const std::string command = outputOf({"nm", commandObject("/MountPointCommand.")});
   EXPECT_THAT(command, HasSubstr("__stack_chk_fail"));
 #if defined(__OPTIMIZE__) && !defined(__clang__)  // clang cannot check calls with variable arguments
@@ -125,8 +126,8 @@ TEST_F(MountPointBinaryTest, ProtectsItsStackAndChecksItsCallsOfTheStandardLibra
 #endif
 }
 
-// A debugger that is given the executable finds its symbols in the file beside it.
-TEST_F(MountPointBinaryTest, IsStrippedAndLeadsToItsSymbols) {
+// A debugger finds the executable's symbols in the file beside it.
+TEST_F(MountPointBinaryTest, IsStrippedAndRefersToItsSymbolFile) {
   const std::string sections = outputOf({"readelf", "--wide", "--sections", MOUNT_POINT});
   EXPECT_THAT(sections, HasSubstr(".gnu_debuglink"));
   EXPECT_THAT(sections, Not(HasSubstr(".symtab")));
@@ -134,21 +135,22 @@ TEST_F(MountPointBinaryTest, IsStrippedAndLeadsToItsSymbols) {
   EXPECT_THAT(outputOf({"readelf", "--wide", "--sections", MOUNT_POINT_SYMBOLS}), HasSubstr(".debug_info"));
 }
 
-// Of the two marks of control-flow enforcement, one needs nothing but calls that return. The other needs
-// every object to be compiled for it; ours are, the C library is not.
-TEST_F(MountPointBinaryTest, BearsTheMarkOfShadowStacks) {
+// There are two marks of control-flow enforcement. SHSTK (shadow stacks) only needs calls that return
+// normally. IBT needs every object to be compiled for it. The command's objects are, but the C library's are
+// not.
+TEST_F(MountPointBinaryTest, IsMarkedForShadowStacks) {
   EXPECT_THAT(outputOf({"readelf", "--notes", MOUNT_POINT}), HasSubstr("SHSTK"));
   for (const std::string& object : commandObjects()) {
     EXPECT_THAT(outputOf({"readelf", "--notes", object}), HasSubstr("IBT, SHSTK")) << object;
   }
 }
 
-// They run before the command. One is the profiling's, one announces all classes of the libraries, and the
-// others are those of the C and C++ libraries. There used to be one for each class in each source file, 487
+// Initialisers run before `main`. One belongs to profiling, one announces all classes of the libraries, and
+// the others belong to the C and C++ libraries. There used to be one for each class in each source file, 487
 // in all.
 TEST_F(MountPointBinaryTest, HasFewInitialisers) {
 #if defined(__clang__)
-  GTEST_SKIP() << "clang leaves one call for each source file";
+  GTEST_SKIP() << "clang keeps an initialiser for each source file";
 #endif
   const std::string sections = outputOf({"readelf", "--wide", "--sections", MOUNT_POINT});
   std::istringstream words(sections.substr(sections.find(".init_array")));
@@ -161,7 +163,7 @@ TEST_F(MountPointBinaryTest, HasFewInitialisers) {
   EXPECT_LE(std::stoul(size, nullptr, 16) / sizeof(void*), 10U);
 }
 
-TEST_F(MountPointBinaryTest, CarriesNoPrivilegeByItself) {
+TEST_F(MountPointBinaryTest, IsBuiltWithoutSetIdBits) {
   struct stat status{};
   ASSERT_EQ(stat(MOUNT_POINT, &status), 0);
   EXPECT_EQ(status.st_mode & (S_ISUID | S_ISGID), 0U);
@@ -176,13 +178,16 @@ class MountPointTracedTest : public MountPointBinaryTest {
   }
 };
 
-// All that happens beside the one write: the C library's start (the thread's own data, random bytes,
-// where the program lies, read-only relocations), and that of the libraries. The main thread learns that it
-// is that, and signals are blocked while the handlers of forks are registered. The command itself takes on
-// the identity of its caller (capget to capset; as an ordinary user it only looks whether there is anything
-// to give up), and has the signal ignored that a limit on the size of files would send (rt_sigaction). No
-// file is opened, no thread or process is started.
-TEST_F(MountPointTracedTest, AsksTheSystemForNothingThatIsNotAccountedFor) {
+// Besides the one write, these calls are expected:
+//
+// - the C library's start-up: thread-local data, random bytes, the program's path, read-only relocations
+// - the libraries' start-up: recognising the main thread (gettid, getpid)
+// - the registration of fork handlers, during which signals are blocked (rt_sigprocmask)
+// - adopting the caller's identity (capget to capset); an ordinary user only checks its capabilities
+// - ignoring SIGXFSZ, the signal of the limit on the size of files (rt_sigaction)
+//
+// The command opens no file and starts no thread or process.
+TEST_F(MountPointTracedTest, MakesOnlyExpectedSystemCalls) {
   const std::vector<std::string> calls = runTraced("NOTHING").systemCalls;
   const std::set<std::string> accounted = {
       "execve",     "brk",      "arch_prctl", "set_tid_address", "set_robust_list", "rseq",
@@ -193,9 +198,9 @@ TEST_F(MountPointTracedTest, AsksTheSystemForNothingThatIsNotAccountedFor) {
   EXPECT_THAT(std::set<std::string>(calls.begin(), calls.end()), IsSubsetOf(accounted));
 }
 
-// The C library, being linked in, asks for what its dynamic loader would; nothing in this program loads
-// anything, so the answers have no effect. Whatever comes to this list needs as good a reason.
-TEST_F(MountPointTracedTest, ReadsNoEnvironmentVariableThatIsNotAccountedFor) {
+// The statically linked C library reads the variables of its dynamic loader. They have no effect, because the
+// command loads nothing. Each addition to this list needs an equally good reason.
+TEST_F(MountPointTracedTest, ReadsOnlyExpectedEnvironmentVariables) {
   const std::set<std::string> accounted = {"LD_LIBRARY_PATH", "LD_WARN",         "LD_BIND_NOW",
                                            "LD_BIND_NOT",     "LD_DYNAMIC_WEAK", "LD_PROFILE_OUTPUT"};
   for (const std::vector<std::string>& arguments :
@@ -206,8 +211,9 @@ TEST_F(MountPointTracedTest, ReadsNoEnvironmentVariableThatIsNotAccountedFor) {
   }
 }
 
-// What the trace cannot show, for want of a directory to make: our own code refers to no environment.
-TEST_F(MountPointBinaryTest, RefersToNoEnvironment) {
+// The traced runs make no directory, so they do not cover all code. Therefore this test shows that the
+// command's own code does not refer to the environment at all.
+TEST_F(MountPointBinaryTest, DoesNotReferToTheEnvironment) {
   for (const std::string& object : commandObjects()) {
     const std::string symbols = outputOf({"nm", "--undefined-only", object});
     EXPECT_THAT(symbols, HasSubstr(" U "));
@@ -217,7 +223,7 @@ TEST_F(MountPointBinaryTest, RefersToNoEnvironment) {
   }
 }
 
-// A value of MALLOC_TOP_PAD_ or of GLIBC_TUNABLES used to end the command before its main.
+// Some values of MALLOC_TOP_PAD_ and GLIBC_TUNABLES used to end the command before `main`.
 TEST_F(MountPointTracedTest, DoesTheSameInAnyEnvironment) {
   const Run expected = runTraced("NOTHING");
   EXPECT_EQ(expected.result.exitStatus, 22);
@@ -252,7 +258,8 @@ TEST_F(MountPointTracedTest, DoesTheSameInAnyEnvironment) {
         "ZEBVerboseLogging=YES"}) {
     SCOPED_TRACE(variable);
     Run run = runTraced(variable);
-    // The C library copies this one into what is left of the program's last page, or else into a new one.
+    // The C library copies this variable into the rest of the program's last page, or into a new page if
+    // there is no room.
     if (std::string_view(variable).starts_with("GLIBC_TUNABLES=")) {
       const auto copied = run.systemCalls.begin() + 1;
       if (*copied == "mmap") run.systemCalls.erase(copied);

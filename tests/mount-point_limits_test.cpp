@@ -1,5 +1,5 @@
-// What the mount-point command does within limits that its caller sets: it ends with its work done and said,
-// or it ends before it has touched anything.
+// Tests the mount-point command under resource limits that its caller sets. The command either does its work
+// and reports the result, or ends before it has changed anything.
 
 #include <fcntl.h>
 #include <gtest/gtest.h>
@@ -22,7 +22,7 @@ std::function<void()> limiting(__rlimit_resource resource, rlim_t limit) {
   return [resource, limit] {
     const rlimit both{limit, limit};
     require(setrlimit(resource, &both) == 0);
-    // The environment lies on the stack.
+    // The environment would use a part of the stack.
     clearenv();
   };
 }
@@ -36,12 +36,11 @@ class MountPointFileLimitTest : public MountPointTest {
   void SetUp() override {
     MountPointTest::SetUp();
     if (IsSkipped()) return;
-    if (kInstrumentation == "coverage") GTEST_SKIP() << "the limit would cut the files of its counts short";
-    if (kInstrumentation == "thread")
-      GTEST_SKIP() << "the sanitizer makes files of its own before the command starts";
+    if (kInstrumentation == "coverage") GTEST_SKIP() << "the limit would truncate the coverage counts";
+    if (kInstrumentation == "thread") GTEST_SKIP() << "the sanitizer writes files before the command starts";
   }
 
-  // With a file as `stream`, which takes `limit` bytes.
+  // Redirects `stream` to a file that may have at most `limit` bytes.
   static std::function<void()> intoFile(int stream, rlim_t limit) {
     return [stream, limit] {
       const int file = open(kFile, O_WRONLY | O_CREAT | O_TRUNC, 0600);
@@ -61,8 +60,8 @@ class MountPointFileLimitTest : public MountPointTest {
   }
 };
 
-// A signal used to end it, which left no status.
-TEST_F(MountPointFileLimitTest, TellsThatItsMessageDoesNotFitTheFile) {
+// A signal used to end the command, so that it had no exit status.
+TEST_F(MountPointFileLimitTest, ReportsThatItsMessageDoesNotFitTheFile) {
   expectSuccess(run({"a"}, intoFile(STDERR_FILENO, 0)));
   expectResult(run({"a"}, intoFile(STDERR_FILENO, 0)), EFBIG, "");
   EXPECT_EQ(written(), "");
@@ -74,7 +73,7 @@ TEST_F(MountPointFileLimitTest, TellsThatItsMessageDoesNotFitTheFile) {
   expectResult(run({"a", "--remove"}, intoFile(STDERR_FILENO, 0)), EFBIG, "");
 }
 
-TEST_F(MountPointFileLimitTest, KeepsTheStatusThatIsNoErrnoWhereItsMessageDoesNotFitTheFile) {
+TEST_F(MountPointFileLimitTest, KeepsAStatusThatIsNotErrnoIfItsMessageDoesNotFit) {
   expectResult(run({}, intoFile(STDERR_FILENO, 0)), 22, "");
   expectResult(run({"a/b"}, intoFile(STDERR_FILENO, 0)), 22, "");
   expectSuccess(run({"a", "--remove"}, intoFile(STDOUT_FILENO, 0)));
@@ -89,13 +88,12 @@ class MountPointMemoryLimitTest : public MountPointTest {
   void SetUp() override {
     MountPointTest::SetUp();
     if (IsSkipped()) return;
-    if (!kInstrumentation.empty())
-      GTEST_SKIP() << "built with instrumentation, which takes memory of its own";
+    if (!kInstrumentation.empty()) GTEST_SKIP() << "instrumented builds need more memory";
   }
 
   static bool isWhole(const ProcessResult& result) { return result.exitStatus == 0 && result.signal == 0; }
 
-  // Whatever ended the command said nothing in its name.
+  // Expects that the command itself printed nothing before it was ended.
   static void expectNoMessageOfItsOwn(const ProcessResult& result) {
     EXPECT_EQ(result.standardError.find("/Volumes"), std::string::npos) << result.standardError;
     EXPECT_EQ(result.standardOutput, "");
@@ -126,19 +124,19 @@ class MountPointMemoryLimitTest : public MountPointTest {
     expectSuccess(run({"a"}, limiting(resource, limit)));
     expectResult(run({"a"}, limiting(resource, limit)), 17, "Failed to create [/Volumes/a], errno: 17\n");
     expectSuccess(run({"a", "--remove"}, limiting(resource, limit)));
-    if (resource == RLIMIT_STACK) return;  // which holds the arguments
+    if (resource == RLIMIT_STACK) return;  // The stack holds the arguments.
     expectResult(run({name}, limiting(resource, limit)), 36,
                  "Failed to create [/Volumes/" + name + "], errno: 36\n");
   }
 };
 
-TEST_F(MountPointMemoryLimitTest, DoesItsWorkOrNothing) {
+TEST_F(MountPointMemoryLimitTest, DoesAllOfItsWorkOrNothing) {
   for (rlim_t limit = 0; limit < 32; limit += 4) expectAllOrNothing(RLIMIT_STACK, limit << 10);
   for (rlim_t limit = 0; limit < 1024; limit += 64) expectAllOrNothing(RLIMIT_DATA, limit << 10);
   for (rlim_t limit = 0; limit < 6144; limit += 512) expectAllOrNothing(RLIMIT_AS, limit << 10);
 }
 
-// The figures of the manual. It used to take 1,284 KiB of data.
+// The limits are those of the manual. The command used to need 1,284 KiB of data.
 TEST_F(MountPointMemoryLimitTest, WorksWithinTheLimitsOfTheManual) {
   expectToWork(RLIMIT_STACK, rlim_t{32} << 10);
   expectToWork(RLIMIT_DATA, rlim_t{768} << 10);
@@ -147,8 +145,8 @@ TEST_F(MountPointMemoryLimitTest, WorksWithinTheLimitsOfTheManual) {
 
 // ---- Open files ----
 
-TEST_F(MountPointTest, OpensNothing) {
-  if (!kInstrumentation.empty()) GTEST_SKIP() << "built with instrumentation, which opens files";
+TEST_F(MountPointTest, OpensNoFiles) {
+  if (!kInstrumentation.empty()) GTEST_SKIP() << "instrumented builds open files";
   expectSuccess(run({"a"}, limiting(RLIMIT_NOFILE, 0)));
   expectResult(run({"a"}, limiting(RLIMIT_NOFILE, 0)), 17, "Failed to create [/Volumes/a], errno: 17\n");
   expectSuccess(run({"a", "--remove"}, limiting(RLIMIT_NOFILE, 0)));

@@ -1,5 +1,5 @@
-// The mount-point command with more rights than its caller has, as it is installed set-user-ID root; and what
-// a hostile caller makes of it. docs/security.md names these cases.
+// Tests the mount-point command when it is installed set-user-ID root and so has more rights than its caller.
+// Shows that a hostile caller gains nothing. docs/security.md names these cases.
 
 #include <fcntl.h>
 #include <gmock/gmock.h>
@@ -40,16 +40,16 @@ struct User {
 constexpr User kCaller = {PrivateRoot::kOrdinaryUser, PrivateRoot::kOrdinaryGroup};
 constexpr User kOther = {1002, 1003};
 
-// The command set-user-ID root, and /Volumes as the manual asks for it.
+// Installs the command set-user-ID root and sets up /Volumes as the manual requires.
 class MountPointPrivilegesTest : public MountPointTest {
  protected:
-  // The command without the bit, for whoever may start it.
+  // A copy of the command without the set-user-ID bit. Every user may run it.
   static constexpr const char* kPlainCommand = "/mount-point.plain";
 
   void SetUp() override {
     MountPointTest::SetUp();
     if (IsSkipped()) return;
-    if (!isMachineRoot()) GTEST_SKIP() << "more than one user needs root: only one is mapped here";
+    if (!isMachineRoot()) GTEST_SKIP() << "this needs root: a user namespace maps only one user";
     fs::copy_file(kCommand, kPlainCommand, fs::copy_options::overwrite_existing);
     ASSERT_EQ(chmod(kCommand, 04755), 0);
     makeFile("/Volumes/.keep");
@@ -67,7 +67,7 @@ class MountPointPrivilegesTest : public MountPointTest {
     return run(std::move(arguments), as(user));
   }
 
-  // Root's effective identity and `caller`'s real one, without the bit.
+  // Removes the bit and runs the command with root as its effective user and `caller` as its real user.
   static std::function<void()> onBehalfOf(User caller) {
     return [caller] {
       leaveLeaksAlone();
@@ -75,7 +75,7 @@ class MountPointPrivilegesTest : public MountPointTest {
               setresgid(caller.group, 0, 0) == 0 && setresuid(caller.user, 0, 0) == 0);
     };
   }
-  // The same without the right `capability`, as setpriv names it.
+  // Runs the command in the same way on behalf of kCaller, but without `capability` (a name of setpriv).
   static ProcessResult runWithout(const std::string& capability, const std::vector<std::string>& arguments) {
     std::vector<std::string> whole = {"setpriv",    "--bounding-set", "-" + capability,
                                       "--inh-caps", "-" + capability, kCommand};
@@ -88,7 +88,7 @@ class MountPointPrivilegesTest : public MountPointTest {
     EXPECT_EQ(statusOf(path).st_gid, owner.group) << path;
   }
 
-  // What `action` returns in a process of `user`'s: 0 to 255.
+  // Runs `action` in a process of `user` and returns its result, which is from 0 to 255.
   static int inProcessOf(User user, const std::function<int()>& action) {
     const pid_t child = fork();
     if (child == 0) {
@@ -101,7 +101,7 @@ class MountPointPrivilegesTest : public MountPointTest {
     return WEXITSTATUS(status);
   }
 
-  // The number with which `user` fails to open `path`; 0 where that works.
+  // Lets `user` open `path` for reading. Returns the error's number, or 0 if it succeeds.
   static int openingFailure(User user, const std::string& path) {
     return inProcessOf(user, [&] { return open(path.c_str(), O_RDONLY) >= 0 ? 0 : errno; });
   }
@@ -109,13 +109,13 @@ class MountPointPrivilegesTest : public MountPointTest {
 
 // ---- Ordinary use ----
 
-TEST_F(MountPointPrivilegesTest, HandsTheDirectoryToTheRealUserAndGroup) {
+TEST_F(MountPointPrivilegesTest, GivesTheDirectoryToTheRealUserAndGroup) {
   expectSuccess(run({"a"}, onBehalfOf(kCaller)));
   expectOwner("/Volumes/a", kCaller);
   EXPECT_EQ(statusOf("/Volumes/a").st_mode & 07777U, 0700U);
 }
 
-TEST_F(MountPointPrivilegesTest, WorksForAnOrdinaryUserWhenInstalledSetUserIdentifier) {
+TEST_F(MountPointPrivilegesTest, WorksForAnOrdinaryUserIfSetUserId) {
   expectSuccess(runAs(kCaller, {"a"}));
   expectOwner("/Volumes/a", kCaller);
   EXPECT_EQ(statusOf("/Volumes/a").st_mode & 07777U, 0700U);
@@ -126,14 +126,14 @@ TEST_F(MountPointPrivilegesTest, WorksForAnOrdinaryUserWhenInstalledSetUserIdent
   EXPECT_EQ(volumes(), std::vector<std::string>{".keep"});
 }
 
-TEST_F(MountPointPrivilegesTest, WorksWhereTheGroupIsRaisedToo) {
+TEST_F(MountPointPrivilegesTest, WorksIfSetGroupIdToo) {
   ASSERT_EQ(chmod(kCommand, 06755), 0);
   expectSuccess(runAs(kCaller, {"a"}));
   expectOwner("/Volumes/a", kCaller);
   expectSuccess(runAs(kCaller, {"a", "--remove"}));
 }
 
-TEST_F(MountPointPrivilegesTest, HandsTheDirectoryOverWhereItsGroupWouldBeInherited) {
+TEST_F(MountPointPrivilegesTest, SetsTheCallersGroupIfVolumesIsSetGroupId) {
   ASSERT_EQ(chown("/Volumes", 0, kOther.group), 0);
   ASSERT_EQ(chmod("/Volumes", 02755), 0);
   expectSuccess(runAs(kCaller, {"a"}));
@@ -141,14 +141,14 @@ TEST_F(MountPointPrivilegesTest, HandsTheDirectoryOverWhereItsGroupWouldBeInheri
   EXPECT_EQ(statusOf("/Volumes/a").st_mode & 07777U, 02700U);
 }
 
-TEST_F(MountPointPrivilegesTest, WorksWhereOnlyRootMayLookIntoVolumes) {
+TEST_F(MountPointPrivilegesTest, WorksIfOnlyRootMaySearchVolumes) {
   ASSERT_EQ(chmod("/Volumes", 0700), 0);
   expectSuccess(runAs(kCaller, {"a"}));
   expectOwner("/Volumes/a", kCaller);
   expectSuccess(runAs(kCaller, {"a", "--remove"}));
 }
 
-TEST_F(MountPointPrivilegesTest, WorksWhereVolumesIsALinkOfRoots) {
+TEST_F(MountPointPrivilegesTest, WorksIfVolumesIsALinkOwnedByRoot) {
   PrivateRoot::removeVolumes();
   fs::create_directory("/elsewhere");
   fs::create_directory_symlink("/elsewhere", "/Volumes");
@@ -160,7 +160,7 @@ TEST_F(MountPointPrivilegesTest, WorksWhereVolumesIsALinkOfRoots) {
   EXPECT_TRUE(fs::remove("/Volumes") && fs::remove("/elsewhere"));
 }
 
-TEST_F(MountPointPrivilegesTest, NarrowsTheModeByTheCallersUmask) {
+TEST_F(MountPointPrivilegesTest, AppliesTheCallersUmask) {
   expectSuccess(run({"a"}, [] {
     umask(0777);
     as(kCaller)();
@@ -170,9 +170,9 @@ TEST_F(MountPointPrivilegesTest, NarrowsTheModeByTheCallersUmask) {
   expectSuccess(runAs(kCaller, {"a", "--remove"}));
 }
 
-// The C library fills what its caller has closed with streams that take nothing, lest another file stand for
-// one.
-TEST_F(MountPointPrivilegesTest, TellsTheFailureOfItsMessageWhereItsStreamsAreClosed) {
+// If the caller has closed a standard stream, the C library opens one that accepts no bytes in its place.
+// Otherwise the next file that is opened would become that stream.
+TEST_F(MountPointPrivilegesTest, ReportsTheFailureOfItsMessageIfItsStreamsAreClosed) {
   const auto closed = [] {
     as(kCaller)();
     for (const int stream : {STDIN_FILENO, STDOUT_FILENO, STDERR_FILENO}) close(stream);
@@ -183,8 +183,8 @@ TEST_F(MountPointPrivilegesTest, TellsTheFailureOfItsMessageWhereItsStreamsAreCl
   expectSuccess(run({"a", "--remove"}, closed));
 }
 
-TEST_F(MountPointPrivilegesTest, DoesNothingWhereAClosedStreamCannotBeFilled) {
-  if (!kInstrumentation.empty()) GTEST_SKIP() << "built with instrumentation, which opens files";
+TEST_F(MountPointPrivilegesTest, DoesNothingIfAClosedStreamCannotBeReplaced) {
+  if (!kInstrumentation.empty()) GTEST_SKIP() << "instrumented builds open files";
   const ProcessResult result = run({"a"}, [] {
     as(kCaller)();
     const rlimit none{0, 0};
@@ -195,9 +195,9 @@ TEST_F(MountPointPrivilegesTest, DoesNothingWhereAClosedStreamCannotBeFilled) {
   EXPECT_FALSE(fs::exists("/Volumes/a"));
 }
 
-TEST_F(MountPointPrivilegesTest, AsksTheSystemForTheSameOnBehalfOfACallerAsOfRoot) {
+TEST_F(MountPointPrivilegesTest, MakesTheSameSystemCallsForACallerAsForRoot) {
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
-  if (!kInstrumentation.empty()) GTEST_SKIP() << "built with instrumentation, which asks for more";
+  if (!kInstrumentation.empty()) GTEST_SKIP() << "instrumented builds make more system calls";
   const auto namesOf = [](const std::vector<std::string>& calls) {
     std::vector<std::string> names;
     for (const std::string& call : calls) names.push_back(call.substr(0, call.find('(')));
@@ -212,9 +212,9 @@ TEST_F(MountPointPrivilegesTest, AsksTheSystemForTheSameOnBehalfOfACallerAsOfRoo
   }
 }
 
-// Without raised privileges the C library takes this apart before the command begins, and this one is more
-// than the command has memory for.
-TEST_F(MountPointPrivilegesTest, WorksWhateverTheLengthOfTheSearchPathForLibraries) {
+// Without raised privileges, the C library parses LD_LIBRARY_PATH before `main`. The command has too little
+// memory for the value of this test.
+TEST_F(MountPointPrivilegesTest, WorksWithALongLibrarySearchPath) {
   const auto searching = [] {
     as(kCaller)();
     std::string path;
@@ -229,12 +229,12 @@ TEST_F(MountPointPrivilegesTest, WorksWhateverTheLengthOfTheSearchPathForLibrari
   expectSuccess(run({"a", "--remove"}, searching));
 }
 
-TEST_F(MountPointPrivilegesTest, RemovesAnothersEmptyDirectory) {
+TEST_F(MountPointPrivilegesTest, RemovesAnotherUsersEmptyDirectory) {
   expectSuccess(runAs(kOther, {"a"}));
   expectSuccess(runAs(kCaller, {"a", "--remove"}));
 }
 
-TEST_F(MountPointPrivilegesTest, RemovesOnlyTheCallersOwnDirectoriesWhereVolumesIsSticky) {
+TEST_F(MountPointPrivilegesTest, RemovesOnlyTheCallersDirectoriesIfVolumesIsSticky) {
   ASSERT_EQ(chmod("/Volumes", 01755), 0);
   expectSuccess(runAs(kOther, {"a"}));
   expectResult(runAs(kCaller, {"a", "--remove"}), 1, "Failed to remove [/Volumes/a], errno: 1\n");
@@ -246,7 +246,7 @@ TEST_F(MountPointPrivilegesTest, RemovesOnlyTheCallersOwnDirectoriesWhereVolumes
 
 // ---- The caller's identity ----
 
-// The line of a process's /proc/…/status that begins with `name`, without tabs.
+// Returns the value of `name` in the process's /proc/…/status, with tabs replaced by spaces.
 std::string statusLine(pid_t process, const std::string& name) {
   std::ifstream file("/proc/" + std::to_string(process) + "/status");
   for (std::string line; std::getline(file, line);) {
@@ -274,7 +274,7 @@ class MountPointStoppedTest : public MountPointPrivilegesTest {
   }
 };
 
-TEST_F(MountPointStoppedTest, IsItsCallerToTheFileSystemAndKeepsTheRightToWriteAnywhere) {
+TEST_F(MountPointStoppedTest, HasItsCallersFileSystemIdentityAndOneCapability) {
   const StoppedProcess stopped(SYS_mkdir, {kCommand, "a"}, as(kCaller));
   expectOwner("/Volumes/a", kCaller);
   EXPECT_EQ(statusLine(stopped.identifier(), "Uid"), "1000 0 0 1000");
@@ -286,27 +286,29 @@ TEST_F(MountPointStoppedTest, IsItsCallerToTheFileSystemAndKeepsTheRightToWriteA
   EXPECT_EQ(statusLine(stopped.identifier(), "CapAmb"), hexadecimal(0));
 }
 
-TEST_F(MountPointStoppedTest, IsItsCallerToTheFileSystemWhereTheGroupIsRaisedToo) {
+TEST_F(MountPointStoppedTest, HasItsCallersFileSystemIdentityIfSetGroupIdToo) {
   ASSERT_EQ(chmod(kCommand, 06755), 0);
   const StoppedProcess stopped(SYS_mkdir, {kCommand, "a"}, as(kCaller));
   EXPECT_EQ(statusLine(stopped.identifier(), "Gid"), "1001 0 0 1001");
 }
 
-// So that no directory of root's is left where a limit or a signal of the caller's ends the command half-way.
-TEST_F(MountPointStoppedTest, LeavesTheCallersDirectoryWhereItIsKilled) {
+// The caller can end the command half-way by a limit or a signal. No directory that root owns may remain
+// then.
+TEST_F(MountPointStoppedTest, LeavesTheCallersDirectoryIfItIsKilled) {
   {
     const StoppedProcess killed(SYS_mkdir, {kCommand, "a"}, as(kCaller));
   }
   expectOwner("/Volumes/a", kCaller);
 }
 
-TEST_F(MountPointStoppedTest, IsItsCallerToTheFileSystemWhenItRemovesToo) {
+TEST_F(MountPointStoppedTest, HasOneCapabilityWhenItRemoves) {
   expectSuccess(runAs(kCaller, {"a"}));
   const StoppedProcess stopped(SYS_rmdir, {kCommand, "a", "--remove"}, as(kCaller));
   EXPECT_EQ(statusLine(stopped.identifier(), "CapEff"), hexadecimal(1UL << CAP_DAC_OVERRIDE));
 }
 
-// How a process of the caller's fares that would read and change the memory of another.
+// The ways in which a process can read or change another one. `accessTo` tries all of them and returns those
+// that work.
 enum Access : std::uint8_t { attached = 1, readMemory = 2, openedMemory = 4, sawProgram = 8 };
 int accessTo(pid_t process) {
   int access = 0;
@@ -314,7 +316,7 @@ int accessTo(pid_t process) {
   if (open((folder + "/mem").c_str(), O_RDWR) >= 0) access |= openedMemory;
   std::array<char, 64> text{};
   if (readlink((folder + "/exe").c_str(), text.data(), text.size()) > 0) access |= sawProgram;
-  // An address that nothing has: the right is looked at first.
+  // The address does not exist in the other process. The kernel checks the permission first.
   iovec local{text.data(), 1};
   iovec remote{text.data(), 1};
   if (process_vm_readv(process, &local, 1, &remote, 1, 0) >= 0 || errno == EFAULT) access |= readMemory;
@@ -333,11 +335,10 @@ TEST_F(MountPointStoppedTest, LetsItsCallerStopItButNotTraceIt) {
   EXPECT_EQ(inProcessOf(kCaller, [&] { return kill(stopped.identifier(), SIGSTOP); }), 0);
 }
 
-// ---- A name that becomes another's while the command stands still ----
+// ---- Attacks: the name is reused while the command is stopped ----
 
-// The attack: the caller stops the command as soon as it has made "a", removes "a" through the command, waits
-// until `another` has put something else there, and lets the command go on. `start` is how the command is
-// begun.
+// The caller stops the command as soon as it has made "a", and removes "a" by running the command again. Then
+// `another` puts something else there. Finally the caller lets the first command continue.
 class MountPointAttackTest : public MountPointStoppedTest {
  protected:
   static void attack(const std::function<void()>& another, const char* command = kCommand) {
@@ -349,7 +350,7 @@ class MountPointAttackTest : public MountPointStoppedTest {
   }
 };
 
-TEST_F(MountPointAttackTest, DoesNotGetAnothersDirectory) {
+TEST_F(MountPointAttackTest, CallerDoesNotGetAnotherUsersDirectory) {
   attack([] {
     expectSuccess(runAs(kOther, {"a"}));
     makeFile("/Volumes/a/secret");
@@ -358,7 +359,7 @@ TEST_F(MountPointAttackTest, DoesNotGetAnothersDirectory) {
   EXPECT_EQ(openingFailure(kCaller, "/Volumes/a/secret"), EACCES);
 }
 
-TEST_F(MountPointAttackTest, DoesNotGetTheRootOfAMountedFileSystem) {
+TEST_F(MountPointAttackTest, CallerDoesNotGetTheRootOfAMountedFileSystem) {
   attack([] {
     fs::create_directory("/Volumes/a");
     ASSERT_EQ(mount("tmpfs", "/Volumes/a", "tmpfs", 0, "mode=0755"), 0);
@@ -369,7 +370,7 @@ TEST_F(MountPointAttackTest, DoesNotGetTheRootOfAMountedFileSystem) {
             EACCES);
 }
 
-TEST_F(MountPointAttackTest, DoesNotGetWhatALinkOfRootsLeadsTo) {
+TEST_F(MountPointAttackTest, CallerDoesNotGetTheTargetOfRootsLink) {
   fs::create_directory("/root-only");
   ASSERT_EQ(chmod("/root-only", 0700), 0);
   attack([] { fs::create_directory_symlink("/root-only", "/Volumes/a"); });
@@ -379,12 +380,12 @@ TEST_F(MountPointAttackTest, DoesNotGetWhatALinkOfRootsLeadsTo) {
   fs::remove("/root-only");
 }
 
-TEST_F(MountPointAttackTest, DoesNotGetAnothersDirectoryByRightsThatComeWithTheFile) {
+TEST_F(MountPointAttackTest, CallerDoesNotGetAnotherUsersDirectoryWithFileCapabilities) {
   vfs_cap_data capabilities{};
   capabilities.magic_etc = VFS_CAP_REVISION_2 | VFS_CAP_FLAGS_EFFECTIVE;
   capabilities.data[0].permitted = 1U << CAP_CHOWN | 1U << CAP_DAC_OVERRIDE;
   if (setxattr(kPlainCommand, "security.capability", &capabilities, XATTR_CAPS_SZ_2, 0) != 0) {
-    GTEST_SKIP() << "no file has capabilities here: " << std::strerror(errno);
+    GTEST_SKIP() << "files cannot have capabilities here: " << std::strerror(errno);
   }
   attack(
       [] {
@@ -395,8 +396,9 @@ TEST_F(MountPointAttackTest, DoesNotGetAnothersDirectoryByRightsThatComeWithTheF
   expectOwner("/Volumes/a", kOther);
 }
 
-// Who may write in /Volumes may also make root, when it calls the command, hand something else to itself.
-TEST_F(MountPointAttackTest, DoesNotMakeRootTakeWhatIsAnothers) {
+// A user who may write in /Volumes could replace the directory when root itself runs the command. Root must
+// not become the owner of what the user put there.
+TEST_F(MountPointAttackTest, RootDoesNotTakeAnotherUsersDirectory) {
   fs::create_directory("/others");
   ASSERT_EQ(chown("/others", kOther.user, kOther.group), 0);
   StoppedProcess stopped(SYS_mkdir, {kPlainCommand, "a"}, leaveLeaksAlone);
@@ -408,9 +410,9 @@ TEST_F(MountPointAttackTest, DoesNotMakeRootTakeWhatIsAnothers) {
   fs::remove("/others");
 }
 
-// ---- /Volumes not as the manual asks for it ----
+// ---- /Volumes is not as the manual requires ----
 
-TEST_F(MountPointPrivilegesTest, KeepsVolumesInItsPlaceWhereAnEntryOfRootsIsInIt) {
+TEST_F(MountPointPrivilegesTest, DoesNotRemoveVolumesIfItContainsAnEntryOfRoot) {
   PrivateRoot::removeVolumes();
   fs::create_directories("/Volumes/.keep");
   makeFile("/Volumes/.keep/file");
@@ -420,15 +422,16 @@ TEST_F(MountPointPrivilegesTest, KeepsVolumesInItsPlaceWhereAnEntryOfRootsIsInIt
   expectResult(runAs(kCaller, {"..", "--remove"}), 39, "Failed to remove [/Volumes/..], errno: 39\n");
 }
 
-// An empty /Volumes can be made its caller's own, who can then put a link in the place of what the command
-// has made. It used to hand over what the link led to.
-TEST_F(MountPointStoppedTest, GivesNothingElseAwayWhereItsCallerHasVolumes) {
+// If /Volumes is empty, a caller can become its owner and then replace the new directory by a link. The
+// command used to give the caller the target of that link.
+TEST_F(MountPointStoppedTest, GivesAwayNothingElseIfItsCallerOwnsVolumes) {
   PrivateRoot::removeVolumes();
   fs::create_directory("/Volumes");
   expectSuccess(runAs(kCaller, {"", "--remove"}));
   expectSuccess(runAs(kCaller, {""}));
   expectOwner("/Volumes", kCaller);
-  // In the private root itself: what is bound into it is the machine's, and would be lost if this failed.
+  // The targets are new files in the private root itself. Other directories there are the machine's, so a
+  // failure of this test would damage them.
   fs::create_directory("/roots-directory");
   makeFile("/roots-file");
   for (const std::string target : {"/roots-file", "/roots-directory"}) {
@@ -447,11 +450,11 @@ TEST_F(MountPointStoppedTest, GivesNothingElseAwayWhereItsCallerHasVolumes) {
   }
 }
 
-// ---- Where the identity cannot be taken on ----
+// ---- The command cannot adopt its caller's identity ----
 
-TEST_F(MountPointPrivilegesTest, WorksAsEverWhereTheSystemRefusesAPartOfTheIdentity) {
+TEST_F(MountPointPrivilegesTest, WorksIfTheSystemRefusesAPartOfTheIdentity) {
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
-  // Half an identity would show: only root may write here.
+  // Only root may write here, so a partly adopted identity would make the command fail.
   ASSERT_EQ(chmod("/Volumes", 0700), 0);
   for (const std::string call : {"capget", "capset", "setfsuid", "setfsgid"}) {
     for (const std::string error : {"EPERM", "ENOSYS"}) {
@@ -464,25 +467,26 @@ TEST_F(MountPointPrivilegesTest, WorksAsEverWhereTheSystemRefusesAPartOfTheIdent
   }
 }
 
-TEST_F(MountPointPrivilegesTest, WorksAsEverWithoutTheRightToWriteAnywhere) {
+TEST_F(MountPointPrivilegesTest, WorksWithoutTheCapabilityToWriteAnywhere) {
   expectSuccess(runWithout("dac_override", {"a"}));
   expectOwner("/Volumes/a", kCaller);
-  // Where only root's group may write.
+  // Now only root's group may write.
   ASSERT_EQ(chown("/Volumes", kOther.user, 0), 0);
   ASSERT_EQ(chmod("/Volumes", 0770), 0);
   expectSuccess(runWithout("dac_override", {"b"}));
   expectOwner("/Volumes/b", kCaller);
 }
 
-TEST_F(MountPointPrivilegesTest, FailsToHandTheDirectoryOverWithoutTheRight) {
+TEST_F(MountPointPrivilegesTest, FailsToChangeTheOwnerWithoutTheCapability) {
   expectResult(runWithout("chown", {"a"}), 1, "Failed to chown [/Volumes/a], errno: 1\n");
   EXPECT_EQ(statusOf("/Volumes/a").st_uid, 0U);
 }
 
-// An ordinary user must set this to filter system calls.
-TEST_F(MountPointPrivilegesTest, HasNoRightsWhereItsCallerMayFilterItsCalls) {
+// An ordinary user must set PR_SET_NO_NEW_PRIVS before filtering system calls. The set-user-ID bit then has
+// no effect.
+TEST_F(MountPointPrivilegesTest, HasNoPrivilegesIfItsCallerMayFilterSystemCalls) {
   if (kInstrumentation == "coverage") {
-    GTEST_SKIP() << "a coverage build writes its counts where only its builder may";
+    GTEST_SKIP() << "only its builder may write the counts of a coverage build";
   }
   const ProcessResult result = run({"a"}, [] {
     as(kCaller)();
@@ -491,9 +495,9 @@ TEST_F(MountPointPrivilegesTest, HasNoRightsWhereItsCallerMayFilterItsCalls) {
   expectResult(result, 13, "Failed to create [/Volumes/a], errno: 13\n");
 }
 
-// ---- What only root may write ----
+// ---- Blocks and files that only root may write ----
 
-// /Volumes as a file system of which 40 % are reserved for root, and the caller has filled the rest.
+// Makes /Volumes a file system with 40 % of its blocks reserved for root. The caller has filled the rest.
 class MountPointFullFileSystemTest : public MountPointPrivilegesTest {
  protected:
   static constexpr const char* kFile = "/Volumes/full/file";
@@ -517,7 +521,7 @@ class MountPointFullFileSystemTest : public MountPointPrivilegesTest {
   }
 
  private:
-  // Until nothing is left even once the file system has settled what it had put off.
+  // Writes until no block is free. The file system delays some work until fsync, which may free more blocks.
   static int fill() {
     const int file = open(kFile, O_WRONLY | O_CREAT, 0600);
     const std::string block(1024, '.');
@@ -530,13 +534,14 @@ class MountPointFullFileSystemTest : public MountPointPrivilegesTest {
   }
 };
 
-TEST_F(MountPointFullFileSystemTest, GetsNoBlockThatIsReservedForRoot) {
+TEST_F(MountPointFullFileSystemTest, MakesNoDirectoryWithBlocksReservedForRoot) {
   expectResult(runAs(kCaller, {"a"}), 28, "Failed to create [/Volumes/a], errno: 28\n");
   expectSuccess(run({"roots"}));
 }
 
-// Messages about the arguments used to be root's writing: up to 128 KiB of the caller's bytes for each.
-TEST_F(MountPointFullFileSystemTest, GetsNoBlockThatIsReservedForRootForItsMessages) {
+// Messages about the arguments used to be written as root: each could put up to 128 KiB of the caller's bytes
+// there.
+TEST_F(MountPointFullFileSystemTest, WritesNoMessageWithBlocksReservedForRoot) {
   const off_t size = statusOf(kFile).st_size;
   const auto intoFile = [] {
     as(kCaller)();
@@ -550,8 +555,9 @@ TEST_F(MountPointFullFileSystemTest, GetsNoBlockThatIsReservedForRootForItsMessa
   EXPECT_EQ(statusOf(kFile).st_size, size);
 }
 
-// A program that raises the rights of whoever runs it loses that when somebody else than root writes into it.
-TEST_F(MountPointPrivilegesTest, LetsNoFileKeepTheBitsThatItsCallersWritingTakesAway) {
+// If a user other than root writes to a program, the kernel removes its set-user-ID and set-group-ID bits. A
+// message that the command writes for its caller must have the same effect.
+TEST_F(MountPointPrivilegesTest, ClearsTheSetIdBitsOfTheFileThatItsMessageGoesTo) {
   const auto intoProgram = [] {
     as(kCaller)();
     const int file = open("/Volumes/program", O_WRONLY | O_APPEND);

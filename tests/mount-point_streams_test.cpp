@@ -1,4 +1,4 @@
-// What the mount-point command does where its messages, or its caller's limits, stand in its way.
+// Tests the mount-point command when its messages cannot be written.
 
 #include <fcntl.h>
 #include <gmock/gmock.h>
@@ -37,9 +37,9 @@ TEST_F(MountPointTest, WorksWithoutStandardStreams) {
   expectResult(run({"a/b"}, closeAll), 22, "");
 }
 
-// The status is errno as it stands after the message was written: where the message itself fails, the
-// status tells that failure and not the one of the directory.
-TEST_F(MountPointTest, TellsTheFailureOfItsMessageWhereThatFails) {
+// The exit status is the value of errno after the message was written. If the message itself cannot be
+// written, the status is the error of that write, not the directory's error.
+TEST_F(MountPointTest, ReportsTheFailureOfItsMessage) {
   expectSuccess(run({"a"}));
   expectResult(run({"a"}, [] { close(STDERR_FILENO); }), EBADF, "");
   expectResult(run({"a"}, [] { replaceStream(STDERR_FILENO, "/dev/full"); }), ENOSPC, "");
@@ -48,7 +48,7 @@ TEST_F(MountPointTest, TellsTheFailureOfItsMessageWhereThatFails) {
   expectResult(run({"a", "--remove"}, [] { replaceStream(STDERR_FILENO, "/dev/full"); }), ENOSPC, "");
 }
 
-TEST_F(MountPointTest, TellsTheFailureOfItsMessageWhereThatFailsAfterChown) {
+TEST_F(MountPointTest, ReportsTheFailureOfItsMessageAfterChown) {
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
   expectResult(runInjected("chown,fchown,lchown,fchownat", "EPERM", {"a"},
                            [] { replaceStream(STDERR_FILENO, "/dev/full"); }),
@@ -57,7 +57,7 @@ TEST_F(MountPointTest, TellsTheFailureOfItsMessageWhereThatFailsAfterChown) {
                EBADF, "");
 }
 
-// A pipe that holds all it can.
+// A full pipe.
 struct FullPipe {
   std::array<int, 2> ends{};
   std::size_t size = 0;
@@ -73,14 +73,14 @@ struct FullPipe {
   }
 };
 
-TEST_F(MountPointTest, TakesAMissingDirectoryForRemovedEvenWhereTheNoticeIsLost) {
+TEST_F(MountPointTest, TreatsAMissingDirectoryAsRemovedEvenIfTheNoticeIsLost) {
   expectSuccess(run({"a", "--remove"}, [] { close(STDOUT_FILENO); }));
   expectSuccess(run({"a", "--remove"}, [] { replaceStream(STDOUT_FILENO, "/dev/full"); }));
   const FullPipe pipe;
   expectSuccess(run({"a", "--remove"}, [&] { dup2(pipe.ends[1], STDOUT_FILENO); }));
 }
 
-TEST_F(MountPointTest, DoesItsWorkBeforeAReaderThatIsGoneEndsIt) {
+TEST_F(MountPointTest, DoesItsWorkBeforeABrokenPipeEndsIt) {
   const auto withoutReader = [](int stream, bool ignored) {
     return [stream, ignored] {
       std::array<int, 2> ends{};
@@ -96,7 +96,7 @@ TEST_F(MountPointTest, DoesItsWorkBeforeAReaderThatIsGoneEndsIt) {
   expectSuccess(run({"b", "--remove"}, withoutReader(STDOUT_FILENO, true)));
 }
 
-TEST_F(MountPointTest, DoesNotWaitForAFullPipeThatDoesNotBlock) {
+TEST_F(MountPointTest, DoesNotWaitForAFullNonBlockingPipe) {
   FullPipe pipe;
   expectSuccess(run({"a"}));
   expectResult(run({"a"}, [&] { dup2(pipe.ends[1], STDERR_FILENO); }), EAGAIN, "");
@@ -115,18 +115,18 @@ TEST_F(MountPointTest, WaitsForAFullPipeWithOneThreadAndLosesNothing) {
   }
   close(pipe.ends[1]);
 
-  // It sleeps in its write: system call 1 with descriptor 2 as its first argument.
+  // Waits until the command sleeps in its write: system call 1 with descriptor 2 as its first argument.
   const std::string process = "/proc/" + std::to_string(child);
   int status = 0;
   for (std::string call; !call.starts_with("1 0x2 ");) {
     ASSERT_EQ(waitpid(child, &status, WNOHANG), 0) << "it ended without waiting";
     std::ifstream file(process + "/syscall");
-    if (!file.is_open()) break;  // kernels may be built without it; the thread count stands all the same
+    if (!file.is_open()) break;  // Some kernels lack this file. The check below still works.
     std::getline(file, call);
     usleep(1000);
   }
   const auto threads = std::distance(fs::directory_iterator(process + "/task"), fs::directory_iterator());
-  EXPECT_TRUE(threads == 1 || kInstrumentation == "thread") << threads;  // which may start one of its own
+  EXPECT_TRUE(threads == 1 || kInstrumentation == "thread") << threads;  // The sanitizer may start a thread.
 
   std::string text;
   std::array<char, 65536> buffer{};

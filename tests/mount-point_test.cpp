@@ -1,4 +1,4 @@
-// The mount-point command as its callers meet it: the built program, run in a private root on a real
+// Tests the mount-point command as its callers use it. Runs the built program in a private root with a real
 // /Volumes.
 
 #include <gmock/gmock.h>
@@ -24,16 +24,16 @@ using PrivateRoot::kOrdinaryGroup;
 
 // ---- Arguments ----
 
-TEST_F(MountPointTest, WithoutArgumentsReportsThatThereIsNoSubdirectory) {
+TEST_F(MountPointTest, ReportsThatNoSubdirectoryIsGiven) {
   expectResult(run({}), 22, "No subdirectory specified.\n");
   EXPECT_THAT(volumes(), IsEmpty());
 }
 
-TEST_F(MountPointTest, SurvivesAnArgumentVectorWithoutTheProgramsName) {
+TEST_F(MountPointTest, AcceptsAnEmptyArgumentVector) {
   expectResult(runProcess({}, {}, kCommand), 22, "No subdirectory specified.\n");
 }
 
-TEST_F(MountPointTest, RefusesANameWithASlashWithoutANewline) {
+TEST_F(MountPointTest, RejectsANameWithASlashInAMessageWithoutANewline) {
   for (const std::string name : {"a/b", "/x", "x/", "/", "//", "../etc", "\xff/\n"}) {
     expectResult(run({name}), 22, "The specified subdirectory is not valid: " + name);
     expectResult(run({name, "--remove"}), 22, "The specified subdirectory is not valid: " + name);
@@ -41,13 +41,13 @@ TEST_F(MountPointTest, RefusesANameWithASlashWithoutANewline) {
   EXPECT_THAT(volumes(), IsEmpty());
 }
 
-TEST_F(MountPointTest, RefusesANameWithASlashEvenWhereTheDirectoryIsThere) {
+TEST_F(MountPointTest, RejectsANameWithASlashEvenIfTheDirectoryExists) {
   fs::create_directories("/Volumes/a/b");
   expectResult(run({"a/b", "--remove"}), 22, "The specified subdirectory is not valid: a/b");
   EXPECT_TRUE(fs::exists("/Volumes/a/b"));
 }
 
-TEST_F(MountPointTest, RemovesOnlyWhenTheSecondOfExactlyTwoArgumentsIsExactlyTheFlag) {
+TEST_F(MountPointTest, RemovesOnlyIfTheSecondOfTwoArgumentsIsTheFlag) {
   const std::vector<std::vector<std::string>> creating = {
       {"a", "--REMOVE"},  {"a", "--remove2"},        {"a", "--remov"},       {"a", ""},
       {"a", "-remove"},   {"a", "--remove", "more"}, {"a", "x", "--remove"}, {"a", "--remove", "--remove"},
@@ -62,7 +62,7 @@ TEST_F(MountPointTest, RemovesOnlyWhenTheSecondOfExactlyTwoArgumentsIsExactlyThe
   }
 }
 
-TEST_F(MountPointTest, TakesWhatLooksLikeAnOptionForAName) {
+TEST_F(MountPointTest, TreatsOptionsAsNames) {
   for (const std::string name : {"--help", "--version", "-h", "--", "--remove"}) {
     expectSuccess(run({name}));
     EXPECT_EQ(volumes(), std::vector<std::string>{name});
@@ -82,36 +82,36 @@ TEST_F(MountPointTest, MakesADirectoryThatOnlyItsOwnerMayUse) {
   EXPECT_EQ(status.st_gid, getgid());
 }
 
-TEST_F(MountPointTest, HandsTheDirectoryOverWhereItsGroupWouldBeInherited) {
-  if (!isMachineRoot()) GTEST_SKIP() << "another group than one's own needs root: only one is mapped here";
+TEST_F(MountPointTest, SetsTheCallersGroupIfVolumesIsSetGroupId) {
+  if (!isMachineRoot()) GTEST_SKIP() << "this needs root: a user namespace maps only one group";
   ASSERT_EQ(chmod("/Volumes", 02755), 0);
   ASSERT_EQ(chown("/Volumes", 0, kOrdinaryGroup), 0);
   expectSuccess(run({"a"}));
   EXPECT_EQ(statusOf("/Volumes/a").st_gid, getgid());
 }
 
-TEST_F(MountPointTest, FailsToMakeADirectoryThatIsThere) {
+TEST_F(MountPointTest, FailsToMakeADirectoryThatExists) {
   expectSuccess(run({"a"}));
   expectResult(run({"a"}), 17, "Failed to create [/Volumes/a], errno: 17\n");
 }
 
-TEST_F(MountPointTest, TakesTheEmptyNameForVolumesItself) {
+TEST_F(MountPointTest, TreatsTheEmptyNameAsVolumes) {
   expectResult(run({""}), 17, "Failed to create [/Volumes/], errno: 17\n");
 }
 
-TEST_F(MountPointTest, MakesVolumesItselfByTheEmptyNameWhereItIsMissing) {
+TEST_F(MountPointTest, MakesMissingVolumesForTheEmptyName) {
   PrivateRoot::removeVolumes();
   expectSuccess(run({""}));
   EXPECT_EQ(statusOf("/Volumes").st_mode & 07777U, 0700U);
 }
 
-TEST_F(MountPointTest, TakesDotsForWhatTheyAre) {
+TEST_F(MountPointTest, TreatsDotNamesAsTheSystemDoes) {
   expectResult(run({"."}), 17, "Failed to create [/Volumes/.], errno: 17\n");
   expectResult(run({".."}), 17, "Failed to create [/Volumes/..], errno: 17\n");
   expectSuccess(run({"..."}));
 }
 
-TEST_F(MountPointTest, NarrowsTheModeByTheUmaskLikeEveryProgram) {
+TEST_F(MountPointTest, AppliesTheUmask) {
   expectSuccess(run({"nothing"}, [] { umask(0777); }));
   expectSuccess(run({"nothing-written"}, [] { umask(0277); }));
   expectSuccess(run({"all"}, [] { umask(0); }));
@@ -137,9 +137,9 @@ TEST_F(MountPointTest, KeepsEveryByteOfTheName) {
   }
 }
 
-TEST_F(MountPointTest, ReportsANameThatIsTooLongWhole) {
-  // The limit counts bytes: 128 characters of two bytes are one too many as well. Linux takes arguments of up
-  // to 131,071 bytes.
+TEST_F(MountPointTest, ReportsATooLongNameInFull) {
+  // The limit of 255 counts bytes, so 128 characters of two bytes each exceed it too. Linux accepts arguments
+  // of up to 131,071 bytes.
   std::string accents;
   for (int count = 0; count < 128; ++count) accents += "\xc3\xa9";
   for (const std::string& name :
@@ -149,7 +149,7 @@ TEST_F(MountPointTest, ReportsANameThatIsTooLongWhole) {
   }
 }
 
-TEST_F(MountPointTest, FailsToMakeADirectoryWhereVolumesIsMissing) {
+TEST_F(MountPointTest, FailsToMakeADirectoryIfVolumesIsMissing) {
   PrivateRoot::removeVolumes();
   expectResult(run({"a"}), 2, "Failed to create [/Volumes/a], errno: 2\n");
   EXPECT_FALSE(fs::exists("/Volumes"));
@@ -172,7 +172,7 @@ TEST_F(MountPointTest, FailsToMakeADirectoryWithoutPermission) {
   EXPECT_THAT(volumes(), IsEmpty());
 }
 
-TEST_F(MountPointTest, FailsToMakeADirectoryWhereAFileOrALinkIsInTheWay) {
+TEST_F(MountPointTest, FailsToMakeADirectoryIfAFileOrALinkHasItsName) {
   makeFile("/Volumes/file");
   fs::create_symlink("nowhere", "/Volumes/dangling");
   fs::create_directory("/Volumes/directory");
@@ -190,7 +190,7 @@ struct Injection {
 constexpr std::array kInjections = {Injection{"EDQUOT", 122}, Injection{"EIO", 5}, Injection{"EPERM", 1},
                                     Injection{"EMLINK", 31}, Injection{"EINTR:when=1", 4}};
 
-TEST_F(MountPointTest, ReportsWhateverTheSystemSaysToMakingADirectory) {
+TEST_F(MountPointTest, ReportsEveryErrorOfMkdir) {
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
   for (const auto& [error, number] : kInjections) {
     expectResult(runInjected("mkdir,mkdirat", error, {"a"}), number,
@@ -199,7 +199,7 @@ TEST_F(MountPointTest, ReportsWhateverTheSystemSaysToMakingADirectory) {
   }
 }
 
-TEST_F(MountPointTest, LeavesTheDirectoryWhereItCouldNotBeHandedOver) {
+TEST_F(MountPointTest, LeavesTheDirectoryIfItsOwnerCannotBeChanged) {
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
   for (const auto& [error, number] : kInjections) {
     expectResult(runInjected("chown,fchown,lchown,fchownat", error, {"a"}), number,
@@ -209,15 +209,16 @@ TEST_F(MountPointTest, LeavesTheDirectoryWhereItCouldNotBeHandedOver) {
   }
 }
 
-// ---- What it asks of the system, and nothing else ----
+// ---- System calls ----
 
-// What every run begins with. The libraries' start ends with signals blocked for a moment. Then the caller's
-// identity is taken on, and the signal of a limit on the size of files is ignored.
+// The calls at the start of every run. At the end of their start-up, the libraries block signals for a
+// moment. Then the command adopts its caller's identity and ignores SIGXFSZ, the signal of the limit on the
+// size of files.
 const std::vector<std::string> kPreparation = {"rt_sigprocmask", "rt_sigprocmask", "capget",      "getgid",
                                                "getuid",         "setfsgid",       "setfsuid",    "setfsgid",
                                                "setfsuid",       "capset",         "rt_sigaction"};
 
-// `calls` without the preparation.
+// Expects that `calls` begins with kPreparation, and returns the other calls.
 std::vector<std::string> withoutPreparation(std::vector<std::string> calls) {
   std::vector<std::string> names;
   for (std::size_t index = 0; index < std::min(kPreparation.size(), calls.size()); ++index) {
@@ -228,14 +229,14 @@ std::vector<std::string> withoutPreparation(std::vector<std::string> calls) {
   return calls;
 }
 
-TEST_F(MountPointTest, AsksTheSystemForItsWorkAndNothingElse) {
-  if (!kInstrumentation.empty()) GTEST_SKIP() << "built with instrumentation, which asks for more";
+TEST_F(MountPointTest, MakesNoUnneededSystemCalls) {
+  if (!kInstrumentation.empty()) GTEST_SKIP() << "instrumented builds make more system calls";
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
   const auto callsOf = [](const std::vector<std::string>& arguments) {
     return withoutPreparation(systemCalls(arguments));
   };
   using Calls = std::vector<std::string>;
-  // The identifiers may be asked for in any order.
+  // The command may ask for the two identifiers in any order.
   Calls making = callsOf({"a"});
   ASSERT_EQ(making.size(), 5U) << testing::PrintToString(making);
   std::sort(making.begin() + 1, making.begin() + 3);
@@ -250,7 +251,7 @@ TEST_F(MountPointTest, AsksTheSystemForItsWorkAndNothingElse) {
   const std::vector<std::string> missing = callsOf({"a", "--remove"});
   ASSERT_EQ(missing.size(), 4U) << testing::PrintToString(missing);
   EXPECT_EQ(missing[0], "rmdir(\"/Volumes/a\") = -1 ENOENT (No such file or directory)");
-  // Standard output is buffered; the C library looks at what it is first.
+  // Standard output is buffered, so the C library checks the kind of file first.
   EXPECT_THAT(missing[1], testing::ContainsRegex("^(new)?fstat"));
   EXPECT_EQ(missing[2], "write(1, \"Path already does not exist: [/Volumes/a]\\n\", 42) = 42");
 }
@@ -263,7 +264,7 @@ TEST_F(MountPointTest, RemovesADirectorySilently) {
   EXPECT_THAT(volumes(), IsEmpty());
 }
 
-TEST_F(MountPointTest, TakesAMissingDirectoryForRemoved) {
+TEST_F(MountPointTest, TreatsAMissingDirectoryAsRemoved) {
   expectResult(run({"a", "--remove"}), 0, "", "Path already does not exist: [/Volumes/a]\n");
   PrivateRoot::removeVolumes();
   expectResult(run({"a", "--remove"}), 0, "", "Path already does not exist: [/Volumes/a]\n");
@@ -282,7 +283,7 @@ TEST_F(MountPointTest, FailsToRemoveADirectoryThatIsInUseAsAMountPoint) {
   ASSERT_EQ(umount("/Volumes/a"), 0);
 }
 
-TEST_F(MountPointTest, FailsToRemoveWhatIsNoDirectory) {
+TEST_F(MountPointTest, FailsToRemoveAnythingButADirectory) {
   makeFile("/Volumes/file");
   fs::create_directory("/Volumes/directory");
   fs::create_symlink("directory", "/Volumes/link");
@@ -293,13 +294,13 @@ TEST_F(MountPointTest, FailsToRemoveWhatIsNoDirectory) {
   EXPECT_EQ(volumes().size(), 4U);
 }
 
-TEST_F(MountPointTest, FailsToRemoveDots) {
+TEST_F(MountPointTest, FailsToRemoveDotAndDotDot) {
   expectResult(run({".", "--remove"}), 22, "Failed to remove [/Volumes/.], errno: 22\n");
   const ProcessResult result = run({"..", "--remove"});
   expectResult(result, 39, "Failed to remove [/Volumes/..], errno: 39\n");
 }
 
-TEST_F(MountPointTest, TakesTheEmptyNameForVolumesItselfWhenRemoving) {
+TEST_F(MountPointTest, TreatsTheEmptyNameAsVolumesWhenRemoving) {
   expectResult(run({"", "--remove"}), 16, "Failed to remove [/Volumes/], errno: 16\n");
   PrivateRoot::removeVolumes();
   fs::create_directory("/Volumes");
@@ -319,7 +320,7 @@ TEST_F(MountPointTest, FailsToRemoveADirectoryWithoutPermission) {
   expectResult(runPowerless({"a", "--remove"}), 13, "Failed to remove [/Volumes/a], errno: 13\n");
 }
 
-TEST_F(MountPointTest, ReportsWhateverTheSystemSaysToRemovingADirectory) {
+TEST_F(MountPointTest, ReportsEveryErrorOfRmdir) {
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
   fs::create_directory("/Volumes/a");
   for (const auto& [error, number] : kInjections) {
@@ -329,10 +330,11 @@ TEST_F(MountPointTest, ReportsWhateverTheSystemSaysToRemovingADirectory) {
   EXPECT_EQ(volumes(), std::vector<std::string>{"a"});
 }
 
-// Lines of commands that run at once do not mix: each line of up to 8 KiB is handed to the kernel in one
-// piece.
-TEST_F(MountPointTest, WritesEachLineInOnePiece) {
-  if (kInstrumentation == "coverage") GTEST_SKIP() << "writing its counts hides what came before";
+// The lines of commands that run at the same time do not mix: the command writes each line of up to 8 KiB in
+// one call.
+TEST_F(MountPointTest, WritesEachLineInOneCall) {
+  if (kInstrumentation == "coverage")
+    GTEST_SKIP() << "the calls that write the coverage counts hide the earlier ones";
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
   expectSuccess(run({"a"}));
   for (const std::string& name : {std::string("a"), std::string(8000, 'x')}) {
@@ -343,8 +345,8 @@ TEST_F(MountPointTest, WritesEachLineInOnePiece) {
   }
 }
 
-// The README shows what script/run shows.
-TEST_F(MountPointTest, DoesWhatTheReadmeShows) {
+// The README contains the output of script/run.
+TEST_F(MountPointTest, BehavesAsTheReadmeShows) {
   const ProcessResult result =
       runProcess({"bash", SOURCE_DIRECTORY "/examples/mount-point/demonstration.sh", kCommand});
   EXPECT_EQ(result.exitStatus, 0);

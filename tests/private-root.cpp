@@ -1,7 +1,8 @@
 // private-root COMMAND [ARGUMENT…]
 //
-// Runs COMMAND in a private root: /Volumes is an empty directory that nobody else sees, every
-// other directory is the machine's. Exits as COMMAND does; 77, with the reason, where the machine forbids it.
+// Runs COMMAND in a private root. There, /Volumes is an empty directory that no other process sees. Every
+// other directory is the machine's. Exits with COMMAND's status. If the machine allows no private root,
+// prints the reason and exits with 77.
 
 #include <unistd.h>
 

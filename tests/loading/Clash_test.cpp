@@ -4,7 +4,7 @@
 
 namespace {
 
-TEST(Clash, IsReportedOnceForEachNameAndTheFirstIsKept) {
+TEST(Clash, IsReportedOnceForEachNameAndKeepsTheFirst) {
   const ProcessResult result = runProcess({CLASH});
   EXPECT_EQ(result.exitStatus, 0);
   EXPECT_EQ(result.standardOutput, "2\n");

@@ -7,7 +7,7 @@
 
 namespace {
 
-// Made before any static object, so no object itself.
+// The hook runs before static objects are constructed, so these variables need constant initialisation.
 constinit char seen[256] = "";
 constinit int runs = 0;
 

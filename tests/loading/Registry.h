@@ -5,22 +5,22 @@
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Object.h"
 
-/// A class with a load hook that looks at everything a hook may rely on, for the programs here that
-/// are put together in different ways.
+/// A class with a load hook that records everything that a hook may rely on. The programs in this folder link
+/// it in different ways.
 class [[gnu::visibility("default")]] Registry : public rt::Implements<Registry, rt::Object> {
  public:
   ~Registry() override;
 
-  /// Asks each class method added to this class, in the order in which they are listed, and notes its
-  /// selector and answer; then which of the classes A to D are known by name.
+  /// Calls each class method that was added to this class, in the order of the list. Records the selectors
+  /// and results, then which of the classes A to D are found by name.
   static void load();
 
-  /// What there is now, in the form of `seenByHook`.
+  /// Returns the current state in the format of `seenByHook`.
   static std::string look();
 
-  /// What `load` saw, such as "add_a:1 add_b:2 A B "; empty until it has run.
+  /// Returns what `load` saw, for example "add_A:1 add_B:2 A B ". Empty until `load` has run.
   static const char* seenByHook();
 
-  /// How often `load` has run.
+  /// Returns how often `load` has run.
   static int hookRuns();
 };

@@ -1,4 +1,4 @@
-// Adds a method and a class, both called LETTER, to which no symbol leads from anywhere.
+// Adds a class LETTER and a class method "add_LETTER". No symbol outside this file refers to them.
 #include "Registry.h"
 #include "Runtime/Objects/ClassMethod.h"
 

@@ -1,5 +1,6 @@
-// Has three classes of one name and two of another, and a protocol of each name. Prints which class is
-// found by the first name: 1 if it is one of the three.
+// This program has three classes called Three, two called Two, and two protocols called P. Prints how many
+// objects are members of the class that is found by their name: 2, because exactly one class of each name is
+// found.
 #include <cstdio>
 
 #include "Runtime/Objects/Class.h"

@@ -1,6 +1,6 @@
-// Opens the library that is the first argument, keeps what it gives, closes it, and goes on using all of it:
-// the object, the class methods that it added, and its own function once more. What there is to see must be
-// the second argument.
+// Opens the library in the first argument, keeps the object that the library gives, and closes the library.
+// Then uses the object, the class methods that the library added, and the library's function once more. The
+// text that it sees must equal the second argument.
 #include <dlfcn.h>
 
 #include <cstdio>

@@ -1,4 +1,4 @@
-// A shared library that has the runtime, and uses it for its caller.
+// A shared library that contains the runtime and uses it in an exported function.
 #include "Runtime/Locks/Private/ThreadIdentifier.h"
 #include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Queues/Queue.h"

@@ -1,6 +1,6 @@
-// Has the runtime, and so has a library that it links or opens, the first argument. Forks while both are in
-// use on another thread, and uses both in the child, and in a child of that. The second argument says whether
-// the two are to share what the runtime knows, or to have it each for itself.
+// This program contains the runtime, and so does a library that it links or opens, whose path is the first
+// argument. It forks while another thread uses both, and uses both in the child and in a child of that child.
+// The second argument says whether the program and the library must share the runtime's state.
 #include <dlfcn.h>
 #include <sys/wait.h>
 #include <unistd.h>
@@ -33,12 +33,12 @@ bool use() {
   return queue->sync([] { return 1; }) == 1 && useInLibrary() == 1;
 }
 
-// Whether `body` is true in a child that ends.
+// Runs `body` in a child. Returns whether it returned true there.
 template <class Body>
 bool isTrueInChild(Body body) {
   const pid_t child = fork();
   if (child == 0) {
-    alarm(120);  // Instead of a hang.
+    alarm(120);  // This ends a child that hangs.
     _exit(body() ? 0 : 1);
   }
   int status = -1;

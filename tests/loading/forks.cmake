@@ -1,8 +1,12 @@
-# A program that forks, and a shared library, both of which have the runtime. What they export, and how the library
-# comes in, decides whether they have one of it or two.
+# Tests a program that forks and uses a shared library. Both contain the runtime. Their exported symbols, and the way in
+# which the library is loaded, decide whether they share one runtime or have two.
 
-# loading_forks(NAME EXPECTED HOW VISIBILITY [EXPORTS]): an entry of ctest. HOW is linked or opened; the archive's
-# symbols in the library have VISIBILITY, exported or hidden; with EXPORTS the program exports its own.
+# loading_forks(NAME EXPECTED HOW VISIBILITY [EXPORTS]) adds an entry to ctest.
+#
+#   EXPECTED       "shared" or "separate": whether both use the same runtime
+#   HOW            "linked" or "opened": how the program loads the library
+#   VISIBILITY     "exported" or "hidden": the visibility of the runtime's symbols in the library
+#   EXPORTS        makes the program export its symbols
 function(loading_forks name expected how visibility)
   set(program "loading-forks-${name}")
   add_library(${program}-library SHARED fork-library.cpp)
@@ -33,10 +37,10 @@ loading_forks(opened separate opened exported)
 loading_forks(opened-exports shared opened exported EXPORTS)
 loading_forks(opened-hidden separate opened hidden)
 
-# A library whose only use of the runtime is a lock, and a program without the runtime that opens and closes it.
+# Tests a program without the runtime. It opens and closes a library that uses only a lock of the runtime.
 add_library(loading-lock-library MODULE lock-library.cpp)
 target_include_directories(loading-lock-library PRIVATE "${PROJECT_SOURCE_DIR}")
-# Only those parts of the archive that are referred to.
+# This links only those objects of the archive that the library refers to.
 target_link_libraries(loading-lock-library PRIVATE MountPoint::Options "$<TARGET_FILE:runtime>")
 add_dependencies(loading-lock-library runtime)
 target_compile_options(loading-lock-library PRIVATE -fvisibility=hidden -fvisibility-inlines-hidden)

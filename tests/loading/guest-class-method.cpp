@@ -1,4 +1,4 @@
-// Adds a class method, and gives an object of a class of the program's.
+// Adds a class method and gives an object of one of the program's classes.
 #include "Registry.h"
 #include "Runtime/Objects/ClassMethod.h"
 #include "Runtime/Objects/String.h"

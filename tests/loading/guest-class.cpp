@@ -1,4 +1,4 @@
-// Gives an object of a class of its own.
+// Gives an object of its own class.
 #include "Runtime/Objects/String.h"
 #include "guest.h"
 

@@ -1,4 +1,4 @@
-// Gives a format that was a plain literal.
+// Gives a format that was made of a plain string literal.
 #include "Runtime/Text/FormatString.h"
 #include "guest.h"
 

@@ -1,4 +1,4 @@
-// Gives a literal.
+// Gives a string literal.
 #include "Runtime/Objects/String.h"
 #include "guest.h"
 

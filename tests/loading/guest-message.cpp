@@ -1,4 +1,4 @@
-// Gives a message that it has logged.
+// Logs a message and gives it.
 #include "Shared/Logging/LUMLog.h"
 #include "guest.h"
 

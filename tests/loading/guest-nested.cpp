@@ -1,4 +1,5 @@
-// Opens and closes another such library while it is being opened itself, and gives what that one gave.
+// Opens and closes another guest library while it is being opened itself. Gives the object that the other one
+// gave.
 #include <dlfcn.h>
 
 #include "guest.h"

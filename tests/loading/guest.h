@@ -3,6 +3,6 @@
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"
 
-/// What a library that is opened and closed again exports as "give": sets `gift` to an object that the
-/// program keeps.
+/// The function "give" that a guest library exports. It sets `gift` to an object that the program keeps after
+/// closing the library.
 using Give = void(rt::Ref<rt::Object>& gift);

@@ -1,5 +1,6 @@
-// Does not have the runtime. A thread opens the library that is the first argument, uses it, closes it, and
-// ends: the runtime in the library must still be there, since it is called when the thread ends.
+// This program does not contain the runtime. A thread opens the library in the first argument, uses it,
+// closes it, and ends. The library's runtime must still be loaded then, because it has a callback for the end
+// of the thread.
 #include <dlfcn.h>
 
 #include <cstdio>

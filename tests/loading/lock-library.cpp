@@ -1,4 +1,4 @@
-// A library that brings the runtime and uses nothing of it but a lock.
+// A library that contains the runtime and uses only a lock of it.
 #include "Runtime/Locks/UnfairLock.h"
 
 namespace {

@@ -1,4 +1,4 @@
-// Opens the library that is the first argument and checks what is known before and after that.
+// Opens the library in the first argument. Checks which classes and class methods are known before and after.
 #include <dlfcn.h>
 
 #include <cstdio>

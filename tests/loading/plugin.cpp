@@ -1,4 +1,4 @@
-// Opened by plugin-host: adds a method and has a class with a load hook of its own.
+// A library that plugin-host opens. It adds a class method and a class with its own load hook.
 #include "Registry.h"
 #include "Runtime/Objects/ClassMethod.h"
 #include "Runtime/Objects/LoadHook.h"

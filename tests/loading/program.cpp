@@ -1,5 +1,5 @@
-// Checks that the load hook ran once, before any static object was made, and saw what the first argument
-// says.
+// Checks that the load hook ran once, before static objects were constructed, and saw the text in the first
+// argument.
 #include <cstdio>
 #include <cstring>
 

@@ -1,4 +1,4 @@
-// What a program without any class of its own calls to check what the hook saw.
+// Lets a program without classes check what the hook saw.
 #include <cstdio>
 #include <cstring>
 

@@ -1,4 +1,4 @@
-// A program that knows nothing of classes; the libraries that it links have them.
+// A program without classes. The libraries that it links have classes.
 extern "C" int checkHook(const char* expected);
 
 int main(int argumentCount, char** arguments) {

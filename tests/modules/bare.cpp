@@ -1,5 +1,5 @@
-// Has no bindings module and leaves the start-up hook as it is: the registry knows that there is nothing more
-// to come.
+// A program without bindings modules and with the default start-up hook. The registry reports a missing
+// service, because it knows that no module will be registered later.
 #include <cstdio>
 #include <string>
 

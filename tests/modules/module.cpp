@@ -1,6 +1,6 @@
-// A bindings module called NAME, of which no symbol is referred to from anywhere: it binds an API of that
-// name to a class of that name. When it is asked for its configurations, it asks for its service, which is
-// too early.
+// A bindings module called NAME. No symbol outside this file refers to it. It binds an API of that name to a
+// class of that name. When the registry asks it for its configurations, it requests its service, which is too
+// early.
 #include "Runtime/Objects/ClassMethod.h"
 #include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "Trace.h"

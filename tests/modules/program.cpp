@@ -1,6 +1,6 @@
-// Has bindings modules in itself and in the libraries that it links, and opens another library, its first
-// argument, that has one too. Checks which modules were asked, when and in which order, and which services
-// there are.
+// This program has bindings modules in itself and in the libraries that it links. It opens another library
+// with a module, the first argument. Checks which modules were asked, when and in which order, and which
+// services exist.
 #include <dlfcn.h>
 
 #include <cstddef>
@@ -19,7 +19,7 @@ using namespace rt::literals;
 
 namespace {
 
-// Filled before any static object is made, so no object itself.
+// The trace begins before static objects are constructed, so these variables need constant initialisation.
 constinit char traced[4096] = "";
 constinit std::size_t tracedSize = 0;
 
@@ -30,12 +30,12 @@ void add(std::string_view text) {
   traced[tracedSize] = '\0';
 }
 
-// What has happened up to the making of the program's static objects.
+// The trace when the program's static objects are constructed.
 const std::string tracedBeforeStaticObjects = traced;
 
 constexpr SRLAPIRegistrationData early{.identifier = "early", .identifierLength = 5};
 
-// What the selectors of these stand for is no module.
+// A class method that returns no module.
 template <char mark>
 const SRLBindingsModuleData* noModule() {
   static constexpr char kMark[] = {mark, '\0'};
@@ -53,7 +53,8 @@ template struct rt::AddedClassMethod<SRLRegistry, "srl_bindings", &noModule<'1'>
 template struct rt::AddedClassMethod<SRLRegistry, "srl_binding", &noModule<'2'>>;
 template struct rt::AddedClassMethod<SRLRegistry, "srl_BindingsA", &noModule<'3'>>;
 template struct rt::AddedClassMethod<SRLRegistry, "_srl_bindingsA", &noModule<'4'>>;
-// One that is asked and has none, and one that cannot be asked.
+// These two selectors are those of modules. The first method returns no module. The second has the wrong type
+// and cannot be called.
 template struct rt::AddedClassMethod<SRLRegistry, "srl_bindingsNone", &noModule<'5'>>;
 template struct rt::AddedClassMethod<SRLRegistry, "srl_bindingsOfAnotherType", &noModuleEither>;
 
@@ -68,7 +69,7 @@ bool SRLStartUpHook() {
   PECErrorHandler::sharedInstance()->setErrorHandlerBlock(
       [](const rt::Ref<PECErrorDescription>& error) { add(error->errorMessage().view()), add("\n"); });
   if (SRLRegistry::sharedInstance()->internalService(&early, {})) trace("too early, and found");
-  // Nobody looks at it.
+  // The registry ignores the result.
   return false;
 }
 
@@ -79,7 +80,7 @@ int fail(const char* what, const std::string& seen) {
   return 1;
 }
 
-// What is traced from now on.
+// Clears the trace.
 void forget() {
   tracedSize = 0;
   traced[0] = '\0';

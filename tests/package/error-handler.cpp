@@ -1,4 +1,5 @@
-// A program of somebody who has only what was installed. Hears of a mistake of its own.
+// A host that is built against the installed libraries only. It registers two callbacks, and the first one
+// prints the error that this reports.
 #include <cstdio>
 
 #include "Libraries/Util/ErrorHandler/ErrorHandler.h"

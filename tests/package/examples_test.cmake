@@ -1,5 +1,5 @@
-# Run by ctest, with BUILD, COMPILER, FLAGS, PYTHON and WORK: copies every example out of the tree, builds it with
-# nothing but what was installed, and checks what it prints.
+# Copies every example out of the source tree, builds it against the installed libraries only, and checks its output.
+# ctest runs this script and sets BUILD, COMPILER, FLAGS, PYTHON and WORK.
 
 include("${CMAKE_CURRENT_LIST_DIR}/run.cmake")
 

@@ -1,4 +1,5 @@
-// A program of somebody who has only what was installed. Logs a number to the older logger, rerouted.
+// A host that is built against the installed libraries only. It logs a number through the rerouting older
+// logger.
 #include <cstdio>
 
 #include "Shared/Logging/Logging.h"

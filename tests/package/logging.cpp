@@ -1,4 +1,4 @@
-// A program of somebody who has only what was installed. Logs a number to a logger of its own.
+// A host that is built against the installed libraries only. It logs a number to its own logger.
 #include "Shared/Logging/Logging.h"
 
 #include <cstdio>

@@ -1,4 +1,4 @@
-// A program of somebody who has only what was installed. Logs a number.
+// A host that is built against the installed libraries only. It logs a number with the older logger.
 #include "Foundation/OlderLogger.h"
 
 using namespace rt::literals;

@@ -1,12 +1,13 @@
-# Run by ctest, with BUILD, COMPILER, FLAGS, WORK, WAY (find_package or pkg-config) and PKG_CONFIG: installs
-# what was built and builds the programs beside this file with nothing else, as a stranger would. Each is called as
-# pkg-config calls the library that it uses, less "mount-point-", and prints 42.
+# Installs the libraries and builds the programs beside this file against the installed tree only. Each program is named
+# after its library: the library's pkg-config name without "mount-point-". Each program prints 42.
+#
+# ctest runs this script and sets BUILD, COMPILER, FLAGS, WORK, WAY (find_package or pkg-config) and PKG_CONFIG.
 
 include("${CMAKE_CURRENT_LIST_DIR}/run.cmake")
 
 file(REMOVE_RECURSE "${WORK}")
 run("${CMAKE_COMMAND}" --install "${BUILD}" --component development --prefix "${WORK}/first")
-# What is installed may be moved.
+# The installed tree must still work after it has been moved.
 file(RENAME "${WORK}/first" "${WORK}/installed")
 
 set(libraries runtime logging error-handler older-logger logging-shim provider service-registry)
@@ -32,6 +33,6 @@ endif()
 foreach(library ${libraries})
   run("${WORK}/build/${library}")
   if(NOT output STREQUAL "42\n")
-    message(FATAL_ERROR "The program of ${library} printed \"${output}\".")
+    message(FATAL_ERROR "The program ${library} printed \"${output}\" and not \"42\".")
   endif()
 endforeach()

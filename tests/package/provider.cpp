@@ -1,4 +1,4 @@
-// A program of somebody who has only what was installed. Prints what a provider provides.
+// A host that is built against the installed libraries only. It prints the number that a provider returns.
 #include <cstdio>
 
 #include "Runtime/Values/Number.h"

@@ -1,4 +1,4 @@
-# run(COMMAND [ARGUMENT…]) runs a command and sets `output` to what it prints. A failure ends the script.
+# run(COMMAND [ARGUMENT…]) runs a command and sets `output` to its standard output. A failure ends the script.
 function(run)
   execute_process(COMMAND ${ARGN} RESULT_VARIABLE result OUTPUT_VARIABLE output ERROR_VARIABLE errors)
   if(NOT result EQUAL 0)

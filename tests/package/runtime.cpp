@@ -1,4 +1,5 @@
-// A program of somebody who has only what was installed. Prints the time that a class found by name knows.
+// A host that is built against the installed libraries only. It finds a factory by its selector and prints
+// the time of the clock that the factory makes.
 #include "Runtime/Runtime.h"
 
 #include <cstdio>
@@ -31,7 +32,7 @@ template struct rt::AddedClassMethod<SystemClock, "make", &makeClock>;
 
 int main() {
   if (SystemClock::factory == nullptr || rt::classNamed("SystemClock") == nullptr) return 1;
-  // Only a runtime that is linked whole has a class of which nothing here knows.
+  // This program does not refer to this class. It is present only if the whole library is linked.
   if (rt::classNamed("String") == nullptr) return 2;
   const rt::Ref<rt::Object> object = SystemClock::factory();
   const rt::Weak<Clock> clock = rt::cast<Clock>(object.get());

@@ -1,4 +1,5 @@
-// A program of somebody who has only what was installed. Prints what a service says that the registry finds.
+// A host that is built against the installed libraries only. It prints the time of a clock that the registry
+// finds.
 #include <cstdio>
 #include <iterator>
 

@@ -27,7 +27,7 @@ void countFree() noexcept {
 
 #ifdef SANITIZES_ALLOCATIONS
 
-// The sanitizer owns malloc and calls these at each allocation.
+// The sanitizer owns malloc and calls these hooks at each allocation and deallocation.
 extern "C" int __sanitizer_install_malloc_and_free_hooks(void (*onMalloc)(const volatile void*, std::size_t),
                                                          void (*onFree)(const volatile void*));
 
@@ -45,7 +45,7 @@ bool AllocationCount::isSupported() noexcept {
 
 #elif defined(__GLIBC__)
 
-// The C library lets a program bring its own malloc, and keeps its own under these names.
+// The C library lets a program replace malloc. Its own functions remain available under these names.
 // NOLINTBEGIN(bugprone-reserved-identifier,cert-dcl37-c,cert-dcl51-cpp,readability-identifier-naming,readability-inconsistent-declaration-parameter-name)
 extern "C" {
 

@@ -2,30 +2,31 @@
 
 #include <cstdint>
 
-/// Counts what the calling thread allocates, by `new`, `malloc` or any of their relatives, in the whole
-/// program with the libraries that it links. Link `allocation-count` and ask from the test:
+/// Counts the allocations of the calling thread, by `new`, `malloc` or any related function. Counts those of
+/// the program and of all libraries that it links. Link `allocation-count` and use it in a test:
 ///
 ///     if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
 ///     AllocationCount count;
 ///     rt::Ref<Point> copy = point;
 ///     EXPECT_EQ(count.allocations(), 0);
 ///
-/// Each object counts from its own making on. Works under the sanitizers too, through their hooks.
+/// Each object counts from its construction. Sanitizers are supported, through their hooks.
 class AllocationCount {
  public:
   AllocationCount() noexcept;
 
-  /// Whether allocations can be counted on this system.
+  /// Returns whether allocations can be counted on this system.
   static bool isSupported() noexcept;
 
-  /// How often the calling thread, which must be the one that made this object, has allocated since.
-  /// A reallocation counts as one.
+  /// Returns how many allocations the calling thread has made since this object was constructed. A
+  /// reallocation counts as one. Precondition: the calling thread constructed this object.
   std::int64_t allocations() const noexcept;
 
-  /// How many of these are left, that is less what the thread has freed since. May be negative.
+  /// Returns `allocations()` minus the number of blocks that the thread has freed since. May be negative.
   std::int64_t balance() const noexcept;
 
-  /// How many blocks the whole process has, since some moment of its start: for comparing with later.
+  /// Returns how many more blocks the whole process has allocated than freed. Only differences between two
+  /// calls are meaningful: counting begins at an unspecified moment while the process starts.
   static std::int64_t liveInProcess() noexcept;
 
  private:

@@ -12,16 +12,16 @@ namespace {
 class AllocationCountTest : public testing::Test {
  protected:
   void SetUp() override {
-    if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations on this system";
+    if (!AllocationCount::isSupported()) GTEST_SKIP() << "allocations cannot be counted on this system";
   }
 };
 
-// What the compiler must not take out.
+// Keeps the compiler from optimising the block away.
 void use(const void* block) {
   asm volatile("" : : "r"(block) : "memory");
 }
 
-TEST_F(AllocationCountTest, IsZeroWhereNothingIsAllocated) {
+TEST_F(AllocationCountTest, IsZeroIfNothingIsAllocated) {
   const AllocationCount count;
   const int local = 0;
   use(&local);
@@ -29,7 +29,7 @@ TEST_F(AllocationCountTest, IsZeroWhereNothingIsAllocated) {
   EXPECT_EQ(count.balance(), 0);
 }
 
-TEST_F(AllocationCountTest, CountsEveryWayToAllocate) {
+TEST_F(AllocationCountTest, CountsEveryAllocationFunction) {
   const AllocationCount count;
   auto made = std::make_unique<int>(1);
   use(made.get());
@@ -57,7 +57,7 @@ TEST_F(AllocationCountTest, CountsEveryWayToAllocate) {
   EXPECT_EQ(count.balance(), 3);
 }
 
-TEST_F(AllocationCountTest, LeavesOtherThreadsOut) {
+TEST_F(AllocationCountTest, IgnoresOtherThreads) {
   std::thread thread;
   const AllocationCount before;
   thread = std::thread([] {

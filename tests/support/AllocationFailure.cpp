@@ -14,7 +14,7 @@ namespace {
 
 constexpr std::int64_t kNever = std::numeric_limits<std::int64_t>::max();
 
-// How many allocations there are before the one that fails; kNever where none is to.
+// The number of allocations before the one that fails. kNever if no allocation is to fail.
 constinit std::atomic<std::int64_t> left = kNever;
 constinit std::atomic<bool> lasts = false;
 constinit thread_local int pauses = 0;
@@ -72,7 +72,7 @@ void* allocateOrThrow(std::size_t size, std::size_t alignment) {
 
 }  // namespace
 
-// NOLINTBEGIN(misc-new-delete-overloads): all are here
+// NOLINTBEGIN(misc-new-delete-overloads): all overloads are here
 void* operator new(std::size_t size) {
   return allocateOrThrow(size, 1);
 }

@@ -2,7 +2,7 @@
 
 #include <cstdint>
 
-// The sanitizers own malloc: with that for addresses, only what C++ allocates, by `new`, can fail.
+// The sanitizers own malloc. With the address sanitizer, only allocations by `new` can fail.
 #if defined(__SANITIZE_ADDRESS__) || defined(__SANITIZE_THREAD__)
 #define SANITIZES_ALLOCATIONS 1
 #elif defined(__has_feature)
@@ -11,31 +11,33 @@
 #endif
 #endif
 
-/// Has an allocation fail, on whichever thread, while it is there. Link `allocation-count`.
+/// Makes an allocation fail, on any thread, during this object's lifetime. Link `allocation-count`.
 ///
-///     const AllocationFailure failure(3);                    // the third from now, and no other
+///     const AllocationFailure failure(3);                    // only the third allocation from now fails
 ///     EXPECT_THROW(rt::format("%@"_s, list), std::bad_alloc);
 ///     EXPECT_TRUE(failure.hasHappened());
 ///
-/// One at a time in a process. Where it is not supported, nothing ever fails.
+/// A process may have only one such object at a time. If this is not supported, no allocation fails.
 class AllocationFailure {
  public:
   enum class Extent : bool { kOnce, kFromThenOn };
 
-  /// Whether allocations can be made to fail on this system. Not under the thread sanitizer, which owns
-  /// `new`.
+  /// Returns whether allocations can be made to fail on this system. False with the thread sanitizer, which
+  /// owns `new`.
   static bool isSupported() noexcept;
 
-  /// The `number`-th allocation from now, counted from 1, fails, and those after it if `extent` says so.
+  /// Makes the `number`-th allocation from now fail, counted from 1. With `kFromThenOn`, all later
+  /// allocations fail too.
   explicit AllocationFailure(std::int64_t number, Extent extent = Extent::kOnce) noexcept;
   AllocationFailure(const AllocationFailure&) = delete;
   AllocationFailure& operator=(const AllocationFailure&) = delete;
   ~AllocationFailure();
 
-  /// Whether it has come to that allocation.
+  /// Returns whether that allocation has been attempted.
   bool hasHappened() const noexcept;
 
-  /// While it is there, nothing fails that the calling thread allocates, and nothing of it is counted.
+  /// Exempts the calling thread during its lifetime: the thread's allocations neither fail nor count towards
+  /// `number`.
   class Pause {
    public:
     Pause() noexcept;
@@ -44,6 +46,6 @@ class AllocationFailure {
     ~Pause();
   };
 
-  /// For those who allocate: whether to fail.
+  /// Returns whether the current allocation must fail. For allocation functions only.
   static bool happensNow() noexcept;
 };

@@ -1,6 +1,7 @@
 #pragma once
 
-/// Runs a function when it is destroyed, as what a block has captured is.
+/// Runs a function when it is destroyed. A block that captures an `AtEnd` thus shows when its captures are
+/// destroyed.
 ///
 ///     block = [end = AtEnd([&] { trace.add("gone"); })] {};
 ///

@@ -5,7 +5,7 @@
 
 constinit std::atomic<ClockHook> clockHook = nullptr;
 
-// A program's own function goes before that of the C library, for the libraries of the system too.
+// The program's function takes precedence over the C library's, even for calls from the system's libraries.
 extern "C" int clock_gettime(clockid_t clock, timespec* time) noexcept {
   const auto status = static_cast<int>(syscall(SYS_clock_gettime, clock, time));
   const ClockHook hook = clockHook.load();

@@ -3,15 +3,15 @@
 #include <atomic>
 #include <ctime>
 
-/// What a test program has the system's clocks say. Link `clock-hook`:
+/// A callback that changes the times which the system's clocks report. Link `clock-hook`:
 ///
 ///     clockHook = [](clockid_t clock, timespec& time) {
 ///       if (clock == CLOCK_REALTIME) time.tv_sec += 3;
 ///     };
 ///
-/// It is called on every thread that reads a clock by `clock_gettime`, as the clocks of the C++ library do.
-/// It gets what the system says, and may change it. The other calls of the system keep to the system's
-/// clocks. Null, as at the start, changes nothing.
+/// `clock_gettime` calls it on the calling thread, with the system's time, which it may change. The clocks of
+/// the C++ library use `clock_gettime`. Other system calls still use the real clocks. Null changes nothing
+/// and is the default.
 using ClockHook = void (*)(clockid_t clock, timespec& time);
 
 extern constinit std::atomic<ClockHook> clockHook;

@@ -1,5 +1,5 @@
-// Counts of what has run are written when a process exits. In a coverage build this is part of every test
-// program, so that those of its children are written, too, that end by `_exit` or are aborted.
+// A process writes its coverage counts when it exits. In a coverage build, every test program links this
+// file. Then children that end by `_exit` or abort write their counts too.
 
 #include <fcntl.h>
 #include <sys/syscall.h>
@@ -11,8 +11,8 @@ extern "C" void __gcov_dump();
 
 namespace {
 
-// A process that may do less than its builder cannot write them, and would say so where tests look for what
-// else it says. The counts are written next, after all other destructors.
+// A process with fewer rights than its builder cannot write the counts. The error message would disturb tests
+// that read standard error. The counts are written right after this destructor, which is the last one.
 [[gnu::destructor(101)]] void closeStandardError() {
   const int nowhere = open("/dev/null", O_WRONLY | O_CLOEXEC);
   if (nowhere >= 0) dup2(nowhere, STDERR_FILENO);
@@ -29,7 +29,7 @@ void writeCounts() {
 
 }  // namespace
 
-// A program's own function goes before that of the C library.
+// The program's function takes precedence over the C library's.
 extern "C" void _exit(int status) {
   writeCounts();
   syscall(SYS_exit_group, status);

@@ -27,7 +27,7 @@ void require(bool succeeded, const char* what) {
   if (!succeeded) throw std::runtime_error(what);
 }
 
-// Where the look-ups of the C library are, counted from where the program is loaded.
+// Returns the addresses of the C library's look-up functions, relative to the program's load address.
 std::set<Address> lookUps(const std::string& symbolsPath) {
   std::istringstream symbols(runProcess({"nm", symbolsPath}).standardOutput);
   std::set<Address> addresses;
@@ -48,7 +48,7 @@ Address loadAddress(pid_t process, const std::string& path) {
   for (std::string line; std::getline(maps, line);) {
     if (line.find(path) != std::string::npos) return std::stoul(line, nullptr, 16);
   }
-  throw std::runtime_error("the program is not where it should be");
+  throw std::runtime_error("the program's file is not mapped");
 }
 
 Address readWord(pid_t process, Address address) {
@@ -100,7 +100,7 @@ std::set<std::string> environmentVariablesReadBy(const std::vector<std::string>&
     _exit(127);
   }
   require(waitForStop(process), "the program cannot be traced");
-  // Whatever goes wrong from here on, no stopped program stays behind.
+  // If anything fails from here on, this ends the stopped program.
   require(ptrace(PTRACE_SETOPTIONS, process, nullptr, PTRACE_O_EXITKILL) == 0,
           "the program cannot be traced");
 
@@ -121,7 +121,7 @@ std::set<std::string> environmentVariablesReadBy(const std::vector<std::string>&
     const auto original = originals.find(registers.rip - 1);
     require(original != originals.end(), "the program stopped where nobody asked it to");
     names.insert(readText(process, registers.rdi));
-    // The one instruction under the breakpoint is run by itself.
+    // The program executes the original instruction alone. Then the breakpoint is set again.
     registers.rip = original->first;
     writeWord(process, original->first, original->second);
     require(ptrace(PTRACE_SETREGS, process, nullptr, &registers) == 0, "cannot write the registers");

@@ -4,9 +4,13 @@
 #include <string>
 #include <vector>
 
-/// The names of the environment variables that a program asks for from its first instruction to its end.
-/// `arguments` are its path and what it is given; the file `symbols` has its symbols. The program must be a
-/// position-independent executable with the C library inside; a breakpoint in that library's look-up shows
-/// every question. Throws std::runtime_error when the program cannot be traced.
+/// Runs a program and returns the names of the environment variables that it looks up from its first
+/// instruction to its end. `arguments` are its path and its arguments. `symbols` is the path of a file with
+/// its symbols.
+///
+/// Each look-up stops at a breakpoint in the C library's functions. Precondition: the program is
+/// position-independent and links the C library statically.
+///
+/// Errors: throws std::runtime_error if the program cannot be traced.
 std::set<std::string> environmentVariablesReadBy(const std::vector<std::string>& arguments,
                                                  const std::string& symbols);

@@ -1,6 +1,6 @@
 #pragma once
 
-/// The function that is first in a message's call stack, of either kind.
+/// Finds the first function in the call stack of a message, whichever of the two kinds of call stack it has.
 ///
 ///     EXPECT_THAT(firstSymbolOf(*message), HasSubstr("functionThatLogs("));
 ///
@@ -17,7 +17,7 @@
 #include "Shared/Logging/LUMLogMessage.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
 
-/// `message` has a call stack.
+/// Returns the first function's symbol. Precondition: `message` has a call stack.
 inline std::string firstSymbolOf(const LUMLogMessage& message) {
   if (auto* symbols = rt::cast<LUMLogSymbolCallstack>(message.callstack().get())) {
     return std::string(symbols->symbols()->stringAt(0).view());

@@ -1,6 +1,6 @@
 #pragma once
 
-/// What tests of forks share.
+/// Helpers for tests of forks: they run code in a child and hold a lock on another thread.
 ///
 ///     EXPECT_EQ(statusOfChild([&] { return lock.tryLock() ? 0 : 1; }), 0);
 
@@ -19,8 +19,8 @@
 #define RT_TEST_IS_APPLE 0
 #endif
 
-/// Starts a child that runs `body` and ends with what it returns. One that hangs is ended by SIGALRM. Returns
-/// the child's identifier, negative where there is none.
+/// Starts a child that runs `body` and exits with its result. SIGALRM ends a child that hangs. Returns the
+/// child's process identifier, or a negative number if there is no child.
 template <class Body>
 pid_t startChild(Body body) {
   constexpr unsigned kPatienceInSeconds = 120;
@@ -32,21 +32,21 @@ pid_t startChild(Body body) {
   return child;
 }
 
-/// Waits until `child` has ended. Returns its exit status, or the number of the signal that has ended it,
-/// negative.
+/// Waits until `child` has ended. Returns its exit status, or the negated number of the signal that ended it.
+/// Returns -1000 if there is no such child.
 inline int statusOf(pid_t child) {
   int status = 0;
   if (child < 0 || waitpid(child, &status, 0) != child) return -1000;
   return WIFEXITED(status) ? WEXITSTATUS(status) : -WTERMSIG(status);
 }
 
-/// Both.
+/// Starts a child that runs `body`, waits until it has ended, and returns its status.
 template <class Body>
 int statusOfChild(Body body) {
   return statusOf(startChild(body));
 }
 
-/// A thread that holds a lock until it is told to let it go, or for as long as this lives.
+/// Holds a lock on another thread until `letGo` is called or this object is destroyed.
 template <class Lock>
 class HeldElsewhere {
  public:

@@ -1,6 +1,6 @@
 #pragma once
 
-// What the tests of keyed archives share: objects of classes that can be archived, more or less.
+// Classes for the tests of keyed archives. Some can be archived correctly, others misbehave.
 
 #include <gtest/gtest.h>
 
@@ -24,7 +24,7 @@
 
 class Plain final : public rt::Implements<Plain, rt::Object> {};
 
-// A value class: a name, and what else there is.
+// A value class with a name and another object.
 class Tag : public rt::Implements<Tag, rt::Object, rt::SecureCoding> {
  public:
   explicit Tag(rt::String name, rt::Ref<rt::Object> other = nullptr)
@@ -69,12 +69,12 @@ class OnlyCoding final : public rt::Implements<OnlyCoding, rt::Object, rt::Codin
  public:
   void encodeWithCoder(rt::KeyedArchiver& coder) const override { coder.encodeObject(nullptr, "key"); }
   static rt::Ref<OnlyCoding> initWithCoder(rt::KeyedUnarchiver&) {
-    ADD_FAILURE() << "made of an archive";
+    ADD_FAILURE() << "the object must not be decoded";
     return rt::make<OnlyCoding>();
   }
 };
 
-// Does what its name says, by what stands in the archive.
+// Misbehaves in the way that `how_` names. When it is decoded, the archive supplies that name.
 class Misbehaving final : public rt::Implements<Misbehaving, rt::Object, rt::SecureCoding> {
  public:
   explicit Misbehaving(rt::String how) : how_(std::move(how)) {}

@@ -1,7 +1,7 @@
 #pragma once
 
-// What the tests of the multiplexer share: a multiplexer without a system logger, and filters and loggers
-// that trace what reaches them.
+// A fixture for the tests of the multiplexer. Its multiplexer has no system logger. Its filters and loggers
+// trace the messages that reach them.
 
 #include <gtest/gtest.h>
 
@@ -14,7 +14,7 @@
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "tests/support/TestLoggers.h"
 
-// A system logger that writes nowhere.
+// A system logger that does not write to the system's log.
 class TestSystemLogger final : public rt::Implements<TestSystemLogger, LUMSystemLogger> {
  public:
   explicit TestSystemLogger(TestSyncLogger::Action action)
@@ -26,7 +26,7 @@ class TestSystemLogger final : public rt::Implements<TestSystemLogger, LUMSystem
   const TestSyncLogger::Action action_;
 };
 
-// What filters and loggers of tests throw.
+// The exception that filters and loggers of tests throw.
 struct Thrown {};
 
 inline void inAnotherThread(const std::function<void()>& body) {
@@ -37,7 +37,7 @@ class LUMLogMultiplexerTest : public testing::Test {
  protected:
   LUMLogMultiplexerTest() { GTEST_FLAG_SET(death_test_style, "threadsafe"); }
 
-  // Traces "name", or "name text".
+  // Returns an action that traces "name", or "name text" if `withText` is true.
   TestSyncLogger::Action tracing(std::string name, bool withText = false) {
     return [this, name = std::move(name), withText](const rt::Ref<LUMLogMessage>& message) {
       trace_.add(withText ? name + ' ' + text(*message) : name);
@@ -59,7 +59,7 @@ class LUMLogMultiplexerTest : public testing::Test {
   rt::Ref<LUMSystemLogger> system(std::string name) {
     return rt::make<TestSystemLogger>(tracing(std::move(name)));
   }
-  // Traces "name" and answers `answer`.
+  // Returns a filter that traces "name" and returns `answer`.
   rt::Ref<LUMLogFilter> filter(std::string name, bool answer) {
     return rt::make<TestFilter>([this, name = std::move(name), answer](const LUMLogMessage&) {
       trace_.add(name);
@@ -70,7 +70,7 @@ class LUMLogMultiplexerTest : public testing::Test {
   void log(const rt::String& text = rt::String::fromUTF8("x"), LUMLogLevel level = LUMLogLevelInfo) {
     multiplexer_->logWithMessage(messageWith(level, text));
   }
-  // Returns when everything that was logged has been delivered.
+  // Waits until all logged messages have been delivered.
   void drain() {
     multiplexer_->waitForLogging();
     queue_->barrierSync();

@@ -1,10 +1,10 @@
-# Programs of parts that are linked in many ways, to see that what is announced when a program is loaded is
-# announced in each of them.
+# Compiles and links the parts of test programs in many ways. The tests show that load hooks, classes and class methods
+# are found however a program is linked.
 
 include_guard(GLOBAL)
 include(CheckLinkerFlag)
 
-# linked_part(NAME SOURCE OPTION…): compiles SOURCE with the options, to the object library NAME.
+# linked_part(NAME SOURCE OPTION…) compiles SOURCE with the options and adds the object library NAME.
 function(linked_part name source)
   add_library(${name} OBJECT ${source})
   target_include_directories(${name} PRIVATE "${PROJECT_SOURCE_DIR}")
@@ -12,9 +12,12 @@ function(linked_part name source)
   target_link_libraries(${name} PRIVATE MountPoint::Options)
 endfunction()
 
-# linked_variants(PREFIX): calls PREFIX_parts(SET OPTION…) for each way of compiling the parts, and for each way of
-# linking those of SET PREFIX_ways(SET NAME OPTION…), where NAME tells the way. The options are those of the linker,
-# for all that is linked; MountPoint::Options are not to be linked, since not every linker knows all of them.
+# linked_variants(PREFIX) calls two functions of the caller:
+#
+#   PREFIX_parts(SET OPTION…)          once for each way to compile the parts; OPTION… are compiler options
+#   PREFIX_ways(SET NAME OPTION…)      once for each way NAME to link the parts of SET; OPTION… are linker options
+#
+# Do not link MountPoint::Options, because not every linker knows all of those options.
 function(linked_variants prefix)
   function(parts)
     cmake_language(CALL ${prefix}_parts ${ARGN})
@@ -22,7 +25,7 @@ function(linked_variants prefix)
   function(ways set name)
     set(options ${instrumentation} ${ARGN})
     if(CMAKE_SYSTEM_NAME STREQUAL "Linux")
-      # Nothing need refer to a library for it to matter.
+      # A library must be linked even if no symbol refers to it.
       list(APPEND options -Wl,--no-as-needed)
     endif()
     cmake_language(CALL ${prefix}_ways ${set} ${name} ${options})
@@ -35,7 +38,7 @@ function(linked_variants prefix)
   endif()
 
   if(CMAKE_SYSTEM_NAME STREQUAL "Linux")
-    # The linkers differ in what they discard.
+    # Each linker discards different sections.
     foreach(linker bfd gold lld)
       check_linker_flag(CXX -fuse-ld=${linker} MOUNT_POINT_HAS_${linker})
       if(MOUNT_POINT_HAS_${linker})
@@ -47,7 +50,7 @@ function(linked_variants prefix)
   parts(hidden -fvisibility=hidden -fvisibility-inlines-hidden)
   ways(hidden hidden)
 
-  # Clang's link-time optimisation needs its own linker, and the archiver may be older than the compiler.
+  # clang's link-time optimisation needs lld. The objects are "fat" because the archiver may be older than the compiler.
   if(CMAKE_CXX_COMPILER_ID STREQUAL "GNU")
     parts(lto -flto)
     ways(lto lto -flto)

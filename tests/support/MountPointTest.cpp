@@ -15,10 +15,10 @@ namespace fs = std::filesystem;
 
 namespace {
 
-// Where a trace of the command goes.
+// The file for a trace of the command.
 constexpr const char* kTrace = "/trace";
 
-// Why no private root could be made; empty when there is one.
+// The reason why there is no private root. Empty if there is one.
 std::string refusal;
 bool asMachineRoot = false;
 
@@ -64,7 +64,7 @@ std::vector<std::string> MountPointTest::systemCalls(const std::vector<std::stri
                                                      const std::function<void()>& beforeExec) {
   std::vector<std::string> whole = {"strace", "-f", "-qq", "-s", "200", "-o", kTrace, kCommand};
   whole.insert(whole.end(), arguments.begin(), arguments.end());
-  // Empty, and for everybody: strace opens it as its real user.
+  // The file is empty and writable for all users, because strace opens it as its real user.
   std::ofstream(kTrace).close();
   chmod(kTrace, 0666);
   runProcess(whole, beforeExec);
@@ -72,8 +72,8 @@ std::vector<std::string> MountPointTest::systemCalls(const std::vector<std::stri
   std::vector<std::string> calls;
   for (std::string line; std::getline(file, line);) {
     line.erase(0, line.find_first_not_of("0123456789 "));
-    // The C library's start ends with making the relocations read-only, that of the libraries with asking
-    // which thread this is.
+    // This drops the calls of the start-up. The C library's start-up ends when it makes the relocations
+    // read-only. The libraries' start-up ends when they ask for the thread's identifier.
     if (line.starts_with("mprotect(") || line.starts_with("gettid(") || line.starts_with("getpid(")) {
       calls.clear();
     } else if (line.find('(') != std::string::npos) {
@@ -130,11 +130,11 @@ void require(bool succeeded) {
 
 namespace {
 
-// Enters a private root, as an ordinary user if asked, and puts the command there. Throws where the
-// machine does not allow it.
+// Enters a private root and copies the command into it. If `asOrdinaryUser` is true, becomes an ordinary user
+// first. Throws if the machine does not allow this.
 void enterPrivateRoot(const char* command, bool asOrdinaryUser) {
   if (asOrdinaryUser && std::string_view(INSTRUMENTATION) == "coverage") {
-    throw std::runtime_error("a coverage build writes its counts where only its builder may");
+    throw std::runtime_error("only its builder may write the counts of a coverage build");
   }
   std::ifstream built(MOUNT_POINT, std::ios::binary);
   if (asOrdinaryUser) PrivateRoot::becomeOrdinaryUser();

@@ -12,42 +12,46 @@
 #include "tests/support/PrivateRoot.h"
 #include "tests/support/Process.h"
 
-/// Throws std::system_error with `errno` where a call has not succeeded.
+/// Throws std::system_error with `errno` if `succeeded` is false.
 void require(bool succeeded);
 
-/// Runs the built command in a private root, on a real /Volumes that each case finds empty. The test programs
-/// with it run as root and, with the argument --as-ordinary-user, once more as an ordinary user; what one of
-/// them cannot do is skipped. Brings `main`.
+/// Runs the built command in a private root. Its /Volumes is real, and empty at the start of each case.
+/// MountPointTest.cpp defines `main`.
+///
+/// With the argument --as-ordinary-user, a test program that root starts runs as an ordinary user. A case
+/// that needs another user is skipped.
 class MountPointTest : public testing::Test {
  protected:
-  /// The command under test: a copy in the private root, where an ordinary user may run it whoever built it.
+  /// The command under test. It is a copy in the private root, so that an ordinary user may run it whoever
+  /// built it.
   static constexpr const char* kCommand = "/mount-point";
-  /// What the compiler added to the command under test: nothing, or the name of a sanitizer or "coverage".
+  /// The command's instrumentation: "", "coverage" or the name of a sanitizer.
   static constexpr std::string_view kInstrumentation = INSTRUMENTATION;
 
   void SetUp() override;
 
-  /// Whether the program runs as the machine's root, with all identifiers at hand, and not as the root of a
-  /// user namespace in which only one is mapped.
+  /// Returns whether the program runs as the machine's root, who may use all user and group identifiers.
+  /// Otherwise it runs as the root of a user namespace in which only one of each is mapped.
   static bool isMachineRoot();
 
   static ProcessResult run(std::vector<std::string> arguments, const std::function<void()>& beforeExec = {});
 
-  /// Runs the command with the system calls of `calls` (comma-separated) failing with `error`. strace says
-  /// more of `error`, as in "EINTR:when=1".
+  /// Runs the command and makes the system calls in `calls` (comma-separated) fail with `error`. `error` has
+  /// strace's syntax, for example "EINTR:when=1".
   static ProcessResult runInjected(const std::string& calls, const std::string& error,
                                    const std::vector<std::string>& arguments,
                                    const std::function<void()>& beforeExec = {});
 
-  /// What the command, once it has started, asks the system for, a line each as strace writes it.
+  /// Runs the command and returns its system calls, one line of strace's output each. Leaves out the calls
+  /// that start the program.
   static std::vector<std::string> systemCalls(const std::vector<std::string>& arguments,
                                               const std::function<void()>& beforeExec = leaveLeaksAlone);
 
-  /// Runs the command with none of root's capabilities.
+  /// Runs the command without root's capabilities.
   static ProcessResult runPowerless(const std::vector<std::string>& arguments);
 
-  /// The leak checker of an instrumented build cannot work below a tracer, nor where the process may not
-  /// trace its like; called before the program starts.
+  /// Turns off the leak checker of an instrumented build. It cannot work while the process is traced, nor if
+  /// the process may not trace others of the same user. Call it before the program starts.
   static void leaveLeaksAlone();
 
   static void expectResult(const ProcessResult& result, int exitStatus, const std::string& standardError,

@@ -1,6 +1,7 @@
 #pragma once
 
-// What the tests of the error handler share: a handler as it is at first, whose callbacks leave a trace.
+// A fixture for the tests of the error handler. Each test begins with the handler in its initial state. Its
+// callbacks trace the errors.
 
 #include <gtest/gtest.h>
 
@@ -14,7 +15,7 @@
 #include "Shared/Logging/LUMSystemLogger.h"
 #include "tests/support/TestLoggers.h"
 
-// The face of the banner, by its characters.
+// The face in the banner, as UTF-8.
 inline constexpr const char* kFace = "\x3c\x28\xe2\x80\xa2\xcc\x80\x5f\xe2\x80\xa2\xcc\x81\x29\x3e";
 
 inline std::string string(const rt::String& text) {
@@ -25,7 +26,7 @@ inline void logError(const rt::String& text = rt::String::fromUTF8("wrong")) {
   LUMLogMultiplexer::sharedInstance()->logWithMessage(messageWith(LUMLogLevelFault, text));
 }
 
-// The system's log would only repeat what is reported here.
+// Keeps the errors of these tests out of the system's log.
 inline void silenceSystemLog() {
   LUMLogMultiplexer::sharedInstance()->addSyncLogger(
       LUMSystemLogger::initWithFilter(LUMLogDropAllFilter::init()));
@@ -44,7 +45,7 @@ class PECErrorHandlerTest : public testing::Test {
     PECErrorHandler::resetAfterTest();
   }
 
-  // Keeps the texts of the errors that it is told of.
+  // Returns a callback that traces `name` and the error's text.
   PECErrorHandlerBlock tracing(std::string name = "") {
     return [this, name = std::move(name)](const rt::Ref<PECErrorDescription>& error) {
       trace_.add(name + string(error->errorMessage()));

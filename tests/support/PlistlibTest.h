@@ -1,7 +1,7 @@
 #pragma once
 
-/// A fixture for what Python's plistlib reads and writes: a file in a directory of the test's own, and
-/// scripts that find plistlib imported and the file's path in `path`.
+/// A fixture for tests that exchange property lists with Python's plistlib. It has a file in its own
+/// directory. Its scripts have plistlib imported, and the file's path in `path`.
 ///
 ///     class KeyedArchiveAndPython : public PlistlibTest {};
 ///
@@ -10,7 +10,7 @@
 ///       EXPECT_EQ(python("print(plistlib.load(open(path, 'rb')))"), "7\n");
 ///     }
 ///
-/// Skips its tests where there is no python3 with plistlib.
+/// Skips its tests if the machine has no python3 with plistlib.
 ///
 /// Not for: anything but tests.
 
@@ -31,7 +31,7 @@ class PlistlibTest : public testing::Test {
  protected:
   void SetUp() override {
     if (runProcess({"python3", "-c", "import plistlib"}).exitStatus != 0) {
-      GTEST_SKIP() << "python3 with its plistlib is not here";
+      GTEST_SKIP() << "python3 with plistlib is missing";
     }
     std::string directory = testing::TempDir() + "plistlib.XXXXXX";
     ASSERT_NE(mkdtemp(directory.data()), nullptr);
@@ -41,7 +41,7 @@ class PlistlibTest : public testing::Test {
     if (!directory_.empty()) std::filesystem::remove_all(directory_);
   }
 
-  /// Runs `script`, which must succeed; returns its output.
+  /// Runs `script` and returns its output. The test fails if the script fails.
   std::string python(const std::string& script) const {
     const ProcessResult result =
         runProcess({"python3", "-c", "import plistlib, sys\npath = sys.argv[1]\n" + script, path()});
@@ -50,12 +50,12 @@ class PlistlibTest : public testing::Test {
   }
   std::string path() const { return directory_ / "file"; }
 
-  /// Makes `bytes` what is in the file.
+  /// Replaces the file's content with `bytes`.
   void writeFile(std::span<const std::byte> bytes) const {
     std::ofstream(path(), std::ios::binary)
         .write(reinterpret_cast<const char*>(bytes.data()), static_cast<std::streamsize>(bytes.size()));
   }
-  /// What is in the file.
+  /// Returns the file's content.
   std::vector<std::byte> readFile() const {
     std::ifstream stream(path(), std::ios::binary);
     const std::string content{std::istreambuf_iterator<char>(stream), {}};

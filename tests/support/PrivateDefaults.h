@@ -12,8 +12,8 @@
 #include "Runtime/Defaults/UserDefaults.h"
 #include "tests/support/SettingsFile.h"
 
-/// Standard user defaults of the test program's own, in a folder that goes with it. To be made before the
-/// first use of any, once a program:
+/// Gives the test program its own standard user defaults, in a temporary folder. The destructor removes the
+/// folder. A program makes one such object, before the first use of user defaults:
 ///
 ///     PrivateDefaults defaults;      // at namespace scope
 ///
@@ -21,7 +21,8 @@
 class PrivateDefaults {
  public:
   PrivateDefaults() {
-    // The program started once more, as for a death test, shares them with the one that started it.
+    // A death test starts the program again. The new process shares the folder of the process that started
+    // it.
     if (const char* const shared = std::getenv(kFolder)) {
       folder_ = shared;
       return;
@@ -37,11 +38,11 @@ class PrivateDefaults {
   PrivateDefaults(const PrivateDefaults&) = delete;
   PrivateDefaults& operator=(const PrivateDefaults&) = delete;
   ~PrivateDefaults() {
-    // Not in a child, which only borrows the folder.
+    // A child of a fork does not own the folder.
     if (getpid() == owner_) std::filesystem::remove_all(folder_);
   }
 
-  /// The file of the settings; its folder is there.
+  /// Returns the path of the settings' file. Its folder exists.
   std::filesystem::path file() const {
     return folder_ / std::filesystem::read_symlink("/proc/self/exe").filename() / "defaults.conf";
   }

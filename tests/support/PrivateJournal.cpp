@@ -37,7 +37,7 @@ void require(bool succeeded, const std::string& what) {
   if (!succeeded) throw std::system_error(errno, std::generic_category(), what);
 }
 
-// Mounts an empty /dev and puts in it what the machine's has.
+// Mounts an empty tmpfs on /dev and binds the machine's devices into it, except /dev/log.
 void enterPrivateDevices() {
   const fs::path devices = "/run/devices";
   fs::create_directory(devices);
@@ -61,7 +61,7 @@ void enterPrivateDevices() {
   require(umount2(devices.c_str(), MNT_DETACH) == 0, "cannot unmount " + devices.string());
 }
 
-// A socket that listens for datagrams at `path`, where nothing may be.
+// Returns a datagram socket bound to `path`. Precondition: `path` does not exist.
 int listenAt(const char* path) {
   const int descriptor = socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0);
   require(descriptor >= 0, "socket");
@@ -72,7 +72,7 @@ int listenAt(const char* path) {
   return descriptor;
 }
 
-// Waits for what a service says to its manager when it is ready.
+// Waits until the service notifies its manager that it is ready.
 void awaitReady(int notifySocket) {
   const timeval wait{60, 0};
   require(setsockopt(notifySocket, SOL_SOCKET, SO_RCVTIMEO, &wait, sizeof wait) == 0, "setsockopt");
@@ -85,7 +85,7 @@ void awaitReady(int notifySocket) {
   }
 }
 
-// Takes one field off the front of what `journalctl --output=export` prints.
+// Removes the first field from the output of `journalctl --output=export` and returns it.
 std::pair<std::string, std::string> takeField(std::string_view& text) {
   const std::size_t lineEnd = text.find('\n');
   const std::string_view line = text.substr(0, lineEnd);
@@ -93,7 +93,7 @@ std::pair<std::string, std::string> takeField(std::string_view& text) {
   if (const std::size_t equals = line.find('='); equals != std::string_view::npos) {
     return {std::string(line.substr(0, equals)), std::string(line.substr(equals + 1))};
   }
-  // A value that is no line of text: its length in 8 bytes, and its bytes.
+  // A value that is not a line of text is printed as its length in 8 bytes, followed by its bytes.
   std::uint64_t length = 0;
   for (std::size_t i = 8; i-- > 0;) length = length << 8U | static_cast<unsigned char>(text.at(i));
   std::pair<std::string, std::string> field{line, text.substr(8, length)};
@@ -128,7 +128,7 @@ PrivateJournal::PrivateJournal(Sockets sockets) {
   fs::remove_all("/run/log/journal");
   if (sockets == Sockets::ownedByManager) {
     listeningSocket_ = listenAt(kSocket);
-    // As the service manager does, so that the daemon knows who sends.
+    // The service manager does the same, so that journald knows the senders.
     const int on = 1;
     require(setsockopt(listeningSocket_, SOL_SOCKET, SO_PASSCRED, &on, sizeof on) == 0, "setsockopt");
   }
@@ -148,7 +148,8 @@ PrivateJournal::~PrivateJournal() {
 void PrivateJournal::start() {
   fs::remove(kNotifySocket);
   const int notifySocket = listenAt(kNotifySocket);
-  // The shell knows its own process identifier, which is to become the daemon's.
+  // LISTEN_PID must be journald's process identifier. The shell knows it, because `exec` replaces the shell
+  // by journald.
   const std::string command = std::string("NOTIFY_SOCKET=") + kNotifySocket +
                               (listeningSocket_ >= 0 ? " LISTEN_FDS=1 LISTEN_PID=$$" : "") +
                               " exec setpriv --pdeathsig KILL " + kDaemon;

@@ -7,8 +7,8 @@
 #include <string>
 #include <vector>
 
-/// A journal of one's own: the machine's journald, run in a private root with an empty /run and a /dev in
-/// which anybody may listen at /dev/log, so that it hears nobody but this process and its children.
+/// Runs the machine's journald as a private journal that hears only this process and its children. It runs in
+/// a private root with an empty /run. That root has its own /dev, so that a test may listen at /dev/log.
 ///
 ///     PrivateJournal::enter();
 ///     PrivateJournal journal;
@@ -16,27 +16,28 @@
 ///     ... log ...
 ///     for (PrivateJournal::Entry& entry : journal.entries("SUBSYSTEM=com.example")) entry["MESSAGE"] ...
 ///
-/// Linux only. Every operation throws std::system_error or std::runtime_error, with the reason, where the
-/// machine does not let it happen. Stopped with the object.
+/// Linux only. The destructor stops journald.
+///
+/// Errors: if the machine does not allow an operation, it throws std::system_error or std::runtime_error with
+/// the reason.
 class PrivateJournal {
  public:
-  /// An entry's fields, as the journal has stored them.
+  /// The stored fields of an entry.
   using Entry = std::map<std::string, std::string>;
 
   enum class Sockets : std::uint8_t {
-    /// journald makes its socket, and a new one when it is started anew: entries that it has not read
-    /// when it stops are lost.
+    /// journald makes its own socket, and a new one at each start. When it stops, unread entries are lost.
     ownedByDaemon,
-    /// The socket is this object's, as it is the service manager's in a running system, and outlives the
-    /// daemon: entries wait in it until journald is there again.
+    /// This object owns the socket, as the service manager does in a running system. The socket outlives
+    /// journald, and entries wait in it until journald starts again.
     ownedByManager,
   };
 
-  /// Moves this process, which must have one thread, into a private root with an empty /run and a /dev of
-  /// its own.
+  /// Moves this process into a private root with an empty /run and its own /dev. Precondition: the process
+  /// has one thread.
   static void enter();
 
-  /// Whether `enter` succeeded in this process.
+  /// Returns whether `enter` succeeded in this process.
   static bool entered();
 
   explicit PrivateJournal(Sockets sockets = Sockets::ownedByDaemon);
@@ -44,17 +45,18 @@ class PrivateJournal {
   PrivateJournal& operator=(const PrivateJournal&) = delete;
   ~PrivateJournal();
 
-  /// Starts journald and returns when it listens. Not while it runs.
+  /// Starts journald and waits until it listens. Precondition: journald is not running.
   void start();
 
-  /// Ends journald, when it has stored what it was sent, and waits until it is gone.
+  /// Stops journald and waits until it has ended. Before it ends, journald stores the entries that it has
+  /// received.
   void stop();
 
-  /// Keeps journald, which runs, from running, and lets it go on.
+  /// Suspends and resumes journald. Precondition of `suspend`: journald is running.
   void suspend() const;
   void resume() const;
 
-  /// The entries that match, of all that have been sent until now, in the order of their arrival.
+  /// Returns all matching entries that have been sent so far, in order of arrival.
   std::vector<Entry> entries(const std::string& match) const;
 
  private:

@@ -1,6 +1,6 @@
-// The private root is a tmpfs. Every top-level directory but /Volumes is bound into it. Then follows
-// `pivot_root`. Root needs a mount namespace for it, an ordinary user also a user namespace. `chroot` would
-// not do, because no further user namespace can be made inside of it.
+// The private root is a tmpfs. Every top-level directory except /Volumes is bound into it. Then `pivot_root`
+// makes it the process's root. Root needs a mount namespace for this, an ordinary user also a user namespace.
+// `chroot` would not suffice, because a process in a chroot cannot create user namespaces.
 
 #include "tests/support/PrivateRoot.h"
 
@@ -28,7 +28,7 @@ void require(bool succeeded, const std::string& what) {
   if (!succeeded) throw std::system_error(errno, std::generic_category(), what);
 }
 
-// Writes `text` to a file of /proc, which takes it in one write or not at all.
+// Writes `text` to a file in /proc. Such a file accepts only a single write.
 void writeWhole(const char* path, const std::string& text) {
   const int file = open(path, O_WRONLY | O_CLOEXEC);
   require(file >= 0, path);
@@ -37,7 +37,7 @@ void writeWhole(const char* path, const std::string& text) {
   require(written == static_cast<ssize_t>(text.size()), path);
 }
 
-// Makes the caller root of a new user namespace, with its own user and group as the only ones mapped.
+// Makes the caller root in a new user namespace. Only its own user and group are mapped.
 void becomeRoot() {
   const std::string user = std::to_string(geteuid());
   const std::string group = std::to_string(getegid());
@@ -47,7 +47,7 @@ void becomeRoot() {
   writeWhole("/proc/self/gid_map", "0 " + group + " 1");
 }
 
-// Gives `root` every entry of "/" but Volumes: directories bound, symbolic links copied.
+// Mirrors every entry of "/" except Volumes in `root`: binds directories and copies symbolic links.
 void mirrorRoot(const fs::path& root) {
   for (const fs::directory_entry& entry : fs::directory_iterator("/")) {
     const fs::path name = entry.path().filename();
@@ -76,15 +76,14 @@ void enter() {
   require(mkdtemp(scratch.data()) != nullptr, "cannot make " + scratch);
   require(mount("tmpfs", scratch.c_str(), "tmpfs", 0, "mode=0755") == 0, "cannot mount a tmpfs");
   mirrorRoot(scratch);
-  // The old root goes below the new one and is let go of there; a chroot would not do, since no
-  // user namespace can be made in one.
+  // pivot_root moves the old root below the new one, where it is detached.
   fs::create_directory(scratch + "/old-root");
   require(syscall(SYS_pivot_root, scratch.c_str(), (scratch + "/old-root").c_str()) == 0,
           "cannot pivot the root");
   fs::current_path("/");
   require(umount2("/old-root", MNT_DETACH) == 0, "cannot detach the old root");
   fs::remove("/old-root");
-  // The mirrored /tmp shows the scratch once more, as a mount of itself.
+  // The mirrored /tmp contains a second mount of the scratch directory.
   require(umount2(scratch.c_str(), MNT_DETACH) == 0, "cannot detach the scratch");
   fs::remove(scratch);
 
@@ -99,10 +98,11 @@ bool entered() {
 }
 
 void becomeOrdinaryUser() {
-  if (geteuid() != 0) throw std::runtime_error("this is an ordinary user already, as whom the suite runs");
+  if (geteuid() != 0) throw std::runtime_error("the suite already runs as an ordinary user");
   require(setgroups(0, nullptr) == 0 && setgid(kOrdinaryGroup) == 0 && setuid(kOrdinaryUser) == 0,
           "cannot become an ordinary user");
-  // Who changes identity loses the say over its own /proc entries, in which namespaces are set up.
+  // A process that changes its identity may no longer write its own entries in /proc, which `enter` needs.
+  // This call restores that right.
   require(prctl(PR_SET_DUMPABLE, 1) == 0, "cannot take the say over /proc back");
 }
 

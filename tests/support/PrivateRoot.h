@@ -4,39 +4,41 @@
 
 #include <string>
 
-/// A root file system of one's own, in which /Volumes is a fresh tmpfs that nobody else sees and
-/// every other directory is the machine's.
+/// Gives a process its own root file system. There, /Volumes is an empty tmpfs that no other process sees.
+/// Every other directory is the machine's.
 ///
 ///     PrivateRoot::enter();
-///     PrivateRoot::mountVolumes("nr_inodes=2");    // instead of the empty one: one that is soon full
+///     PrivateRoot::mountVolumes("nr_inodes=2");    // mounts a tmpfs that is soon full over the first one
 ///
-/// Linux only. Not thread-safe: meant for a program that has one thread. Every operation throws
-/// std::system_error, naming what was refused, when the machine does not let it happen.
+/// Linux only.
+///
+/// Threads: not thread-safe; the program must have only one thread.
+///
+/// Errors: if the machine refuses an operation, it throws std::system_error and names what was refused.
 namespace PrivateRoot {
 
-/// Moves this process, and the children it starts later, into new mount and (unless it is root) user
-/// namespaces, and makes the private root theirs, with an empty /Volumes. An ordinary user becomes
-/// root there, with only its own user and group mapped. The working directory stays, or
-/// becomes "/" where the new root may not enter it. After an
-/// exception the process must not go on as if its file system were private.
+/// Moves this process and its later children into the private root, with an empty /Volumes. It uses a new
+/// mount namespace. An ordinary user also gets a new user namespace, and is root there; only its own user and
+/// group are mapped. The working directory stays the same, or becomes "/" if the new root may not enter it.
+/// After an exception, the file system may still be the machine's.
 void enter();
 
-/// Whether `enter` succeeded in this process.
+/// Returns whether `enter` succeeded in this process.
 bool entered();
 
-/// Makes this process, which root runs, an ordinary user's, as whom it may `enter` afterwards: user
-/// `kOrdinaryUser` and group `kOrdinaryGroup`, which differ so that neither can stand for the other. Throws
-/// std::runtime_error where an ordinary user runs it already.
+/// Changes this process from root to an ordinary user, who may call `enter` afterwards. The user is
+/// `kOrdinaryUser`, the group `kOrdinaryGroup`. The two numbers differ, so that a test notices if they are
+/// confused. Throws std::runtime_error if the process does not run as root.
 void becomeOrdinaryUser();
 
 inline constexpr uid_t kOrdinaryUser = 1000;
 inline constexpr gid_t kOrdinaryGroup = 1001;
 
-/// Mounts an empty tmpfs, mode 0755, over /Volumes, which is made when it is missing. `options` are
-/// further options of tmpfs, comma-separated.
+/// Mounts an empty tmpfs with mode 0755 over /Volumes. Makes the directory if it is missing. `options` are
+/// further options of the tmpfs, comma-separated.
 void mountVolumes(const std::string& options = "");
 
-/// Unmounts all that is mounted on /Volumes and removes the directory with all that is in it.
+/// Unmounts everything that is mounted on /Volumes, then removes the directory and its content.
 void removeVolumes();
 
 }  // namespace PrivateRoot

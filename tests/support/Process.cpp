@@ -33,7 +33,7 @@ struct Pipe {
   }
 };
 
-// Appends what can be read now; closes the descriptor and makes it -1 at the end of the stream.
+// Appends the bytes that can be read now. At the end of the stream, closes the descriptor and sets it to -1.
 void drain(int& descriptor, std::string& text) {
   std::array<char, 65536> buffer{};
   const ssize_t count = read(descriptor, buffer.data(), buffer.size());
@@ -100,12 +100,13 @@ bool RunningProcess::reap(int& status, int options) {
   return true;
 }
 
-// Each stop is the program's start, a signal, or one side of a system call, which has the bit 0x80.
+// The program stops at its start, at each signal, and before and after each system call. The stop for a
+// system call has the bit 0x80.
 StoppedProcess::StoppedProcess(long systemCall, const std::vector<std::string>& arguments,
                                const std::function<void()>& beforeExec)
     : RunningProcess(arguments, [&] {
-        // While it is still who its tracer is: the kernel asks at the program's start whether that one may
-        // trace it.
+        // This must come before `beforeExec`, while the child has the same identity as its tracer. The kernel
+        // checks again at the program's start whether the tracer may trace it.
         require(ptrace(PTRACE_TRACEME, 0, nullptr, nullptr) == 0, "ptrace");
         if (beforeExec) beforeExec();
       }) {

@@ -9,34 +9,37 @@
 
 /// How a program ended and what it wrote.
 struct ProcessResult {
-  /// The exit status; none when a signal ended the program.
+  /// The exit status. Empty if a signal ended the program.
   std::optional<int> exitStatus;
-  /// The signal that ended the program; 0 when it exited.
+  /// The signal that ended the program. 0 if it exited.
   int signal = 0;
   std::string standardOutput;
   std::string standardError;
 };
 
-/// A program under way, the one at `arguments[0]` (searched for in PATH), with pipes as its standard output
-/// and error and nothing to read on standard input. `arguments` may be empty only together with `program`,
-/// which names the file to execute instead of `arguments[0]`.
+/// Represents a running program. Its standard output and error are pipes, and its standard input is empty.
 ///
-/// `beforeExec`, when given, runs in the child, after its standard streams are in place and before
-/// the program starts: the place to close a stream, set a umask or drop an identity.
+/// The constructor starts `program` or, if `program` is empty, `arguments[0]`. It searches for the file in
+/// PATH. `arguments` may be empty only if `program` is given.
 ///
-/// Throws std::system_error where no process can be started. Not thread-safe.
+/// `beforeExec` runs in the child after its standard streams are set up and before the program starts. It may
+/// close a stream, set the umask or drop privileges.
+///
+/// Threads: not thread-safe.
+///
+/// Errors: throws std::system_error if no process can be started.
 class RunningProcess {
  public:
   explicit RunningProcess(const std::vector<std::string>& arguments,
                           const std::function<void()>& beforeExec = {}, const std::string& program = "");
-  /// Ends the program where nobody has waited for its end.
+  /// Kills the program, unless `wait` has been called.
   ~RunningProcess();
   RunningProcess(const RunningProcess&) = delete;
   RunningProcess& operator=(const RunningProcess&) = delete;
 
   pid_t identifier() const { return child_; }
 
-  /// Waits until the program has ended. To be called once.
+  /// Waits until the program has ended. Call it at most once.
   ProcessResult wait();
 
  private:
@@ -48,22 +51,23 @@ class RunningProcess {
   int error_ = -1;
 };
 
-/// A program that stands still at the end of its first `systemCall` (a number as SYS_mkdir), as if its user
-/// had sent it SIGSTOP just there: it is traced no more, and goes on at SIGCONT. Where it raises its
-/// privileges, the process that constructs this must be one that may trace it all the same, as root may.
+/// Represents a program that is stopped at the end of its first `systemCall`, which is a number such as
+/// SYS_mkdir. It is in the state that SIGSTOP leaves it in: it is not traced, and SIGCONT continues it. If
+/// the program raises its privileges, the constructing process needs the right to trace it nevertheless, as
+/// root has.
 ///
-/// Throws std::runtime_error where the program ends before it makes the call.
+/// Errors: throws std::runtime_error if the program ends before it makes the call.
 class StoppedProcess : public RunningProcess {
  public:
   StoppedProcess(long systemCall, const std::vector<std::string>& arguments,
                  const std::function<void()>& beforeExec = {});
 };
 
-/// Runs a program to its end; the arguments are `RunningProcess`'s.
+/// Runs a program to its end and returns its result. The arguments are those of `RunningProcess`.
 ///
 ///     ProcessResult result = runProcess({"mkdir", "-m", "700", "/Volumes/a"});
 ProcessResult runProcess(const std::vector<std::string>& arguments,
                          const std::function<void()>& beforeExec = {}, const std::string& program = "");
 
-/// Why this machine does not let one program trace another, as strace does; "" when it does.
+/// Returns the reason why strace cannot trace programs on this machine, or "" if it can.
 std::string tracingRefusal();

@@ -1,6 +1,6 @@
 #pragma once
 
-// What the tests of queues share: a serial queue.
+// A fixture for the tests of queues. It has a serial queue.
 
 #include <gtest/gtest.h>
 

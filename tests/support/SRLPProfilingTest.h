@@ -1,6 +1,6 @@
 #pragma once
 
-/// Implementations whose making is measured, and what was recorded of it.
+/// Provides implementations for the tests of profiling, and finds the events that were recorded for an API.
 ///
 ///     const SRLAPIRegistrationData api = apiNamed("of this test alone");
 ///     const rt::Ref<SRLImplementation> implementation = makesClocks();
@@ -27,7 +27,7 @@
 class Clock final : public rt::Implements<Clock, rt::Object> {};
 class Calendar final : public rt::Implements<Calendar, rt::Object> {};
 
-/// A type whose description is whatever the test does in it.
+/// A type whose `description` calls a function of the test.
 class TalkingType final : public rt::Implements<TalkingType, rt::Object, SRLInstanceType> {
  public:
   explicit TalkingType(std::function<rt::String()> talk) : talk_(std::move(talk)) {}
@@ -38,7 +38,7 @@ class TalkingType final : public rt::Implements<TalkingType, rt::Object, SRLInst
   const std::function<rt::String()> talk_;
 };
 
-/// Does something when it is destroyed.
+/// Calls a function when it is destroyed.
 class AtEnd final : public rt::Implements<AtEnd, rt::Object> {
  public:
   explicit AtEnd(std::function<void()> action) : action_(std::move(action)) {}
@@ -48,7 +48,8 @@ class AtEnd final : public rt::Implements<AtEnd, rt::Object> {
   const std::function<void()> action_;
 };
 
-/// A record, of an API that is no other test's, since the storage is shared by all.
+/// Returns the record of an API. Each test needs an identifier of its own, because all tests share the
+/// storage.
 inline SRLAPIRegistrationData apiNamed(const char* identifier) {
   SRLAPIRegistrationData record;
   record.identifier = identifier;
@@ -67,7 +68,8 @@ inline rt::Ref<SRLImplementation> makes(rt::Ref<SRLInstanceType> type, std::uint
 inline rt::Ref<SRLImplementation> makesClocks(std::uint64_t lifetime = 0) {
   return makes(SRLClassType::initWithClass(&rt::classInfo<Clock>()), lifetime);
 }
-/// What is counted stays in the storage by its description, and an address in that may be taken again.
+/// Returns an implementation whose instances are counted. The storage keeps each count under a description
+/// that contains an address, which a later object may reuse. So the identifier must be unique.
 inline rt::Ref<SRLImplementation> makesNewClocks(std::string_view uniqueIdentifier) {
   return makes(SRLClassType::initWithClass(&rt::classInfo<Clock>()), 1, nullptr, uniqueIdentifier);
 }
@@ -75,7 +77,7 @@ inline rt::Ref<SRLImplementation> makesCalendars() {
   return makes(SRLClassType::initWithClass(&rt::classInfo<Calendar>()));
 }
 
-/// The events for the API, the last stored first.
+/// Returns the events for the API. The newest comes first.
 inline std::vector<rt::Ref<SRLPServiceInitializationEvent>> eventsFor(const SRLAPIRegistrationData& api) {
   std::vector<rt::Ref<SRLPServiceInitializationEvent>> events;
   const rt::Ref<rt::Array> all = SRLProfilingStorage::sharedInstance()->serviceInitializationEvents();

@@ -1,11 +1,11 @@
 #pragma once
 
-/// Which sanitizers the program is compiled with, for tests that a sanitizer's own threads, locks or memory
-/// would disturb: `RT_TEST_THREAD_SANITIZER` and `RT_TEST_ADDRESS_SANITIZER` are 1 or 0.
+/// Defines `RT_TEST_THREAD_SANITIZER` and `RT_TEST_ADDRESS_SANITIZER`: 1 if the program is compiled with that
+/// sanitizer, else 0. They are for tests that a sanitizer's own threads, locks or memory would disturb.
 ///
 ///     if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer has a thread of its own";
 ///
-/// Macros, since some code must not be there at all.
+/// They are macros because some code must not even be compiled.
 
 #if defined(__has_feature)
 #if __has_feature(thread_sanitizer)

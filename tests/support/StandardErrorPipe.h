@@ -10,14 +10,14 @@
 #include <string>
 #include <utility>
 
-/// What the process writes to standard error while this lives: into a pipe, or a pair of sockets, of which
-/// the test has the reading end.
+/// Captures what the process writes to standard error during this object's lifetime. It redirects standard
+/// error to a pipe or a pair of sockets and reads the other end.
 ///
 ///     StandardErrorPipe standardError;
 ///     ... fail ...
 ///     EXPECT_EQ(standardError.text(), "it failed\n");
 ///
-/// They nest.
+/// Objects of this class may be nested.
 class StandardErrorPipe {
  public:
   enum class Kind : std::uint8_t { pipe, socket };
@@ -37,16 +37,16 @@ class StandardErrorPipe {
     if (ends_[1] >= 0) close(ends_[1]);
   }
 
-  /// Leaves what is written without a reader.
+  /// Closes the reading end, so that later writes fail.
   void closeReader() {
     if (ends_[0] >= 0) close(ends_[0]);
     ends_[0] = -1;
   }
 
-  /// Lets nothing that writes wait for room.
+  /// Makes writes fail instead of blocking when there is no room.
   void makeNonBlocking() { fcntl(ends_[1], F_SETFL, fcntl(ends_[1], F_GETFL) | O_NONBLOCK); }
 
-  /// Up to `size` bytes of what was written, as soon as there are any.
+  /// Waits until bytes have been written, then reads and returns up to `size` of them.
   std::string take(std::size_t size) {
     std::string bytes(size, '\0');
     const ssize_t count = read(ends_[0], bytes.data(), size);
@@ -54,7 +54,7 @@ class StandardErrorPipe {
     return bytes;
   }
 
-  /// Everything that was written and not taken; nothing is captured any more.
+  /// Ends the capture. Returns everything that was written and not yet taken.
   std::string text() {
     dup2(kept_, STDERR_FILENO);
     close(std::exchange(ends_[1], -1));
@@ -63,7 +63,7 @@ class StandardErrorPipe {
     return all;
   }
 
-  /// Writes until no more is taken.
+  /// Fills the pipe: writes until there is no room.
   void fill() {
     const int flags = fcntl(ends_[1], F_GETFL);
     makeNonBlocking();

@@ -1,6 +1,7 @@
 #pragma once
 
-// What the tests of the system log share: a private journal, a classic daemon's socket, and what was dropped.
+// A fixture and helpers for the tests of the system log. They read a private journal, play a classic syslog
+// daemon, and count dropped entries.
 
 #include <gtest/gtest.h>
 #include <sys/socket.h>
@@ -22,7 +23,7 @@
 inline constexpr const char* kJournalSocket = "/run/systemd/journal/socket";
 inline constexpr const char* kClassicSocket = "/dev/log";
 
-// Why there is no private journal; empty when there is one.
+// The reason why there is no private journal. Empty if there is one.
 inline std::string refusal;
 
 inline const rt::SystemLog& testLog() {
@@ -31,7 +32,7 @@ inline const rt::SystemLog& testLog() {
   return log;
 }
 
-// The descriptors of this process that are sockets.
+// Returns the descriptors of this process that are sockets.
 inline std::vector<int> sockets() {
   std::vector<int> found;
   for (const std::filesystem::directory_entry& entry : std::filesystem::directory_iterator("/proc/self/fd")) {
@@ -42,12 +43,12 @@ inline std::vector<int> sockets() {
   return found;
 }
 
-// Makes the log start as in a new process.
+// Closes all sockets, so that the log starts as in a new process.
 inline void closeSockets() {
   for (const int descriptor : sockets()) close(descriptor);
 }
 
-// How many entries had been dropped when the test began.
+// The number of entries that had been dropped when the test began.
 inline std::uint64_t droppedBefore = 0;
 
 inline std::uint64_t dropped() {
@@ -64,14 +65,14 @@ inline std::vector<std::string> messages(const PrivateJournal& journal) {
   return all;
 }
 
-// How many dropped entries the journal tells of.
+// Returns how many dropped entries the journal reports.
 inline std::uint64_t reportedDropped(const PrivateJournal& journal) {
   std::uint64_t sum = 0;
   for (PrivateJournal::Entry& entry : journal.entries("SUBSYSTEM=rt")) sum += std::stoull(entry["DROPPED"]);
   return sum;
 }
 
-// A classic daemon's socket.
+// The socket of a classic syslog daemon.
 class ClassicSocket {
  public:
   ClassicSocket() : descriptor_(socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0)) {
@@ -87,7 +88,7 @@ class ClassicSocket {
     std::filesystem::remove(kClassicSocket);
   }
 
-  // The packets that have come.
+  // Reads and returns the packets that have arrived.
   std::vector<std::string> packets() {
     std::vector<std::string> all;
     std::string buffer(65536, '\0');
@@ -106,9 +107,10 @@ class SystemLogTest : public testing::Test {
   void SetUp() override {
     if (!PrivateJournal::entered()) GTEST_SKIP() << refusal;
     std::filesystem::remove(kClassicSocket);
-    // Made now: the child of a fork would wait for ever for a thread of its parent's that is making it.
+    // This constructs the log before any fork. Otherwise a child could wait for ever for a thread of its
+    // parent that was constructing it.
     testLog();
-    // What earlier cases left untold is told now.
+    // This makes the log report the entries that earlier cases dropped.
     if (rt::SystemLog::droppedCount() != 0) {
       const StandardErrorPipe standardError;
       testLog().write(rt::SystemLog::Type::info, "ended");

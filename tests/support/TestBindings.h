@@ -1,6 +1,6 @@
 #pragma once
 
-/// A few services, their records as a generator writes them, and registries that know them.
+/// Provides a few services, their records as a generator writes them, and registries with these records.
 ///
 ///     const TestModule module({{&testClockAPI, testWallClocks}});
 ///     rt::Ref<SRLRegistry> registry = registryWith({&module});
@@ -30,7 +30,7 @@ struct TestClock : rt::Protocol<TestClock> {
 };
 class TestWallClock final : public rt::Implements<TestWallClock, rt::Object, TestClock> {};
 class TestSundial final : public rt::Implements<TestSundial, rt::Object, TestClock> {};
-/// Is no clock.
+/// Does not conform to TestClock.
 class TestStone final : public rt::Implements<TestStone, rt::Object> {};
 
 template <class Service>
@@ -38,14 +38,14 @@ rt::Ref<rt::Object> makeTestService(SRLScopeTagSet) {
   return rt::make<Service>();
 }
 
-/// For one implementation, in scopes 1 and 2.
+/// An API for a single implementation, with scopes 1 and 2.
 inline constinit const SRLAPIRegistrationData testClockAPI{
     .identifier = "Clock",
     .instanceType = {.names = {.protocolName = "TestClock"}},
     .scopeType = 0b11,
     .identifierLength = 5,
 };
-/// For many implementations, in no scope.
+/// An API for many implementations, without scopes.
 inline constinit const SRLAPIRegistrationData testClocksAPI{
     .identifier = "Clocks",
     .instanceType = {.names = {.protocolName = "TestClock"}},
@@ -53,7 +53,7 @@ inline constinit const SRLAPIRegistrationData testClocksAPI{
     .isMultibound = 1,
 };
 
-/// Implementations that are made anew for each request, and live in no scope.
+/// Returns the record of an implementation without scopes. Each request makes a new instance.
 template <class Service>
 constexpr SRLImplementationRegistrationData testImplementation(const char* name) {
   return {.identifier = name,
@@ -71,7 +71,7 @@ inline constinit TestImplementations testSundials[] = {&testSundial, nullptr};
 inline constinit TestImplementations testBothClocks[] = {&testWallClock, &testSundial, nullptr};
 inline constinit TestImplementations testNoClocks[] = {nullptr};
 
-/// A module with some bindings, which it sorts.
+/// A module with the given bindings. The constructor sorts them.
 class TestModule {
  public:
   explicit TestModule(std::vector<_SRLBindingRegistrationData> bindings,
@@ -96,7 +96,7 @@ class TestModule {
   SRLBindingsModuleData data_;
 };
 
-/// A registry with these modules, in their order, which outlive it.
+/// Returns a registry that has registered these modules in order. The modules must outlive the registry.
 inline rt::Ref<SRLRegistry> registryWith(std::initializer_list<const TestModule*> modules) {
   std::vector<const SRLBindingsModuleData*> datas;
   for (const TestModule* module : modules) datas.push_back(module->data());
@@ -105,7 +105,7 @@ inline rt::Ref<SRLRegistry> registryWith(std::initializer_list<const TestModule*
   return registry;
 }
 
-/// An implementation whose instances are of `type`, which may be null, with a factory of its own.
+/// Returns an implementation whose instances are of `type`, which may be null. It has its own factory.
 inline rt::Ref<SRLImplementation> implementationOf(std::string_view identifier, rt::Ref<SRLInstanceType> type,
                                                    SRLScopeType scope = 0) {
   return SRLImplementation::initWithIdentifier(
@@ -113,20 +113,21 @@ inline rt::Ref<SRLImplementation> implementationOf(std::string_view identifier, 
       [](const SRLScopeTagSet&, bool*) -> rt::Ref<rt::Object> { return rt::make<TestWallClock>(); }, nullptr);
 }
 
-/// The same for instances of a class.
+/// Returns an implementation whose instances are of the class `Service`.
 template <class Service>
 rt::Ref<SRLImplementation> implementationOf(std::string_view identifier, SRLScopeType scope = 0) {
   return implementationOf(identifier, SRLClassType::initWithClass(&rt::classInfo<Service>()), scope);
 }
 
-/// What is bound to `api`; null where that is nothing.
+/// Returns the implementation that is bound to `api`, or null.
 inline rt::Ref<SRLImplementation> boundTo(const SRLAPIRegistrationData& api,
                                           const rt::Ref<SRLRegistry>& registry) {
   const rt::LockGuard guard(*registry->lock());
   return registry->implementationForSingleBoundService(&api);
 }
 
-/// How many implementations are bound to `api`, for many; -1 where the registry does not know it.
+/// Returns how many implementations are bound to `api`, or -1 if the registry does not know it. Precondition:
+/// `api` is for many implementations.
 inline std::int64_t countBoundTo(const SRLAPIRegistrationData& api, const rt::Ref<SRLRegistry>& registry) {
   const rt::Ref<rt::Array> instances = registry->internalMultiBoundService(&api, {});
   return instances ? static_cast<std::int64_t>(instances->count()) : -1;

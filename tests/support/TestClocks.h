@@ -1,6 +1,6 @@
 #pragma once
 
-/// Protocols for classes to conform to, one of which inherits the other.
+/// Two protocols that test classes conform to. AlarmClock inherits Clock.
 ///
 /// Not for: anything but tests and benchmarks.
 

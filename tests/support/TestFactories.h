@@ -1,6 +1,6 @@
 #pragma once
 
-/// Factories of instances that are nothing but there, and one that must not be called.
+/// Provides a factory that makes an empty instance, and one that must not be called.
 ///
 /// Not for: anything but tests.
 
@@ -16,8 +16,8 @@ inline rt::Ref<rt::Object> makeInstance() {
   return rt::make<Instance>();
 }
 
-/// For requests that find what they ask for.
+/// A factory that must not be called. It is for requests that find an existing instance.
 inline rt::Ref<rt::Object> mustNotRun() {
-  ADD_FAILURE() << "a factory ran";
+  ADD_FAILURE() << "the factory must not run";
   return nullptr;
 }

@@ -1,6 +1,6 @@
 #pragma once
 
-/// Loggers, filters and formatters that are what a test says, and messages for them.
+/// Provides loggers, filters and formatters that call blocks of the test, and messages for them.
 ///
 ///     Trace trace;
 ///     multiplexer->addSyncLogger(rt::make<TestSyncLogger>([&](const rt::Ref<LUMLogMessage>& message) {
@@ -29,7 +29,7 @@
 #include "Shared/Logging/LUMLogMetadata.h"
 #include "Shared/Logging/LUMSyncLogger.h"
 
-/// A message of nothing but a level, a text and metadata.
+/// Returns a message that has only a level, a text and metadata.
 inline rt::Ref<LUMLogMessage> messageWith(LUMLogLevel level, const rt::String& text = nullptr,
                                           rt::Ref<LUMLogMetadata> metadata = nullptr) {
   return LUMLogMessage::initWithLevel(level, text, text, nullptr, nullptr, 0, nullptr, nullptr, nullptr,
@@ -40,7 +40,7 @@ inline std::string text(const LUMLogMessage& message) {
   return std::string(message.formattedString().view());
 }
 
-/// What happened, in its order. Any thread may add.
+/// Records events in order. Threads: thread-safe.
 class Trace {
  public:
   void add(std::string event) {
@@ -48,7 +48,7 @@ class Trace {
     events_.push_back(std::move(event));
   }
 
-  /// Everything since the last call of this function.
+  /// Removes and returns the recorded events.
   std::vector<std::string> events() {
     const std::scoped_lock guard(mutex_);
     return std::exchange(events_, {});
@@ -59,7 +59,7 @@ class Trace {
   std::vector<std::string> events_;
 };
 
-/// Lets a message pass if a block says so.
+/// A filter that asks a block whether to allow a message.
 class TestFilter final : public rt::Implements<TestFilter, rt::Object, LUMLogFilter> {
  public:
   using Question = rt::Block<bool(const LUMLogMessage&)>;
@@ -72,7 +72,7 @@ class TestFilter final : public rt::Implements<TestFilter, rt::Object, LUMLogFil
   const Question question_;
 };
 
-/// Calls a block, and has a filter that may be null.
+/// A synchronous logger that calls a block for each message. Its filter may be null.
 class TestSyncLogger final : public rt::Implements<TestSyncLogger, rt::Object, LUMSyncLogger> {
  public:
   using Action = rt::Block<void(const rt::Ref<LUMLogMessage>&)>;
@@ -88,12 +88,13 @@ class TestSyncLogger final : public rt::Implements<TestSyncLogger, rt::Object, L
   const rt::Ref<LUMLogFilter> filter_;
 };
 
-/// The same on a queue, which it asks a block for, in a mode, which it asks another block for.
+/// An asynchronous logger that calls a block for each message. Two more blocks choose its queue and its
+/// dispatch mode.
 class TestAsyncLogger final : public rt::Implements<TestAsyncLogger, rt::Object, LUMAsyncLogger> {
  public:
   using Action = TestSyncLogger::Action;
 
-  /// What the logger says; it may be changed until the logger is used.
+  /// The logger's answers. They may be changed until the logger is used.
   rt::Ref<LUMLogFilter> filter_;
   rt::Block<rt::Ref<rt::Queue>()> operationQueue_;
   rt::Block<LUMLogDispatchMode(const LUMLogMessage&)> dispatchMode_ = [](const LUMLogMessage&) {
@@ -114,7 +115,7 @@ class TestAsyncLogger final : public rt::Implements<TestAsyncLogger, rt::Object,
   const Action action_;
 };
 
-/// Makes of a message what a block makes of it.
+/// A formatter that calls a block for each message.
 class TestFormatter final : public rt::Implements<TestFormatter, rt::Object, LUMLogFormatter> {
  public:
   using Making = rt::Block<rt::String(const LUMLogMessage&)>;

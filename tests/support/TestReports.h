@@ -1,11 +1,13 @@
 #pragma once
 
-/// What the libraries report as misuse while it is there, on one thread. The error callback meanwhile
-/// returns, and nothing reaches the system's log.
+/// Records the misuse that the libraries report during its lifetime. Meanwhile the error callback does
+/// nothing, and no message reaches the system's log.
 ///
 ///     TestReports reports;
 ///     SRLClassType::initWithClass(nullptr);
 ///     EXPECT_THAT(reports.texts(), ElementsAre("SRLClassType's concreteClass must not be nil."));
+///
+/// Threads: not thread-safe. Only one thread may report.
 ///
 /// Not for: anything but tests.
 
@@ -44,10 +46,10 @@ class TestReports {
     PECErrorHandler::resetAfterTest();
   }
 
-  /// The messages since the last call of this function or the next.
+  /// Returns the messages since the last call of `messages` or `texts`.
   std::vector<rt::Ref<LUMLogMessage>> messages() { return std::exchange(messages_, {}); }
 
-  /// Their texts, of those that are faults.
+  /// Returns the texts of the faults among these messages.
   std::vector<std::string> texts() {
     std::vector<std::string> texts;
     for (const rt::Ref<LUMLogMessage>& message : messages()) {
@@ -62,7 +64,7 @@ class TestReports {
       [this](const rt::Ref<LUMLogMessage>& message) { messages_.push_back(message); });
 };
 
-/// How many parameters of a message are kept by themselves, as safe ones of type 1.
+/// Returns how many parameters the message keeps as safe parameters of type 1.
 inline std::int32_t countOfSafeParameters(const LUMLogMessage& message) {
   if (!message.safeParameters()) return 0;
   std::int32_t count = 0;

@@ -1,7 +1,7 @@
 #pragma once
 
-/// Services of a bindings module as a generator writes it, and a fixture that makes a registry which knows
-/// them the shared one while a test runs.
+/// Provides the services of a bindings module, as a generator writes it, and a fixture. During a test, the
+/// fixture replaces the shared registry with one that has these services.
 ///
 /// Not for: anything but tests.
 
@@ -21,7 +21,7 @@
 
 namespace TestServices {
 
-/// What the services are: it knows the tags that its factory was given.
+/// The class of the services. An instance stores the tags that its factory was given.
 class Thing : public rt::Implements<Thing, rt::Object> {
  public:
   explicit Thing(const SRLScopeTagSet& given) : tags(given) {}
@@ -29,7 +29,7 @@ class Thing : public rt::Implements<Thing, rt::Object> {
   const SRLScopeTagSet tags;
 };
 
-/// A thing with another.
+/// A thing that contains another object.
 class Nest final : public rt::Implements<Nest, Thing> {
  public:
   Nest(const SRLScopeTagSet& given, rt::Ref<rt::Object> other) : Implements(given), inner(std::move(other)) {}
@@ -37,7 +37,7 @@ class Nest final : public rt::Implements<Nest, Thing> {
   const rt::Ref<rt::Object> inner;
 };
 
-/// What a factory throws.
+/// The exception that a factory throws.
 struct Failure {};
 
 inline int nullsMade = 0;
@@ -55,7 +55,7 @@ inline rt::Ref<rt::Object> throwFailure(SRLScopeTagSet /*tags*/) {
 
 inline constexpr SRLAPIInstanceType kThingType{.names = {.protocolName = nullptr, .className = "Thing"}};
 
-// One for each window and account (bits 1 and 0), of which implementations may want less.
+// An instance for each window (bit 1) and account (bit 0). An implementation may use fewer of these scopes.
 inline constexpr SRLAPIRegistrationData scopedAPI{
     .identifier = "Scoped", .instanceType = kThingType, .scopeType = 0b11, .identifierLength = 6};
 inline constexpr SRLAPIRegistrationData freshAPI{
@@ -77,7 +77,7 @@ inline constexpr SRLAPIRegistrationData manyAPI{.identifier = "Many",
                                                 .isMultibound = 1};
 inline constexpr SRLAPIRegistrationData noneOfManyAPI{
     .identifier = "NoneOfMany", .instanceType = kThingType, .identifierLength = 10, .isMultibound = 1};
-// In no module.
+// APIs that no module has.
 inline constexpr SRLAPIRegistrationData unknownAPI{
     .identifier = "Unknown", .instanceType = kThingType, .identifierLength = 7};
 inline constexpr SRLAPIRegistrationData unknownManyAPI{
@@ -128,13 +128,13 @@ static_assert(SRLAreBindingsSorted(kBindings));
 inline constexpr SRLBindingsModuleData kModule{.bindingsBegin = std::begin(kBindings),
                                                .bindingsEnd = std::end(kBindings)};
 
-/// A set of tags, which the caller keeps.
+/// Returns a set of these tags. The caller must keep the tags alive.
 inline SRLScopeTagSet tagSet(const rt::Ref<rt::Object>& first = nullptr,
                              const rt::Ref<rt::Object>& second = nullptr) {
   return {{first.get(), second.get()}};
 }
 
-/// With a registry that knows the module in the place of the program's own.
+/// Replaces the shared registry with one that has the module's services.
 class ServicesTest : public testing::Test {
  protected:
   ServicesTest() : before_(SRLRegistry::setSharedInstance(registry)) {
@@ -143,8 +143,8 @@ class ServicesTest : public testing::Test {
   }
   ~ServicesTest() override { SRLRegistry::setSharedInstance(before_); }
 
-  /// The texts reported since the last call; each as every report of a registry's operation is made, of its
-  /// parameters in their order.
+  /// Returns the texts that were reported since the last call. Expects that each is a fault of this operation
+  /// of the registry, and that its text is the format with the parameters filled in, in order.
   std::vector<std::string> reportsOf(const std::string& function) {
     std::vector<std::string> texts;
     for (const rt::Ref<LUMLogMessage>& message : reports.messages()) {

@@ -1,6 +1,7 @@
 #pragma once
 
-// What the tests of user defaults share: a folder of their own, what is reported, and what is observed.
+// A fixture for the tests of user defaults. Each test has its own folder, and the fixture records what is
+// reported.
 
 #include <gtest/gtest.h>
 #include <sys/stat.h>
@@ -61,7 +62,7 @@ class UserDefaults : public testing::Test {
   static rt::Ref<rt::UserDefaults> defaultsAt(const std::filesystem::path& path) {
     return rt::UserDefaults::initWithPath(rt::String::fromUTF8(path.string()));
   }
-  // What was reported since the last call.
+  // Returns the reports since the last call.
   std::vector<std::string> reports() {
     const std::scoped_lock lock(mutex_);
     return std::exchange(reports_, {});

@@ -1,6 +1,6 @@
 #pragma once
 
-/// Reports of misuse, whole: everything but the line and the call stack, to be compared at once.
+/// Compares whole reports of misuse: all of their parts except the line's number and the call stack.
 ///
 ///     TestReports reports;
 ///     registry->apiIdentifierFromString(nullptr);
@@ -26,11 +26,12 @@ struct WholeReport {
   std::string file;
   std::string function;
   std::string text;
-  /// The safe strings of type 1, in the order of the arguments, null as "(null)"; anything else is "?".
-  // NOLINTNEXTLINE(readability-redundant-member-init): compilers warn where it is left out
+  /// The safe strings of type 1, in the order of the arguments. Null becomes "(null)", and any other
+  /// parameter "?".
+  // NOLINTNEXTLINE(readability-redundant-member-init): compilers warn if it is left out
   std::vector<std::string> parameters{};
   LUMLogLevel level = LUMLogLevelFault;
-  /// That it has a line, which is not compared.
+  /// Whether the report has a line. The number is not compared.
   bool hasLine = true;
 
   bool operator==(const WholeReport&) const = default;
@@ -43,7 +44,7 @@ struct WholeReport {
   }
 };
 
-/// What `message` is as a report.
+/// Returns `message` as a report.
 inline WholeReport wholeReport(const LUMLogMessage& message) {
   WholeReport report{
       .file = std::string(message.file().view()),
@@ -66,7 +67,7 @@ inline WholeReport wholeReport(const LUMLogMessage& message) {
   return report;
 }
 
-/// The reports since `reports` was last asked.
+/// Returns the reports since the last call of a function of `reports`.
 inline std::vector<WholeReport> wholeReports(TestReports& reports) {
   std::vector<WholeReport> whole;
   for (const rt::Ref<LUMLogMessage>& message : reports.messages()) whole.push_back(wholeReport(*message));

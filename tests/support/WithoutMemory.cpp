@@ -27,20 +27,22 @@ namespace {
 
 using Extent = AllocationFailure::Extent;
 
-// What a child of the process found.
+// The result of a child.
 enum Result : int { kSurvived = 0, kHasNoSuchAllocation = 1, kFailed = 2 };
 
-// Long enough for any machine: only what hangs takes longer.
+// The limit in seconds for a child. Only a child that hangs takes longer on any machine.
 constexpr unsigned kPatience = 120;
 
-// Of first runs, every so manieth: a child of an instrumented program takes long to be there.
+// The step between the allocations that fail in first runs. It is large in instrumented builds, where a fork
+// is slow.
 #ifdef SANITIZES_ALLOCATIONS
 constexpr int kStep = 16;
 #else
 constexpr int kStep = 1;
 #endif
 
-// As often as that, something is lost only by a leak.
+// If the process grows in this many runs in a row, the growth is a leak. In each run, `settlesAt` checks up
+// to kLooks times.
 constexpr int kRunsWithLeak = 20;
 constexpr int kLooks = 100;
 
@@ -50,12 +52,13 @@ bool fail(std::int64_t number, Extent extent, const char* what) {
   return false;
 }
 
-// How many locks the thread holds.
+// Returns how many locks the calling thread holds.
 int heldLocks() {
   return static_cast<int>(rt::detail::ForkGate::heldLocks());
 }
 
-// Whether no more is allocated than that, once the threads of queues have let go of what they have done.
+// Returns whether the process has at most `live` blocks. Waits a while for the threads of queues to release
+// finished tasks.
 bool settlesAt(std::int64_t live) {
   for (int i = 0; i < kLooks; ++i) {
     if (AllocationCount::liveInProcess() <= live) return true;
@@ -64,14 +67,14 @@ bool settlesAt(std::int64_t live) {
   return false;
 }
 
-// Has the allocation fail, and then runs the program with memory. False where something is wrong.
+// Runs the program while the allocation fails, and then with memory. Returns false if a check fails.
 bool survives(const Program& program, std::int64_t number, Extent extent, bool& hasHappened) {
   const int held = heldLocks();
   {
     const AllocationFailure failure(number, extent);
     try {
       program();
-    } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): so be it
+    } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): the program may throw this
     } catch (const std::exception& exception) {
       const AllocationFailure::Pause pause;
       return fail(number, extent, exception.what());
@@ -93,7 +96,7 @@ int resultOfChild(const std::function<Result()>& body) {
   const pid_t child = fork();
   if (child == 0) {
     alarm(kPatience);
-    // Threads that end while allocations are counted would change the count.
+    // Worker threads stay alive. A thread that ended during the count would change it.
     rt::detail::WorkerPool::idleTimeout = std::chrono::nanoseconds(std::chrono::hours(1)).count();
     const int result = body();
     std::fflush(nullptr);
@@ -114,7 +117,7 @@ bool leaksNothing() {
 #endif
 }
 
-// The allocations of a first run, each in a child of its own; gives how many.
+// Makes each allocation of a first run fail, each in its own child. Returns how many it tried.
 std::int64_t tryFirstRuns(const Program& program, Extent extent) {
   std::int64_t tried = 0;
   for (std::int64_t number = 1;; number += kStep) {
@@ -134,14 +137,15 @@ std::int64_t tryFirstRuns(const Program& program, Extent extent) {
   }
 }
 
-// Each allocation of a later run, all in the calling process; gives how many, or -1.
+// Makes each allocation of a later run fail, all in the calling process. Returns how many it tried, or -1 if
+// a check fails.
 std::int64_t tryLaterRuns(const Program& program, Extent extent, Growth growth) {
   program();
   for (std::int64_t number = 1;; ++number) {
     std::fflush(nullptr);
     bool hasHappened = false;
-    // What is found out once may be kept, and so may a thread that a queue has had to start. What is lost
-    // each time is a leak.
+    // A run may allocate what later runs reuse, such as a cache or a queue's thread. A process that grows in
+    // every run has a leak.
     bool leaks = true;
     for (int i = 0; leaks && i < kRunsWithLeak; ++i) {
       const std::int64_t before = AllocationCount::liveInProcess();
@@ -159,7 +163,7 @@ std::int64_t tryLaterRuns(const Program& program, Extent extent, Growth growth) 
 }  // namespace
 
 void tryEachAllocation(const Program& program, Growth growth) {
-  if (!AllocationFailure::isSupported()) GTEST_SKIP() << "no way to have allocations fail here";
+  if (!AllocationFailure::isSupported()) GTEST_SKIP() << "allocations cannot be made to fail on this system";
   for (const Extent extent : {Extent::kOnce, Extent::kFromThenOn}) {
     const std::int64_t first = tryFirstRuns(program, extent);
     if (testing::Test::HasFailure()) return;

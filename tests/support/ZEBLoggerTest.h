@@ -1,7 +1,7 @@
 #pragma once
 
-// What the tests of the older logger share: writers, formatters and filters that do as they are told, and a
-// fixture with a folder and user defaults of its own.
+// A fixture for the tests of the older logger, with its own folder and user defaults. Its writers, formatters
+// and filters call functions of the test.
 
 #include <gtest/gtest.h>
 
@@ -20,10 +20,10 @@
 #include "Foundation/ZEBLogger.h"
 #include "tests/support/PrivateDefaults.h"
 
-// NOLINTNEXTLINE(bugprone-throwing-static-initialization): then there is nothing to test with
+// NOLINTNEXTLINE(bugprone-throwing-static-initialization): if it throws, the tests cannot run
 inline const PrivateDefaults privateDefaults;
 
-// Keeps the lines, each after its level.
+// Records each line with its level before it.
 class Recorder final : public rt::Implements<Recorder, rt::Object, ZEBLogWriter> {
  public:
   void logMessage(const rt::String& message, ZEBLogLevel level) override {

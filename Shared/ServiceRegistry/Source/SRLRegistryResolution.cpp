@@ -6,6 +6,7 @@
 
 #include "Libraries/Util/ErrorHandler/PECReport.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLAPIIdentifier.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLScopedFactory.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingEnabled.h"
 #include "Shared/ServiceRegistry/Source/Profiling/SRLPProfilingMeasurement.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"

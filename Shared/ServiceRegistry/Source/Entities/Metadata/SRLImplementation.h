@@ -11,7 +11,6 @@
 /// Not for: the instances, which are whatever the factory makes.
 
 #include <cstdint>
-#include <optional>
 #include <string_view>
 #include <utility>
 
@@ -25,7 +24,8 @@
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementationConfiguration.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeType.h"
-#include "Shared/ServiceRegistry/Source/Private/SRLScopedFactory.h"
+
+struct SRLScopedFactory;
 
 class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementation, rt::Object> {
  public:
@@ -38,12 +38,6 @@ class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementati
       SRLScopeType scope, SRLFactoryBlock factoryBlock,
       const rt::Ref<SRLImplementationConfiguration>& configuration);
 
-  /// The same for a registry, with a block that does what `scopedFactory` does.
-  static rt::Ref<SRLImplementation> initWithIdentifier(
-      std::string_view identifier, rt::Ref<SRLInstanceType> instanceType, std::uint64_t lifetime,
-      SRLScopeType scope, const SRLScopedFactory& scopedFactory,
-      const rt::Ref<SRLImplementationConfiguration>& configuration);
-
   /// What the factory makes; may be null.
   const rt::Ref<SRLInstanceType>& instanceType() const noexcept { return instanceType_; }
   std::uint64_t lifetime() const noexcept { return lifetime_; }
@@ -52,9 +46,7 @@ class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementati
   const SRLFactoryBlock& factoryBlock() const noexcept { return factoryBlock_; }
   /// What the factory block does, for a registry that looks first whether the instance is there; null where
   /// the block is somebody's own.
-  const SRLScopedFactory* scopedFactory() const noexcept {
-    return scopedFactory_ ? &*scopedFactory_ : nullptr;
-  }
+  const SRLScopedFactory* scopedFactory() const noexcept { return scopedFactory_; }
   /// What the implementation wants to be configured with; may be null.
   const rt::Ref<SRLImplementationConfiguration>& configuration() const noexcept { return configuration_; }
 
@@ -70,7 +62,7 @@ class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementati
  private:
   SRLImplementation(std::string_view identifier, rt::Ref<SRLInstanceType> instanceType,
                     std::uint64_t lifetime, SRLScopeType scope, SRLFactoryBlock factoryBlock,
-                    std::optional<SRLScopedFactory> scopedFactory,
+                    const SRLScopedFactory* scopedFactory,
                     rt::Ref<SRLImplementationConfiguration> configuration) noexcept
       : identifier_(identifier),
         scopeType_(scope),
@@ -85,6 +77,7 @@ class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementati
   const rt::Ref<SRLInstanceType> instanceType_;
   const std::uint64_t lifetime_;
   const SRLFactoryBlock factoryBlock_;
-  const std::optional<SRLScopedFactory> scopedFactory_;
+  // The block's.
+  const SRLScopedFactory* const scopedFactory_;
   const rt::Ref<SRLImplementationConfiguration> configuration_;
 };

@@ -54,7 +54,7 @@ struct SRLRegistryIvars {
 
   /// The scope with these tags; null where there is none.
   SRLMemoizingScope* findScope(const SRLScopeTagSet& tags) RT_REQUIRES(lock) {
-    if (lastScope == nullptr || lastTags != tags.tags || !SRLScopeTagSetEqual(lastScope->first.tags, tags)) {
+    if (lastScope == nullptr || !areLast(tags) || !SRLScopeTagSetEqual(lastScope->first.tags, tags)) {
       const Scopes::Entry* found = scopes.find(ScopeKey(tags));
       if (found == nullptr) return nullptr;
       lastScope = found;
@@ -98,4 +98,14 @@ struct SRLRegistryIvars {
   /// The APIs that were asked for by identifier, which is in their records. Changed under the lock, and
   /// looked into without it.
   SRLTable<std::string_view, const SRLAPIRegistrationData*, SRLIdentifierHash> apisByIdentifier;
+
+ private:
+  // Whether these are the tags of the last request, without asking them. Not by `==`, which is a call.
+  bool areLast(const SRLScopeTagSet& tags) const noexcept RT_REQUIRES(lock) {
+    for (std::size_t i = 0; i < SRLScopeTagSet::kCapacity; ++i) {
+      if (lastTags[i] != tags.tags[i]) return false;
+      if (tags.tags[i] == nullptr) return true;
+    }
+    return true;
+  }
 };

@@ -26,6 +26,7 @@
 #include <cstddef>
 #include <string_view>
 #include <type_traits>
+#include <typeinfo>
 #include <utility>
 
 #include "Runtime/Base/Visibility.h"
@@ -67,6 +68,8 @@ class CapturingBlock final : public BlockBody<Result, Arguments...> {
   Result call(Arguments... arguments) const override {
     return static_cast<Result>(function_(std::forward<Arguments>(arguments)...));
   }
+
+  const Function& function() const noexcept { return function_; }
 
  private:
   mutable Function function_;
@@ -141,6 +144,15 @@ class Block<Result(Arguments...)> {
     if (!body_) [[unlikely]]
       detail::trapOnNullBlock();
     return body_->call(std::forward<Arguments>(arguments)...);
+  }
+
+  /// The callable object that the block was made from, if it is a `Function` with state; null otherwise, and
+  /// for null. The block owns it.
+  template <class Function>
+  const Function* target() const noexcept {
+    using Made = detail::CapturingBlock<Function, Result, Arguments...>;
+    if (!body_ || typeid(*body_) != typeid(Made)) return nullptr;
+    return &static_cast<const Made&>(*body_).function();
   }
 
   explicit operator bool() const noexcept { return body_ != nullptr; }

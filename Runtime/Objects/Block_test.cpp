@@ -93,6 +93,28 @@ TEST(Block, IsTheSameBlockEachTimeIfNothingIsCaptured) {
   EXPECT_NE(make(), rt::Block<int()>([] { return 42; }));
 }
 
+TEST(Block, KnowsWhatItWasMadeFrom) {
+  struct Adder {
+    int number;
+    int operator()(int value) const { return number + value; }
+  };
+  struct Doubler {
+    int operator()(int value) const { return 2 * value; }
+  };
+  using Function = int (*)(int);
+  const rt::Block<int(int)> block = Adder{.number = 2};
+  ASSERT_NE(block.target<Adder>(), nullptr);
+  EXPECT_EQ(block.target<Adder>()->number, 2);
+  EXPECT_EQ(rt::Block<int(int)>(block).target<Adder>(), block.target<Adder>());
+  EXPECT_EQ(block.target<Function>(), nullptr);
+  const rt::Block<int(int)> ofFunction = twice;
+  ASSERT_NE(ofFunction.target<Function>(), nullptr);
+  EXPECT_EQ(*ofFunction.target<Function>(), &twice);
+  EXPECT_EQ(ofFunction.target<Adder>(), nullptr);
+  EXPECT_EQ(rt::Block<int(int)>(Doubler()).target<Doubler>(), nullptr);
+  EXPECT_EQ(rt::Block<int(int)>().target<Adder>(), nullptr);
+}
+
 TEST(Block, IsAnObject) {
   const rt::Ref<Token> token = rt::make<Token>();
   const rt::Block<void()> block = [token] {};

@@ -241,11 +241,11 @@ void SRLRegistry::registerBindings(const _SRLBindingRegistrationData& binding) {
           SRLImplementationRegistrationDataConfigInstanceType(record), record->isConfigurationRequired != 0);
     }
     rt::Ref<SRLInstanceType> instanceType = SRLImplementationRegistrationDataInstanceType(record);
-    const SRLScopedFactory scopedFactory{record->factory, record, api->scopeType, record->scopeType,
-                                         record->lifetime};
+    SRLFactoryBlock factoryBlock =
+        scopedBlockForFactory(record->factory, record, api->scopeType, record->scopeType, record->lifetime);
     const rt::Ref<SRLImplementation> implementation =
         SRLImplementation::initWithIdentifier(record->identifier, std::move(instanceType), record->lifetime,
-                                              record->scopeType, scopedFactory, configuration);
+                                              record->scopeType, std::move(factoryBlock), configuration);
     internalRegisterServiceAPI(api, implementation);
   }
 }

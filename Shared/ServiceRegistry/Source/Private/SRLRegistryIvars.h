@@ -51,7 +51,7 @@ struct SRLRegistryIvars {
 
   /// Returns the scope with these tags. Null if there is none.
   SRLMemoizingScope* findScope(const SRLScopeTagSet& tags) {
-    if (lastScope == nullptr || lastTags != tags.tags || !SRLScopeTagSetEqual(lastScope->first.tags, tags)) {
+    if (lastScope == nullptr || !areLast(tags) || !SRLScopeTagSetEqual(lastScope->first.tags, tags)) {
       const Scopes::Entry* found = scopes.find(ScopeKey(tags));
       if (found == nullptr) return nullptr;
       lastScope = found;
@@ -102,4 +102,14 @@ struct SRLRegistryIvars {
   std::atomic<bool> isShared = false;
   rt::UnfairLock delegateLock;
   rt::Weak<SRLScopeLifecycleDelegate> scopeLifecycleDelegate RT_GUARDED_BY(delegateLock);
+
+ private:
+  // Returns whether these are the tags of the latest request, by address. Not with `==`, which is a call.
+  bool areLast(const SRLScopeTagSet& tags) const noexcept {
+    for (std::size_t i = 0; i < SRLScopeTagSet::kCapacity; ++i) {
+      if (lastTags[i] != tags.tags[i]) return false;
+      if (tags.tags[i] == nullptr) return true;
+    }
+    return true;
+  }
 };

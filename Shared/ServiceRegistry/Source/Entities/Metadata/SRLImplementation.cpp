@@ -1,8 +1,10 @@
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementation.h"
 
 #include <functional>
+#include <utility>
 
 #include "Runtime/Text/Format.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLScopedFactory.h"
 
 using namespace rt::literals;
 
@@ -20,17 +22,9 @@ rt::Ref<SRLImplementation> SRLImplementation::initWithIdentifier(
     std::string_view identifier, rt::Ref<SRLInstanceType> instanceType, std::uint64_t lifetime,
     SRLScopeType scope, SRLFactoryBlock factoryBlock,
     const rt::Ref<SRLImplementationConfiguration>& configuration) {
+  const auto* scopedFactory = factoryBlock.target<SRLScopedFactory>();
   return rt::Ref<SRLImplementation>::adopt(new SRLImplementation(identifier, std::move(instanceType),
                                                                  lifetime, scope, std::move(factoryBlock),
-                                                                 std::nullopt, rt::copy(configuration)));
-}
-
-rt::Ref<SRLImplementation> SRLImplementation::initWithIdentifier(
-    std::string_view identifier, rt::Ref<SRLInstanceType> instanceType, std::uint64_t lifetime,
-    SRLScopeType scope, const SRLScopedFactory& scopedFactory,
-    const rt::Ref<SRLImplementationConfiguration>& configuration) {
-  return rt::Ref<SRLImplementation>::adopt(new SRLImplementation(identifier, std::move(instanceType),
-                                                                 lifetime, scope, scopedFactory,
                                                                  scopedFactory, rt::copy(configuration)));
 }
 

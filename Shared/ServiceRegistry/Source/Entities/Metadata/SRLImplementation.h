@@ -11,7 +11,6 @@
 /// Not for: the instances. The factory makes these.
 
 #include <cstdint>
-#include <optional>
 #include <string_view>
 #include <utility>
 
@@ -25,7 +24,8 @@
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementationConfiguration.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeType.h"
-#include "Shared/ServiceRegistry/Source/Private/SRLScopedFactory.h"
+
+struct SRLScopedFactory;
 
 class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementation, rt::Object> {
  public:
@@ -40,12 +40,6 @@ class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementati
       SRLScopeType scope, SRLFactoryBlock factoryBlock,
       const rt::Ref<SRLImplementationConfiguration>& configuration);
 
-  /// Does the same with a factory block that calls `scopedFactory`. For the registry.
-  static rt::Ref<SRLImplementation> initWithIdentifier(
-      std::string_view identifier, rt::Ref<SRLInstanceType> instanceType, std::uint64_t lifetime,
-      SRLScopeType scope, const SRLScopedFactory& scopedFactory,
-      const rt::Ref<SRLImplementationConfiguration>& configuration);
-
   /// Returns the type of the instances that the factory makes. May be null.
   const rt::Ref<SRLInstanceType>& instanceType() const noexcept { return instanceType_; }
   /// Returns 0 for one instance per scope, or 1 for a new instance at every request.
@@ -55,10 +49,8 @@ class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementati
   /// Returns the block that gets an instance. May be null.
   const SRLFactoryBlock& factoryBlock() const noexcept { return factoryBlock_; }
   /// Returns the scoped factory that the factory block calls, so that a registry can look for an existing
-  /// instance first. Null if the block is of another kind.
-  const SRLScopedFactory* scopedFactory() const noexcept {
-    return scopedFactory_ ? &*scopedFactory_ : nullptr;
-  }
+  /// instance first. Null if the block is of another kind. Ownership: the block's.
+  const SRLScopedFactory* scopedFactory() const noexcept { return scopedFactory_; }
   /// Returns the configuration that the implementation takes. Null if it takes none.
   const rt::Ref<SRLImplementationConfiguration>& configuration() const noexcept { return configuration_; }
 
@@ -74,7 +66,7 @@ class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementati
  private:
   SRLImplementation(std::string_view identifier, rt::Ref<SRLInstanceType> instanceType,
                     std::uint64_t lifetime, SRLScopeType scope, SRLFactoryBlock factoryBlock,
-                    std::optional<SRLScopedFactory> scopedFactory,
+                    const SRLScopedFactory* scopedFactory,
                     rt::Ref<SRLImplementationConfiguration> configuration) noexcept
       : identifier_(identifier),
         scopeType_(scope),
@@ -89,6 +81,7 @@ class RT_VISIBLE SRLImplementation final : public rt::Implements<SRLImplementati
   const rt::Ref<SRLInstanceType> instanceType_;
   const std::uint64_t lifetime_;
   const SRLFactoryBlock factoryBlock_;
-  const std::optional<SRLScopedFactory> scopedFactory_;
+  // The block's.
+  const SRLScopedFactory* const scopedFactory_;
   const rt::Ref<SRLImplementationConfiguration> configuration_;
 };

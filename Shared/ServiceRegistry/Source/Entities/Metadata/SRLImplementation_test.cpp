@@ -14,6 +14,7 @@
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/String.h"
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLScopedFactory.h"
 
 namespace {
 
@@ -102,6 +103,19 @@ TEST(SRLImplementation, AcceptsNullForTypeConfigurationAndFactory) {
   EXPECT_EQ(made->instanceType(), nullptr);
   EXPECT_EQ(made->configuration(), nullptr);
   EXPECT_EQ(made->factoryBlock(), nullptr);
+}
+
+TEST(SRLImplementation, FindsTheScopedFactoryInItsBlock) {
+  static constexpr SRLImplementationRegistrationData kRecord;
+  Parts parts;
+  EXPECT_EQ(parts.make()->scopedFactory(), nullptr);
+  parts.factoryBlock = SRLScopedFactory{nullptr, &kRecord, 0b111, 0b101, 1};
+  const Ref<SRLImplementation> made = parts.make();
+  ASSERT_NE(made->scopedFactory(), nullptr);
+  EXPECT_EQ(made->scopedFactory()->identifier, &kRecord);
+  EXPECT_EQ(made->scopedFactory()->apiScope, 0b111U);
+  parts.factoryBlock = nullptr;
+  EXPECT_EQ(parts.make()->scopedFactory(), nullptr);
 }
 
 TEST(SRLImplementation, PassesTagsAndFlagToItsFactory) {

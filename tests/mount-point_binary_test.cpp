@@ -92,6 +92,17 @@ TEST_F(MountPointBinaryTest, ContainsTheLibraries) {
   }
 }
 
+// A local static variable that another thread initialises during a fork is never initialised in the child. The
+// default assertion handler used to be one: the child waited for ever.
+TEST_F(MountPointBinaryTest, LibrariesHaveNoStaticVariablesThatInitialiseThemselvesOnFirstUse) {
+  std::istringstream libraries(LIBRARY_FILES);
+  std::size_t count = 0;
+  for (std::string library; libraries >> library; ++count) {
+    EXPECT_THAT(outputOf({"nm", "-C", library}), Not(HasSubstr("guard variable"))) << library;
+  }
+  EXPECT_EQ(count, 7U);
+}
+
 TEST_F(MountPointBinaryTest, IsPositionIndependent) {
   EXPECT_THAT(outputOf({"readelf", "--file-header", MOUNT_POINT}), HasSubstr("DYN"));
   const std::string dynamic = outputOf({"readelf", "--wide", "--dynamic", MOUNT_POINT});

@@ -4,6 +4,7 @@
 #include <string>
 
 #include "Runtime/Base/Private/StandardError.h"
+#include "Runtime/Locks/Private/Lazy.h"
 #include "Runtime/Objects/Exception.h"
 #include "Runtime/Process/Private/ThreadReference.h"
 
@@ -19,10 +20,9 @@ constexpr std::chrono::seconds kLongestWait{1};
 }  // namespace
 
 Ref<AssertionHandler> AssertionHandler::currentHandler() {
-  // Never destroyed: assertions may fail in code that runs at exit.
-  static AssertionHandler* const defaultHandler = make<AssertionHandler>().detach();
-  AssertionHandler* const own = CurrentHandler::get();
-  return own != nullptr ? own : defaultHandler;
+  if (AssertionHandler* const own = CurrentHandler::get()) return own;
+  static constinit Lazy<Ref<AssertionHandler>> defaultHandler;
+  return defaultHandler.get([] { return make<AssertionHandler>(); });
 }
 
 void AssertionHandler::setCurrentHandler(Ref<AssertionHandler> handler) {

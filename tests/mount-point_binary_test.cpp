@@ -92,8 +92,8 @@ TEST_F(MountPointBinaryTest, ContainsTheLibraries) {
   }
 }
 
-// A local static variable that another thread initialises during a fork is never initialised in the child. The
-// default assertion handler used to be one: the child waited for ever.
+// A local static variable that another thread initialises during a fork is never initialised in the child.
+// The default assertion handler used to be one: the child waited for ever.
 TEST_F(MountPointBinaryTest, LibrariesHaveNoStaticVariablesThatInitialiseThemselvesOnFirstUse) {
   std::istringstream libraries(LIBRARY_FILES);
   std::size_t count = 0;

@@ -42,7 +42,7 @@ Ref<rt::Object> throughAnArchive(const Ref<rt::Object>& object) {
   return read;
 }
 
-TEST(KeyedArchiver, ArchivesNothing) {
+TEST(KeyedArchiver, EncodesAnEmptyArchive) {
   const Bytes bytes = KeyedArchiver().encodedData();
   KeyedUnarchiver unarchiver(bytes);
   EXPECT_TRUE(unarchiver.error().isNull());
@@ -140,7 +140,7 @@ TEST(KeyedArchiver, EncodesMoreAfterEncodedData) {
   EXPECT_EQ(unarchiver.decodeString("second"), "2"_s);
 }
 
-TEST(KeyedArchiver, RefusesWhatItCannotArchive) {
+TEST(KeyedArchiver, RejectsObjectsThatItCannotArchive) {
   const auto errorOfArchiving = [](const Ref<rt::Object>& object) {
     return whatOf([&] { archive(object); });
   };
@@ -190,7 +190,7 @@ Ref<rt::Object> repeated(std::size_t times) {
 
 // An object may be 16 MiB larger than 16 times the archive, and no larger. Regression: objects of any size
 // were archived.
-TEST(KeyedArchiver, RefusesWhatIsReachedTooOften) {
+TEST(KeyedArchiver, RejectsObjectsThatAreReferredToTooOften) {
   // The tag counts 1, and its name 1 and 9 bytes. With the arrays, the size is 12 times 2 to the 20th.
   EXPECT_TRUE(throughAnArchive(doubled(20)));
   EXPECT_THAT(whatOf([] { archive(doubled(21)); }), HasSubstr("objects are referred to too often"));
@@ -208,7 +208,7 @@ TEST(KeyedArchiver, RefusesWhatIsReachedTooOften) {
   EXPECT_THAT(whatOf([] { archive(repeated(273)); }), HasSubstr("objects are referred to too often"));
 }
 
-TEST(KeyedArchiver, CountsWhatIsUnderEachKeyByItself) {
+TEST(KeyedArchiver, LimitsReferencesForEachKeySeparately) {
   KeyedArchiver archiver;
   for (const char* key : {"first", "second", "third"}) archiver.encodeObject(doubled(20), key);
   const Bytes bytes = archiver.encodedData();
@@ -266,7 +266,7 @@ TEST(KeyedArchiver, ReadsBackRandomObjects) {
 
 class KeyedArchiveAndPython : public PlistlibTest {};
 
-TEST_F(KeyedArchiveAndPython, PythonReadsOurs) {
+TEST_F(KeyedArchiveAndPython, PythonReadsOurArchives) {
   KeyedArchiver archiver;
   archiver.encodeObject(rt::Array::of(rt::make<Tag>("ü"_s), rt::Number::of(7)), "kTagsID");
   writeFile(archiver.encodedData());
@@ -284,7 +284,7 @@ print(at(tag['$class']), ascii(at(tag['$$class'])), at(tag['other'])))"),
             "{'$classname': 'Tag', '$classes': ['Tag', 'Object']} '\\xfc' $null\n");
 }
 
-TEST_F(KeyedArchiveAndPython, ReadsPythons) {
+TEST_F(KeyedArchiveAndPython, ReadsPythonsArchives) {
   python(R"(
 uid = plistlib.UID
 plistlib.dump({'$archiver': 'PythonArchiver', '$version': 100000, '$top': {'root': uid(1)}, '$objects': [

@@ -84,7 +84,7 @@ class Forged {
   PropertyList::Array places;
 };
 
-TEST(KeyedUnarchiver, RefusesWhatIsNoArchive) {
+TEST(KeyedUnarchiver, RejectsBytesThatAreNotAnArchive) {
   EXPECT_THAT(errorOf({}), HasSubstr("no keyed archive: no binary property list"));
   PropertyList list;
   list.root = list.add("text");
@@ -97,7 +97,7 @@ TEST(KeyedUnarchiver, RefusesWhatIsNoArchive) {
   EXPECT_EQ(errorOf(forged.bytes()), "no keyed archive, but another property list");
 }
 
-TEST(KeyedUnarchiver, RefusesObjectsOfOtherClasses) {
+TEST(KeyedUnarchiver, RejectsObjectsOfOtherClasses) {
   const auto* array = &rt::classInfo<rt::Array>();
   const auto* string = &rt::classInfo<rt::StringObject>();
   EXPECT_EQ(errorOf(archive("text"_s), {array}),
@@ -120,7 +120,7 @@ TEST(KeyedUnarchiver, RefusesObjectsOfOtherClasses) {
       KeyedUnarchiver::unarchivedObjectOfClass<rt::Array>(archive(rt::Array::of("t"_s, rt::Number::of(1)))));
 }
 
-TEST(KeyedUnarchiver, MakesNothingButAnArrayWhereOneIsAskedFor) {
+TEST(KeyedUnarchiver, DecodesOnlyAnArrayIfAnArrayIsRequested) {
   const auto decode = [](const Ref<rt::Object>& root, std::initializer_list<const rt::ClassInfo*> classes,
                          std::string& error) {
     KeyedUnarchiver unarchiver(archive(root));
@@ -164,7 +164,7 @@ TEST(KeyedUnarchiver, ChecksTheClassesAtEachCall) {
   EXPECT_THAT(std::string(unarchiver.error().view()), HasSubstr("\"Tag\""));
 }
 
-TEST(KeyedUnarchiver, RefusesClassesThatCannotBeUnarchived) {
+TEST(KeyedUnarchiver, RejectsClassesThatCannotBeUnarchived) {
   const auto errorOfClass = [](const char* name) {
     Forged forged;
     forged.add(forged.dictionary({{"$class", forged.reference(2)}}));
@@ -208,7 +208,7 @@ TEST(KeyedUnarchiver, StopsAtTheFirstError) {
   EXPECT_EQ(unarchiver.error(), error);
 }
 
-TEST(KeyedUnarchiver, RefusesArchivesThatContradictThemselves) {
+TEST(KeyedUnarchiver, RejectsInconsistentArchives) {
   const auto errorOfRoot = [](const std::function<Forged::Index(Forged&)>& root) {
     Forged forged;
     forged.add(root(forged));
@@ -261,7 +261,7 @@ TEST(KeyedUnarchiver, RefusesArchivesThatContradictThemselves) {
               HasSubstr("\"Tag\" contains itself"));
 }
 
-TEST(KeyedUnarchiver, RefusesKeysThatAreCollections) {
+TEST(KeyedUnarchiver, RejectsKeysThatAreCollections) {
   Forged forged;
   const auto keys = forged.references({2});
   forged.add(forged.dictionary(
@@ -274,7 +274,7 @@ TEST(KeyedUnarchiver, RefusesKeysThatAreCollections) {
 }
 
 // A list of a thousand elements that a thousand collections share would yield a million elements.
-TEST(KeyedUnarchiver, DoesNotMultiplyWhatAFileHolds) {
+TEST(KeyedUnarchiver, ReadsSharedListsOnce) {
   Forged forged;
   const auto list = forged.references({3});
   forged.add(forged.dictionary({{"$class", forged.reference(4)}, {"objects", forged.references({2, 5})}}));
@@ -285,7 +285,7 @@ TEST(KeyedUnarchiver, DoesNotMultiplyWhatAFileHolds) {
   EXPECT_EQ(errorOf(forged.bytes()), "two collections with the same objects");
 }
 
-TEST(KeyedUnarchiver, RefusesWhatIsNestedTooDeeply) {
+TEST(KeyedUnarchiver, RejectsTooDeepNesting) {
   for (const int depth : {512, 513}) {
     Forged forged;
     for (int i = 1; i < depth; ++i) {
@@ -306,7 +306,7 @@ TEST(KeyedUnarchiver, RefusesWhatIsNestedTooDeeply) {
 
 // A few bytes can stand for more objects than there are atoms. Regression: they were decoded, and their
 // hash took for ever.
-TEST(KeyedUnarchiver, RefusesWhatIsReferredToTooOften) {
+TEST(KeyedUnarchiver, RejectsObjectsThatAreReferredToTooOften) {
   // Each tag has an array that has the next tag twice.
   const auto doubled = [](std::uint64_t times) {
     Forged forged;
@@ -348,7 +348,7 @@ TEST(KeyedUnarchiver, RefusesWhatIsReferredToTooOften) {
 }
 
 // Decoding stops at the limit, however large the object would be.
-TEST(KeyedUnarchiver, StopsWhereObjectsAreReferredToTooOften) {
+TEST(KeyedUnarchiver, StopsAtObjectsThatAreReferredToTooOften) {
   Forged forged;
   PropertyList::Array references(300, forged.reference(2));
   references.push_back(forged.reference(4));
@@ -363,7 +363,7 @@ TEST(KeyedUnarchiver, StopsWhereObjectsAreReferredToTooOften) {
   EXPECT_EQ(Tag::initialized, initialized);
 }
 
-TEST(KeyedUnarchiver, SurvivesDamage) {
+TEST(KeyedUnarchiver, SurvivesDamagedArchives) {
   std::mt19937_64 random(7);  // NOLINT(cert-msc*): the same damage in every run
   const Bytes bytes = archive(rt::Array::of(rt::make<Tag>("tag"_s, rt::make<ColoredTag>("red"_s)),
                                             rt::Dictionary::of({{"key"_s, rt::Array::of("text"_s)}})));

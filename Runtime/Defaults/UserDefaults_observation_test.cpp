@@ -63,7 +63,7 @@ TEST_F(UserDefaults, TellObserversOfChanges) {
 }
 
 // Each read still returns what is in the file. The next observation tries again to watch it.
-TEST_F(UserDefaults, SayThatTheyAreNotWatched) {
+TEST_F(UserDefaults, ReportThatTheFileCannotBeWatched) {
   if (RT_TEST_ADDRESS_SANITIZER) GTEST_SKIP() << "the address sanitizer needs descriptors for its checks";
   const auto defaults = this->defaults();
   set("key", "1");
@@ -97,7 +97,7 @@ TEST_F(UserDefaults, LiveAsLongAsTheyAreObserved) {
   EXPECT_FALSE(weak.lock());
 }
 
-TEST_F(UserDefaults, LetGoOfWhatAnObserverCaptured) {
+TEST_F(UserDefaults, ReleaseTheCapturesOfARemovedObserver) {
   const auto defaults = this->defaults();
   const auto captured = std::make_shared<int>();
   auto observation = defaults->observe("key", Notify::kAlsoNow, [captured] {});
@@ -131,7 +131,7 @@ TEST_F(UserDefaults, HoldNoLockWhileAnObserverRuns) {
   EXPECT_EQ(inner, 3);
 }
 
-TEST_F(UserDefaults, LetAnObserverEndItsOwnObservation) {
+TEST_F(UserDefaults, AllowAnObserverToRemoveItself) {
   const auto defaults = this->defaults();
   int calls = 0;
   rt::UserDefaults::Observation observation;
@@ -148,7 +148,7 @@ TEST_F(UserDefaults, LetAnObserverEndItsOwnObservation) {
   EXPECT_EQ(calls, 7);
 }
 
-TEST_F(UserDefaults, PassOnWhatAnObserverThrowsAtOnce) {
+TEST_F(UserDefaults, ThrowWhatAnObserverThrowsAtOnce) {
   const auto defaults = this->defaults();
   int tries = 0;
   EXPECT_EQ(whatOf([&] {
@@ -175,7 +175,7 @@ bool isAsleep(pid_t thread) {
 }
 
 // After a removal, the caller may destroy what the observer uses.
-TEST_F(UserDefaults, RemovalWaitsForAnObserverThatRuns) {
+TEST_F(UserDefaults, RemovalWaitsForARunningObserver) {
   const auto defaults = this->defaults();
   std::atomic<bool> isRunning = false;
   std::atomic<bool> mayEnd = false;
@@ -203,7 +203,7 @@ TEST_F(UserDefaults, RemovalWaitsForAnObserverThatRuns) {
 }
 
 // Invariant: a removed observer is not running and never runs again.
-TEST_F(UserDefaults, ConcurrentRemovalIsFinal) {
+TEST_F(UserDefaults, CallNoObserverAfterItsConcurrentRemoval) {
   const auto defaults = this->defaults();
   std::atomic<bool> isDone = false;
   std::jthread setter([&] {

@@ -40,7 +40,7 @@ void inShell(const std::string& script, const fs::path& path) {
 
 using UserDefaultsOfOthers = UserDefaults;
 
-TEST_F(UserDefaultsOfOthers, AreToldOf) {
+TEST_F(UserDefaultsOfOthers, NotifyObserversOfChanges) {
   const auto defaults = this->defaults();
   const auto observation = observe(defaults);
   await(nullptr);
@@ -56,7 +56,7 @@ TEST_F(UserDefaultsOfOthers, AreToldOf) {
   await("5"_s);
 }
 
-TEST_F(UserDefaultsOfOthers, AreToldOfThoughAReadCameFirst) {
+TEST_F(UserDefaultsOfOthers, NotifyObserversEvenIfAReadCameFirst) {
   const auto defaults = this->defaults();
   const auto observation = observe(defaults);
   for (int i = 0; i < 100; ++i) {
@@ -67,7 +67,7 @@ TEST_F(UserDefaultsOfOthers, AreToldOfThoughAReadCameFirst) {
   }
 }
 
-TEST_F(UserDefaultsOfOthers, AreToldOfWhereTheFolderIsMissing) {
+TEST_F(UserDefaultsOfOthers, NotifyObserversEvenIfTheFolderWasMissing) {
   const fs::path path = folder_ / "a" / "b" / "c" / "defaults.conf";
   const auto defaults = defaultsAt(path);
   const auto observation = observe(defaults);
@@ -80,7 +80,7 @@ TEST_F(UserDefaultsOfOthers, AreToldOfWhereTheFolderIsMissing) {
   await("2"_s);
 }
 
-TEST_F(UserDefaultsOfOthers, AreToldOfBehindASymbolicLink) {
+TEST_F(UserDefaultsOfOthers, NotifyObserversThroughASymbolicLink) {
   fs::create_directory(folder_ / "elsewhere");
   fs::create_symlink("elsewhere/target", path());
   write(folder_ / "elsewhere" / "target", "key = 1");
@@ -96,7 +96,7 @@ TEST_F(UserDefaultsOfOthers, AreToldOfBehindASymbolicLink) {
   await("4"_s);
 }
 
-TEST_F(UserDefaultsOfOthers, AreToldOfAfterAChildHasForked) {
+TEST_F(UserDefaultsOfOthers, NotifyObserversAfterAFork) {
   auto defaults = this->defaults();
   auto observation = observe(defaults);
   const pid_t child = fork();
@@ -113,7 +113,7 @@ TEST_F(UserDefaultsOfOthers, AreToldOfAfterAChildHasForked) {
   await("1"_s);
 }
 
-TEST_F(UserDefaultsOfOthers, AreToldOfOnAThreadThatTakesNoSignals) {
+TEST_F(UserDefaultsOfOthers, NotifyObserversOnAThreadThatBlocksSignals) {
   const auto defaults = this->defaults();
   std::binary_semaphore called{0};
   sigset_t blocked;
@@ -133,7 +133,7 @@ TEST_F(UserDefaultsOfOthers, AreToldOfOnAThreadThatTakesNoSignals) {
   EXPECT_EQ(sigismember(&own, SIGTERM), 0);
 }
 
-TEST_F(UserDefaultsOfOthers, ReportWhatAnObserverThrows) {
+TEST_F(UserDefaultsOfOthers, ReportExceptionsOfObservers) {
   const auto defaults = this->defaults();
   std::binary_semaphore reported{0};
   std::string report;
@@ -189,7 +189,7 @@ int statusOfFork(const std::function<int()>& inChild) {
 }
 
 // Regression: the child waited for ever for a call that a thread of the parent was making.
-TEST_F(UserDefaults, InAChildDoNotWaitForAThreadOfTheParent) {
+TEST_F(UserDefaults, DoNotWaitInAChildForAThreadOfTheParent) {
   const auto defaults = this->defaults();
   std::binary_semaphore isCalled{0};
   std::binary_semaphore mayReturn{0};
@@ -239,7 +239,7 @@ TEST_F(UserDefaults, InAChildAreObservedAgain) {
 }
 
 // Regression: in the child, the thread waited for itself for ever.
-TEST_F(UserDefaults, MayBeForkedInAnObserver) {
+TEST_F(UserDefaults, AllowAForkInAnObserver) {
   const auto defaults = this->defaults();
   int status = -1;
   std::counting_semaphore<> isOver{0};
@@ -259,7 +259,7 @@ TEST_F(UserDefaults, MayBeForkedInAnObserver) {
 }
 
 // Invariant: a child reads and observes, whatever the threads of its parent were doing.
-TEST_F(UserDefaults, InAChildAreFreeOfWhatTheParentsThreadsHeld) {
+TEST_F(UserDefaults, AreUsableInAChildWhateverTheParentsThreadsHeld) {
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the thread sanitizer allows no thread in such a child";
   const auto defaults = this->defaults();
   set("key", "0");
@@ -286,7 +286,7 @@ TEST_F(UserDefaults, InAChildAreFreeOfWhatTheParentsThreadsHeld) {
 }
 
 // Regression: once the system had refused to watch the file, it was never watched again.
-TEST_F(UserDefaultsOfOthers, AreToldOfAgainAfterTheSystemHasFailed) {
+TEST_F(UserDefaultsOfOthers, NotifyObserversAgainAfterASystemFailure) {
   const auto defaults = this->defaults();
   const auto observation = observe(defaults);
   int replaced = 0;

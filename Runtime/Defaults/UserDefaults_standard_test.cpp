@@ -81,7 +81,7 @@ TEST_F(StandardUserDefaults, AreInTheUsersFolder) {
 #endif
 }
 
-TEST_F(StandardUserDefaults, SayThatThereIsNoPlaceForThem) {
+TEST_F(StandardUserDefaults, ReportThatThereIsNoFolderForThem) {
   const auto use = [] {
     const auto defaults = rt::UserDefaults::standardUserDefaults();
     int calls = 0;
@@ -100,7 +100,7 @@ TEST_F(StandardUserDefaults, SayThatThereIsNoPlaceForThem) {
               HasSubstr("name is none for a folder: ../escaped"));
 }
 
-TEST_F(StandardUserDefaults, SayThatTheFileIsNotReadable) {
+TEST_F(StandardUserDefaults, ReportThatTheFileIsNotReadable) {
   write(path(), "key = 1\n");
   setMode(path(), 0200);
   setMode(folder_, 0755);

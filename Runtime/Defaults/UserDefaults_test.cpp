@@ -24,7 +24,7 @@ using testing::ElementsAre;
 using testing::HasSubstr;
 using testing::IsEmpty;
 
-TEST_F(UserDefaults, NoFileIsNoSettings) {
+TEST_F(UserDefaults, HaveNoSettingsWithoutAFile) {
   const auto defaults = this->defaults();
   EXPECT_FALSE(defaults->boolForKey("key"));
   EXPECT_TRUE(defaults->stringForKey("key").isNull());
@@ -43,7 +43,7 @@ TEST_F(UserDefaults, NeedPath) {
   EXPECT_FALSE(rt::UserDefaults::initWithPath("/tmp/a\0b"_s));
 }
 
-TEST_F(UserDefaults, ReadBooleansAsPeopleWriteThem) {
+TEST_F(UserDefaults, ReadManySpellingsOfBooleans) {
   const auto defaults = this->defaults();
   for (const char* value : {"YES", "yes", "Yes", "TRUE", "true", "on", "ON", "y", "T", "1", "2", "-1", "0.5",
                             "+1", "99999999999999999999", R"("yes")"}) {

@@ -104,7 +104,7 @@ TEST(Class, HasItsNameInTheSource) {
   EXPECT_EQ(rt::protocolInfo<Clock>().name, "Clock");
 }
 
-TEST(Class, HasTheNameThatItStates) {
+TEST(Class, HasTheNameThatItDeclares) {
   EXPECT_EQ(rt::classInfo<NamedBox<int>>().name, "BoxByAnotherName");
   EXPECT_EQ(rt::classInfo<Crate>().name, "Crate");
   EXPECT_EQ(rt::classInfo<Chest>().name, "SRLChest");

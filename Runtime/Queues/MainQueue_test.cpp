@@ -60,7 +60,7 @@ TEST_F(MainQueueTest, TasksWaitUntilTheMainThreadRunsThem) {
   EXPECT_TRUE(wasMain);
 }
 
-TEST_F(MainQueueTest, DrainLeavesWhatItsTasksQueue) {
+TEST_F(MainQueueTest, DrainLeavesTasksThatItsTasksQueue) {
   std::vector<int> order;
   Queue::main()->async([&] {
     order.push_back(1);
@@ -83,7 +83,7 @@ TEST_F(MainQueueTest, DrainWithinATaskRunsNothing) {
   EXPECT_EQ(MainQueue::drain(), 1U) << "it is still there";
 }
 
-TEST_F(MainQueueTest, SyncOnTheMainThreadRunsWhatIsQueued) {
+TEST_F(MainQueueTest, SyncOnTheMainThreadRunsQueuedTasksFirst) {
   std::vector<int> order;
   Queue::main()->async([&] { order.push_back(1); });
   Queue::main()->sync([&] { order.push_back(2); });
@@ -105,7 +105,7 @@ TEST_F(MainQueueTest, DescriptorIsReadableWhileThereIsWork) {
   EXPECT_FALSE(isReadable(descriptor));
 }
 
-TEST_F(MainQueueTest, StopLeavesTheRestQueued) {
+TEST_F(MainQueueTest, StopLeavesTheOtherTasksQueued) {
   std::vector<int> order;
   Queue::main()->async([&] {
     order.push_back(1);
@@ -143,7 +143,7 @@ TEST_F(MainQueueTest, StopFromAnotherThreadWakesRun) {
 
 // Invariant: each queued task ends a wait of the main thread. So no task is left when the last one has
 // called `stop`.
-TEST_F(MainQueueTest, NoWakeUpIsLost) {
+TEST_F(MainQueueTest, LosesNoWakeUp) {
   constexpr int kRounds = 5000;
   int count = 0;
   std::thread other([&] {
@@ -219,7 +219,7 @@ class DescriptorRefusal {
   rlimit before_{};
 };
 
-TEST_F(MainQueueDeathTest, SaysThatThereIsNoDescriptorAndTriesAgain) {
+TEST_F(MainQueueDeathTest, ReportsAMissingDescriptorAndTriesAgain) {
   if (RT_TEST_ADDRESS_SANITIZER) GTEST_SKIP() << kSanitizerNeedsDescriptors;
   EXPECT_EXIT(
       {
@@ -234,7 +234,7 @@ TEST_F(MainQueueDeathTest, SaysThatThereIsNoDescriptorAndTriesAgain) {
 }
 
 // Regression: if the parent had made no queue, the child kept the parent's descriptor.
-TEST_F(MainQueueDeathTest, TheChildOfAForkHasNoneWhereThereIsNone) {
+TEST_F(MainQueueDeathTest, ChildHasNoDescriptorIfTheSystemHasNone) {
   if (RT_TEST_ADDRESS_SANITIZER) GTEST_SKIP() << kSanitizerNeedsDescriptors;
   EXPECT_EXIT(
       {

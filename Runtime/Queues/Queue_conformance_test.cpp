@@ -138,7 +138,7 @@ TEST_P(QueueConformance, KeepsTheOrder) {
   for (int i = 0; i < kTasks; ++i) ASSERT_EQ(order[static_cast<std::size_t>(i)], i);
 }
 
-TEST_P(QueueConformance, SyncRunsAfterWhatIsQueued) {
+TEST_P(QueueConformance, SyncRunsAfterQueuedTasks) {
   serve([](Queue& queue) {
     int count = 0;
     for (int round = 1; round <= 200; ++round) {
@@ -148,7 +148,7 @@ TEST_P(QueueConformance, SyncRunsAfterWhatIsQueued) {
   });
 }
 
-TEST_P(QueueConformance, BarrierWaitsForAllBefore) {
+TEST_P(QueueConformance, BarrierWaitsForAllEarlierTasks) {
   serve([](Queue& queue) {
     std::atomic<int> count = 0;
     for (int round = 1; round <= 100; ++round) {
@@ -186,7 +186,7 @@ TEST_P(QueueConformance, SyncThrowsWhatTheTaskThrows) {
   });
 }
 
-TEST_P(QueueConformance, SyncThrowsAlsoWhenTheQueueIsBusy) {
+TEST_P(QueueConformance, SyncThrowsEvenIfTheQueueIsBusy) {
   serve([](Queue& queue) {
     for (int round = 0; round < 50; ++round) {
       queue.async([] { std::this_thread::yield(); });
@@ -210,7 +210,7 @@ TEST_P(QueueConformance, ATaskIsDestroyedOnceItHasRun) {
   });
 }
 
-TEST_P(QueueConformance, NothingIsQueuedWhenTheTaskCannotBeCopied) {
+TEST_P(QueueConformance, QueuesNothingIfCopyingTheTaskThrows) {
   struct Uncopyable {
     Uncopyable() = default;
     Uncopyable(const Uncopyable&) { throw std::bad_alloc(); }
@@ -222,7 +222,7 @@ TEST_P(QueueConformance, NothingIsQueuedWhenTheTaskCannotBeCopied) {
   });
 }
 
-TEST_P(QueueConformance, TasksThatTasksQueueComeAfterWhatIsQueued) {
+TEST_P(QueueConformance, TasksQueuedByTasksRunAfterEarlierOnes) {
   std::vector<int> order;
   serve([&](Queue& queue) {
     queue.sync([&] {
@@ -283,7 +283,7 @@ TEST_P(QueueConformance, TasksDoNotOverlap) {
 
 // Invariant: only tasks touch the plain variables `sum` and `last`. Each task sees what the task before it
 // has written, on whichever thread, and the thread sanitizer finds no race.
-TEST_P(QueueConformance, TasksSeeWhatTasksHaveWritten) {
+TEST_P(QueueConformance, TasksSeeTheWritesOfEarlierTasks) {
   constexpr int kThreads = 4;
   constexpr int kRounds = 250;
   long sum = 0;
@@ -308,7 +308,7 @@ TEST_P(QueueConformance, TasksSeeWhatTasksHaveWritten) {
 }
 
 // Invariant: tasks of one thread run in the order in which that thread has queued them.
-TEST_P(QueueConformance, EveryThreadsOrderIsKept) {
+TEST_P(QueueConformance, KeepsTheOrderOfEachThread) {
   constexpr int kThreads = 8;
   constexpr int kTasks = 1000;
   std::vector<int> next(kThreads, 0);
@@ -327,7 +327,7 @@ TEST_P(QueueConformance, EveryThreadsOrderIsKept) {
 
 // Compares with a model. For a thread that queues and waits in a random order, it is as if each task had
 // run at once.
-TEST_P(QueueConformance, IsLikeRunningTasksAtOnceForOneThread) {
+TEST_P(QueueConformance, BehavesForOneThreadAsIfTasksRanAtOnce) {
   serve([](Queue& queue) {
     std::mt19937 random(20240611);
     std::vector<unsigned> ours;
@@ -359,7 +359,7 @@ TEST_P(QueueConformance, IsLikeRunningTasksAtOnceForOneThread) {
   });
 }
 
-TEST_P(QueueConformance, LabelIsTheCurrentOneInTasksOnly) {
+TEST_P(QueueConformance, CurrentLabelIsSetOnlyInTasks) {
   EXPECT_EQ(Queue::currentLabel(), ""_s);
   serve([](Queue& queue) {
     EXPECT_EQ(queue.label(), GetParam().label);
@@ -374,7 +374,7 @@ TEST_P(QueueConformance, LabelIsTheCurrentOneInTasksOnly) {
   EXPECT_EQ(Queue::currentLabel(), ""_s);
 }
 
-TEST_P(QueueConformance, LabelOfTheInnerQueueIsTheCurrentOne) {
+TEST_P(QueueConformance, CurrentLabelIsThatOfTheInnerQueue) {
   serve([](Queue& queue) {
     const Ref<Queue> inner = rt::make<Queue>("inner"_s);
     queue.sync([&] {
@@ -414,7 +414,7 @@ TEST_P(QueueConformance, AsyncTasksRunWithTheNicenessOfTheirClass) {
 #endif
 
 // Invariant: a queue without references exists until its tasks have run.
-TEST_P(QueueConformance, ReleasedWithTasksItRunsThemAll) {
+TEST_P(QueueConformance, RunsAllTasksAfterItsLastReferenceIsReleased) {
   GetParam().serveDuring([] {
     std::latch mayGoOn(1);
     std::latch allHaveRun(100);

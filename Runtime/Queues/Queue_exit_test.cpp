@@ -79,7 +79,7 @@ TEST_F(QueueDeathTest, ATaskThatWaitsForTheMainQueueIsServedAtExit) {
       testing::ExitedWithCode(0), "served 100 times;");
 }
 
-TEST_F(QueueDeathTest, TasksThatQueueThemselvesForEverDoNotKeepTheProcess) {
+TEST_F(QueueDeathTest, TasksThatQueueThemselvesDoNotDelayExitForEver) {
   EXPECT_EXIT(
       {
         struct Again {
@@ -105,7 +105,7 @@ TEST_F(QueueDeathTest, ATaskThatDoesNotEndIsNamedAtExit) {
 }
 
 // Regression: a task that did not end ran on the thread that exits, and the process never ended.
-TEST_F(QueueDeathTest, TheThreadThatExitsRunsNoTasksOfThePool) {
+TEST_F(QueueDeathTest, TheExitingThreadRunsNoTasksOfThePool) {
   EXPECT_EXIT(
       {
         static const auto exiting = std::this_thread::get_id();
@@ -120,7 +120,7 @@ TEST_F(QueueDeathTest, TheThreadThatExitsRunsNoTasksOfThePool) {
 }
 
 // Regression: as long as tasks ran, the time limit was not checked.
-TEST_F(QueueDeathTest, ABusyMainQueueDoesNotKeepTheProcess) {
+TEST_F(QueueDeathTest, ABusyMainQueueDoesNotDelayExitForEver) {
   EXPECT_EXIT(
       {
         static std::atomic<bool> never = false;
@@ -138,7 +138,7 @@ TEST_F(QueueDeathTest, ABusyMainQueueDoesNotKeepTheProcess) {
 
 // Regression: static objects that exist before the first task are destroyed after the tasks have run. Tasks
 // that they queued then were lost.
-TEST_F(QueueDeathTest, WhatStaticObjectsQueueInTheirDestructorsRunsToo) {
+TEST_F(QueueDeathTest, TasksQueuedByStaticDestructorsRunToo) {
   EXPECT_EXIT(
       {
         static Queue& queue = *new Queue("test"_s);
@@ -156,7 +156,7 @@ TEST_F(QueueDeathTest, WhatStaticObjectsQueueInTheirDestructorsRunsToo) {
 }
 
 // Regression: tasks that referred to such an object used it after its destructor.
-TEST_F(QueueDeathTest, AStaticObjectThatIsYoungerThanTheFirstTaskCanWaitForTasks) {
+TEST_F(QueueDeathTest, AStaticObjectMadeAfterTheFirstTaskCanWaitForTasks) {
   EXPECT_EXIT(
       {
         static std::atomic<bool> mayGoOn = false;
@@ -205,7 +205,7 @@ int statusOf(pid_t child) {
 constexpr const char* kNoThreadsAfterFork =
     "the thread sanitizer allows no new threads in the child of a fork";
 
-TEST_F(QueueTest, QueuesAreEmptyInTheChildOfAForkAndWork) {
+TEST_F(QueueTest, QueuesAreEmptyAndUsableInTheChildOfAFork) {
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << kNoThreadsAfterFork;
   std::atomic<bool> mayGoOn = false;
   std::atomic<int> ofParent = 0;
@@ -276,7 +276,7 @@ constexpr const char* kLeaksAfterFork =
     "to the address sanitizer, what the parent's threads hold has leaked when the child of a fork exits";
 
 // Regression: at exit, the child of a fork waited for the parent's tasks until the time limit.
-TEST_F(QueueDeathTest, AChildDoesNotWaitAtExitForWhatItsParentHasQueued) {
+TEST_F(QueueDeathTest, AChildDoesNotWaitAtExitForItsParentsTasks) {
   if (RT_TEST_ADDRESS_SANITIZER) GTEST_SKIP() << kLeaksAfterFork;
   const auto exitOfTheChild = [&] {
     std::atomic<bool> never = false;
@@ -301,7 +301,7 @@ TEST_F(QueueDeathTest, AChildDoesNotWaitAtExitForWhatItsParentHasQueued) {
 }
 
 // Regression: if the parent had run a task before, the child did not wait for one of its own tasks at exit.
-TEST_F(QueueDeathTest, AChildWaitsAtExitForEveryTaskOfItsOwn) {
+TEST_F(QueueDeathTest, AChildWaitsAtExitForItsOwnTasks) {
   if (RT_TEST_ADDRESS_SANITIZER) GTEST_SKIP() << kLeaksAfterFork;
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << kNoThreadsAfterFork;
   const auto exitOfTheChild = [&] {
@@ -316,7 +316,7 @@ TEST_F(QueueDeathTest, AChildWaitsAtExitForEveryTaskOfItsOwn) {
 }
 
 // The task that forks is also the parent's, which counts it.
-TEST_F(QueueDeathTest, AChildOfATaskWaitsAtExitForEveryTaskOfItsOwn) {
+TEST_F(QueueDeathTest, AChildOfATaskWaitsAtExitForItsOwnTasks) {
   if (RT_TEST_ADDRESS_SANITIZER) GTEST_SKIP() << kLeaksAfterFork;
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << kNoThreadsAfterFork;
   const auto exitOfTheChild = [&] {

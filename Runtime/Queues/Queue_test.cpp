@@ -23,7 +23,7 @@ using rt::QualityOfService;
 using rt::Queue;
 using rt::Ref;
 
-TEST_F(QueueTest, KeepsWhatItIsMadeOf) {
+TEST_F(QueueTest, StoresItsLabelAndPriorities) {
   const Ref<Queue> queue = rt::make<Queue>("made"_s, QualityOfService::kUtility);
   EXPECT_EQ(queue->label(), "made"_s);
   EXPECT_EQ(queue->qualityOfService(), QualityOfService::kUtility);
@@ -31,7 +31,7 @@ TEST_F(QueueTest, KeepsWhatItIsMadeOf) {
   EXPECT_EQ(rt::make<Queue>(nullptr)->label(), ""_s);
 }
 
-TEST_F(QueueTest, TakesWhatCanBeCalledAsItCallsIt) {
+TEST_F(QueueTest, AcceptsCallablesOfTheRightForm) {
   struct CalledInPlace {
     void operator()() & {}
   };
@@ -52,7 +52,7 @@ TEST_F(QueueTest, AnIdleQueueRunsSyncOnTheCallersThread) {
   EXPECT_EQ(queue_->sync([] { return std::this_thread::get_id(); }), caller);
 }
 
-TEST_F(QueueTest, AsyncRunsElsewhere) {
+TEST_F(QueueTest, AsyncRunsOnAnotherThread) {
   std::latch hasRun(1);
   std::thread::id runner;
   queue_->async([&] {
@@ -63,7 +63,7 @@ TEST_F(QueueTest, AsyncRunsElsewhere) {
   EXPECT_NE(runner, std::this_thread::get_id());
 }
 
-TEST_F(QueueTest, IsDestroyedOnceNobodyRefersToItAndItsTasksHaveRun) {
+TEST_F(QueueTest, IsDestroyedAfterItsLastReferenceAndItsLastTask) {
   Ref<Queue> queue = rt::make<Queue>("test"_s);
   const rt::Weak<Queue> weak = queue;
   std::latch isRunning(1);
@@ -89,7 +89,7 @@ TEST_F(QueueTest, IsDestroyedOnceNobodyRefersToItAndItsTasksHaveRun) {
 
 // A thread that stops running a queue hands it to a waiting thread, but not to one whose task has run
 // already.
-TEST_F(QueueTest, GoesOnAfterAThreadThatWaitedWasServed) {
+TEST_F(QueueTest, GoesOnAfterAWaitingThreadHasRunItsTask) {
   for (int round = 0; round < 100; ++round) {
     std::latch isRunning(1);
     std::atomic<bool> mayGoOn = false;

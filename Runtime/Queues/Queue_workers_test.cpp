@@ -79,7 +79,7 @@ TEST_F(QueueTest, WaitingTasksDoNotNeedFreeThreads) {
   EXPECT_EQ(count, kQueues + 1);
 }
 
-TEST_F(QueueTest, ThreadsEndWhenTheyHaveBeenIdle) {
+TEST_F(QueueTest, IdleThreadsEnd) {
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer has a thread of its own";
   queue_->async([] {});
   queue_->barrierSync();
@@ -96,7 +96,7 @@ constinit std::atomic<bool> hasRunAfterwards = false;
 
 // Regression: work that a worker got between the end of its wait and its own end was lost. Here the worker
 // itself queues the work, when it reads the clock.
-TEST_F(QueueDeathTest, AWorkerThatGetsWorkAsItsTimeEndsDoesIt) {
+TEST_F(QueueDeathTest, AWorkerThatGetsWorkAsItsIdleTimeEndsRunsIt) {
   EXPECT_EXIT(
       {
         alarm(30);  // Instead of a hang.
@@ -126,7 +126,7 @@ TEST_F(QueueDeathTest, NoThreadStartsBeforeTheFirstAsync) {
       testing::ExitedWithCode(0), "");
 }
 
-TEST_F(QueueTest, WorkersTakeNoSignals) {
+TEST_F(QueueTest, WorkersBlockSignals) {
   std::latch hasRun(1);
   sigset_t blocked;
   sigemptyset(&blocked);
@@ -158,7 +158,7 @@ TEST_F(QueueDeathTest, FaultsOfATaskReachTheHostsHandler) {
   }
 }
 
-TEST_F(QueueTest, WorkersDoNotBearTheNameOfWhoStartedThem) {
+TEST_F(QueueTest, WorkersDoNotBearTheNameOfTheirStarter) {
   if (!RT_TEST_THREAD_SANITIZER) waitUntilWorkersHaveEnded();
   std::thread([&] {
     rt::Thread::setCurrentName("Importer"_s);
@@ -255,7 +255,7 @@ class ThreadRefusal {
   rlimit before_{};
 };
 
-TEST_F(QueueWithoutThreadsDeathTest, TasksWaitWhereTheSystemRefusesAThread) {
+TEST_F(QueueWithoutThreadsDeathTest, TasksWaitIfTheSystemRefusesAThread) {
   EXPECT_EXIT(
       {
         const Ref<Queue> queue = rt::make<Queue>("test"_s);
@@ -279,7 +279,7 @@ TEST_F(QueueWithoutThreadsDeathTest, TasksWaitWhereTheSystemRefusesAThread) {
 
 // Regression: a queue that had been refused a thread once never asked again. Its tasks waited until the
 // process exited.
-TEST_F(QueueWithoutThreadsDeathTest, AQueueThatWasRefusedAThreadAsksAgain) {
+TEST_F(QueueWithoutThreadsDeathTest, AQueueTriesAgainAfterAThreadWasRefused) {
   EXPECT_EXIT(
       {
         alarm(30);  // Instead of a hang.

@@ -323,7 +323,7 @@ TEST(Format, DoesNotAdvanceTheCallersList) {
   EXPECT_EQ(twice("%2$s %1$d", 1, "two"), "two 1|two 1");
 }
 
-TEST(Format, ExceptionsPassAndNothingIsLeaked) {
+TEST(Format, ThrowsWhatADescriptionThrowsAndLeaksNothing) {
   const rt::Ref<Witness> thrower = rt::make<Witness>();
   const std::string filler(2 * rt::StringBuilder::kInlineCapacity, 'a');
   // The exception itself is freed before the count is read.

@@ -279,7 +279,7 @@ TEST(CollectionDescription, SortsKeysWhateverTheOrderOfInsertion) {
   }
 }
 
-TEST(CollectionDescription, LetsExceptionsPass) {
+TEST(CollectionDescription, ThrowsWhatADescriptionThrows) {
   class Thrower final : public rt::Implements<Thrower, rt::Object> {
    public:
     rt::String description() const override { throw std::runtime_error("no description"); }

@@ -266,7 +266,7 @@ TEST_F(LUMLogMultiplexerThreadsTest, KeepsConcurrentChanges) {
 
 // One logger throws, one removes and adds itself, one logs a fault, and one waits. A logger that is always
 // present misses no message that was logged before the exception.
-TEST_F(LUMLogMultiplexerThreadsTest, KeepsItsPromisesAmongHostileLoggers) {
+TEST_F(LUMLogMultiplexerThreadsTest, KeepsItsInvariantsAmongHostileLoggers) {
   struct Thrown {};
   std::uint64_t byAsync = 0;  // Used by tasks of the queue only.
   std::atomic<std::uint64_t> thrown = 0;

@@ -5,7 +5,7 @@
 ///
 ///     class KeyedArchiveAndPython : public PlistlibTest {};
 ///
-///     TEST_F(KeyedArchiveAndPython, PythonReadsOurs) {
+///     TEST_F(KeyedArchiveAndPython, PythonReadsOurArchives) {
 ///       writeFile(rt::KeyedArchiver::archivedDataWithRootObject(number));
 ///       EXPECT_EQ(python("print(plistlib.load(open(path, 'rb')))"), "7\n");
 ///     }

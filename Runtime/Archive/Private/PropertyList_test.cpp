@@ -73,7 +73,7 @@ TEST(PropertyList, IsNeverCopied) {
   static_assert(std::is_nothrow_move_constructible_v<PropertyList::Value>);
 }
 
-TEST(PropertyList, NothingIsNoPropertyList) {
+TEST(PropertyList, RejectsNoBytesAndAnEmptyList) {
   EXPECT_THROW(PropertyList::decoded({}), rt::MalformedPropertyList);
   EXPECT_THROW(static_cast<void>(PropertyList().encoded()), std::invalid_argument);
 }
@@ -95,7 +95,7 @@ TEST(PropertyList, ReadsKnownBytes) {
             PropertyList::Value(PropertyList::Array{1, 1}));
 }
 
-TEST(PropertyList, ReadsBackEachKindAtItsEdges) {
+TEST(PropertyList, ReadsBackEachKindAtItsLimits) {
   using Limits = std::numeric_limits<std::int64_t>;
   for (const std::int64_t number : {Limits::min(), std::int64_t{-1}, std::int64_t{0}, std::int64_t{255},
                                     std::int64_t{256}, std::int64_t{65535}, std::int64_t{65536},
@@ -134,7 +134,7 @@ TEST(PropertyList, FindsByKey) {
   EXPECT_EQ(list.find(99, "key"), std::nullopt);
 }
 
-TEST(PropertyList, RefusesToWriteWhatItWouldNotRead) {
+TEST(PropertyList, RejectsValuesThatItCouldNotReadBack) {
   const auto errorOfEncoding = [](const PropertyList& list) {
     return errorOf([&] { static_cast<void>(list.encoded()); });
   };
@@ -154,7 +154,7 @@ TEST(PropertyList, RefusesToWriteWhatItWouldNotRead) {
   EXPECT_THAT(errorOfEncoding(list), HasSubstr("root"));
 }
 
-TEST(PropertyList, RefusesWhatIsMalformed) {
+TEST(PropertyList, RejectsMalformedBytes) {
   using namespace std::string_view_literals;
   EXPECT_THAT(errorOfDecoding(file("\x00"sv, {8})), HasSubstr("unknown kind"));
   EXPECT_THAT(errorOfDecoding(file("\xC0"sv, {8})), HasSubstr("unknown kind"));
@@ -187,7 +187,7 @@ TEST(PropertyList, RefusesWhatIsMalformed) {
   EXPECT_THAT(errorOfDecoding(file("\x53\x52\x51k"sv, {8, 9, 10})), HasSubstr("overlaps"));
 }
 
-TEST(PropertyList, RefusesATrailerThatContradictsTheFile) {
+TEST(PropertyList, RejectsATrailerThatContradictsTheFile) {
   const Bytes whole = file("\x09", {8});
   const std::size_t trailer = whole.size() - 32;
   for (const std::size_t offset : {6U, 7U}) {
@@ -294,7 +294,7 @@ TEST(PropertyList, ReadsBackRandomLists) {
 }
 
 // If bytes are cut off or changed, the result is an exception or a list that can be written again.
-TEST(PropertyList, SurvivesDamage) {
+TEST(PropertyList, SurvivesDamagedBytes) {
   std::mt19937_64 random(7);  // NOLINT(cert-msc*): the same damage in every run
   const Bytes bytes = randomList(random).encoded();
   for (std::size_t length = 0; length < bytes.size(); ++length) {
@@ -319,7 +319,7 @@ TEST(PropertyList, SurvivesDamage) {
 
 class PropertyListAndPython : public PlistlibTest {};
 
-TEST_F(PropertyListAndPython, PythonReadsOurs) {
+TEST_F(PropertyListAndPython, PythonReadsOurPropertyLists) {
   PropertyList list;
   PropertyList::Dictionary root;
   const auto add = [&](const char* key, PropertyList::Value value) {
@@ -342,7 +342,7 @@ TEST_F(PropertyListAndPython, PythonReadsOurs) {
             "'text': 'a\\xfc\\U0001f600', 'uid': UID(300), 'array': ['no', False]}\n");
 }
 
-TEST_F(PropertyListAndPython, ReadsPythons) {
+TEST_F(PropertyListAndPython, ReadsPythonsPropertyLists) {
   python(R"(
 plistlib.dump({'yes': True, 'int': -1, 'large': 2**64 - 1, 'real': 0.5, 'text': '\xfc\U0001f600', 'uid': plistlib.UID(70000),
     'array': list(range(500))}, open(path, 'wb'), fmt=plistlib.FMT_BINARY))");

@@ -39,7 +39,7 @@ class DefaultsFile : public testing::Test {
   fs::path folder_;
 };
 
-TEST_F(DefaultsFile, ThatIsOldIsReadOnlyOnce) {
+TEST_F(DefaultsFile, ReadsAnOldFileOnlyOnce) {
   // The time of a change cannot be set back, so the test uses files that have existed for long.
   constexpr const char* kOld = "/etc/passwd";
   constexpr const char* kOther = "/etc/group";
@@ -55,14 +55,14 @@ TEST_F(DefaultsFile, ThatIsOldIsReadOnlyOnce) {
   EXPECT_TRUE(file.isStill(file.version()));
 }
 
-TEST_F(DefaultsFile, ThatIsFreshIsReadAgain) {
+TEST_F(DefaultsFile, ReadsAFreshFileAgain) {
   const rt::DefaultsFile file((folder_ / "file").string());
   std::ofstream(file.path()) << "a";
   EXPECT_FALSE(file.isStill(file.version()));
 }
 
 // The clock of a file system may have steps of two seconds. Two changes within one step have the same time.
-TEST_F(DefaultsFile, IsFreshForTwoSeconds) {
+TEST_F(DefaultsFile, CountsAsFreshForTwoSeconds) {
   static time_t now;
   const rt::DefaultsFile file((folder_ / "file").string());
   std::ofstream(file.path()) << "a";
@@ -81,7 +81,7 @@ TEST_F(DefaultsFile, IsFreshForTwoSeconds) {
   EXPECT_TRUE(file.isStill(settled));
 }
 
-TEST_F(DefaultsFile, ThatIsMissingHasAVersion) {
+TEST_F(DefaultsFile, HasAVersionForAMissingFile) {
   const rt::DefaultsFile file((folder_ / "file").string());
   EXPECT_FALSE(file.isStill(rt::DefaultsFile::Version()));
   const rt::DefaultsFile::Version version = file.version();
@@ -93,7 +93,7 @@ TEST_F(DefaultsFile, ThatIsMissingHasAVersion) {
   EXPECT_THROW(file.content(1), std::system_error);
 }
 
-TEST_F(DefaultsFile, SaysWhatItCannotRead) {
+TEST_F(DefaultsFile, NamesTheFileThatItCannotRead) {
   const auto errorOf = [](const auto& act) -> std::string {
     try {
       act();
@@ -111,7 +111,7 @@ TEST_F(DefaultsFile, SaysWhatItCannotRead) {
   EXPECT_EQ(below.content(1), std::nullopt);
 }
 
-TEST_F(DefaultsFile, IsReadWhole) {
+TEST_F(DefaultsFile, ReadsTheWholeFile) {
   const rt::DefaultsFile file((folder_ / "file").string());
   for (const std::size_t size : {0U, 1U, 4095U, 4096U, 4097U, 100000U}) {
     const std::string content(size, 'x');

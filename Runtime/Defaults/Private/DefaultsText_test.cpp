@@ -32,7 +32,7 @@ std::string valueIn(std::string_view line) {
   return value != nullptr ? *value : "(none)";
 }
 
-TEST(DefaultsText, NothingHasNoSettings) {
+TEST(DefaultsText, HasNoSettingsIfEmpty) {
   EXPECT_EQ(DefaultsText().find("key"), nullptr);
   for (const char* text : {"", "\n", "# remark", "  # remark\n\n\t\r\n"}) {
     EXPECT_EQ(DefaultsText::parsed(text).find("key"), nullptr);
@@ -56,7 +56,7 @@ TEST(DefaultsText, ReadsALine) {
   EXPECT_THAT(DefaultsText::parsed("two words = ü").find("two words"), Pointee(std::string("ü")));
 }
 
-TEST(DefaultsText, SaysWhatIsMalformedAndWhere) {
+TEST(DefaultsText, ReportsWhatIsMalformedAndWhere) {
   EXPECT_EQ(errorOf("a = 1\nb"), "line 2: a key without a = behind it");
   EXPECT_EQ(errorOf("b # = 1"), "line 1: a key without a = behind it");
   EXPECT_EQ(errorOf("\"b\" c = 1"), "line 1: a key without a = behind it");

@@ -24,7 +24,7 @@ TEST(FilePath, FollowsSymbolicLinks) {
   EXPECT_EQ(rmdir(folder.c_str()), 0);
 }
 
-TEST(FilePath, LeavesAPathThatCannotBeFollowedAsItIs) {
+TEST(FilePath, LeavesAnUnresolvablePathUnchanged) {
   EXPECT_EQ(rt::resolvedPath("/missing/b"), "/missing/b");
 }
 

@@ -172,7 +172,7 @@ TEST(SRLRegistryRegistration, IsInProgressDuringTheCallbacksOfModules) {
 }
 
 // The API's type is given by a function, which must not run before a request for the API.
-TEST(SRLRegistryRegistration, LooksAtNoBinding) {
+TEST(SRLRegistryRegistration, DoesNotReadBindings) {
   TestReports reports;
   static int calls;
   calls = 0;

@@ -297,7 +297,7 @@ TEST_F(SRLRegistryScopes, EndWithTheLockReleased) {
   EXPECT_TRUE(found);
 }
 
-TEST_F(SRLRegistryScopes, DoNotEndByNull) {
+TEST_F(SRLRegistryScopes, DoNotEndForANullTag) {
   const Ref<SRLMemoizingScope> scope = registry->scopeWithTags({});
   registry->removeScopesWithTag(nullptr);
   EXPECT_THAT(reportsOf("-[SRLRegistry removeScopesWithTag:]"), ElementsAre("tag cannot be nil!"));

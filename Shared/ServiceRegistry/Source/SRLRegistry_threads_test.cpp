@@ -267,7 +267,7 @@ class Delegate final : public rt::Implements<Delegate, rt::Object, SRLScopeLifec
   }
 };
 
-TEST(SRLRegistryThreads, KeepEveryPromise) {
+TEST(SRLRegistryThreads, KeepAllInvariants) {
   std::atomic<int> reports{0};
   PECErrorHandler::sharedInstance()->setErrorHandlerBlock(
       [&](const Ref<PECErrorDescription>&) { ++reports; });

@@ -247,7 +247,9 @@ TEST_F(UserDefaults, AllowAForkInAnObserver) {
   observation = defaults->observe("key", Notify::kOnChange, [&] {
     status = statusOfFork([&] {
       observation.remove();
-      set("key", "2");
+      // Not by `set`, whose lock the parent's main thread may hold.
+      write(folder_ / "fresh", "key = 2");
+      fs::rename(folder_ / "fresh", path());
       return defaults->stringForKey("key") == "2" ? 0 : 1;
     });
     isOver.release();

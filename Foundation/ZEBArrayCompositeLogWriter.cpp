@@ -1,3 +1,6 @@
+// This class exists because the runtime knows no logger: a protocol cannot be added to `rt::Array` from
+// outside. An array never changes, so the constructor looks at its elements once.
+
 #include "Foundation/ZEBArrayCompositeLogWriter.h"
 
 #include <utility>
@@ -6,7 +9,7 @@
 
 namespace {
 
-// `object` as a writer; null where it is none.
+// Returns `object` as a writer; null if it cannot be one.
 rt::Ref<ZEBLogWriter> writerFor(const rt::Ref<rt::Object>& object) {
   if (rt::Ref<ZEBLogWriter> writer = rt::cast<ZEBLogWriter>(object)) return writer;
   if (const auto array = rt::cast<rt::Array>(object)) return ZEBArrayCompositeLogWriter::initWithArray(array);
@@ -21,7 +24,7 @@ ZEBArrayCompositeLogWriter::ZEBArrayCompositeLogWriter(std::vector<rt::Ref<ZEBLo
 rt::Ref<ZEBArrayCompositeLogWriter> ZEBArrayCompositeLogWriter::initWithArray(
     const rt::Ref<rt::Array>& array) {
   if (array == nullptr) return nullptr;
-  // An array never changes: what its elements are is looked at once.
+  // An array is immutable, so its elements are examined once.
   std::vector<rt::Ref<ZEBLogWriter>> writers;
   for (const rt::Ref<rt::Object>& element : *array) {
     if (rt::Ref<ZEBLogWriter> writer = writerFor(element)) writers.push_back(std::move(writer));

@@ -1,19 +1,19 @@
 #pragma once
 
-/// Makes an array of writers a writer: each line to it goes to all of them, in their order.
+/// A writer that passes each line to all writers of an array, in their order.
 ///
 ///     logger->setWriter(ZEBArrayCompositeLogWriter::of(rt::FileHandle::standardError(), file, counter));
 ///
-/// An element is one of these; any other object is passed over:
+/// An element is one of the following. Any other object is skipped:
 ///
 /// - an object that conforms to ZEBLogWriter;
-/// - a `rt::FileHandle`, as by Foundation/ZEBFileHandleLogWriter.h;
+/// - a `rt::FileHandle`, which is wrapped as by Foundation/ZEBFileHandleLogWriter.h;
 /// - another array of such.
 ///
-/// Any thread may use it. A line has gone to all writers before the next one goes to any, so all get them in
-/// one order.
+/// Threads: thread-safe. A line reaches all writers before the next line reaches any, so that all writers get
+/// the lines in the same order.
 ///
-/// Not for: an array that contains itself by way of a logger.
+/// Not for: an array that contains itself through a logger.
 
 #include <vector>
 
@@ -26,18 +26,18 @@
 class RT_VISIBLE ZEBArrayCompositeLogWriter final
     : public rt::Implements<ZEBArrayCompositeLogWriter, rt::Object, ZEBLogWriter> {
  public:
-  /// A writer to the elements of `array`; null for null.
+  /// Makes a writer of the elements of `array`. Returns null if `array` is null.
   static rt::Ref<ZEBArrayCompositeLogWriter> initWithArray(const rt::Ref<rt::Array>& array);
 
-  /// A writer to these elements, none of which is null: references to objects or protocols. Throws
-  /// std::invalid_argument where one is null.
+  /// Makes a writer of these elements, which are references to objects or protocols. Throws
+  /// std::invalid_argument if an element is null.
   template <class... Elements>
   static rt::Ref<ZEBArrayCompositeLogWriter> of(const Elements&... elements) {
     return initWithArray(rt::Array::of(elements...));
   }
 
-  /// Hands `message` and `level` to each writer. Under a lock of its own, which a writer may take again by
-  /// logging. What a writer throws passes, and the writers after it do not get the line.
+  /// Passes `message` and `level` to each writer, with this object's lock held. A writer may log to this
+  /// object again. Throws what a writer throws; the writers after it do not get the line.
   void logMessage(const rt::String& message, ZEBLogLevel level) override;
 
  private:

@@ -21,7 +21,7 @@ using testing::ElementsAre;
 
 using Lines = std::vector<std::string>;
 
-// Writes its name and the line into a list.
+// Adds its name and the line to a list.
 class Recorder final : public rt::Implements<Recorder, rt::Object, ZEBLogWriter> {
  public:
   Recorder(Lines& lines, std::string name) : lines_(lines), name_(std::move(name)) {}
@@ -43,7 +43,7 @@ class Throwing final : public rt::Implements<Throwing, rt::Object, ZEBLogWriter>
 
 class Bystander final : public rt::Implements<Bystander, rt::Object> {};
 
-TEST(ZEBArrayCompositeLogWriter, HandsLinesToAllWritersInTheirOrder) {
+TEST(ZEBArrayCompositeLogWriter, PassesLinesToAllWritersInOrder) {
   Lines lines;
   const auto first = rt::make<Recorder>(lines, "a");
   const rt::Ref<ZEBLogWriter> second = rt::make<Recorder>(lines, "b");
@@ -53,7 +53,7 @@ TEST(ZEBArrayCompositeLogWriter, HandsLinesToAllWritersInTheirOrder) {
   EXPECT_THAT(lines, ElementsAre("a1 one", "b1 one", "a1 one", "a7 two", "b7 two", "a7 two"));
 }
 
-TEST(ZEBArrayCompositeLogWriter, PassesOverWhatIsNoWriter) {
+TEST(ZEBArrayCompositeLogWriter, SkipsElementsThatAreNotWriters) {
   Lines lines;
   const auto writer =
       ZEBArrayCompositeLogWriter::of("text"_s, rt::make<Recorder>(lines, "a"), rt::Number::of(3),
@@ -67,7 +67,7 @@ TEST(ZEBArrayCompositeLogWriter, MayBeEmpty) {
   EXPECT_FALSE(ZEBArrayCompositeLogWriter::initWithArray(nullptr));
 }
 
-TEST(ZEBArrayCompositeLogWriter, TakesFileHandlesAndArraysForTheWritersThatTheyAre) {
+TEST(ZEBArrayCompositeLogWriter, TreatsFileHandlesAndArraysAsWriters) {
   Lines lines;
   const auto inner = rt::Array::of(rt::make<Recorder>(lines, "a"), rt::FileHandle::standardError());
   const auto writer = ZEBArrayCompositeLogWriter::of(inner, rt::FileHandle::standardOutput(),
@@ -80,7 +80,7 @@ TEST(ZEBArrayCompositeLogWriter, TakesFileHandlesAndArraysForTheWritersThatTheyA
   EXPECT_THAT(lines, ElementsAre("a4 line", "a4 line"));
 }
 
-TEST(ZEBArrayCompositeLogWriter, TakesLoggers) {
+TEST(ZEBArrayCompositeLogWriter, TreatsLoggersAsWriters) {
   Lines lines;
   const auto logger = ZEBLogger::loggerWithWriter(rt::make<Recorder>(lines, "a"), nullptr, nullptr);
   const auto writer = ZEBArrayCompositeLogWriter::of(logger);
@@ -89,17 +89,17 @@ TEST(ZEBArrayCompositeLogWriter, TakesLoggers) {
   EXPECT_THAT(lines, ElementsAre("a2 100%@"));
 }
 
-TEST(ZEBArrayCompositeLogWriter, PassesWhatAWriterThrowsAndGoesOnWithTheNextLine) {
+TEST(ZEBArrayCompositeLogWriter, ThrowsWhatAWriterThrowsAndWritesTheNextLine) {
   Lines lines;
   const auto writer = ZEBArrayCompositeLogWriter::of(rt::make<Recorder>(lines, "a"), rt::make<Throwing>(),
                                                      rt::make<Recorder>(lines, "b"));
   EXPECT_THROW(writer->logMessage("one"_s, 3), std::runtime_error);
-  // The lock is free again, for others too.
+  // The lock is free again, for other threads too.
   std::thread([&] { EXPECT_THROW(writer->logMessage("two"_s, 3), std::runtime_error); }).join();
   EXPECT_THAT(lines, ElementsAre("a3 one", "a3 two"));
 }
 
-TEST(ZEBArrayCompositeLogWriter, LetsAWriterLogToItAgain) {
+TEST(ZEBArrayCompositeLogWriter, AWriterMayLogToIt) {
   class Echo final : public rt::Implements<Echo, rt::Object, ZEBLogWriter> {
    public:
     void logMessage(const rt::String& message, ZEBLogLevel level) override {
@@ -123,9 +123,9 @@ class Yielding final : public rt::Implements<Yielding, rt::Object, ZEBLogWriter>
   }
 };
 
-// Invariant: no writer gets a line before all have got the one before it. The recorders have no lock of their
+// Invariant: no writer gets a line before all have got the previous one. The recorders have no lock of their
 // own.
-TEST(ZEBArrayCompositeLogWriter, KeepsLinesOfThreadsApart) {
+TEST(ZEBArrayCompositeLogWriter, DoesNotMixLinesOfThreads) {
   constexpr int kThreads = 8;
   constexpr int kLines = 500;
   Lines lines;

@@ -1,6 +1,6 @@
 #pragma once
 
-// How logging keeps what goes wrong in it to itself.
+// Keeps failures inside logging away from the code that logs.
 
 #include <utility>
 
@@ -8,8 +8,8 @@
 #include <cxxabi.h>
 #endif
 
-/// Runs `body`; what it throws is dropped. The cancellation of the thread passes: where that is an exception,
-/// too, the system ends programs that drop it.
+/// Runs `body` and drops what it throws. Cancellation of the thread passes through: where cancellation is an
+/// exception, the system ends a program that drops it.
 template <class Body>
 void ZEBDropExceptions(Body&& body) {
   try {
@@ -18,6 +18,6 @@ void ZEBDropExceptions(Body&& body) {
   } catch (const abi::__forced_unwind&) {
     throw;
 #endif
-  } catch (...) {  // NOLINT(bugprone-empty-catch): a line that cannot be logged is lost
+  } catch (...) {  // NOLINT(bugprone-empty-catch): the line that failed is lost
   }
 }

@@ -1,3 +1,6 @@
+// This class exists because the runtime knows no logger: a protocol cannot be added to `rt::FileHandle` from
+// outside. All writers over a handle share the handle's one lock.
+
 #include "Foundation/ZEBFileHandleLogWriter.h"
 
 #include <utility>

@@ -1,6 +1,6 @@
 #pragma once
 
-/// Makes a file handle a writer: each line to it becomes one of the file's.
+/// A writer that appends each line to a file handle.
 ///
 ///     rt::Ref<ZEBFileHandleLogWriter> writer =
 ///         ZEBFileHandleLogWriter::fileHandleForLoggingAtPath("/var/log/host.log"_s, 0644);
@@ -8,7 +8,7 @@
 ///
 ///     logger->setWriter(ZEBFileHandleLogWriter::initWithFileHandle(rt::FileHandle::standardError()));
 ///
-/// Any thread may use it, and several writers over one handle: lines are whole, by the handle's own lock.
+/// Threads: thread-safe. Several writers may share a handle. The handle's own lock keeps lines whole.
 
 #include <cstdint>
 
@@ -20,19 +20,19 @@
 class RT_VISIBLE ZEBFileHandleLogWriter final
     : public rt::Implements<ZEBFileHandleLogWriter, rt::Object, ZEBLogWriter> {
  public:
-  /// A writer over `fileHandle`; null for null.
+  /// Makes a writer for `fileHandle`. Returns null if `fileHandle` is null.
   static rt::Ref<ZEBFileHandleLogWriter> initWithFileHandle(rt::Ref<rt::FileHandle> fileHandle);
 
-  /// A writer over a new handle for the file at `path`: as `rt::FileHandle::openForAppending`, also where
-  /// that gives none.
+  /// Makes a writer for a new handle that `rt::FileHandle::openForAppending` opens. Returns null if that
+  /// fails.
   static rt::Ref<ZEBFileHandleLogWriter> fileHandleForLoggingAtPath(const rt::String& path,
                                                                     std::uint16_t mode);
 
-  /// The handle; never null.
+  /// Returns the handle; never null.
   const rt::Ref<rt::FileHandle>& fileHandle() const noexcept { return fileHandle_; }
 
-  /// Writes `message`, "(null)" for null, and a line feed. Throws nothing: a line that cannot be written is
-  /// lost.
+  /// Writes `message` and a line feed; "(null)" stands for a null message. Throws nothing. A line that cannot
+  /// be written is lost.
   void logMessage(const rt::String& message, ZEBLogLevel level) override;
 
  private:

@@ -41,7 +41,7 @@ class ZEBFileHandleLogWriterTest : public testing::Test {
   fs::path directory_;
 };
 
-TEST_F(ZEBFileHandleLogWriterTest, MakesTheFileWithTheMode) {
+TEST_F(ZEBFileHandleLogWriterTest, CreatesTheFileWithTheMode) {
   const mode_t before = umask(022);
   const auto writer = open(0666);
   umask(before);
@@ -51,13 +51,13 @@ TEST_F(ZEBFileHandleLogWriterTest, MakesTheFileWithTheMode) {
   EXPECT_EQ(flags & (O_ACCMODE | O_APPEND), O_WRONLY | O_APPEND);
 }
 
-TEST_F(ZEBFileHandleLogWriterTest, IsNoneWhereThereIsNoFile) {
+TEST_F(ZEBFileHandleLogWriterTest, IsNullWithoutAFile) {
   EXPECT_FALSE(ZEBFileHandleLogWriter::fileHandleForLoggingAtPath(nullptr, 0644));
   EXPECT_FALSE(ZEBFileHandleLogWriter::fileHandleForLoggingAtPath("/no/such/folder/log"_s, 0644));
   EXPECT_FALSE(ZEBFileHandleLogWriter::initWithFileHandle(nullptr));
 }
 
-TEST_F(ZEBFileHandleLogWriterTest, WritesLinesWhateverTheirLevel) {
+TEST_F(ZEBFileHandleLogWriterTest, WritesLinesOfEveryLevel) {
   std::ofstream(path()) << "before\n";
   const auto writer = open();
   for (const ZEBLogLevel level : {-1, 0, 4, 99}) writer->logMessage("größe %d %@"_s, level);
@@ -66,7 +66,7 @@ TEST_F(ZEBFileHandleLogWriterTest, WritesLinesWhateverTheirLevel) {
   EXPECT_EQ(contents(), "before\ngröße %d %@\ngröße %d %@\ngröße %d %@\ngröße %d %@\n\n(null)\n");
 }
 
-TEST_F(ZEBFileHandleLogWriterTest, ClosesTheFileWhenItGoes) {
+TEST_F(ZEBFileHandleLogWriterTest, ClosesTheFileWhenDestroyed) {
   auto writer = open();
   const int descriptor = writer->fileHandle()->descriptor();
   EXPECT_NE(fcntl(descriptor, F_GETFD), -1);
@@ -74,13 +74,13 @@ TEST_F(ZEBFileHandleLogWriterTest, ClosesTheFileWhenItGoes) {
   EXPECT_EQ(fcntl(descriptor, F_GETFD), -1);
 }
 
-TEST_F(ZEBFileHandleLogWriterTest, IsSilentAboutAFullDisk) {
+TEST_F(ZEBFileHandleLogWriterTest, IgnoresAFullDisk) {
   if (!fs::exists("/dev/full")) GTEST_SKIP() << "no /dev/full here";
   const auto writer = ZEBFileHandleLogWriter::fileHandleForLoggingAtPath("/dev/full"_s, 0644);
   ASSERT_TRUE(writer);
   writer->logMessage("lost"_s, 3);
   writer->logMessage("lost, too"_s, 3);
-  // Once there is room, it goes on.
+  // It writes again as soon as there is room.
   const int descriptor = writer->fileHandle()->descriptor();
   const int other = ::open(path().c_str(), O_WRONLY | O_APPEND | O_CREAT | O_CLOEXEC, 0600);
   ASSERT_GE(other, 0);
@@ -90,7 +90,7 @@ TEST_F(ZEBFileHandleLogWriterTest, IsSilentAboutAFullDisk) {
   EXPECT_EQ(contents(), "next\n");
 }
 
-TEST_F(ZEBFileHandleLogWriterTest, IsSilentAboutAClosedDescriptor) {
+TEST_F(ZEBFileHandleLogWriterTest, IgnoresAClosedDescriptor) {
   const auto writer = open();
   const int descriptor = writer->fileHandle()->descriptor();
   const int kept = dup(descriptor);
@@ -103,7 +103,7 @@ TEST_F(ZEBFileHandleLogWriterTest, IsSilentAboutAClosedDescriptor) {
   EXPECT_EQ(contents(), "next\n");
 }
 
-TEST_F(ZEBFileHandleLogWriterTest, GoesOnWritingAFileThatWasRemoved) {
+TEST_F(ZEBFileHandleLogWriterTest, WritesToAFileThatWasRemoved) {
   const auto writer = open();
   fs::remove(path());
   writer->logMessage("to nobody"_s, 3);
@@ -113,8 +113,8 @@ TEST_F(ZEBFileHandleLogWriterTest, GoesOnWritingAFileThatWasRemoved) {
   EXPECT_EQ(status.st_size, 10);
 }
 
-TEST_F(ZEBFileHandleLogWriterTest, KeepsLinesOfSeveralWritersOverOneHandleWhole) {
-  // Two writers over one handle.
+TEST_F(ZEBFileHandleLogWriterTest, KeepsLinesWholeIfWritersShareAHandle) {
+  // Two writers share a handle.
   const auto first = open();
   const auto second = ZEBFileHandleLogWriter::initWithFileHandle(first->fileHandle());
   const rt::String line = rt::String::fromUTF8(std::string(3000, 'x'));

@@ -1,13 +1,13 @@
 #pragma once
 
-/// The filter that lets the lines of some levels pass.
+/// A filter that lets the lines of a set of levels pass.
 ///
 ///     logger->setFilter(
 ///         ZEBLogAllowedLevelFilter::initWithAllowedLevels({ZEBLogLevelDebug, ZEBLogLevelError}));
 ///
-/// It is immutable: any thread may use it.
+/// Threads: thread-safe, because it is immutable.
 ///
-/// Not for: levels beyond those of Foundation/ZEBLogLevel.h, which never pass.
+/// Not for: levels other than those of Foundation/ZEBLogLevel.h. They never pass.
 
 #include <bitset>
 #include <set>
@@ -19,13 +19,14 @@
 class RT_VISIBLE ZEBLogAllowedLevelFilter
     : public rt::Implements<ZEBLogAllowedLevelFilter, rt::Object, ZEBLogFilter> {
  public:
-  /// One that allows `allowedLevels`; null where there are none, or one of them is not from 0 to 4.
+  /// Makes a filter that allows `allowedLevels`. Returns null if the set is empty or has a level that is not
+  /// from 0 to 4.
   static rt::Ref<ZEBLogAllowedLevelFilter> initWithAllowedLevels(const std::set<ZEBLogLevel>& allowedLevels);
 
-  /// One that allows the levels 0 to 4.
+  /// Makes a filter that allows the levels 0 to 4.
   static rt::Ref<ZEBLogAllowedLevelFilter> init();
 
-  /// Whether `level` is one of the allowed levels.
+  /// Returns whether `level` is allowed.
   bool filterAllowsMessage(const rt::String& message, ZEBLogLevel level) override;
 
  protected:

@@ -29,7 +29,7 @@ TEST(ZEBLogAllowedLevelFilter, AllowsAllLevelsWithoutASet) {
   EXPECT_THAT(allowedBy(*ZEBLogAllowedLevelFilter::init()), ElementsAre(0, 1, 2, 3, 4));
 }
 
-TEST(ZEBLogAllowedLevelFilter, CannotBeMadeForNoLevelsOrOthers) {
+TEST(ZEBLogAllowedLevelFilter, IsNullWithoutLevelsOrWithUnknownOnes) {
   EXPECT_FALSE(ZEBLogAllowedLevelFilter::initWithAllowedLevels({}));
   EXPECT_FALSE(ZEBLogAllowedLevelFilter::initWithAllowedLevels({5}));
   EXPECT_FALSE(ZEBLogAllowedLevelFilter::initWithAllowedLevels({0, 5}));

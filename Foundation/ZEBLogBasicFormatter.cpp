@@ -8,7 +8,7 @@ using namespace rt::literals;
 
 namespace {
 
-// As a parameter, an argument list is a pointer on the systems where it can be missing.
+// A `va_list` parameter is a pointer on the systems where it can be null.
 template <class List>
 bool isMissing(List list) {
   if constexpr (std::is_pointer_v<List>) return list == nullptr;

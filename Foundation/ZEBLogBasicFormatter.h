@@ -1,10 +1,10 @@
 #pragma once
 
-/// The formatter that adds nothing: a line is the message. What a logger has that was given none.
+/// A formatter whose line is the message alone. It is the default of a logger.
 ///
 ///     logger->setFormatter(rt::make<ZEBLogBasicFormatter>());
 ///
-/// Any thread may use it.
+/// Threads: thread-safe.
 
 #include "Foundation/ZEBLogFormatter.h"
 #include "Runtime/Base/Visibility.h"
@@ -14,12 +14,12 @@ class RT_VISIBLE ZEBLogBasicFormatter
  public:
   ZEBLogBasicFormatter() = default;
 
-  /// The format with its arguments, as `rt::formatV` makes it; null where either is null. Throws what a
-  /// description of an argument throws.
+  /// Returns the format with its arguments, as `rt::formatV` does. Null if the format or `valist` is null.
+  /// Throws what the description of an argument throws.
   rt::String stringForFunc(const rt::String& func, const rt::String& withFormat, std::va_list valist,
                            ZEBLogLevel level) override;
 
-  /// `func` as lines show it: "(unknown)" where it is null or nothing but white space; "main()" for "main";
-  /// as it is, without the white space around it, where it begins with "-[" or "+[" or ends with ")".
+  /// Returns `func` as lines show it, without the white space around it. "main" becomes "main()". Text that
+  /// begins with "-[" or "+[", or ends with ")", stays as it is. Null or blank text becomes "(unknown)".
   virtual rt::String prettyNameForFunc(const rt::String& func);
 };

@@ -16,14 +16,14 @@ rt::String format(const rt::String* withFormat, ...) {
   std::va_list arguments;
   va_start(arguments, withFormat);
   const rt::String first = formatter->stringForFunc("func"_s, *withFormat, arguments, 3);
-  // The list is left where it is.
+  // The list has not been advanced.
   const rt::String second = formatter->stringForFunc(nullptr, *withFormat, arguments, 0);
   va_end(arguments);
   EXPECT_EQ(first, second);
   return first;
 }
 
-TEST(ZEBLogBasicFormatter, AppliesTheFormatAndIgnoresTheRest) {
+TEST(ZEBLogBasicFormatter, AppliesTheFormatAndIgnoresFunctionAndLevel) {
   const rt::String text = "%@ has %d of %s%%"_s;
   const rt::Ref<rt::Array> array = rt::Array::of("a"_s);
   EXPECT_EQ(format(&text, static_cast<rt::Object*>(array.get()), 3, "five"), "(\n    a\n) has 3 of five%"_s);
@@ -31,17 +31,17 @@ TEST(ZEBLogBasicFormatter, AppliesTheFormatAndIgnoresTheRest) {
   EXPECT_EQ(format(&empty), ""_s);
 }
 
-TEST(ZEBLogBasicFormatter, MakesNoneWithoutAFormat) {
+TEST(ZEBLogBasicFormatter, ReturnsNullWithoutAFormat) {
   const rt::String none;
   EXPECT_TRUE(format(&none).isNull());
 }
 
-TEST(ZEBLogBasicFormatter, MakesNoneWithoutArguments) {
+TEST(ZEBLogBasicFormatter, ReturnsNullWithoutArguments) {
   const auto formatter = rt::make<ZEBLogBasicFormatter>();
   EXPECT_TRUE(formatter->stringForFunc("func"_s, "format"_s, nullptr, 3).isNull());
 }
 
-TEST(ZEBLogBasicFormatter, ShowsFunctions) {
+TEST(ZEBLogBasicFormatter, FormatsFunctionNames) {
   const auto formatter = rt::make<ZEBLogBasicFormatter>();
   const std::pair<rt::String, rt::String> cases[] = {
       {"main"_s, "main()"_s},

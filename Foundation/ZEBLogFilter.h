@@ -1,6 +1,6 @@
 #pragma once
 
-/// What decides which lines of a logger are written.
+/// Decides which lines of a logger are written.
 ///
 ///     class Quiet final : public rt::Implements<Quiet, rt::Object, ZEBLogFilter> {
 ///      public:
@@ -9,7 +9,7 @@
 ///       }
 ///     };
 ///
-/// Not for: sparing the work of formatting, which is done before a filter is asked.
+/// Not for: saving the cost of formatting. A line is formatted before the filter is asked.
 
 #include "Foundation/ZEBLogLevel.h"
 #include "Runtime/Base/Visibility.h"
@@ -17,18 +17,21 @@
 #include "Runtime/Objects/String.h"
 
 struct RT_VISIBLE ZEBLogFilter : rt::Protocol<ZEBLogFilter> {
-  /// Whether the finished line `message` is written. Called by any thread that logs, by several at once.
-  /// What it throws the logger drops, with the line.
+  /// Returns whether the finished line `message` is written.
+  /// Threads: any thread that logs may call it, also several at once.
+  /// Errors: if it throws, the logger drops the exception and the line.
   virtual bool filterAllowsMessage(const rt::String& message, ZEBLogLevel level) = 0;
 
-  /// Told that the filter has been set into a logger. Called under that logger's lock, which keeps its
-  /// setters waiting, but no thread that logs. It must not set a filter of that logger. By default does
-  /// nothing.
+  /// Tells the filter that it has been set into a logger. Does nothing by default.
+  ///
+  /// Called with that logger's lock held. The lock blocks the logger's setters, but no thread that logs. Must
+  /// not set a filter of that logger.
   virtual void didAttachToLogger() {}
 
-  /// Told that the filter is about to be replaced in a logger, or that the logger is being destroyed.
-  /// Otherwise as `didAttachToLogger`; in a logger's destruction no lock is held, and what it throws is
-  /// dropped.
+  /// Tells the filter that a logger is about to replace it or is being destroyed. Does nothing by default.
+  ///
+  /// On replacement, the rules of `didAttachToLogger` hold. On destruction, no lock is held and exceptions
+  /// are dropped.
   virtual void willDetachFromLogger() {}
 
  protected:

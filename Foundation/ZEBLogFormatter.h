@@ -1,6 +1,6 @@
 #pragma once
 
-/// What turns a format and its arguments into one line of a logger.
+/// Turns a format and its arguments into one line of a logger.
 ///
 ///     class Shouting final : public rt::Implements<Shouting, ZEBLogBasicFormatter> {
 ///      public:
@@ -10,7 +10,7 @@
 ///       }
 ///     };
 ///
-/// Not for: writing lines, or deciding which are written.
+/// Not for: writing lines, or deciding which lines are written.
 
 #include <cstdarg>
 
@@ -20,10 +20,11 @@
 #include "Runtime/Objects/String.h"
 
 struct RT_VISIBLE ZEBLogFormatter : rt::Protocol<ZEBLogFormatter> {
-  /// The line, without an end, for the format `withFormat` with the arguments of `valist`, which is left
-  /// where it is; null for none, and then nothing is logged. `func` is the name of the function that logs,
-  /// or null. Called by any thread that logs, by several at once. What it throws the logger drops, with the
-  /// line.
+  /// Returns the line, without a line feed, for the format `withFormat` and the arguments `valist`. If it
+  /// returns null, nothing is logged. Does not advance `valist`. `func` is the name of the function that
+  /// logs, or null.
+  /// Threads: any thread that logs may call it, also several at once.
+  /// Errors: if it throws, the logger drops the exception and the line.
   virtual rt::String stringForFunc(const rt::String& func, const rt::String& withFormat, std::va_list valist,
                                    ZEBLogLevel level) = 0;
 

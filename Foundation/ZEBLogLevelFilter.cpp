@@ -1,3 +1,7 @@
+// A filter that is destroyed while it still watches fails an assertion in its destructor. If the thread's
+// handler returns, the program goes on. The default handler throws. That ends the program, after the handler
+// has said why.
+
 #include "Foundation/ZEBLogLevelFilter.h"
 
 #include "Runtime/Process/AssertionHandler.h"
@@ -7,7 +11,7 @@ using namespace rt::literals;
 
 namespace {
 
-// Of the environment variable and of the user default.
+// The name of both the environment variable and the user default.
 constexpr const char* kSettingName = "ZEBVerboseLogging";
 
 bool isYes(const rt::String& value) {

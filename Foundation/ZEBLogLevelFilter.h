@@ -1,20 +1,21 @@
 #pragma once
 
-/// The filter with a switch that may be thrown while the program runs: informational lines pass when verbose
-/// logging is on, debugging lines never, all others always.
+/// A filter with a switch for verbose logging. Info lines pass if the switch is on. Debug lines never pass.
+/// All other lines pass. The switch may change while the program runs.
 ///
 ///     rt::Ref<ZEBLogger> logger = ZEBLogger::loggerWithWriter(writer, formatter, ZEBLogLevelFilter::init());
 ///
-/// The switch is the environment variable ZEBVerboseLogging where there is one: on when it begins, after
-/// white space, with a Y or T of either case, or is an integer other than 0. Otherwise it is the user default
-/// of the same name (Runtime/Defaults/UserDefaults.h), which is read when the filter is set into a logger and
-/// whenever it changes, also by another process, until the filter leaves its logger. In one that never was in
-/// a logger the switch is off.
+/// If the environment variable ZEBVerboseLogging exists, it sets the switch. The switch is on if the value,
+/// after white space, begins with Y or T in either case, or is an integer other than 0.
 ///
-/// Any thread may use it. One filter is for one logger at a time: the first that lets it go ends its watching
-/// of the user default.
+/// Otherwise the user default of the same name sets the switch (Runtime/Defaults/UserDefaults.h). The filter
+/// reads it when it is set into a logger, and whenever it changes, also by another process. That ends when
+/// the filter leaves its logger. Before the filter is set into a logger, the switch is off.
 ///
-/// Not for: choosing levels once (Foundation/ZEBLogAllowedLevelFilter.h and its subclasses).
+/// Threads: thread-safe. A filter belongs to one logger at a time. If several share it, the first that
+/// releases it stops its observation of the user default.
+///
+/// Not for: levels that are chosen once. See Foundation/ZEBLogAllowedLevelFilter.h and its subclasses.
 
 #include <atomic>
 
@@ -27,24 +28,24 @@
 class RT_VISIBLE ZEBLogLevelFilter final
     : public rt::Implements<ZEBLogLevelFilter, rt::Object, ZEBLogFilter> {
  public:
-  /// One that is in no logger yet.
+  /// Makes a filter that is in no logger yet.
   static rt::Ref<ZEBLogLevelFilter> init();
 
-  /// Fails an assertion where the filter was not told that it leaves its logger. Where the thread's handler
-  /// throws, as the default one does, the program ends with that.
+  /// Fails an assertion if the filter was not told that it leaves its logger. If the thread's assertion
+  /// handler throws, as the default one does, the program ends.
   ~ZEBLogLevelFilter() override;
 
-  /// False for level 1, `verboseLoggingEnabled` for level 2, true for all others.
+  /// Returns false for level 1, `verboseLoggingEnabled` for level 2, and true for all others.
   bool filterAllowsMessage(const rt::String& message, ZEBLogLevel level) override;
 
-  /// Begins to watch the user default, if that has not begun yet. Throws what
+  /// Starts to observe the user default, unless the filter already does. Throws what
   /// `rt::UserDefaults::observe` throws.
   void didAttachToLogger() override;
 
-  /// Ends it.
+  /// Stops observing the user default.
   void willDetachFromLogger() override;
 
-  /// Whether the switch is on.
+  /// Returns whether the switch is on.
   bool verboseLoggingEnabled() const noexcept {
     return verboseLoggingEnabled_.load(std::memory_order_relaxed);
   }
@@ -52,12 +53,13 @@ class RT_VISIBLE ZEBLogLevelFilter final
  private:
   ZEBLogLevelFilter() { readSetting(nullptr); }
 
-  // From the environment or else from `userDefaults`, where that is not null.
+  // Reads the environment variable, or else the user default from `userDefaults` unless that is null.
   void readSetting(const rt::UserDefaults* userDefaults);
 
   std::atomic<bool> verboseLoggingEnabled_ = false;
-  // Not taken by the observer, for which the end of an observation waits. Recursive, since what is wrong with
-  // the user defaults is reported under it, to a handler of the host's.
+  // The observer must not take this lock: ending an observation waits for the observer. The lock is recursive
+  // because a mistake in the user defaults is reported with the lock held. The host's handler may then take
+  // it again.
   rt::RecursiveLock lock_;
   rt::UserDefaults::Observation observation_ RT_GUARDED_BY(lock_);
 };

@@ -23,7 +23,7 @@ using namespace rt::literals;
 
 constexpr const char* kSetting = "ZEBVerboseLogging";
 
-// NOLINTNEXTLINE(bugprone-throwing-static-initialization): then there is nothing to test with
+// NOLINTNEXTLINE(bugprone-throwing-static-initialization): without it no test can run
 const PrivateDefaults privateDefaults;
 
 class ZEBLogLevelFilterTest : public testing::Test {
@@ -45,7 +45,7 @@ class ZEBLogLevelFilterTest : public testing::Test {
   }
 };
 
-TEST_F(ZEBLogLevelFilterTest, AllowsAllButDebuggingAndInformationalLines) {
+TEST_F(ZEBLogLevelFilterTest, AllowsAllLinesExceptDebugAndInfo) {
   const auto filter = ZEBLogLevelFilter::init();
   EXPECT_FALSE(filter->verboseLoggingEnabled());
   for (const ZEBLogLevel level : {INT_MIN, -1, 0, 3, 4, 5, INT_MAX})
@@ -54,7 +54,7 @@ TEST_F(ZEBLogLevelFilterTest, AllowsAllButDebuggingAndInformationalLines) {
   EXPECT_FALSE(allows(*filter, 2));
 }
 
-TEST_F(ZEBLogLevelFilterTest, AllowsInformationalLinesToo_WhereItIsVerbose) {
+TEST_F(ZEBLogLevelFilterTest, AllowsInfoLinesIfVerbose) {
   set("1");
   const auto filter = ZEBLogLevelFilter::init();
   EXPECT_TRUE(filter->verboseLoggingEnabled());
@@ -63,7 +63,7 @@ TEST_F(ZEBLogLevelFilterTest, AllowsInformationalLinesToo_WhereItIsVerbose) {
   EXPECT_FALSE(allows(*filter, 1));
 }
 
-TEST_F(ZEBLogLevelFilterTest, ReadsTheEnvironmentAsPeopleWriteIt) {
+TEST_F(ZEBLogLevelFilterTest, AcceptsManySpellingsInTheEnvironment) {
   for (const char* value : {"yes", "YES", " \tyes\n", "y", "Yonder", "true", "T", "tomorrow", "1", "2", "-1",
                             "+3", " 7 dwarfs", "007", "99999999999999999999"}) {
     set(value);
@@ -84,7 +84,7 @@ TEST_F(ZEBLogLevelFilterTest, ReadsTheUserDefaultOnceItIsAttached) {
   filter->willDetachFromLogger();
 }
 
-TEST_F(ZEBLogLevelFilterTest, LetsTheEnvironmentOverruleTheUserDefault) {
+TEST_F(ZEBLogLevelFilterTest, PrefersTheEnvironmentToTheUserDefault) {
   setDefault("YES");
   set("no");
   const auto filter = ZEBLogLevelFilter::init();
@@ -95,7 +95,7 @@ TEST_F(ZEBLogLevelFilterTest, LetsTheEnvironmentOverruleTheUserDefault) {
   filter->willDetachFromLogger();
 }
 
-// The environment counts at the time of reading, as the user default does.
+// The variable's value at the time of reading counts, as for the user default.
 TEST_F(ZEBLogLevelFilterTest, ReadsTheEnvironmentAgainWhenItIsAttached) {
   const auto filter = ZEBLogLevelFilter::init();
   set("yes");
@@ -119,7 +119,7 @@ TEST_F(ZEBLogLevelFilterTest, FollowsTheUserDefaultFromAttachmentToDetachment) {
   defaults->setBool(true, kSetting);
   EXPECT_TRUE(filter->verboseLoggingEnabled());
   filter->willDetachFromLogger();
-  // Nobody tells it any more.
+  // The filter is no longer told of changes.
   defaults->remove(kSetting);
   EXPECT_TRUE(filter->verboseLoggingEnabled());
   filter->didAttachToLogger();
@@ -127,7 +127,7 @@ TEST_F(ZEBLogLevelFilterTest, FollowsTheUserDefaultFromAttachmentToDetachment) {
   filter->willDetachFromLogger();
 }
 
-TEST_F(ZEBLogLevelFilterTest, ReadsNothingWhenItIsAttachedAlready) {
+TEST_F(ZEBLogLevelFilterTest, ReadsNothingIfAttachedAlready) {
   const auto filter = ZEBLogLevelFilter::init();
   set("yes");
   filter->didAttachToLogger();
@@ -137,7 +137,7 @@ TEST_F(ZEBLogLevelFilterTest, ReadsNothingWhenItIsAttachedAlready) {
   filter->willDetachFromLogger();
 }
 
-TEST_F(ZEBLogLevelFilterTest, IsDetachedOnceHoweverOftenItWasAttached) {
+TEST_F(ZEBLogLevelFilterTest, OneDetachmentEndsAllAttachments) {
   const auto defaults = rt::UserDefaults::standardUserDefaults();
   const auto filter = ZEBLogLevelFilter::init();
   filter->willDetachFromLogger();
@@ -149,10 +149,10 @@ TEST_F(ZEBLogLevelFilterTest, IsDetachedOnceHoweverOftenItWasAttached) {
   filter->willDetachFromLogger();
 }
 
-TEST_F(ZEBLogLevelFilterTest, HearsOfAChangeByAnotherProcess) {
+TEST_F(ZEBLogLevelFilterTest, FollowsChangesByAnotherProcess) {
   const auto filter = ZEBLogLevelFilter::init();
   const auto logger = ZEBLogger::loggerWithWriter(nullptr, nullptr, filter);
-  // Observers are called in their order: when this one is, the filter has been.
+  // Observers are called in the order of their registration. So the filter has been called before this one.
   std::counting_semaphore<> changes(0);
   const auto observation = rt::UserDefaults::standardUserDefaults()->observe(
       kSetting, rt::UserDefaults::Notify::kOnChange, [&] { changes.release(); });
@@ -168,8 +168,8 @@ TEST_F(ZEBLogLevelFilterTest, HearsOfAChangeByAnotherProcess) {
   EXPECT_FALSE(filter->verboseLoggingEnabled());
 }
 
-// Attaching, detaching, changing and asking at once: at the end the filter knows the last value.
-TEST_F(ZEBLogLevelFilterTest, MayBeUsedByManyThreads) {
+// Attaches, detaches, changes the default and asks, all at once. At the end the filter knows the last value.
+TEST_F(ZEBLogLevelFilterTest, IsThreadSafe) {
   const auto defaults = rt::UserDefaults::standardUserDefaults();
   const auto filter = ZEBLogLevelFilter::init();
   std::vector<std::thread> threads;
@@ -209,7 +209,7 @@ class FailureRecorder final : public rt::Implements<FailureRecorder, rt::Asserti
 constexpr rt::String kDescription =
     "The user defaults instance is still retained, which means there was a missing `willDetachFromLogger` call. It is important to balance the `didAttachToLogger` call with a `willDetachFromLogger` call because those methods register/unregister the `ZEBLogLevelFilter` instance as an observer of the user defaults instance."_s;
 
-TEST_F(ZEBLogLevelFilterTest, FailsAnAssertionWhereItGoesWithoutHavingBeenDetached) {
+TEST_F(ZEBLogLevelFilterTest, FailsAnAssertionIfDestroyedWhileAttached) {
   const auto recorder = rt::make<FailureRecorder>();
   rt::AssertionHandler::setCurrentHandler(recorder);
   auto filter = ZEBLogLevelFilter::init();
@@ -222,11 +222,11 @@ TEST_F(ZEBLogLevelFilterTest, FailsAnAssertionWhereItGoesWithoutHavingBeenDetach
   EXPECT_EQ(failure.file, "Foundation/ZEBLogger"_s);
   EXPECT_EQ(failure.lineNumber, 544U);
   EXPECT_EQ(failure.description, kDescription);
-  // Where the handler returns, the filter watches nothing any more all the same.
+  // If the handler returns, the filter still stops observing.
   rt::UserDefaults::standardUserDefaults()->setBool(true, kSetting);
 }
 
-TEST_F(ZEBLogLevelFilterTest, GoesInPeaceWhereItWasDetachedOrNeverAttached) {
+TEST_F(ZEBLogLevelFilterTest, FailsNoAssertionIfDetachedOrNeverAttached) {
   const auto recorder = rt::make<FailureRecorder>();
   rt::AssertionHandler::setCurrentHandler(recorder);
   auto filter = ZEBLogLevelFilter::init();
@@ -244,8 +244,8 @@ TEST_F(ZEBLogLevelFilterTest, GoesInPeaceWhereItWasDetachedOrNeverAttached) {
   EXPECT_TRUE(recorder->failures.empty());
 }
 
-// The default handler throws, which nothing can do out of a destruction.
-TEST(ZEBLogLevelFilterDeathTest, EndsTheProgramByTheDefaultHandler) {
+// The default handler throws, and no exception can leave a destructor.
+TEST(ZEBLogLevelFilterDeathTest, TheDefaultAssertionHandlerEndsTheProgram) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   const auto destroyAttached = [] {
     auto filter = ZEBLogLevelFilter::init();

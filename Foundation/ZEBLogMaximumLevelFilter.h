@@ -1,6 +1,6 @@
 #pragma once
 
-/// The filter that lets the lines of a level, and of those below it, pass.
+/// A filter that lets a line pass if its level is at most a given one.
 ///
 ///     logger->setFilter(ZEBLogMaximumLevelFilter::initWithMaximumLevel(ZEBLogLevelInfo));
 
@@ -10,7 +10,7 @@
 class RT_VISIBLE ZEBLogMaximumLevelFilter final
     : public rt::Implements<ZEBLogMaximumLevelFilter, ZEBLogAllowedLevelFilter> {
  public:
-  /// One that allows the levels 0 to `maximumLevel`; null where that is not from 0 to 4.
+  /// Makes a filter that allows the levels 0 to `maximumLevel`. Returns null if that is not from 0 to 4.
   static rt::Ref<ZEBLogMaximumLevelFilter> initWithMaximumLevel(ZEBLogLevel maximumLevel);
 
  private:

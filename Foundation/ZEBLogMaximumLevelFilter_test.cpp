@@ -8,7 +8,7 @@ namespace {
 
 using namespace rt::literals;
 
-TEST(ZEBLogMaximumLevelFilter, AllowsItsLevelAndThoseBelow) {
+TEST(ZEBLogMaximumLevelFilter, AllowsItsLevelAndLowerOnes) {
   for (ZEBLogLevel maximum = 0; maximum <= 4; ++maximum) {
     const auto filter = ZEBLogMaximumLevelFilter::initWithMaximumLevel(maximum);
     ASSERT_TRUE(filter) << maximum;
@@ -19,7 +19,7 @@ TEST(ZEBLogMaximumLevelFilter, AllowsItsLevelAndThoseBelow) {
   }
 }
 
-TEST(ZEBLogMaximumLevelFilter, CannotBeMadeForOtherLevels) {
+TEST(ZEBLogMaximumLevelFilter, IsNullForUnknownLevels) {
   for (const ZEBLogLevel maximum : {INT_MIN, -1, 5, 6, INT_MAX}) {
     EXPECT_FALSE(ZEBLogMaximumLevelFilter::initWithMaximumLevel(maximum)) << maximum;
   }

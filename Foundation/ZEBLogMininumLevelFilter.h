@@ -1,10 +1,10 @@
 #pragma once
 
-/// The filter that lets the lines of a level, and of those above it, pass.
+/// A filter that lets a line pass if its level is at least a given one.
 ///
 ///     logger->setFilter(ZEBLogMininumLevelFilter::initWithMinimumLevel(ZEBLogLevelError));
 ///
-/// Its name is spelled like this for good: classes are found by their names.
+/// The spelling of the name is permanent, because classes are found by their names.
 
 #include "Foundation/ZEBLogAllowedLevelFilter.h"
 #include "Runtime/Base/Visibility.h"
@@ -12,7 +12,7 @@
 class RT_VISIBLE ZEBLogMininumLevelFilter final
     : public rt::Implements<ZEBLogMininumLevelFilter, ZEBLogAllowedLevelFilter> {
  public:
-  /// One that allows the levels `minimumLevel` to 4; null where that is not from 0 to 4.
+  /// Makes a filter that allows the levels `minimumLevel` to 4. Returns null if that is not from 0 to 4.
   static rt::Ref<ZEBLogMininumLevelFilter> initWithMinimumLevel(ZEBLogLevel minimumLevel);
 
  private:

@@ -8,7 +8,7 @@ namespace {
 
 using namespace rt::literals;
 
-TEST(ZEBLogMininumLevelFilter, AllowsItsLevelAndThoseAbove) {
+TEST(ZEBLogMininumLevelFilter, AllowsItsLevelAndHigherOnes) {
   for (ZEBLogLevel minimum = 0; minimum <= 4; ++minimum) {
     const auto filter = ZEBLogMininumLevelFilter::initWithMinimumLevel(minimum);
     ASSERT_TRUE(filter) << minimum;
@@ -19,13 +19,13 @@ TEST(ZEBLogMininumLevelFilter, AllowsItsLevelAndThoseAbove) {
   }
 }
 
-TEST(ZEBLogMininumLevelFilter, CannotBeMadeForOtherLevels) {
+TEST(ZEBLogMininumLevelFilter, IsNullForUnknownLevels) {
   for (const ZEBLogLevel minimum : {INT_MIN, -1, 5, 6, INT_MAX}) {
     EXPECT_FALSE(ZEBLogMininumLevelFilter::initWithMinimumLevel(minimum)) << minimum;
   }
 }
 
-TEST(ZEBLogMininumLevelFilter, IsFoundByItsNameAsItIsSpelled) {
+TEST(ZEBLogMininumLevelFilter, KeepsTheSpellingOfItsName) {
   EXPECT_EQ(rt::classNamed("ZEBLogMininumLevelFilter"), &rt::classInfo<ZEBLogMininumLevelFilter>());
   EXPECT_EQ(rt::classNamed("ZEBLogMinimumLevelFilter"), nullptr);
   EXPECT_TRUE(

@@ -1,16 +1,16 @@
 #pragma once
 
-/// The filter that lets every line pass: what a logger has that was given none.
+/// A filter that lets every line pass. It is the default of a logger.
 ///
 ///     logger->setFilter(rt::make<ZEBLogNoFilter>());
 ///
-/// Any thread may use it.
+/// Threads: thread-safe.
 
 #include "Foundation/ZEBLogFilter.h"
 #include "Runtime/Base/Visibility.h"
 
 class RT_VISIBLE ZEBLogNoFilter final : public rt::Implements<ZEBLogNoFilter, rt::Object, ZEBLogFilter> {
  public:
-  /// True.
+  /// Returns true.
   bool filterAllowsMessage(const rt::String& message, ZEBLogLevel level) override;
 };

@@ -16,7 +16,7 @@ TEST(ZEBLogNoFilter, AllowsEverything) {
   }
 }
 
-TEST(ZEBLogNoFilter, DoesNothingWhereItIsSetAndWhereItLeaves) {
+TEST(ZEBLogNoFilter, DoesNothingWhenAttachedAndDetached) {
   const auto filter = rt::make<ZEBLogNoFilter>();
   filter->willDetachFromLogger();
   filter->didAttachToLogger();

@@ -1,3 +1,6 @@
+// The line is put together by hand. By a format, logging a line takes a quarter longer. A test compares the
+// two.
+
 #include "Foundation/ZEBLogStandardFormatter.h"
 
 #include <charconv>
@@ -45,7 +48,7 @@ rt::String ZEBLogStandardFormatter::stringForFunc(const rt::String& func, const 
                                                   std::va_list valist, ZEBLogLevel level) {
   const rt::String date = dateFormatter_->stringFromTime(std::chrono::system_clock::now());
   const rt::String message = ZEBLogBasicFormatter::stringForFunc(func, withFormat, valist, level);
-  // What "%@ %@[%d/%p] [lvl=%d] %@ %@" makes of the same, and quicker.
+  // Makes what the format "%@ %@[%d/%p] [lvl=%d] %@ %@" would make, but faster.
   rt::StringBuilder line;
   appendText(line, date);
   line.append(' ');

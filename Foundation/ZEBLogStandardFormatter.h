@@ -1,16 +1,17 @@
 #pragma once
 
-/// The formatter of standard loggers: when, which process and thread, what level, where, and the message.
+/// The formatter of standard loggers. A line has the time, the process and thread, the level, the function
+/// and the message.
 ///
 ///     logger->setFormatter(ZEBLogStandardFormatter::init());
 ///     logger->logFuncError("main", "%d left", 3);
 ///
 ///     | 2026-11-21 08:04:20.123 importer[4711/0x7f3a5c0e2740] [lvl=3] main() 3 left
 ///
-/// The time is the local one (Runtime/Text/LocalTimeFormatter.h); the thread is its handle. The process is
-/// the one in which the formatter was made, also in the child of a fork.
+/// The time is local time (Runtime/Text/LocalTimeFormatter.h), and the thread is given by its handle. The
+/// process is the one that made the formatter, even in the child of a fork.
 ///
-/// Any thread may use it.
+/// Threads: thread-safe.
 
 #include <cstdint>
 
@@ -22,16 +23,17 @@
 class RT_VISIBLE ZEBLogStandardFormatter
     : public rt::Implements<ZEBLogStandardFormatter, ZEBLogBasicFormatter> {
  public:
-  /// A formatter for this process; null where its name or a formatter of dates cannot be had.
+  /// Makes a formatter for this process. Returns null if the process's name or a date formatter is not
+  /// available.
   static rt::Ref<ZEBLogStandardFormatter> init();
 
-  /// The line, never null: "(null)" stands for a message of which format or arguments are null. Throws what a
-  /// description of an argument throws.
+  /// Returns the line; never null. "(null)" stands for the message if the format or `valist` is null. Throws
+  /// what the description of an argument throws.
   rt::String stringForFunc(const rt::String& func, const rt::String& withFormat, std::va_list valist,
                            ZEBLogLevel level) override;
 
  protected:
-  /// None of the references is null.
+  /// Precondition: none of the references is null.
   ZEBLogStandardFormatter(rt::Ref<rt::LocalTimeFormatter> dateFormatter, rt::String processName,
                           std::int32_t processIdentifier) noexcept;
 

@@ -45,13 +45,13 @@ class ZEBLogStandardFormatterTest : public testing::Test {
     tzset();
   }
 
-  // A line of the calling thread, with the message "7 left".
+  // Returns a line of the calling thread with the message "7 left".
   std::string line() const { return ::line(*formatter_, "main"_s, 3, &kFormat, 7); }
 
-  // The time in a line, to the second.
+  // Returns the time in a line, to the second.
   std::string timeNow() const { return line().substr(0, 19); }
 
-  // What follows the time in each of these lines.
+  // Returns the text that follows the time in each of these lines.
   static std::string rest() {
     char text[256];
     std::snprintf(text, sizeof text, " %s[%d/0x%lx] [lvl=3] main() 7 left",
@@ -59,7 +59,7 @@ class ZEBLogStandardFormatterTest : public testing::Test {
     return text;
   }
 
-  // By the clock that lines go by: `std::time` lags behind it.
+  // Reads the clock that lines use; `std::time` lags behind it.
   static std::time_t now() { return std::chrono::system_clock::to_time_t(std::chrono::system_clock::now()); }
 
   static std::string utc(std::time_t time) {
@@ -77,7 +77,7 @@ class ZEBLogStandardFormatterTest : public testing::Test {
   std::string zone_;
 };
 
-TEST_F(ZEBLogStandardFormatterTest, SaysWhenWhichProcessAndThreadWhatLevelWhereAndWhat) {
+TEST_F(ZEBLogStandardFormatterTest, ShowsTimeProcessThreadLevelFunctionAndMessage) {
   setenv("TZ", "UTC0", 1);
   const std::time_t before = now();
   const std::string text = line();
@@ -90,7 +90,7 @@ TEST_F(ZEBLogStandardFormatterTest, SaysWhenWhichProcessAndThreadWhatLevelWhereA
   EXPECT_EQ(text.substr(23), rest());
 }
 
-// The fields are put together by hand; this is the format that they are to come out as.
+// The formatter puts the line together by hand. The line must be what this format makes.
 TEST_F(ZEBLogStandardFormatterTest, MakesWhatItsFormatWouldMake) {
   for (const ZEBLogLevel level : {-1, 0, 4, 2'147'483'647}) {
     const std::string text = ::line(*formatter_, "-[A b]"_s, level, &kFormat, -3);
@@ -101,7 +101,7 @@ TEST_F(ZEBLogStandardFormatterTest, MakesWhatItsFormatWouldMake) {
   }
 }
 
-TEST_F(ZEBLogStandardFormatterTest, NamesTheThreadThatLogs) {
+TEST_F(ZEBLogStandardFormatterTest, ShowsTheThreadThatLogs) {
   std::string text;
   std::string expected;
   std::thread([&] {
@@ -112,20 +112,20 @@ TEST_F(ZEBLogStandardFormatterTest, NamesTheThreadThatLogs) {
   EXPECT_NE(text, rest());
 }
 
-TEST_F(ZEBLogStandardFormatterTest, MakesALineOfALongMessage) {
+TEST_F(ZEBLogStandardFormatterTest, FormatsALongMessage) {
   const rt::String message = rt::String::fromUTF8(std::string(100'000, 'x'));
   const rt::String format = "%@"_s;
   const std::string text = ::line(*formatter_, nullptr, 1, &format, message.object());
   EXPECT_TRUE(text.ends_with("[lvl=1] (unknown) " + std::string(message.view())));
 }
 
-TEST_F(ZEBLogStandardFormatterTest, HasALineForNoMessage) {
+TEST_F(ZEBLogStandardFormatterTest, ShowsAMissingMessageAsNull) {
   const rt::String none;
   EXPECT_TRUE(::line(*formatter_, nullptr, 4, &none).ends_with(" [lvl=4] (unknown) (null)"));
   EXPECT_TRUE(formatter_->stringForFunc("f"_s, "text"_s, nullptr, 4).hasSuffix(" [lvl=4] f() (null)"));
 }
 
-TEST_F(ZEBLogStandardFormatterTest, PassesWhatADescriptionThrows) {
+TEST_F(ZEBLogStandardFormatterTest, ThrowsWhatADescriptionThrows) {
   class Throwing final : public rt::Implements<Throwing, rt::Object> {
    public:
     rt::String description() const override { throw std::runtime_error("no description"); }
@@ -136,8 +136,8 @@ TEST_F(ZEBLogStandardFormatterTest, PassesWhatADescriptionThrows) {
   EXPECT_TRUE(line().ends_with("7 left"));
 }
 
-TEST_F(ZEBLogStandardFormatterTest, TellsTheTimeOfTheZoneOfTheMoment) {
-  // Wherever the second changes meanwhile, it is tried again.
+TEST_F(ZEBLogStandardFormatterTest, UsesTheCurrentTimeZone) {
+  // Tries again if the second changes in the middle.
   for (int attempt = 0; attempt < 100; ++attempt) {
     setenv("TZ", "UTC0", 1);
     const std::time_t before = now();
@@ -155,9 +155,9 @@ TEST_F(ZEBLogStandardFormatterTest, TellsTheTimeOfTheZoneOfTheMoment) {
   FAIL() << "no second was long enough";
 }
 
-// In a zone whose summer time begins a moment from now: the lines until then, and the first after it.
-// Where none came before the change, since the process was held up, it is tried again.
-TEST_F(ZEBLogStandardFormatterTest, GoesOnAcrossTheBeginningOfSummerTime) {
+// Uses a zone whose summer time begins in a moment, and logs until it has begun. Tries again if no line came
+// before the change, because the process was held up.
+TEST_F(ZEBLogStandardFormatterTest, FollowsTheBeginningOfSummerTime) {
   for (int attempt = 0, lines = 0; lines == 0; ++attempt) {
     ASSERT_LT(attempt, 20);
     const std::time_t change = now() + 2;
@@ -181,8 +181,8 @@ TEST_F(ZEBLogStandardFormatterTest, GoesOnAcrossTheBeginningOfSummerTime) {
   }
 }
 
-// One formatter serves all threads: a line's time is no mixture.
-TEST_F(ZEBLogStandardFormatterTest, ServesManyThreads) {
+// All threads share a formatter. The time in a line is never a mixture of two.
+TEST_F(ZEBLogStandardFormatterTest, IsThreadSafe) {
   setenv("TZ", "UTC0", 1);
   std::vector<std::thread> threads;
   threads.reserve(8);

@@ -1,6 +1,6 @@
 #pragma once
 
-/// What writes the lines of a logger.
+/// Writes the lines of a logger.
 ///
 ///     class LineCount final : public rt::Implements<LineCount, rt::Object, ZEBLogWriter> {
 ///      public:
@@ -9,10 +9,10 @@
 ///       std::atomic<int> count_ = 0;
 ///     };
 ///
-/// Loggers themselves are writers. So are file handles and arrays of writers, by way of
-/// Foundation/ZEBFileHandleLogWriter.h and Foundation/ZEBArrayCompositeLogWriter.h.
+/// A logger is a writer itself. Foundation/ZEBFileHandleLogWriter.h makes a file handle a writer, and
+/// Foundation/ZEBArrayCompositeLogWriter.h an array of writers.
 ///
-/// Not for: deciding which lines are written, which filters do.
+/// Not for: deciding which lines are written; see ZEBLogFilter.
 
 #include "Foundation/ZEBLogLevel.h"
 #include "Runtime/Base/Visibility.h"
@@ -20,8 +20,9 @@
 #include "Runtime/Objects/String.h"
 
 struct RT_VISIBLE ZEBLogWriter : rt::Protocol<ZEBLogWriter> {
-  /// Writes one finished line, which comes without its end. Called by any thread that logs, by several at
-  /// once. What it throws the logger drops, with the line.
+  /// Writes one finished line, which has no line feed.
+  /// Threads: any thread that logs may call it, also several at once.
+  /// Errors: if it throws, the logger drops the exception and the line.
   virtual void logMessage(const rt::String& message, ZEBLogLevel level) = 0;
 
  protected:

@@ -1,3 +1,8 @@
+// The setters work under a recursive lock. A filter is told of its attaching and detaching under that lock,
+// and may use the logger meanwhile. A line is logged without a lock: writer, formatter and filter are one
+// immutable object, which `rt::AtomicRef` reads. So a filter that logs from another thread while it is
+// attached waits for nobody. A replaced piece lives until the last line with it is written.
+
 #include "Foundation/ZEBLogger.h"
 
 #include <string_view>
@@ -18,11 +23,11 @@ using namespace rt::literals;
 
 namespace {
 
-// Of those who set the shared logger. Recursive: making the first one reads the user defaults, and what is
-// wrong with these is reported to a handler of the host's, which may log.
+// Serialises the threads that set the shared logger. Recursive, because making the first logger reads the
+// user defaults. A mistake in these is reported to a handler of the host, which may log.
 constinit rt::RecursiveLock sharedLock;
 
-// Never destroyed: programs log until the process is gone.
+// Never destroyed, because programs log until the process ends.
 rt::AtomicRef<ZEBLogger>& shared() {
   static constinit rt::Lazy<rt::AtomicRef<ZEBLogger>> logger;
   return logger.get([] { return rt::AtomicRef<ZEBLogger>(); });
@@ -36,7 +41,7 @@ rt::Ref<ZEBLogWriter> standardError() {
   return ZEBFileHandleLogWriter::initWithFileHandle(rt::FileHandle::standardError());
 }
 
-// What `build` returns; null where it throws.
+// Returns what `build` returns; null if `build` throws.
 template <class Build>
 rt::Ref<ZEBLogger> built(Build build) {
   rt::Ref<ZEBLogger> logger;
@@ -51,12 +56,12 @@ rt::Ref<ZEBLogger> buildStandardLogger(rt::Ref<ZEBLogWriter> writer) {
 
 }  // namespace
 
-// What a line is logged with. One object, so that it is read at one go.
+// The pieces that log a line. One object, so that a line reads all of them at once.
 class ZEBLogger::Pieces final : public rt::Implements<Pieces, rt::Object> {
  public:
   static constexpr std::string_view kClassName = "ZEBLoggerPieces";
 
-  // Changed only before they are a logger's.
+  // Changed only before the object belongs to a logger.
   rt::Ref<ZEBLogWriter> writer;
   rt::Ref<ZEBLogFormatter> formatter;
   rt::Ref<ZEBLogFilter> filter;
@@ -66,14 +71,14 @@ rt::Ref<ZEBLogger> ZEBLogger::sharedLogger() {
   if (rt::Ref<ZEBLogger> logger = shared().load()) return logger;
   const rt::LockGuard guard(sharedLock);
   if (rt::Ref<ZEBLogger> logger = shared().load()) return logger;
-  // Where one is set meanwhile, on this thread, it stays.
+  // If this thread has set a logger meanwhile, that one stays.
   shared().compareExchange(nullptr, standardLogger());
   return shared().load();
 }
 
 void ZEBLogger::setSharedLogger(rt::Ref<ZEBLogger> logger) {
   const rt::LockGuard guard(sharedLock);
-  // `logger` lets the old one go, after the lock.
+  // `logger` now holds the old logger, and releases it after the lock.
   logger = shared().exchange(std::move(logger));
 }
 
@@ -152,7 +157,7 @@ rt::Ref<ZEBLogFilter> ZEBLogger::filter() const {
   return pieceOf(&Pieces::filter);
 }
 
-// Has `piece` take the place of what is there.
+// The other pieces stay as they are.
 template <class Piece>
 void ZEBLogger::setPiece(rt::Ref<Piece> Pieces::* piece, rt::Ref<Piece> value, rt::Ref<Pieces>& next) {
   if (const rt::Ref<Pieces> known = pieces_.load()) {
@@ -164,7 +169,7 @@ void ZEBLogger::setPiece(rt::Ref<Piece> Pieces::* piece, rt::Ref<Piece> value, r
   next = pieces_.exchange(std::move(next));
 }
 
-// What is replaced goes after the lock.
+// The setters declare `pieces` before the lock, so that the replaced pieces are released after it.
 
 void ZEBLogger::setWriter(rt::Ref<ZEBLogWriter> writer) {
   if (writer == nullptr) writer = standardOutput();

@@ -1,7 +1,7 @@
 #pragma once
 
-/// The older logger: a line of text for each call, made by a formatter, let through by a filter, written by a
-/// writer, each of which may be exchanged while others log.
+/// The older logger, which writes one line of text per call. A formatter makes the line, a filter decides
+/// whether it passes, and a writer writes it. Each of them may be replaced while other threads log.
 ///
 ///     ZEBLogger::setSharedLogger(ZEBLogger::standardLoggerWithPath("/var/log/host.log"_s));
 ///
@@ -9,16 +9,18 @@
 ///     logger->logError("%@ has %d entries"_s, name, 0);
 ///     logger->logFuncInfo(__func__, "started"_s);      // shorter: Foundation/ZEBLoggerMacroHelpers.h
 ///
-/// A format that its arguments do not fit does not compile (Runtime/Text/FormatString.h). `"..."_s` is as
-/// fast as it gets; a plain literal takes an allocation more, and std::bad_alloc passes there. A format that
-/// is known only at run time goes to `logInternalFunc`.
+/// A format that does not fit its arguments does not compile (Runtime/Text/FormatString.h). A literal with
+/// the suffix `_s` is fastest. A plain literal costs one more allocation, and std::bad_alloc from there
+/// reaches the caller. Pass a format that is known only at run time to `logInternalFunc`.
 ///
-/// Whatever else goes wrong, in a formatter, a filter, a writer or the description of an argument, logging
-/// throws nothing: the line is lost and the next one tries again.
+/// Errors: apart from that, logging throws nothing. If a formatter, a filter, a writer or the description of
+/// an argument fails, the line is lost. The next line is not affected.
 ///
-/// Any thread may use all of it, also in the child of a fork, whatever other threads were doing.
+/// Threads: all of it is thread-safe, also in the child of a fork, whatever other threads were doing.
 ///
-/// Not for: new code, which has the structured framework; a writer that logs through its own logger.
+/// Not for: new code, which uses the structured framework (Shared/Logging/LUMLog.h).
+///
+/// Not for: a writer that logs through its own logger.
 
 #include <cstdarg>
 #include <type_traits>
@@ -36,69 +38,70 @@
 
 class RT_VISIBLE ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLogWriter> {
  public:
-  /// The process's logger: what `setSharedLogger` has set or, before that and after it has set null, a
-  /// `standardLogger`, which is made by the first call. Null only where that is; the next call tries again.
+  /// Returns the logger that `setSharedLogger` has set. If none was set, or null, the call makes a
+  /// `standardLogger` and sets it. Returns null only if that fails; the next call then tries again.
   static rt::Ref<ZEBLogger> sharedLogger();
 
-  /// Makes `logger`, which may be null, the process's. Who has the one before it from `sharedLogger` may go
-  /// on with it.
+  /// Sets the process's logger; `logger` may be null. Code that got the previous logger from `sharedLogger`
+  /// may go on using it.
   static void setSharedLogger(rt::Ref<ZEBLogger> logger);
 
-  // The factories return null where something throws while they build the logger.
+  // The factories return null if building the logger throws.
 
-  /// To standard output, by a ZEBLogStandardFormatter, through a ZEBLogLevelFilter.
+  /// Makes a logger to standard output, with a ZEBLogStandardFormatter and a ZEBLogLevelFilter.
   static rt::Ref<ZEBLogger> standardLogger();
 
-  /// The same to standard error.
+  /// Same as `standardLogger`, but to standard error.
   static rt::Ref<ZEBLogger> standardLoggerWithStderr();
 
-  /// The same with levels 1 and 2 to standard output, 3 and 4 to standard error.
+  /// Same as `standardLogger`, but with levels 3 and 4 to standard error.
   static rt::Ref<ZEBLogger> standardLoggerWithStdoutAndStderr();
 
-  /// The same to the end of the file at `path`, which is made with mode 0644 where there is none. Null where
-  /// it cannot be opened.
+  /// Same as `standardLogger`, but to the end of the file at `path`. A file that does not exist is created
+  /// with mode 0644. Returns null if the file cannot be opened.
   static rt::Ref<ZEBLogger> standardLoggerWithPath(const rt::String& path);
 
-  /// A new logger with these pieces, each of which may be null for the one that its setter describes.
+  /// Makes a logger with these pieces. A null piece stands for the default that its setter names.
   static rt::Ref<ZEBLogger> loggerWithWriter(rt::Ref<ZEBLogWriter> writer, rt::Ref<ZEBLogFormatter> formatter,
                                              rt::Ref<ZEBLogFilter> filter);
 
-  /// The same without any.
+  /// Makes a logger with the default pieces.
   static rt::Ref<ZEBLogger> logger();
 
-  /// As `loggerWithWriter`, but throws what the filter throws in `didAttachToLogger`, and std::bad_alloc.
-  /// Sets the writer, the formatter and the filter, in this order. Never null.
+  /// Same as `loggerWithWriter`, but never null. Sets the writer, the formatter and the filter, in this
+  /// order. Throws std::bad_alloc, and what the filter throws in `didAttachToLogger`.
   static rt::Ref<ZEBLogger> initWithWriter(rt::Ref<ZEBLogWriter> writer, rt::Ref<ZEBLogFormatter> formatter,
                                            rt::Ref<ZEBLogFilter> filter);
 
-  /// The same without any.
+  /// Same as above, with the default pieces.
   static rt::Ref<ZEBLogger> init();
 
-  /// Tells the filter `willDetachFromLogger`.
+  /// Calls the filter's `willDetachFromLogger`.
   ~ZEBLogger() override;
 
-  /// The pieces; never null.
+  /// Return the pieces, which are never null.
   virtual rt::Ref<ZEBLogWriter> writer() const;
   virtual rt::Ref<ZEBLogFormatter> formatter() const;
   virtual rt::Ref<ZEBLogFilter> filter() const;
 
-  /// Sets the writer; null means standard output.
+  /// Sets the writer; null stands for standard output.
   ///
-  /// Setters of one logger wait for each other, and no thread that logs waits for them. A line that is under
-  /// way is made, filtered and written by the pieces that were there as it began.
+  /// Threads: the setters of one logger wait for each other. Logging never waits for them. A line that is
+  /// being logged keeps the pieces that were set when it began.
   virtual void setWriter(rt::Ref<ZEBLogWriter> writer);
 
-  /// Sets the formatter; null means a new ZEBLogBasicFormatter.
+  /// Sets the formatter; null stands for a new ZEBLogBasicFormatter.
   virtual void setFormatter(rt::Ref<ZEBLogFormatter> formatter);
 
-  /// Tells the old filter `willDetachFromLogger`, sets the new one, and tells it `didAttachToLogger`; null
-  /// means a new ZEBLogNoFilter. What a filter throws there passes; what comes after it is then not done.
+  /// Calls the old filter's `willDetachFromLogger`, sets the new filter, and calls its `didAttachToLogger`.
+  /// Null stands for a new ZEBLogNoFilter. If a filter throws, the remaining steps are not done and the
+  /// exception passes through.
   virtual void setFilter(rt::Ref<ZEBLogFilter> filter);
 
-  // Inlined in every build, so that between the code that logs and `logInternalFunc` there is one frame, that
-  // of `logVariadic`: who captures call stacks counts on it.
+  // The logging functions are inlined in every build, so that exactly one frame lies between the code that
+  // logs and `logInternalFunc`: that of `logVariadic`. Subclasses that capture call stacks rely on that.
 
-  /// Log at the levels 1 to 4.
+  /// Log a line at the levels 1 to 4.
   template <class... Arguments>
   [[gnu::always_inline]] void logDebug(rt::FormatString<std::type_identity_t<Arguments>...> format,
                                        const Arguments&... arguments) {
@@ -120,7 +123,7 @@ class RT_VISIBLE ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLog
     log(ZEBLogLevelAssert, nullptr, format, arguments...);
   }
 
-  /// The same in the function called `func`, a text that ends with NUL, or null.
+  /// Same as above, with the name of the function that logs. `func` ends with NUL, or is null.
   template <class... Arguments>
   [[gnu::always_inline]] void logFuncDebug(const char* func,
                                            rt::FormatString<std::type_identity_t<Arguments>...> msg,
@@ -146,18 +149,18 @@ class RT_VISIBLE ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLog
     log(ZEBLogLevelAssert, func, msg, arguments...);
   }
 
-  /// Logs `message` as it is, at `level`; at any other level than 1 to 4, drops it.
+  /// Logs `message` unchanged at `level`. Drops it if `level` is not from 1 to 4.
   void logMessage(const rt::String& message, ZEBLogLevel level) override;
 
-  /// What all of the above come to: has the formatter make a line of `format` and of the arguments in
-  /// `valist`, which is left where it is, and hands that to the writer if the filter allows it. `func` is
-  /// null or ends with NUL; one that is not UTF-8 counts as null.
+  /// Logs one line. All of the functions above end here. The formatter makes the line of `format` and
+  /// `valist`, the filter decides whether it passes, and the writer writes it. Does not advance `valist`.
+  /// `func` is null or ends with NUL. A name that is not UTF-8 counts as null.
   virtual void logInternalFunc(const char* func, const rt::String& format, std::va_list valist,
                                ZEBLogLevel level);
 
  protected:
-  /// Without pieces. A subclass sets them, or overrides what would use them: `logInternalFunc`, and the
-  /// accessors and setters.
+  /// Makes a logger without pieces. A subclass sets them, or overrides the functions that use them:
+  /// `logInternalFunc`, and the accessors and setters.
   ZEBLogger();
 
  private:
@@ -165,7 +168,8 @@ class RT_VISIBLE ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLog
 
   template <class Piece>
   rt::Ref<Piece> pieceOf(rt::Ref<Piece> Pieces::* piece) const;
-  // `next` is new, and is the pieces that were there when it returns. Allocates nothing.
+  // Replaces one piece by `value`. `next` is a new object, and holds the replaced pieces on return. Allocates
+  // nothing.
   template <class Piece>
   void setPiece(rt::Ref<Piece> Pieces::* piece, rt::Ref<Piece> value, rt::Ref<Pieces>& next)
       RT_REQUIRES(lock_);
@@ -178,12 +182,12 @@ class RT_VISIBLE ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLog
     logVariadic(level, func, &text, rt::toVariadic(arguments)...);
   }
 
-  // With arguments that are as `rt::toVariadic` makes them.
+  // Takes the arguments in the form that `rt::toVariadic` gives them.
   [[gnu::noinline]] void logVariadic(ZEBLogLevel level, const char* func, const rt::String* format, ...);
 
-  // The setters'.
+  // Serialises the setters.
   rt::RecursiveLock lock_;
-  // Replaced, never changed, so that a line goes on with those that it has found. Null in a subclass that
-  // sets none.
+  // Replaced as a whole, never changed, so that each line keeps the pieces that it found. Null in a subclass
+  // that sets no pieces.
   rt::AtomicRef<Pieces> pieces_;
 };

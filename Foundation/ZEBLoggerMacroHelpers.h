@@ -1,15 +1,15 @@
 #pragma once
 
-/// Logging through the shared logger with the name of the function that logs:
+/// Macros that log through the shared logger, with the name of the function that logs.
 ///
 ///     void importFile(const rt::String& file) {
 ///       ZEBLogError("%@ has %d entries"_s, file, 0);     // ... [lvl=3] importFile() first.txt has 0 entries
 ///     }
 ///
-/// Each takes a literal format and its arguments, and is a statement. No argument is evaluated where there is
-/// no shared logger.
+/// Each macro takes a literal format and its arguments, and is a statement. If there is no shared logger, no
+/// argument is evaluated.
 ///
-/// Not for: other loggers, which have `logFuncDebug` and so on.
+/// Not for: other loggers. Call their `logFuncDebug` and so on.
 
 #include "Foundation/ZEBLogger.h"
 
@@ -18,7 +18,7 @@
 #define ZEBLogError(...) ZEBLOG_SHARED(logFuncError, __VA_ARGS__)
 #define ZEBLogAssert(...) ZEBLOG_SHARED(logFuncAssert, __VA_ARGS__)
 
-/// Their inside.
+// The implementation of the macros.
 #define ZEBLOG_SHARED(operation, ...)                                           \
   do {                                                                          \
     if (const rt::Ref<ZEBLogger> zebLogShared = ZEBLogger::sharedLogger()) {    \

@@ -1,4 +1,4 @@
-// The loggers that the factories make, and the one that all share.
+// Tests the factories' loggers and the shared logger.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 #include <sys/stat.h>
@@ -40,7 +40,7 @@ TEST_F(ZEBLoggerTest, MakesStandardLoggers) {
 constexpr const char* kErrorLine =
     R"([0-9]+-[0-9]+-[0-9]+ [0-9]+:[0-9]+:[0-9]+\.[0-9]+ ZEBLogger_standard_test\[[0-9]+/0x[0-9a-f]+\] \[lvl=3\] \(unknown\) error 7)";
 
-TEST_F(ZEBLoggerTest, WritesErrorsOnlyUnlessItIsVerbose) {
+TEST_F(ZEBLoggerTest, WritesOnlyErrorsUnlessVerbose) {
   const auto logger = ZEBLogger::standardLogger();
   testing::internal::CaptureStdout();
   logger->logDebug("debug"_s);
@@ -49,7 +49,7 @@ TEST_F(ZEBLoggerTest, WritesErrorsOnlyUnlessItIsVerbose) {
   EXPECT_THAT(testing::internal::GetCapturedStdout(), MatchesRegex(std::string(kErrorLine) + "\n"));
 }
 
-TEST_F(ZEBLoggerTest, SplitsItsLinesToBothStreams) {
+TEST_F(ZEBLoggerTest, SplitsLinesBetweenBothStreams) {
   setenv("ZEBVerboseLogging", " yes ", 1);
   const auto logger = ZEBLogger::standardLoggerWithStdoutAndStderr();
   ASSERT_TRUE(logger);
@@ -68,9 +68,9 @@ TEST_F(ZEBLoggerTest, SplitsItsLinesToBothStreams) {
               MatchesRegex(std::string(kErrorLine) + "\n[^\n]*\\[lvl=4\\] \\(unknown\\) assert\n"));
 }
 
-// What the filter lets pass of levels that no operation logs at: 0 comes out nowhere, as a logger is a writer
-// for four levels only.
-TEST_F(ZEBLoggerTest, SplitsNoLinesOfLevelsThatNoOperationLogsAt) {
+// These levels pass the filter, but no operation logs at them. They are written nowhere, because a logger
+// that is used as a writer takes only four levels.
+TEST_F(ZEBLoggerTest, DropsLinesOfLevelsThatNoOperationLogsAt) {
   const auto logger = ZEBLogger::standardLoggerWithStdoutAndStderr();
   const auto log = [&](ZEBLogLevel level, ...) {
     std::va_list arguments;
@@ -98,7 +98,7 @@ TEST_F(ZEBLoggerTest, WritesToAFile) {
   EXPECT_EQ(static_cast<unsigned>(fs::status(path("new")).permissions()), 0644U);
 }
 
-TEST_F(ZEBLoggerTest, IsNoneForAFileThatCannotBeOpened) {
+TEST_F(ZEBLoggerTest, IsNullForAFileThatCannotBeOpened) {
   EXPECT_FALSE(ZEBLogger::standardLoggerWithPath(nullptr));
   EXPECT_FALSE(ZEBLogger::standardLoggerWithPath(""_s));
   EXPECT_FALSE(ZEBLogger::standardLoggerWithPath(pathText("no/file")));
@@ -121,7 +121,7 @@ TEST_F(ZEBLoggerTest, BecomesVerboseWhileItRuns) {
 
 // The shared logger.
 
-TEST_F(ZEBLoggerTest, SharesAStandardLoggerUntilAnotherIsSet) {
+TEST_F(ZEBLoggerTest, SharesAStandardLoggerByDefault) {
   const auto logger = ZEBLogger::sharedLogger();
   ASSERT_TRUE(logger);
   EXPECT_EQ(ZEBLogger::sharedLogger(), logger);
@@ -135,7 +135,7 @@ TEST_F(ZEBLoggerTest, SharesAStandardLoggerUntilAnotherIsSet) {
   EXPECT_TRUE(isA<ZEBLogStandardFormatter>(ZEBLogger::sharedLogger()->formatter()));
 }
 
-TEST_F(ZEBLoggerTest, LetsWhoHasTheSharedLoggerGoOnWithIt) {
+TEST_F(ZEBLoggerTest, APreviousSharedLoggerStaysUsable) {
   ZEBLogger::setSharedLogger(recordingLogger());
   const auto held = ZEBLogger::sharedLogger();
   ZEBLogger::setSharedLogger(nullptr);
@@ -143,17 +143,17 @@ TEST_F(ZEBLoggerTest, LetsWhoHasTheSharedLoggerGoOnWithIt) {
   EXPECT_THAT(recorder_->lines(), ElementsAre("3 still there"));
 }
 
-// Would wait for ever, if the old one went under the class's lock.
-TEST_F(ZEBLoggerTest, LetsTheOldSharedLoggerGoUnderNoLock) {
+// This would deadlock if the old logger were released under the class's lock.
+TEST_F(ZEBLoggerTest, ReleasesTheOldSharedLoggerWithoutALock) {
   const auto filter = rt::make<FunctionFilter>();
   filter->detaching = [&] { std::thread([] { ZEBLogger::sharedLogger(); }).join(); };
   ZEBLogger::setSharedLogger(ZEBLogger::loggerWithWriter(recorder_, nullptr, filter));
   ZEBLogger::setSharedLogger(recordingLogger());
 }
 
-// The report of a malformed file of user defaults is made as the first shared logger is, and may log itself.
-// In a process of its own: in this one, a thread that watches that file may report first.
-TEST(ZEBLoggerDeathTest, MayBeAskedForWhileTheSharedLoggerIsBeingMade) {
+// Making the first shared logger may report a malformed file of user defaults, and the report may log. The
+// test needs a process of its own, because in this one another thread that watches the file may report first.
+TEST(ZEBLoggerDeathTest, SharedLoggerMayBeUsedWhileItIsBeingMade) {
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   const auto ask = [] {
     std::ofstream(privateDefaults.file()) << "not a setting\n";

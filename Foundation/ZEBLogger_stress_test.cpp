@@ -1,4 +1,4 @@
-// Many who log at once, and a system that takes no more.
+// Tests many threads and processes that log at once, and a system that refuses to write.
 #include <fcntl.h>
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -23,9 +23,9 @@ namespace {
 using namespace rt::literals;
 namespace fs = std::filesystem;
 
-// Many at once.
+// Many threads and processes at once.
 
-// Invariant: every line of every writer is in the file once, whole, and those of one writer in its order.
+// Invariant: each line of each writer is in the file once and whole. The lines of one writer are in order.
 void expectWholeLines(const std::string& text, int writers, int lines) {
   std::istringstream stream(text);
   std::map<int, int> next;
@@ -70,8 +70,8 @@ TEST_F(ZEBLoggerTest, KeepsLinesOfProcessesWhole) {
   for (int writer = 0; writer < 2; ++writer) {
     children.push_back(fork());
     if (children.back() == 0) {
-      // Without the usual filter, which would start a thread: the thread sanitizer allows none in the child
-      // of a process that has several.
+      // Without the default filter, which would start a thread. The thread sanitizer allows no new thread in
+      // the child of a process that has several.
       const auto file = ZEBFileHandleLogWriter::fileHandleForLoggingAtPath(pathText(), 0644);
       logLines(*ZEBLogger::loggerWithWriter(file, ZEBLogStandardFormatter::init(), nullptr), writer, 2000);
       _exit(0);
@@ -85,8 +85,8 @@ TEST_F(ZEBLoggerTest, KeepsLinesOfProcessesWhole) {
   expectWholeLines(contents(), 2, 2000);
 }
 
-// Invariant: whatever pieces are set meanwhile, each line goes to one of the two writers.
-TEST_F(ZEBLoggerTest, LosesNoLineWhilePiecesAreExchanged) {
+// Invariant: whatever pieces are set meanwhile, each line reaches one of the two writers.
+TEST_F(ZEBLoggerTest, LosesNoLineWhilePiecesAreReplaced) {
   constexpr int kThreads = 4;
   constexpr int kLines = 2000;
   const auto other = rt::make<Recorder>();
@@ -110,7 +110,8 @@ TEST_F(ZEBLoggerTest, LosesNoLineWhilePiecesAreExchanged) {
   EXPECT_EQ(recorder_->lines().size() + other->lines().size(), std::size_t{kThreads} * kLines);
 }
 
-// Invariant: each line goes to a logger that was the shared one when it was asked for, and all of these last.
+// Invariant: each line reaches the logger that was shared when the line was logged. These loggers stay
+// usable.
 TEST_F(ZEBLoggerTest, LosesNoLineWhileTheSharedLoggerIsReplaced) {
   constexpr int kThreads = 4;
   constexpr int kLines = 2000;
@@ -129,8 +130,9 @@ TEST_F(ZEBLoggerTest, LosesNoLineWhileTheSharedLoggerIsReplaced) {
   EXPECT_EQ(recorder_->lines().size(), std::size_t{kThreads} * kLines);
 }
 
-// Two threads that set filters at once: each that was told that it came is told that it goes, and none twice.
-TEST_F(ZEBLoggerTest, TellsFiltersInTurnWhenSettersCompete) {
+// Two threads set filters at once. Each filter that is told of its attachment is told of its detachment,
+// once.
+TEST_F(ZEBLoggerTest, AttachesAndDetachesEachFilterOnceWhenSettersCompete) {
   std::atomic<int> attached = 0;
   std::atomic<int> wrong = 0;
   rt::Ref<ZEBLogger> logger = recordingLogger();
@@ -154,9 +156,9 @@ TEST_F(ZEBLoggerTest, TellsFiltersInTurnWhenSettersCompete) {
   EXPECT_EQ(wrong, 0);
 }
 
-// Where the system takes no more.
+// A system that refuses to write.
 
-TEST_F(ZEBLoggerTest, GoesOnAfterAFullDiskAClosedDescriptorAndARemovedFile) {
+TEST_F(ZEBLoggerTest, RecoversFromAFullDiskAClosedDescriptorAndARemovedFile) {
   if (!fs::exists("/dev/full")) GTEST_SKIP() << "no /dev/full here";
   const auto logger = ZEBLogger::standardLoggerWithPath("/dev/full"_s);
   ASSERT_TRUE(logger);

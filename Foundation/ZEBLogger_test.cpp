@@ -26,7 +26,7 @@ namespace {
 using namespace rt::literals;
 using testing::ElementsAre;
 
-// Shows what a formatter is asked.
+// Makes a line that shows what the formatter was given.
 class ShowingFormatter final : public rt::Implements<ShowingFormatter, ZEBLogBasicFormatter> {
  public:
   rt::String stringForFunc(const rt::String& func, const rt::String& withFormat, std::va_list valist,
@@ -42,7 +42,7 @@ struct Undescribed final : public rt::Implements<Undescribed, rt::Object> {
 
 // Pieces.
 
-TEST_F(ZEBLoggerTest, WritesMessagesAloneToStandardOutputUnlessToldOtherwise) {
+TEST_F(ZEBLoggerTest, WritesPlainMessagesToStandardOutputByDefault) {
   for (const auto& logger :
        {ZEBLogger::logger(), ZEBLogger::init(), ZEBLogger::loggerWithWriter(nullptr, nullptr, nullptr),
         ZEBLogger::initWithWriter(nullptr, nullptr, nullptr)}) {
@@ -55,7 +55,7 @@ TEST_F(ZEBLoggerTest, WritesMessagesAloneToStandardOutputUnlessToldOtherwise) {
   }
 }
 
-TEST_F(ZEBLoggerTest, KeepsThePiecesThatItIsGiven) {
+TEST_F(ZEBLoggerTest, UsesTheGivenPieces) {
   const rt::Ref<ZEBLogFormatter> formatter = rt::make<ShowingFormatter>();
   const rt::Ref<ZEBLogFilter> filter = ZEBLogAllowedLevelFilter::init();
   const auto logger = ZEBLogger::loggerWithWriter(recorder_, formatter, filter);
@@ -64,7 +64,7 @@ TEST_F(ZEBLoggerTest, KeepsThePiecesThatItIsGiven) {
   EXPECT_EQ(logger->filter(), filter);
 }
 
-TEST_F(ZEBLoggerTest, TakesNullForTheUsualPiece) {
+TEST_F(ZEBLoggerTest, NullSetsTheDefaultPiece) {
   const auto logger =
       ZEBLogger::loggerWithWriter(recorder_, rt::make<ShowingFormatter>(), ZEBLogAllowedLevelFilter::init());
   logger->setWriter(nullptr);
@@ -75,7 +75,7 @@ TEST_F(ZEBLoggerTest, TakesNullForTheUsualPiece) {
   EXPECT_TRUE(isA<ZEBLogNoFilter>(logger->filter()));
 }
 
-TEST_F(ZEBLoggerTest, TellsFiltersThatTheyComeAndGo) {
+TEST_F(ZEBLoggerTest, TellsFiltersOfAttachmentAndDetachment) {
   std::vector<std::string> events;
   rt::Ref<ZEBLogger> logger = recordingLogger();
   const auto filterNamed = [&](const std::string& name) {
@@ -106,7 +106,7 @@ TEST_F(ZEBLoggerTest, TellsFiltersThatTheyComeAndGo) {
   EXPECT_THAT(events, ElementsAre("first detaching?"));
 }
 
-TEST_F(ZEBLoggerTest, DropsWhatAFilterThrowsAsItsLoggerGoes) {
+TEST_F(ZEBLoggerTest, DropsWhatAFilterThrowsWhenTheLoggerIsDestroyed) {
   const auto filter = rt::make<FunctionFilter>();
   int calls = 0;
   filter->detaching = [&] {
@@ -117,7 +117,7 @@ TEST_F(ZEBLoggerTest, DropsWhatAFilterThrowsAsItsLoggerGoes) {
   EXPECT_EQ(calls, 1);
 }
 
-TEST_F(ZEBLoggerTest, KeepsTheOldFilterThatThrowsAsItIsToGo) {
+TEST_F(ZEBLoggerTest, KeepsAFilterThatThrowsWhenDetached) {
   const auto logger = recordingLogger();
   const auto filter = rt::make<FunctionFilter>();
   logger->setFilter(filter);
@@ -125,12 +125,12 @@ TEST_F(ZEBLoggerTest, KeepsTheOldFilterThatThrowsAsItIsToGo) {
   EXPECT_THROW(logger->setFilter(nullptr), std::runtime_error);
   EXPECT_EQ(logger->filter(), filter);
   filter->detaching = [] {};
-  // The lock is free again, for others too.
+  // The lock is free again, for other threads too.
   std::thread([&] { logger->setFilter(nullptr); }).join();
   EXPECT_TRUE(isA<ZEBLogNoFilter>(logger->filter()));
 }
 
-TEST_F(ZEBLoggerTest, HasTheNewFilterThatThrowsAsItComes) {
+TEST_F(ZEBLoggerTest, SetsAFilterThatThrowsWhenAttached) {
   const auto logger = recordingLogger();
   const auto filter = rt::make<FunctionFilter>();
   filter->attached = [] { throw 7; };
@@ -139,20 +139,20 @@ TEST_F(ZEBLoggerTest, HasTheNewFilterThatThrowsAsItComes) {
   std::thread([&] { logger->setFilter(nullptr); }).join();
 }
 
-TEST_F(ZEBLoggerTest, IsNoneWhereItsMakingThrows) {
+TEST_F(ZEBLoggerTest, IsNullIfMakingItThrows) {
   const auto filter = rt::make<FunctionFilter>();
   int detached = 0;
   filter->attached = [] { throw std::runtime_error("not here"); };
   filter->detaching = [&] { ++detached; };
   EXPECT_FALSE(ZEBLogger::loggerWithWriter(recorder_, nullptr, filter));
-  // It was in the logger all the same.
+  // The filter was attached even so.
   EXPECT_EQ(detached, 1);
   EXPECT_THROW(ZEBLogger::initWithWriter(recorder_, nullptr, filter), std::runtime_error);
   EXPECT_EQ(detached, 2);
 }
 
-// Would wait for ever, if a logging waited for a setter.
-TEST_F(ZEBLoggerTest, LogsWhileAFilterIsBeingTold) {
+// This would deadlock if logging waited for a setter.
+TEST_F(ZEBLoggerTest, LogsWhileAFilterIsBeingAttachedOrDetached) {
   const auto logger = recordingLogger();
   const auto filter = rt::make<FunctionFilter>();
   filter->attached = filter->detaching = [&] { std::thread([&] { logger->logInfo("meanwhile"_s); }).join(); };
@@ -161,7 +161,7 @@ TEST_F(ZEBLoggerTest, LogsWhileAFilterIsBeingTold) {
   EXPECT_THAT(recorder_->lines(), ElementsAre("2 meanwhile", "2 meanwhile"));
 }
 
-TEST_F(ZEBLoggerTest, LetsAFilterExchangePiecesAsItComes) {
+TEST_F(ZEBLoggerTest, AFilterMaySetOtherPiecesWhenAttached) {
   const auto logger = ZEBLogger::logger();
   const auto filter = rt::make<FunctionFilter>();
   filter->attached = [&] { logger->setWriter(recorder_); };
@@ -171,8 +171,8 @@ TEST_F(ZEBLoggerTest, LetsAFilterExchangePiecesAsItComes) {
   logger->setFilter(nullptr);
 }
 
-// Would wait for ever, if an old piece went under a lock of the logger's.
-TEST_F(ZEBLoggerTest, LetsOldPiecesGoUnderNoLock) {
+// This would deadlock if an old piece were released under the logger's lock.
+TEST_F(ZEBLoggerTest, ReleasesOldPiecesWithoutALock) {
   struct Going {
     explicit Going(std::function<void()> function) : run(std::move(function)) {}
     Going(const Going&) = delete;
@@ -215,7 +215,7 @@ TEST_F(ZEBLoggerTest, LogsAtFourLevels) {
                                               "4 (null)|d%.1f %s|4|d0.5 text"));
 }
 
-TEST_F(ZEBLoggerTest, LogsTheNamesOfFunctions) {
+TEST_F(ZEBLoggerTest, LogsFunctionNames) {
   const auto logger = ZEBLogger::loggerWithWriter(recorder_, rt::make<ShowingFormatter>(), nullptr);
   logger->logFuncDebug("f", "a"_s);
   logger->logFuncInfo("größe", "b%d"_s, 1);
@@ -226,7 +226,7 @@ TEST_F(ZEBLoggerTest, LogsTheNamesOfFunctions) {
                                               "4 (null)|not UTF-8|4|not UTF-8"));
 }
 
-TEST_F(ZEBLoggerTest, TakesFormatsOfTheMomentAndLevelsOfAnySort) {
+TEST_F(ZEBLoggerTest, TakesRuntimeFormatsAndAnyLevel) {
   const auto logger = ZEBLogger::loggerWithWriter(recorder_, rt::make<ShowingFormatter>(), nullptr);
   const auto log = [&](const char* func, const rt::String* format, ZEBLogLevel level, ...) {
     std::va_list arguments;
@@ -253,7 +253,7 @@ TEST_F(ZEBLoggerTest, IsAWriterForFourLevels) {
                           "4 (null)|%@|4|100%@", "3 (null)|%@|3|(null)"));
 }
 
-TEST_F(ZEBLoggerTest, ShowsTheFilterTheFinishedLineAndFormatsDroppedOnesToo) {
+TEST_F(ZEBLoggerTest, FormatsEveryLineBeforeItAsksTheFilter) {
   int formatted = 0;
   std::vector<std::string> seen;
   const auto filter = rt::make<FunctionFilter>();
@@ -270,7 +270,7 @@ TEST_F(ZEBLoggerTest, ShowsTheFilterTheFinishedLineAndFormatsDroppedOnesToo) {
   EXPECT_THAT(recorder_->lines(), ElementsAre("3 line 2"));
 }
 
-TEST_F(ZEBLoggerTest, WritesNothingWhereTheFormatterMakesNone) {
+TEST_F(ZEBLoggerTest, WritesNothingIfTheFormatterReturnsNull) {
   bool isAsked = false;
   const auto filter = rt::make<FunctionFilter>();
   filter->allows = [&](const rt::String&, ZEBLogLevel) { return isAsked = true; };
@@ -284,7 +284,7 @@ TEST_F(ZEBLoggerTest, WritesNothingWhereTheFormatterMakesNone) {
   EXPECT_THAT(recorder_->lines(), ElementsAre("3 "));
 }
 
-TEST_F(ZEBLoggerTest, DropsALineInWhichSomethingThrowsAndWritesTheNext) {
+TEST_F(ZEBLoggerTest, DropsALineIfSomethingThrowsAndWritesTheNext) {
   const auto logger = recordingLogger();
   const auto undescribed = rt::make<Undescribed>();
   logger->logError("%@"_s, undescribed);
@@ -332,13 +332,13 @@ TEST_F(ZEBLoggerTest, LetsAThreadBeCancelledInAWriter) {
   void* result = nullptr;
   ASSERT_EQ(pthread_join(thread, &result), 0);
   EXPECT_EQ(result, PTHREAD_CANCELED);
-  // All was let go on the way.
+  // The cancellation has released everything that the writer's call held.
   logger->setWriter(recorder_);
   logger->logError("next"_s);
   EXPECT_THAT(recorder_->lines(), ElementsAre("3 next"));
 }
 
-// What has no pieces and takes everything at one place.
+// A subclass without pieces, which takes all lines in one place.
 class Rerouting final : public rt::Implements<Rerouting, ZEBLogger> {
  public:
   rt::Ref<ZEBLogWriter> writer() const override { return nullptr; }
@@ -357,7 +357,7 @@ class Rerouting final : public rt::Implements<Rerouting, ZEBLogger> {
   std::vector<std::string> lines;
 };
 
-TEST_F(ZEBLoggerTest, LetsASubclassTakeEverything) {
+TEST_F(ZEBLoggerTest, ASubclassMayTakeEverything) {
   const auto rerouting = rt::make<Rerouting>();
   const rt::Ref<ZEBLogger> logger = rerouting;
   logger->setWriter(nullptr);
@@ -370,11 +370,11 @@ TEST_F(ZEBLoggerTest, LetsASubclassTakeEverything) {
   logger->logMessage("text"_s, 3);
   logger->logMessage("dropped"_s, 0);
   EXPECT_THAT(rerouting->lines, ElementsAre("1 none|%d|1", "2 f|%d|2", "3 none|%@|text"));
-  // What it throws is its own affair.
+  // The base class does not drop what a subclass throws.
   EXPECT_THROW(logger->logAssert("line"_s), std::runtime_error);
 }
 
-// Notes the calls that led to it.
+// Records the call stack at `logInternalFunc`.
 class CallRecorder final : public rt::Implements<CallRecorder, ZEBLogger> {
  public:
   [[gnu::noinline]] void logInternalFunc(const char* /*func*/, const rt::String& /*format*/,
@@ -393,8 +393,8 @@ template <class Log>
   return reinterpret_cast<std::uint64_t>(__builtin_return_address(0));
 }
 
-// Whoever captures call stacks leaves these two frames out.
-TEST_F(ZEBLoggerTest, HasTwoFramesOfItsOwnBelowTheCodeThatLogs) {
+// Code that captures call stacks leaves these two frames out.
+TEST_F(ZEBLoggerTest, AddsTwoFramesBelowTheCodeThatLogs) {
   const auto recorder = rt::make<CallRecorder>();
   ZEBLogger& logger = *recorder;
   EXPECT_EQ(returnAddressOf([&]() __attribute__((always_inline)) { logger.logInfo("line"_s); }),

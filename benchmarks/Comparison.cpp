@@ -25,7 +25,7 @@ double median(std::vector<double> values) {
   return values.size() % 2 == 1 ? values[middle] : (values[middle - 1] + values[middle]) / 2;
 }
 
-// Google Benchmark's own report less the single repetitions, whose times are kept.
+// Prints Google Benchmark's own report without the single repetitions, and stores their times.
 class ComparingReporter : public benchmark::ConsoleReporter {
  public:
   using benchmark::ConsoleReporter::ConsoleReporter;
@@ -46,7 +46,7 @@ class ComparingReporter : public benchmark::ConsoleReporter {
     benchmark::ConsoleReporter::ReportRuns(shown);
   }
 
-  // Prints a line for each peer; returns whether every benchmark ran and every bound holds.
+  // Prints a line for each peer. Returns whether every benchmark ran and every bound holds.
   bool reportRatios() const {
     bool holds = !failed_;
     const std::map<Peer, double>& limits = bounds();
@@ -72,7 +72,7 @@ class ComparingReporter : public benchmark::ConsoleReporter {
   }
 
  private:
-  // In seconds, by the name without the options that Google Benchmark appends to it.
+  // Times in seconds. The key is a case's name, without the options that Google Benchmark appends to it.
   std::map<std::string, std::vector<double>> times_;
   bool failed_ = false;
 };
@@ -88,7 +88,7 @@ Bound::Bound(std::string caseName, std::string peer, double ratio) {
 }
 
 int main(int argumentCount, char** arguments) {
-  // What is given on the command line comes later and so has the last word.
+  // Options on the command line come later, so they override these.
   std::vector<std::string> defaults = {"--benchmark_repetitions=11", "--benchmark_min_time=0.05",
                                        "--benchmark_enable_random_interleaving=true"};
   std::vector<char*> all = {arguments[0]};

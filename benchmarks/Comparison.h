@@ -2,25 +2,25 @@
 
 #include <string>
 
-/// Comparisons within one run.
+/// Compares our code with peers in one run.
 ///
-/// Benchmark programs here register their cases as "Topic/case/ours" and "Topic/case/PEER", link
-/// `benchmark-comparison` (which brings `main`), and get, after Google Benchmark's own lines, one line
-/// for each peer: both medians and their ratio. The repetitions of all cases are interleaved at random,
-/// so that a busy machine slows both sides alike.
+/// A benchmark program registers its cases as "Topic/case/ours" and "Topic/case/PEER". It links
+/// `benchmark-comparison`, which defines `main`. After Google Benchmark's own output it prints a line for
+/// each peer, with both medians and their ratio. The repetitions of all cases run in random order, so that a
+/// busy machine slows both sides alike.
 ///
 ///     BENCHMARK(copyRef)->Name("Ref/copy/ours");
 ///     BENCHMARK(copySharedPointer)->Name("Ref/copy/shared_ptr");
 ///     const Bound bound{"Ref/copy", "shared_ptr", 1.0};   // at namespace scope
 ///
-/// A ratio over its bound is marked and makes the program exit with status 1.
+/// If a ratio exceeds its bound, its line says so and the program exits with status 1.
 struct Bound {
-  /// At most `ratio` times the median of `caseName`/`peer` may be the one of `caseName`/ours.
+  /// Registers a bound: the median of `caseName`/ours may be at most `ratio` times that of `caseName`/`peer`.
   Bound(std::string caseName, std::string peer, double ratio);
 };
 
-/// A thread that waits until the program ends. Other parts of a program have threads, too: what does without
-/// atomic operations until there is a second one must not do so where it is measured.
+/// A thread that waits until the program ends. System libraries avoid atomic operations while a program has
+/// only one thread. Real programs have several, so the measurements need a second one.
 ///
 ///     const SecondThread secondThread;   // at namespace scope
 struct SecondThread {

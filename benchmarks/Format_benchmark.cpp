@@ -1,5 +1,5 @@
-// Formatting beside snprintf, which writes to a buffer on the stack and allocates nothing, and fmt, which
-// makes a std::string. Ours makes a rt::String: one allocation.
+// Compares formatting with snprintf and fmt. snprintf writes to a buffer on the stack and allocates nothing.
+// fmt makes a std::string. Ours makes an rt::String, with one allocation.
 #include <benchmark/benchmark.h>
 #include <fmt/format.h>
 
@@ -13,7 +13,7 @@ namespace {
 
 using namespace rt::literals;
 
-// The text of a short report: with the rest too long for a std::string to hold within itself.
+// With the rest of the line, this is too long for a std::string to store without allocating.
 const char* const kName = "SystemClock";
 const rt::String kNameString = rt::String::fromUTF8(kName);
 

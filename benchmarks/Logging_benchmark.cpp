@@ -1,5 +1,5 @@
-// Messages with one text and one number, from the call to a logger that takes the finished text, beside two
-// usual libraries doing the same.
+// Compares logging with two common libraries. Each message has a text and a number, and ends at a logger that
+// takes the formatted text.
 
 #include <benchmark/benchmark.h>
 #include <glog/logging.h>
@@ -28,7 +28,7 @@ using namespace rt::literals;
 constexpr const char* kName = "holiday.tar";
 constexpr int kBurst = 256;
 
-/// A second thread, which waits: with one thread alone the libraries of the system leave out their atomics.
+// A second thread, which waits. System libraries avoid atomic operations while a program has only one thread.
 class Company {
  public:
   Company()
@@ -76,7 +76,7 @@ class AsyncLogger final : public rt::Implements<AsyncLogger, rt::Object, LUMAsyn
   const rt::Ref<rt::Queue> queue_ = rt::make<rt::Queue>("AsyncLogger"_s);
 };
 
-/// The shared multiplexer without any logger, and with those that a case adds.
+// The shared multiplexer, with no loggers but those that a case adds.
 class Ours {
  public:
   Ours() {
@@ -109,7 +109,7 @@ class Ours {
   const rt::Ref<LUMLogFilter> filter_ = LUMLogMinimumLevelFilter::initWithMinimumLevel(LUMLogLevelError);
 };
 
-/// Takes the finished text, as SyncLogger does.
+// Takes the formatted text, as SyncLogger does.
 template <class Mutex>
 class Sink final : public spdlog::sinks::base_sink<Mutex> {
  protected:
@@ -182,7 +182,7 @@ void refusedSpdlog(benchmark::State& state) {
   }
 }
 
-// What the call costs, as long as what it feeds keeps up: each message is waited for.
+// Measures the call alone. Each message is handled before the next one, so that the queue never fills.
 void steadyOurs(benchmark::State& state) {
   Ours ours;
   ours.addAsync();
@@ -195,7 +195,7 @@ void steadyOurs(benchmark::State& state) {
   }
 }
 
-// A burst, and what it takes until all of it has been taken.
+// Measures a burst of messages until the logger has taken the last one.
 void burstOurs(benchmark::State& state) {
   Ours ours;
   ours.addAsync();
@@ -205,7 +205,7 @@ void burstOurs(benchmark::State& state) {
   }
 }
 
-/// Counts what it takes, so that the end of a burst is known.
+// Counts its messages, so that the end of a burst is known.
 class CountingSink final : public spdlog::sinks::base_sink<spdlog::details::null_mutex> {
  public:
   void waitFor(std::uint64_t count) const {
@@ -303,7 +303,7 @@ void errorOurs(benchmark::State& state, bool capture) {
   for (auto _ : state) LUMLogAt(LUMLogLevelError, "%s has %d entries"_s, kName, ++i);
 }
 
-// The part of it that is the unwinder's.
+// Measures the unwinder alone, which is a part of logging an error with a call stack.
 void unwinder(benchmark::State& state) {
   std::array<std::uint64_t, 128> addresses{};
   for (auto _ : state) benchmark::DoNotOptimize(rt::CallStack::capture(addresses));

@@ -1,6 +1,6 @@
-// A line of the older logger beside one of spdlog, with the same fields in both: the local time to the
-// millisecond, the process, the thread, the level, the function and a message with two arguments. Once to a
-// writer that drops it, which measures how a line is made, and once to /dev/null by way of the kernel.
+// Compares a line of the older logger with one of spdlog. Both have the same fields: the local time in
+// milliseconds, the process, the thread, the level, the function and a message with two arguments. One case
+// drops the line, and so measures the formatting alone. The other writes it to /dev/null.
 #include <benchmark/benchmark.h>
 #include <spdlog/logger.h>
 #include <spdlog/sinks/base_sink.h>
@@ -26,7 +26,7 @@ class DroppingWriter final : public rt::Implements<DroppingWriter, rt::Object, Z
   }
 };
 
-// As spdlog's null sink, but that one does not even ask the formatter for the line.
+// Drops the line like spdlog's null sink, but formats it first.
 class DroppingSink final : public spdlog::sinks::base_sink<spdlog::details::null_mutex> {
  protected:
   void sink_it_(const spdlog::details::log_msg& message) override {

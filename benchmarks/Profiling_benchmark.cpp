@@ -1,4 +1,4 @@
-// What it costs to measure how long services take, and what it costs to be able to.
+// Measures what profiling of services costs while it is on, and while it is off.
 
 #include <benchmark/benchmark.h>
 
@@ -20,7 +20,7 @@ class Service final : public rt::Implements<Service, rt::Object> {};
 
 constexpr SRLAPIRegistrationData kAPI{.identifier = "Service", .identifierLength = 7};
 
-// New at each request, so that what is measured is added up and not kept.
+// Makes a new instance for each request, so that the measurements are added up and not stored.
 Ref<SRLImplementation> implementation() {
   return SRLImplementation::initWithIdentifier(
       "Service", SRLClassType::initWithClass(&rt::classInfo<Service>()), 1, 0,

@@ -20,7 +20,7 @@ namespace {
 
 using namespace rt::literals;
 
-/// What one writes by hand: a thread, a mutex, a condition variable.
+// A queue as one writes it by hand, with a thread, a mutex and a condition variable.
 class ConditionQueue {
  public:
   ConditionQueue() : thread_([this] { run(); }) {}
@@ -64,7 +64,7 @@ class ConditionQueue {
   std::thread thread_;
 };
 
-/// The same interface over ours.
+// Our queue with the same interface.
 class OurQueue {
  public:
   template <class Task>
@@ -86,7 +86,7 @@ void waitForAll(Queue& queue) {
   isDone.wait(false);
 }
 
-// Many small tasks from `kThreads` threads at once, until the last of them has run.
+// Measures many small tasks from `kThreads` threads, until the last of them has run.
 template <class Queue, int kThreads>
 void throughput(benchmark::State& state) {
   constexpr int kTasks = 20'000;
@@ -108,7 +108,7 @@ void throughput(benchmark::State& state) {
   state.SetItemsProcessed(state.iterations() * kThreads * kTasks);
 }
 
-// A task that brings a text and two numbers with it, as a log record does.
+// Measures tasks that capture a text and two numbers, as a log record would.
 template <class Queue>
 void payload(benchmark::State& state) {
   constexpr int kTasks = 20'000;
@@ -126,14 +126,14 @@ void payload(benchmark::State& state) {
   state.SetItemsProcessed(state.iterations() * kTasks);
 }
 
-// One task at a time: from `async` on an idle queue to the answer from its thread.
+// Measures one task at a time, from `async` on an idle queue to the answer from its thread.
 template <class Queue>
 void roundTrip(benchmark::State& state) {
   Queue queue;
   for (auto _ : state) waitForAll(queue);
 }
 
-// The same after a pause in which everything has gone to sleep.
+// Measures the same after a pause in which the queue's thread has gone to sleep.
 template <class Queue>
 void wakeUp(benchmark::State& state) {
   Queue queue;

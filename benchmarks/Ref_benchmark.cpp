@@ -1,4 +1,4 @@
-// References beside the standard library's, and casts beside the compiler's.
+// Compares references with the standard library's, and casts with the compiler's.
 
 #include <benchmark/benchmark.h>
 
@@ -28,7 +28,7 @@ class SystemClock : public rt::Implements<SystemClock, rt::Object, AlarmClock> {
 };
 class QuartzClock : public rt::Implements<QuartzClock, SystemClock> {};
 
-/// For std::shared_ptr, without a count of its own.
+// A class for std::shared_ptr, without a reference count of its own.
 struct PlainClock {
   virtual ~PlainClock() = default;
   virtual int now() const { return 1; }

@@ -1,6 +1,6 @@
 #pragma once
 
-/// What the registry's benchmarks ask for, and the container that they compare it with.
+/// The services that the registry's benchmarks request, and a container to compare the registry with.
 ///
 /// Not for: anything but benchmarks.
 
@@ -22,7 +22,7 @@
 
 namespace RegistryBenchmark {
 
-/// What all services are.
+/// The class of all services.
 class Service final : public rt::Implements<Service, rt::Object> {};
 
 inline rt::Ref<rt::Object> makeService(SRLScopeTagSet /*tags*/) {
@@ -32,7 +32,8 @@ inline rt::Ref<rt::Object> makeService(SRLScopeTagSet /*tags*/) {
 inline constexpr std::size_t kAPIs = 1000;
 inline constexpr SRLAPIInstanceType kType{.names = {.protocolName = nullptr, .className = "Service"}};
 
-/// A thousand APIs of one account's each, every third of which is made anew each time; and one for eight.
+/// A module with a thousand APIs in the scope of an account. Every third of them makes a new instance for
+/// each request. One more API is bound to eight implementations.
 struct Module {
   Module() {
     for (std::size_t i = 0; i < kAPIs; ++i) {
@@ -72,7 +73,7 @@ inline const Module& module() {
   return module;
 }
 
-/// For tables of the standard library whose keys are tags.
+/// The hash and equality of tag sets, for tables of the standard library.
 struct TagSetHash {
   std::size_t operator()(const SRLScopeTagSet& set) const { return SRLScopeTagSetHash(set); }
 };
@@ -82,7 +83,8 @@ struct TagSetEqual {
   }
 };
 
-/// The container of a user: services by name, instances by name in scopes by tags.
+/// A container as a user would write it. It finds services by name, scopes by tags, and instances in a scope
+/// by name.
 class Container {
  public:
   using Service = std::shared_ptr<void>;
@@ -108,7 +110,8 @@ class Container {
         if (const auto instance = scope.find(name); instance != scope.end()) return instance->second;
       }
     }
-    // Factories may ask for other services, so that two threads may make the same: the first counts.
+    // Runs the factory without the lock, since it may request other services. If two threads make the same
+    // instance, the first to store it wins.
     Service made = factory(tags);
     if (isFresh) return made;
     const std::lock_guard lock(mutex_);

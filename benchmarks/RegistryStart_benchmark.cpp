@@ -1,5 +1,5 @@
-// What a program's registry costs until it is ready, beside the same with nothing between it, and beside a
-// container as a user would write it.
+// Measures what a program's registry costs until it is ready. Compares it with the necessary steps alone
+// ("bare"), and with a container as a user would write it.
 
 #include <benchmark/benchmark.h>
 
@@ -28,7 +28,7 @@ const SecondThread secondThread;
 using namespace RegistryBenchmark;
 using rt::Ref;
 
-// The same thousand APIs, all in one module or each in its own.
+// The thousand APIs in `count` modules: all in one, or each in its own.
 template <std::size_t count>
 std::span<const SRLBindingsModuleData* const> modules() {
   static const auto data = [] {
@@ -46,8 +46,8 @@ std::span<const SRLBindingsModuleData* const> modules() {
   }();
   return pointers;
 }
-// A hundred programs are loaded: their registries know the modules. None of them ends, as that of a program
-// does not while it runs.
+// Starts a hundred registries with the modules, as a hundred programs would. Their destruction is not
+// measured, since a program's registry lives as long as the program.
 template <auto start>
 void startHundred(benchmark::State& state) {
   constexpr std::size_t kStarts = 100;
@@ -66,7 +66,7 @@ Ref<SRLRegistry> start() {
   made->internalRegisterBindings(modules<count>());
   return made;
 }
-// A registry and its scope of configurations are each an object and what it knows, apart from each other.
+// A registry and its scope of configurations. Each is an object and, allocated separately, its data.
 struct BareRegistry {
   struct Tables {
     std::unordered_map<const void*, Ref<rt::Object>> implementations;
@@ -100,7 +100,7 @@ template <std::size_t count>
 BareRegistry startBare() {
   return startBareWith(modules<count>());
 }
-// The container has to be told of each API.
+// Each API must be bound in the container.
 std::unique_ptr<Container> startContainer() {
   auto made = std::make_unique<Container>();
   for (std::size_t i = 0; i < kAPIs; ++i) {
@@ -111,7 +111,7 @@ std::unique_ptr<Container> startContainer() {
   return made;
 }
 
-// The same from the beginning: the class methods of a thousand modules are listed and called.
+// Starts a registry from the beginning: lists and calls the class methods of a thousand modules.
 const SRLBindingsModuleData* bindings() {
   return modules<1>().front();
 }
@@ -125,7 +125,7 @@ void discover(benchmark::State& state) {
     state.SkipWithError("methods are missing");
   SRLRegistry::setSharedInstance(before);
 }
-// The methods are walked through in the order in which they are loaded (see below), put in order and called.
+// Visits the methods in the order in which they are loaded (see below), sorts them and calls them.
 void discoverBare(benchmark::State& state) {
   const std::vector<rt::ClassMethod> methods = rt::classMethods(rt::classInfo<SRLRegistry>());
   std::forward_list<rt::ClassMethod> listed;

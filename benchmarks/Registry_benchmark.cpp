@@ -1,4 +1,5 @@
-// Services beside what a look-up is made of, and beside a container as a user would write it.
+// Compares requests for services with the necessary steps of a look-up ("bare"), and with a container as a
+// user would write it.
 
 #include <benchmark/benchmark.h>
 
@@ -46,7 +47,7 @@ Ref<SRLRegistry> registryWith(const SRLBindingsModuleData& data) {
   return registry;
 }
 
-// The registry that the cases ask, all of whose APIs have been asked for.
+// The registry of the cases. All of its APIs have been requested before.
 SRLRegistry& registry() {
   static const Ref<SRLRegistry> registry = [] {
     Ref<SRLRegistry> made = registryWith(module().data);
@@ -58,13 +59,13 @@ SRLRegistry& registry() {
   return *registry;
 }
 
-// The tag of a request is equal to the scope's, and not the same.
+// The tag of a request. It equals the scope's tag but is another object.
 const Ref<rt::Object>& account() {
   static const Ref<rt::Object> tag = rt::String::fromUTF8("account").object();
   return tag;
 }
 
-// What a look-up is made of: locks, tables and counts, and nothing between them.
+// The locks, tables and reference counts of a look-up, without any other work.
 struct Floor {
   Floor() {
     for (const SRLAPIRegistrationData& api : module().apis) {
@@ -86,7 +87,7 @@ struct Floor {
   std::unordered_map<SRLScopeTagSet, Ref<rt::Object>, TagSetHash, TagSetEqual> scopes;
 };
 
-// The least that a request can do: one lock, the same tables, the same counts, and no checks.
+// The least that a request can do: one lock, the same tables and reference counts, and no checks.
 struct Least {
   Least() {
     for (const SRLAPIRegistrationData& api : module().apis) {
@@ -154,7 +155,7 @@ template <class Table, class Key>
   return found != table.end() ? Ref<rt::Object>(found->second) : nullptr;
 }
 
-// An instance that is there, in its scope of the shared registry.
+// Finds an existing instance in its scope of the shared registry.
 [[gnu::always_inline]] inline Ref<rt::Object> keptInstance(Floor& floor, const SRLAPIRegistrationData& api,
                                                            const SRLScopeTagSet& tags) {
   const Ref<rt::Object> shared = [&] {
@@ -204,7 +205,7 @@ void findScopedInContainer(benchmark::State& state) {
   for (auto _ : state) benchmark::DoNotOptimize(asked.find(name, tags));
 }
 
-// Of two accounts by turns, so that the scope is never that of the request before.
+// Requests services of two accounts in turn, so that the scope always differs from the previous request's.
 void findByTurns(benchmark::State& state) {
   SRLRegistry& asked = registry();
   const Ref<rt::Object> another = rt::String::fromUTF8("another").object();
@@ -258,14 +259,14 @@ void missOptional(benchmark::State& state) {
   SRLRegistry& asked = registry();
   for (auto _ : state) benchmark::DoNotOptimize(asked.internalOptionalService(&kUnknown, {}));
 }
-// The module's binding of an API; null where it has none.
+// Returns the module's binding of an API, or null if there is none.
 const _SRLBindingRegistrationData* bindingOf(const SRLAPIRegistrationData& api) {
   const auto identifierOf = [](const auto& binding) { return SRLIdentifierBytes(*binding.api); };
   const auto* const found = std::ranges::lower_bound(module().bindings, std::string_view(api.identifier),
                                                      SRLIsIdentifierBefore, identifierOf);
   return found != module().bindings.end() && identifierOf(*found) == api.identifier ? &*found : nullptr;
 }
-// A module may bind it, so it is looked for among the module's bindings. (Ours does so once.)
+// Searches the module's bindings each time, since the module may bind the API. Our registry does that once.
 void missBare(benchmark::State& state) {
   static Floor& floor = *new Floor();
   for (auto _ : state) {
@@ -318,14 +319,14 @@ void findManyInContainer(benchmark::State& state) {
   }
 }
 
-// The last of a thousand, which has been asked for before.
+// Requests the last of a thousand APIs by its identifier. It has been requested before.
 void findByString(benchmark::State& state) {
   SRLRegistry& asked = registry();
   const rt::String name = rt::String::fromUTF8(module().identifiers.back());
   const auto tags = SRLScopeTagSetCodableWrapper::initWithTagSet({{account().get()}});
   for (auto _ : state) benchmark::DoNotOptimize(asked.eg_internalService(name, tags));
 }
-// The identifier is in a table too.
+// Finds the identifier in a table too.
 void findByStringBare(benchmark::State& state) {
   static Floor& floor = *new Floor();
   static const auto& byIdentifier = []() -> const auto& {
@@ -340,13 +341,13 @@ void findByStringBare(benchmark::State& state) {
       const rt::LockGuard guard(floor.lock);
       return byIdentifier.find(name)->second;
     }();
-    // NOLINTNEXTLINE(performance-unnecessary-copy-initialization): user code may let go of the wrapper's
+    // NOLINTNEXTLINE(performance-unnecessary-copy-initialization): user code may release the wrapper's tags
     const Ref<rt::Array> kept = tags;
     const Ref<rt::Object> implementation = lookUp(floor.lock, floor.implementations, api);
     benchmark::DoNotOptimize(keptInstance(floor, *api, {{kept->at(0)}}));
   }
 }
-// Identifiers are looked through one after the other, as they are the first time.
+// Compares the identifiers one after the other, as our first request does.
 void findByStringScanning(benchmark::State& state) {
   const std::string& name = module().identifiers.back();
   for (auto _ : state) {
@@ -361,9 +362,9 @@ void findByStringInContainer(benchmark::State& state) {
   for (auto _ : state) benchmark::DoNotOptimize(asked.find(name, tags));
 }
 
-// With all checks of its binding, and in a scope that is new too.
+// First requests check their bindings, and the first of them creates its scope.
 constexpr std::size_t kFirst = 100;
-// Of all that there are.
+// Spreads the requests over all APIs.
 constexpr std::size_t nthFirst(std::size_t i) {
   return i * (kAPIs / kFirst);
 }
@@ -383,9 +384,9 @@ void findFirst(benchmark::State& state) {
     state.ResumeTiming();
   }
 }
-// Step by step: the binding is looked for, its types are made and compared, and what has to be there
-// afterwards is made: an implementation with a block, a scope, and an instance, with a lock for which others
-// could wait meanwhile. (Ours makes no type for the API, and one such lock for all.)
+// The steps of a first request. It finds the binding, and makes and compares its types. Then it makes an
+// implementation with a block, a scope, and an instance, with a lock on which other threads could wait. Our
+// registry makes no type for the API, and one such lock for all instances.
 void findFirstBare(benchmark::State& state) {
   struct Scope {
     rt::UnfairLock lock;
@@ -471,7 +472,7 @@ void findFirstInContainer(benchmark::State& state) {
   }
 }
 
-// What a program without modules pays when it is loaded, and for the end of a registry.
+// Measures what a program without modules pays when it is loaded, and the destruction of a registry.
 void discoverNone(benchmark::State& state) {
   const Ref<SRLRegistry> before = SRLRegistry::sharedInstance();
   for (auto _ : state) {

@@ -1,4 +1,4 @@
-// Tag sets beside the plainest code for the same, and a scope's look-up beside what it is made of.
+// Compares tag sets with the simplest code for the same, and a scope's look-up with its necessary steps.
 
 #include <benchmark/benchmark.h>
 
@@ -62,7 +62,7 @@ void hashTagsOfVector(benchmark::State& state) {
   }
 }
 
-// Tags that are equal, and not the same.
+// The tags are equal but not identical.
 void compareTags(benchmark::State& state) {
   const Ref<rt::Array> tags = fourTags();
   const Ref<rt::Array> others = fourTags();
@@ -84,7 +84,7 @@ void compareArraysOfTags(benchmark::State& state) {
   }
 }
 
-// Bit by bit, each tag's place counted anew.
+// Masks bit by bit, and counts bits for the index of each tag.
 [[gnu::noinline]] SRLScopeTagSet maskedByCounting(const SRLScopeTagSet& set, SRLScopeType apiScope,
                                                   SRLScopeType implScope) {
   SRLScopeTagSet masked;
@@ -122,7 +122,7 @@ class Instance final : public rt::Implements<Instance, rt::Object> {};
 constexpr std::size_t kInstances = 100;
 using Identifiers = std::array<char, kInstances>;
 
-// Each in its turn, in an order that is not that of the table.
+// Returns the index of the next instance. The order visits each instance, and differs from the table's order.
 std::size_t next(std::size_t index) {
   return (index + 37) % kInstances;
 }
@@ -140,8 +140,8 @@ void findInstance(benchmark::State& state) {
   }
 }
 
-// What the look-up is made of, bare: a lock taken and let go, a table searched, an object retained and
-// released.
+// The necessary steps of the look-up: it takes and releases a lock, searches a table, and retains and
+// releases an object.
 struct Bare {
   rt::UnfairLock lock;
   std::unordered_map<const void*, Ref<rt::Object>> instances RT_GUARDED_BY(lock);

@@ -1,5 +1,5 @@
-// The whole command, from its start to its end, beside coreutils doing the same to the same directory.
-// Run it in a private root (script/bench does): it works in the real /Volumes.
+// Compares a whole run of the command with coreutils doing the same to the same directory. Run it in a
+// private root, as script/bench does: it changes /Volumes.
 
 #include <benchmark/benchmark.h>
 #include <fcntl.h>
@@ -16,7 +16,7 @@ namespace {
 
 constexpr const char* kDirectory = "/Volumes/benchmark";
 
-// Seconds from the start of the program to its end; negative when it did not succeed.
+// Returns the seconds from the start of the program to its end. Negative if the program fails.
 double run(const char* const* arguments) {
   char* const noEnvironment[] = {nullptr};
   const auto begin = std::chrono::steady_clock::now();
@@ -54,8 +54,8 @@ void remove(benchmark::State& state, const char* const* arguments) {
   }
 }
 
-// Has the system read a program from the disk when it runs next. One that was just written, as a linker does
-// it or an installation, lies otherwise in memory, which makes a difference of a tenth and more.
+// Makes the system read a program from the disk at its next run. A program that was just written, by a linker
+// or an installation, lies differently in memory. That makes a difference of a tenth and more.
 bool forgetPages(const char* path) {
   const int file = open(path, O_RDONLY | O_CLOEXEC);
   if (file < 0) return false;
@@ -64,7 +64,8 @@ bool forgetPages(const char* path) {
   return isForgotten;
 }
 
-// Before all of them, so that their medians are of programs in memory.
+// Runs once before all cases. Only the first run of each program reads the disk, so the medians are those of
+// programs in memory.
 const bool kAreForgotten = forgetPages(MOUNT_POINT) && forgetPages("/bin/mkdir") && forgetPages("/bin/rmdir");
 
 constexpr const char* kCreateOurs[] = {MOUNT_POINT, "benchmark", nullptr};
@@ -72,8 +73,8 @@ constexpr const char* kCreateTheirs[] = {"/bin/mkdir", "-m", "700", kDirectory, 
 constexpr const char* kRemoveOurs[] = {MOUNT_POINT, "benchmark", "--remove", nullptr};
 constexpr const char* kRemoveTheirs[] = {"/bin/rmdir", kDirectory, nullptr};
 
-// Each turn runs one program once, in no order: what slows the machine down for a moment slows all of them,
-// and none finds the caches as it left them, as when one types a command.
+// Each repetition runs one program once, in random order. So a busy moment slows all programs alike. No
+// program finds the caches as it left them, as for a command that a user types.
 void takeTurns(benchmark::internal::Benchmark* benchmark) {
   benchmark->UseManualTime()->Iterations(1)->Repetitions(2001);
 }

@@ -9,7 +9,7 @@ namespace {
 
 using namespace rt::literals;
 
-// Short enough for std::string to hold it within itself, and not.
+// std::string stores the short text without allocating, and allocates for the long one.
 constexpr const char* kShort = "short text";
 constexpr const char* kLong = "a text that is a good deal longer than any buffer within a string is";
 

@@ -1,5 +1,5 @@
-// One entry, beside the usual client library sending the same fields: what the call costs where a socket
-// takes every entry at once, and what it takes with the machine's journald at the other end.
+// Compares writing an entry with the usual client library, which sends the same fields. In one case a socket
+// takes every entry at once. In the other the machine's journald takes them.
 
 #include <benchmark/benchmark.h>
 #include <sys/socket.h>
@@ -31,7 +31,7 @@ constexpr const char* kSocket = "/run/systemd/journal/socket";
 constexpr const char* kText =
     "-[Importer importFile:]: cannot read \"/srv/incoming/2026-07-31.csv\", line 1204";
 
-// Where the sends arrive: at this process itself, or at journald.
+// Receives the entries, in this process or by journald.
 class Receiver {
  public:
   explicit Receiver(bool isDaemon) {
@@ -59,7 +59,8 @@ class Receiver {
     std::filesystem::remove(kSocket);
   }
 
-  // Sees to it that there is room for the next; returns whether one had come, as far as can be told.
+  // Takes an entry or gives journald time for it, so that there is room for the next. Returns false if this
+  // process has received none.
   bool takeOne() {
     if (descriptor_ >= 0) return recv(descriptor_, buffer_.data(), buffer_.size(), MSG_DONTWAIT) > 0;
     std::this_thread::sleep_for(std::chrono::microseconds(200));
@@ -93,7 +94,7 @@ void measure(benchmark::State& state, bool isDaemon, void (*send)()) {
   }
 }
 
-// A new handle for each entry, as a logger has it that keeps none.
+// Makes a new SystemLog for each entry, as a logger without a stored one does.
 void sendOurs() {
   const rt::SystemLog log("com.example.Importer"_s, "files"_s);
   if (log.isEnabled(rt::SystemLog::Type::error)) log.write(rt::SystemLog::Type::error, kText);

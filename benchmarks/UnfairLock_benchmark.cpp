@@ -19,7 +19,7 @@ void uncontended(benchmark::State& state) {
   }
 }
 
-// Two threads, one short critical section, the time in which both together get a fixed number of turns.
+// Measures the time in which two threads enter a short critical section a fixed number of times.
 template <class Lock>
 void contended(benchmark::State& state) {
   constexpr int kTurns = 200'000;

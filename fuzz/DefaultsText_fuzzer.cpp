@@ -1,4 +1,4 @@
-// Files of user defaults: what can be read is kept as it is, and a change leaves the rest alone.
+// Reads files of user defaults. An unchanged file must keep its text. A changed file must be readable again.
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>
@@ -22,7 +22,7 @@ bool has(const rt::DefaultsText& text, std::string_view key, std::string_view va
 
 }  // namespace
 
-// The first byte says how long a key and a value at the start are; the rest is a file.
+// The first byte gives the lengths of a key and of a value, which follow it. The rest of the input is a file.
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
   const std::string input(reinterpret_cast<const char*>(data), size);
   std::string_view rest = input;

@@ -1,4 +1,5 @@
-// The formatter against snprintf, for formats that C defines; against its promises, for any others.
+// Compares the formatter with snprintf for formats that C defines. For other formats, checks that the
+// formatter keeps its contract.
 #include <fuzzer/FuzzedDataProvider.h>
 
 #include <algorithm>
@@ -20,7 +21,7 @@
 #include "Runtime/Objects/String.h"
 #include "Runtime/Text/Format.h"
 
-// Formats are what is being made up here.
+// The fuzzer builds formats at run time.
 #pragma clang diagnostic ignored "-Wformat-nonliteral"
 
 namespace {
@@ -63,19 +64,19 @@ void compare(const std::string& format, Arguments... arguments) {
   require(actual == expected, format, expected, actual);
 }
 
-/// Makes up directives that C defines.
+// Builds random directives that C defines.
 class DirectiveMaker {
  public:
   explicit DirectiveMaker(FuzzedDataProvider& data) : data_(data) {}
 
-  /// A width or precision: none, a number, or "*" for the next argument, whose value it stores.
+  // Returns a width or precision: "", a number, or "*" for the next argument. Stores that argument's value.
   std::string number(int& argument, bool& isArgument) {
     isArgument = false;
     switch (data_.ConsumeIntegralInRange(0, 2)) {
       case 0:
         return "";
       case 1:
-        // Widths are bounded here and in C's promises alike.
+        // C guarantees no larger widths.
         return std::to_string(
             data_.ConsumeIntegralInRange(1, data_.ConsumeBool() ? 40 : rt::kMaximumFieldWidth));
       default:
@@ -98,7 +99,7 @@ class DirectiveMaker {
     return conversions[data_.ConsumeIntegralInRange<std::size_t>(0, conversions.size() - 1)];
   }
 
-  /// Calls compare with the directive and whichever of width and precision are arguments.
+  // Calls `compare` with the directive, its value, and its width and precision if they are arguments.
   template <class T>
   void check(const std::string& flags, bool hasPrecision, const std::string& length, char conversion,
              T value) {
@@ -147,13 +148,13 @@ void checkReal(FuzzedDataProvider& data) {
   maker.check(flags, hasPrecision, data.ConsumeBool() ? "l" : "", conversion, value);
 }
 
-/// `text` up to a precision: a character that it would cut in two is left out.
+// Returns `text` cut to a precision, without an incomplete character at its end.
 std::string_view cut(std::string_view text, std::size_t precision) {
   if (text.size() < precision) return text;
   text = text.substr(0, precision);
   for (std::size_t i = 1; i <= 3 && i <= text.size(); ++i) {
     const std::string_view tail = text.substr(text.size() - i);
-    // The beginning of a character is what becomes one with the right bytes after it.
+    // The tail is the beginning of a character if some bytes after it make it one.
     for (const std::string_view rest : {"\x80", "\xBF", "\x80\x80", "\xBF\xBF", "\x80\x80\x80",
                                         "\xBF\xBF\xBF", "\x90\x80\x80", "\xA0\x80"}) {
       const std::string whole = std::string(tail) + std::string(rest);
@@ -176,7 +177,7 @@ void checkText(FuzzedDataProvider& data) {
   const std::string_view whole = text.c_str();
   const std::string expected = theirs("<%s>", std::string(cut(whole, precision)).c_str());
   const rt::String repaired = rt::String::fromUTF8Repaired(expected);
-  // No NUL within the precision: only that many bytes may be read.
+  // If the text is as long as the precision, no NUL follows. So the formatter must not read further.
   std::vector<char> bytes(whole.substr(0, precision).begin(), whole.substr(0, precision).end());
   if (bytes.size() < precision) bytes.push_back('\0');
   const std::string format = "<%." + std::to_string(precision) + "s>";
@@ -201,7 +202,7 @@ void checkWide(FuzzedDataProvider& data) {
   maker.check(flags, data.ConsumeBool(), isS ? "" : "l", isS ? 'S' : 's', text.c_str());
 }
 
-/// Several directives over one list of arguments, each by its position, any number of times.
+// Checks formats whose directives take the arguments of one list by position, any number of times.
 void checkPositions(FuzzedDataProvider& data) {
   DirectiveMaker maker(data);
   std::string format;
@@ -235,16 +236,16 @@ void checkPositions(FuzzedDataProvider& data) {
   const std::size_t count = data.ConsumeIntegralInRange<std::size_t>(0, 8);
   for (std::size_t i = 0; i < count; ++i) add(data.ConsumeIntegralInRange(1, 6));
   for (int position = 1; position <= 6; ++position) add(position);
-  // Not below zero: with positions and "0", the C library at hand fills with zeros on the right then.
+  // Not negative: with positions and "0", this C library would fill with zeros on the right.
   const int width = data.ConsumeIntegralInRange(0, 60);
   const int precision = data.ConsumeIntegralInRange(-60, 60);
   compare(format, width, precision, data.ConsumeIntegral<long>(), data.ConsumeFloatingPoint<double>(),
           static_cast<long double>(data.ConsumeFloatingPoint<double>()), "some text");
 }
 
-/// Any bytes as a format. All arguments are zero, whatever they are read as.
+// Checks any bytes as a format. All arguments are zero, whatever type they are read as.
 void checkAnything(FuzzedDataProvider& data) {
-  // Three arguments want four bytes ("%*.*d"), so that these are enough.
+  // A directive with three arguments has five bytes ("%*.*d"), so there are enough arguments for 80 bytes.
   const std::string format = data.ConsumeRandomLengthString(80);
   rt::String text;
   const auto call = [&](auto... zeros) { text = ours(format.c_str(), zeros...); };
@@ -263,7 +264,7 @@ void checkAnything(FuzzedDataProvider& data) {
 }  // namespace
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t size) {
-  // Wide characters are UTF-8 in ours always, in snprintf by the locale.
+  // Our formatter always writes wide characters as UTF-8. snprintf goes by the locale.
   static const char* const kLocale = std::setlocale(LC_CTYPE, "C.UTF-8");
   if (kLocale == nullptr) std::abort();
   FuzzedDataProvider data(bytes, size);

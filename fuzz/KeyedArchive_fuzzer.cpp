@@ -1,5 +1,5 @@
-// Keyed archives: what can be read can be written, but where it repeats as much as only a longer file may,
-// and is then read as the same.
+// Reads keyed archives, writes the objects, and reads them again, which must give the same archive. Writing
+// may fail only if the new archive is so short that its objects are referred to too often.
 #include <cstddef>
 #include <cstdint>
 #include <cstdlib>
@@ -47,7 +47,7 @@ void require(bool condition) {
 template struct rt::AddedClassMethod<Tag, "initWithCoder:", &rt::initWithCoder<Tag>>;
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-  // A copy of just the size, so that a look beyond the end is noticed.
+  // A copy of exactly this size, so that the sanitizer notices reads past the end.
   const std::span<const std::byte> given = std::as_bytes(std::span(data, size));
   const std::vector<std::byte> bytes(given.begin(), given.end());
   try {
@@ -62,7 +62,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
       rt::KeyedUnarchiver::unarchivedObjectOfClasses({&rt::classInfo<rt::Object>()}, bytes, &error);
   require(!object || error.isNull());
   if (!object) return 0;
-  // By bytes, since few of them can stand for millions of objects.
+  // Compares archives and not objects, since a few bytes can stand for millions of objects.
   std::vector<std::byte> first;
   try {
     first = rt::KeyedArchiver::archivedDataWithRootObject(object);

@@ -1,6 +1,6 @@
-// The arguments of LUMLog as programs pass them, of any kinds and in any number, against a model that knows
-// what was passed: the text, the safe parameters by their places, and the place in the source come out as
-// they went in.
+// Calls LUMLog with any kinds and any number of arguments, and compares the message with a model that knows
+// what was passed. The message must have the right text, safe parameters at their indices, and place in the
+// source.
 #include <fuzzer/FuzzedDataProvider.h>
 
 #include <algorithm>
@@ -37,7 +37,7 @@ void require(bool condition) {
   if (!condition) std::abort();
 }
 
-// Classes whose names begin with those of the safe parameters, or nearly so.
+// Classes whose names begin with the name of a safe parameter's class, or resemble it.
 template <int number>
 class Named : public rt::Implements<Named<number>, rt::Object> {
  public:
@@ -48,14 +48,14 @@ class Named : public rt::Implements<Named<number>, rt::Object> {
   rt::String description() const override { return rt::String::fromUTF8(kClassName); }
 };
 
-/// As it is passed. Pointers are to objects and to texts.
+// An argument in the form in which it is passed. A pointer points to an object or a text.
 using Argument = std::variant<std::int64_t, const void*, double, long double>;
 
 constexpr std::size_t kMostArguments = 4;
-// Enough to fill all registers that take reals.
+// Enough to fill all registers that take real numbers.
 constexpr std::size_t kFlood = 9;
 
-/// One call, and what is to come of it.
+// A call of LUMLog, and the expected message.
 struct Call {
   LUMLogLevel level = 0;
   std::string file;
@@ -99,7 +99,7 @@ std::string printed(long double value) {
   return text.data();
 }
 
-/// A kind for which nothing is read.
+// Returns a kind for which LUMLog reads no argument.
 LUMLogArgumentKind otherKind(FuzzedDataProvider& data) {
   const auto kind = data.ConsumeIntegral<LUMLogArgumentKind>();
   return kind < 7 ? kind + 7 : kind;
@@ -141,7 +141,7 @@ Call someCall(FuzzedDataProvider& data) {
     call.metadata = LUMLogMetadata::metadataWithComponent(rt::String::fromUTF8("component"));
   call.isFlooded = data.ConsumeBool();
 
-  // Text is not looked at beyond the arguments that the format mentions.
+  // The format mentions only the first arguments. The others do not appear in the text.
   std::size_t mentioned = data.ConsumeIntegralInRange<std::size_t>(0, kFlood + kMostArguments);
   std::string format;
   const auto mention = [&](const char* directive, const std::string& text) {
@@ -156,7 +156,7 @@ Call someCall(FuzzedDataProvider& data) {
       mention("%.2f", printed(static_cast<double>(i) + 0.5));
     }
   }
-  // Where a text moves, so would what an argument points to.
+  // The vector must not grow, since arguments point into its texts.
   call.texts.reserve(kMostArguments);
   const auto argumentCount = data.ConsumeIntegralInRange<std::size_t>(0, kMostArguments);
   // Kinds may end before the arguments do.
@@ -184,7 +184,7 @@ Call someCall(FuzzedDataProvider& data) {
       case 2: {
         bool isSafe = false;
         const Ref<rt::Object> object = someObject(data, isSafe);
-        // An object may pass for a pointer, too, and is none to be kept then.
+        // An object may also have the kind of a pointer. It is not a safe parameter then.
         kind = data.ConsumeIntegralInRange(0, 3) != 0 ? 1 : data.PickValueInArray(kIntegerKinds);
         if (kind == 1 && isSafe && i < kindCount)
           call.safeParameters.emplace(static_cast<std::int32_t>(call.kinds.size()), object.get());
@@ -212,12 +212,12 @@ Call someCall(FuzzedDataProvider& data) {
   }
   call.count = static_cast<std::int32_t>(call.kinds.size());
   if (data.ConsumeIntegralInRange(0, 15) == 0) {
-    // None is looked at then.
+    // LUMLog reads no kinds then.
     call.count = data.ConsumeIntegralInRange<std::int32_t>(INT32_MIN, 0);
     call.kinds = {};
     call.safeParameters.clear();
   }
-  // Just the size, so that a look beyond the end is noticed.
+  // Exactly this size, so that the sanitizer notices reads past the end.
   call.kinds.shrink_to_fit();
   if (data.ConsumeIntegralInRange(0, 7) != 0) call.format = rt::String::fromUTF8(format);
   return call;
@@ -226,7 +226,7 @@ Call someCall(FuzzedDataProvider& data) {
 }  // namespace
 
 extern "C" int LLVMFuzzerInitialize(int*, char***) {
-  // Messages go on their way, and end there.
+  // Messages pass through the multiplexer, and the filter drops them.
   LUMLogMultiplexer::sharedInstance()->addSyncLogger(
       LUMSystemLogger::initWithFilter(LUMLogDropAllFilter::init()));
   return 0;

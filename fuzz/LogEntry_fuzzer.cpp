@@ -1,6 +1,6 @@
-// Entries of the system's log as they leave the process. What the journal is handed, as a datagram or, where
-// that would be too large, as a file, parses back to the fields that went in. What the classic daemon is
-// handed is the text in readable lines, in packets of a bounded length with no character cut in two.
+// Checks entries of the system's log as they leave the process. The journal gets a datagram, or a file if
+// that would be too large. Both must parse back to the fields of the entry. The classic daemon must get the
+// text with control characters escaped, in packets of bounded length that cut no character in two.
 #include <fuzzer/FuzzedDataProvider.h>
 #include <sys/socket.h>
 #include <sys/uio.h>
@@ -34,11 +34,11 @@ void require(bool condition) {
   if (!condition) std::abort();
 }
 
-/// The daemon's end.
+// The daemon's end.
 struct Daemon {
-  /// Longer datagrams are refused.
+  // Longer datagrams are refused.
   std::size_t longestDatagram = 0;
-  /// How much a file takes at a time.
+  // How many bytes one write to a file takes.
   std::size_t longestWrite = 0;
   std::vector<std::string> received;
 };
@@ -64,7 +64,7 @@ std::string contentOf(int file) {
 
 }  // namespace
 
-// These stand before the C library's.
+// These functions replace those of the C library.
 extern "C" ssize_t sendmsg(int /*socket*/, const msghdr* message, int /*flags*/) {
   std::string bytes = joined(message->msg_iov, message->msg_iovlen);
   if (const cmsghdr* control = CMSG_FIRSTHDR(message); control != nullptr) {
@@ -92,7 +92,7 @@ namespace {
 
 using Fields = std::vector<std::pair<std::string, std::string>>;
 
-/// The fields of what the journal was handed, as its documentation says how to read them.
+// Parses what the journal was given, as the journal's documentation describes it.
 Fields parsed(std::string_view bytes) {
   Fields fields;
   const auto take = [&bytes](std::size_t length) {
@@ -166,7 +166,7 @@ void checkSyslog(const LogEntry& entry) {
   require(rt::detail::writeToSyslog(entry, {}) == Delivery::done);
   const std::string name = std::string(program_invocation_short_name).substr(0, 32);
   const std::string sender = " " + readable(name) + "[" + std::to_string(getpid()) + "]: ";
-  // "Nov  2 12:34:56", after the priority.
+  // The head is the priority, a time such as "Nov  2 12:34:56", and the sender.
   const std::string priority = "<" + std::to_string(8 + std::stoi(severity(entry))) + ">";
   const std::size_t headLength = priority.size() + 15 + sender.size();
   std::string expected = readable(entry.text);
@@ -183,7 +183,7 @@ void checkSyslog(const LogEntry& entry) {
     body += piece;
   }
   require(body == expected);
-  // None is shorter than it must be, where there are characters to be kept together.
+  // A packet is shorter than the limit by at most the 3 bytes of an incomplete character.
   require(daemon_.received.size() <= expected.size() / (1024 - headLength - 3) + 1 ||
           !rt::isValidUTF8(expected));
 }
@@ -206,7 +206,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t siz
   const std::string part = data.ConsumeRemainingBytesAsString();
   std::string text;
   for (std::size_t i = 0; i < repetitions; ++i) text += part;
-  // Any of them may be what is too long to be copied.
+  // The subsystem may also be the value that is too long to be copied.
   if (repetitions % 3 == 0) std::swap(subsystem, text);
   entry.subsystem = subsystem;
   entry.category = category;

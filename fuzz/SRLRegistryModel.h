@@ -1,6 +1,6 @@
 #pragma once
 
-// What registries do with records, in maps and without any care for time.
+// A model of what registries do with records. It uses maps and ignores speed.
 
 #include <cstddef>
 #include <map>
@@ -17,11 +17,11 @@
 
 using Reports = std::vector<std::string>;
 
-/// What an operation does, by the model.
+// The effects of an operation according to the model.
 struct Expected {
   Reports reports;
   std::vector<Made> made;
-  /// Of instances that scopes have: null where the factory gave none.
+  // The instances that were found in scopes. Instances for which a factory returned null are left out.
   std::vector<rt::Object*> kept;
   bool isNull = false;
   bool answer = false;
@@ -37,7 +37,7 @@ struct ModelImplementation {
   const rt::ClassInfo* type;
   const rt::ClassInfo* configuration;
 
-  /// What two implementations are equal by.
+  // Two implementations are equal if these values are.
   auto value() const {
     return std::tuple(std::string_view(record->identifier), type, record->lifetime + 0U, record->scopeType,
                       configuration, configuration != nullptr && record->isConfigurationRequired != 0);
@@ -47,12 +47,12 @@ struct ModelImplementation {
 struct ModelRegistry {
   bool isRegistered = false;
   std::map<API, std::optional<ModelImplementation>> singles;
-  /// Of one that was only asked for, there is no list.
+  // An API that was only asked for has no list.
   std::map<API, std::optional<std::vector<ModelImplementation>>> multis;
   Scopes scopes;
 };
 
-/// The registries of one input, by the plainest means.
+// The model of all registries of one input.
 class Model {
  public:
   explicit Model(const Records& records) : registries(1), records_(records) {}
@@ -61,7 +61,7 @@ class Model {
   void services(std::size_t i, API api, const Tags& tags, Expected& expected);
   void has(std::size_t i, API api, Expected& expected);
   API apiCalled(std::size_t i, std::string_view identifier) const;
-  /// Notes what an operation has made for a scope.
+  // Stores an instance in the scope that it was made for.
   void keep(const Made& each);
   void forgetPending() { pending_.clear(); }
 
@@ -76,10 +76,10 @@ class Model {
   static const rt::ClassInfo* typeCalled(const char* name, Expected& expected);
   static bool fits(API api, const rt::ClassInfo& type, Expected& expected);
   void bind(ModelRegistry& registry, const _SRLBindingRegistrationData& binding, Expected& expected);
-  /// Adds what the implementation gives; returns whether that is null.
+  // Adds the instance of the implementation to `expected`. Returns whether the instance is null.
   bool resolve(const ModelImplementation& implementation, const Tags& tags, Expected& expected);
 
   const Records& records_;
-  // By implementation, the scope that an instance is to be kept in.
+  // For each implementation, the scope in which its next instance is stored.
   std::map<std::size_t, Tags> pending_;
 };

@@ -61,7 +61,7 @@ Records::Records(FuzzedDataProvider& data) {
   static constexpr std::array<const char*, 5> kIdentifiers{"", "a", "b", "ab", "ba"};
   const auto scope = [&data] {
     const unsigned bits = data.ConsumeIntegralInRange(0U, 31U);
-    // Also the ends of the mask.
+    // The highest bit is used too.
     return static_cast<SRLScopeType>((bits & 15U) | (bits & 16U ? 0x80000000U : 0U));
   };
   apis.resize(data.ConsumeIntegralInRange<std::size_t>(1, 5));
@@ -84,7 +84,7 @@ Records::Records(FuzzedDataProvider& data) {
     implementation.identifier = data.PickValueInArray(kIdentifiers);
     implementation.factory = kFactories[i];
     makesNull[i] = data.ConsumeIntegralInRange(0, 7) == 0;
-    // Mostly a part of what an API has.
+    // Half of the implementations need only scopes of an API.
     implementation.scopeType = scope();
     if (data.ConsumeBool()) implementation.scopeType &= apis[i % apis.size()].scopeType;
     implementation.instanceTypeKind = data.ConsumeIntegralInRange(0U, 3U) & 3U;

@@ -1,6 +1,6 @@
 #pragma once
 
-// Records for a registry as an input of the fuzzer has them, and what their factories make.
+// The records that a fuzzer's input describes, and what their factories make.
 
 #include <fuzzer/FuzzedDataProvider.h>
 
@@ -25,12 +25,12 @@ class FuzzA : public rt::Implements<FuzzA, rt::Object, FuzzP> {};
 class FuzzB final : public rt::Implements<FuzzB, FuzzA> {};
 class FuzzC final : public rt::Implements<FuzzC, rt::Object> {};
 
-/// The class among these that is called `name`, or null.
+// Returns the class above with this name, or null.
 const rt::ClassInfo* classCalled(const char* name);
 
 constexpr std::size_t kMostImplementations = 8;
 
-/// What a factory was asked for, and has made: null where it makes null.
+// A call of a factory: its implementation and tags, and the instance that it made, which may be null.
 struct Made {
   std::size_t implementation;
   Tags tags;
@@ -40,13 +40,13 @@ struct Made {
     return implementation == other.implementation && tags == other.tags;
   }
 };
-/// In order, since whoever reads it cleared it.
+// The calls of factories in order, since the vector was last cleared.
 extern std::vector<Made> made;
 extern std::size_t instancesAlive;
-/// By implementation.
+// For each implementation, whether its factory returns null.
 extern std::array<bool, kMostImplementations> makesNull;
 
-/// Records as the input has them.
+// The records that the input describes.
 struct Records {
   explicit Records(FuzzedDataProvider& data);
 

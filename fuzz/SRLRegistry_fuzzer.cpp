@@ -1,6 +1,6 @@
-// Compares registries with a model made of maps, for any records and any order of requests. Both must give
-// the same instances, from the same factories and tags, and the same reports. Nothing may live that no scope
-// holds.
+// Compares registries with a model made of maps, for any records and any order of requests. Both must return
+// the same instances, from the same factories and tags, and make the same reports. No instance may outlive
+// its scope.
 #include <fuzzer/FuzzedDataProvider.h>
 
 #include <algorithm>
@@ -32,7 +32,7 @@ void require(bool condition) {
   if (!condition) std::abort();
 }
 
-/// An input's operations, on registries and on the model.
+// Performs the operations of an input, on registries and on the model.
 class Session {
  public:
   explicit Session(FuzzedDataProvider& data) : data_(data), records_(data), model_(records_) {
@@ -159,7 +159,7 @@ class Session {
     }
   }
 
-  /// Tags, which are compared by their values, as objects of their own.
+  // A tag set of new objects. Tags are compared by value.
   struct TagSet {
     explicit TagSet(const Tags& tags) {
       for (std::size_t i = 0; i < tags.size(); ++i) {
@@ -171,7 +171,7 @@ class Session {
     SRLScopeTagSet set;
   };
 
-  /// Mostly as many as the API wants, of three values.
+  // Returns tags with three possible values. Their number is mostly the one that the API requires.
   Tags someTags(const SRLAPIRegistrationData& api) {
     auto count = static_cast<std::size_t>(std::popcount(api.scopeType));
     if (count > 4 || data_.ConsumeIntegralInRange(0, 7) == 0)
@@ -181,7 +181,8 @@ class Session {
     return tags;
   }
 
-  /// Null now and then, and then with one tag too many, which `fitting` knows.
+  // Returns a wrapper of `tags`. Sometimes returns null, sometimes a wrapper with one tag too many. `fitting`
+  // returns the tags that the registry then uses.
   Ref<SRLScopeTagSetCodableWrapper> wrapperOf(const Tags& tags, Expected& expected) {
     const int kind = data_.ConsumeIntegralInRange(0, 15);
     isTooLong_ = kind == 1;
@@ -206,14 +207,15 @@ class Session {
   }
   static std::vector<rt::Object*> sorted(const Ref<rt::Array>& array) {
     std::vector<rt::Object*> instances;
-    // A null that a factory gave is in a scope, too.
+    // A scope also stores the null that a factory returned.
     for (const Ref<rt::Object>& each : *array) {
       if (each) instances.push_back(each.get());
     }
     return sorted(std::move(instances));
   }
 
-  /// That it was done as the model says, in any order of implementations; notes what was made.
+  // Requires the reports and factory calls that the model expects, in any order. Stores the new instances in
+  // the model. Returns the instances that the operation must have used.
   std::vector<rt::Object*> checkDone(const Expected& expected) {
     Reports texts;
     for (const Ref<LUMLogMessage>& message : reports_.messages()) {
@@ -256,7 +258,7 @@ class Session {
     require(checkDone(expected).empty() && instancesAlive == model_.countAlive());
   }
 
-  // What tells the reports apart.
+  // The length of a prefix that distinguishes the reports.
   static constexpr std::size_t kPrefix = 40;
 
   static TestReports& reports() {

@@ -1,5 +1,5 @@
-// Archives of tag sets: what can be read can be written, but where it repeats as much as only a longer file
-// may, and is then read as equal.
+// Reads archives of tag sets, writes the tag set, and reads it again, which must give an equal one. Writing
+// may fail only if the new archive is so short that its objects are referred to too often.
 #include <algorithm>
 #include <cstddef>
 #include <cstdint>
@@ -29,7 +29,7 @@ namespace {
 using rt::Ref;
 using Wrapper = SRLScopeTagSetCodableWrapper;
 
-// A tag that a host made up.
+// A class of tags as a host may define it.
 class Tag final : public rt::Implements<Tag, rt::Object, SRLScopeTag, rt::SecureCoding> {
  public:
   explicit Tag(rt::String name) : name_(std::move(name)) {}
@@ -52,7 +52,8 @@ void require(bool condition) {
   if (!condition) std::abort();
 }
 
-// How many objects a comparison of `object` looks at, up to a limit: few bytes can stand for millions.
+// Counts the objects that a comparison visits, up to a limit, since a few bytes can stand for millions of
+// objects.
 class Size {
  public:
   static constexpr std::size_t kLimit = 10'000;
@@ -87,7 +88,7 @@ Ref<Wrapper> read(std::span<const std::byte> bytes) {
 template struct rt::AddedClassMethod<Tag, "initWithCoder:", &rt::initWithCoder<Tag>>;
 
 extern "C" int LLVMFuzzerInitialize(int*, char***) {
-  // Reports go on their way, and end there.
+  // Reports pass through the error handler and the multiplexer, and the filter drops them.
   LUMLogMultiplexer::sharedInstance()->addSyncLogger(
       LUMSystemLogger::initWithFilter(LUMLogDropAllFilter::init()));
   PECErrorHandler::sharedInstance()->setErrorHandlerBlock([](const Ref<PECErrorDescription>&) {});
@@ -95,7 +96,7 @@ extern "C" int LLVMFuzzerInitialize(int*, char***) {
 }
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-  // A copy of just the size, so that a look beyond the end is noticed.
+  // A copy of exactly this size, so that the sanitizer notices reads past the end.
   const std::span<const std::byte> given = std::as_bytes(std::span(data, size));
   const Ref<Wrapper> wrapper = read(std::vector<std::byte>(given.begin(), given.end()));
   if (!wrapper) return 0;

@@ -1,7 +1,7 @@
-// Symbol tables in files that may say anything: what is found is what a plain reading of the same bytes
-// gives, and nothing is read that is not in the file.
+// Looks up symbols in files of any content. A simple reading of the same bytes must find the same symbol, and
+// nothing outside of the file may be read.
 //
-// An input is an address within the image, in 8 bytes, and the file that the image was loaded from.
+// An input is an address relative to the image, in 8 bytes, and the file of the image.
 #include <dlfcn.h>
 #include <elf.h>
 #include <link.h>
@@ -28,14 +28,14 @@ void require(bool condition) {
 
 constexpr std::uint64_t kBias = 0x7000'0000'0000;
 
-/// The one image that is loaded while there is a table to look at; the process's own are hidden then.
+// The image that the process seems to have loaded, instead of its own images, while a look-up runs.
 struct LoadedImage {
   std::string path;
   std::vector<Elf64_Phdr> headers;
 };
 thread_local const LoadedImage* loadedImage = nullptr;
 
-/// A file as a table of bytes, read piece by piece.
+// A file in memory, from which values are read one at a time.
 class File {
  public:
   explicit File(std::string_view bytes) : bytes_(bytes) {}
@@ -48,7 +48,7 @@ class File {
     return value;
   }
 
-  /// All `count` values, or none where one of them is not there.
+  // Returns all `count` values, or no values if the file is too short for them.
   template <class Value>
   std::vector<Value> all(std::uint64_t offset, std::uint64_t count) const {
     std::vector<Value> values;
@@ -64,13 +64,13 @@ class File {
   std::string_view bytes_;
 };
 
-/// The program headers, as the system would have them from a file that was whole when it was loaded.
+// Returns the program headers that the system would have after loading this file.
 std::vector<Elf64_Phdr> programHeaders(const File& file) {
   const auto header = file.at<Elf64_Ehdr>(0);
   return header ? file.all<Elf64_Phdr>(header->e_phoff, header->e_phnum) : std::vector<Elf64_Phdr>();
 }
 
-/// The first function of the file's first table of symbols that has `address`; its name and its start.
+// The first function in the file's first symbol table that contains an address.
 struct Function {
   std::string name;
   std::uint64_t start = 0;
@@ -91,7 +91,7 @@ Function functionAt(const File& file, std::uint64_t address) {
     const auto names = file.all<char>(text.sh_offset, text.sh_size);
     for (const Elf64_Sym& symbol : file.all<Elf64_Sym>(section.sh_offset, section.sh_size / 24)) {
       if (symbol.st_info % 16 != STT_FUNC || symbol.st_shndx == 0 || symbol.st_name >= names.size()) continue;
-      // One that goes over the end of all addresses goes on at 0.
+      // A function may extend over the highest address and continue at 0.
       if (address - symbol.st_value >= symbol.st_size) continue;
       const auto start = names.begin() + symbol.st_name;
       return {{start, std::find(start, names.end(), '\0')}, symbol.st_value};
@@ -103,7 +103,7 @@ Function functionAt(const File& file, std::uint64_t address) {
 
 }  // namespace
 
-// Stands before the C library's.
+// Replaces the function of the C library.
 extern "C" int dl_iterate_phdr(int (*visit)(dl_phdr_info*, std::size_t, void*), void* context) {
   if (loadedImage == nullptr) {
     using Iterate = int(int (*)(dl_phdr_info*, std::size_t, void*), void*);
@@ -125,19 +125,20 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size
   const std::string bytes(reinterpret_cast<const char*>(data) + sizeof offset, size - sizeof offset);
   const File file(bytes);
 
-  // One file for all inputs, of just the size.
+  // All inputs use one file, which gets exactly the input's size.
   static const int descriptor = memfd_create("image", MFD_CLOEXEC);
   require(ftruncate(descriptor, 0) == 0);
   require(pwrite(descriptor, bytes.data(), bytes.size(), 0) == static_cast<ssize_t>(bytes.size()));
   LoadedImage image{"/proc/self/fd/" + std::to_string(descriptor), programHeaders(file)};
-  // The program headers are the loader's, which has refused a file that says where it lies itself.
+  // Leaves out files with a header PT_PHDR. The look-up would take the bias from the place of these headers
+  // in memory, which no loader has chosen.
   const bool hasSelf = std::ranges::any_of(image.headers, [](auto& each) { return each.p_type == PT_PHDR; });
   if (hasSelf) return 0;
 
   rt::detail::SymbolTables tables;
   loadedImage = &image;
   const auto symbol = tables.find(kBias + offset);
-  // Once more, from what was kept.
+  // The second look-up uses the table that the first has read.
   const auto again = tables.find(kBias + offset);
   loadedImage = nullptr;
 

@@ -1,4 +1,5 @@
-// UTF-8 against a model that knows nothing of ranges: the set of what all characters begin with.
+// Compares the UTF-8 functions with a model that has no ranges, only the sets of all encoded characters and
+// of all their beginnings.
 #include <array>
 #include <cstddef>
 #include <cstdint>
@@ -17,7 +18,7 @@ void require(bool condition) {
   if (!condition) std::abort();
 }
 
-/// `character` by the definition of the encoding, with division instead of masks and shifts.
+// Encodes `character` by the definition, with division instead of masks and shifts.
 std::string encode(std::uint32_t character) {
   const auto byte = [](std::uint32_t value) { return static_cast<char>(static_cast<unsigned char>(value)); };
   if (character < 128) return {byte(character)};
@@ -42,7 +43,7 @@ struct Model {
     }
   }
 
-  /// The length of the character that `bytes` begin with, or 0.
+  // Returns the length of the character at the start of `bytes`, or 0.
   std::size_t character(std::string_view bytes) const {
     for (std::size_t length = 1; length <= 4 && length <= bytes.size(); ++length) {
       if (characters.contains(std::string(bytes.substr(0, length)))) return length;
@@ -81,14 +82,14 @@ const Model& model() {
 
 }  // namespace
 
-// The model takes seconds to build, which are not the first input's.
+// Builds the model before the first input, since that takes seconds.
 extern "C" int LLVMFuzzerInitialize(int*, char***) {
   model();
   return 0;
 }
 
 extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* data, std::size_t size) {
-  // A copy of just the size, so that a look beyond the end is noticed.
+  // A copy of exactly this size, so that the sanitizer notices reads past the end.
   const std::string copy(reinterpret_cast<const char*>(data), size);
   const std::string_view bytes = copy;
 

@@ -1,15 +1,17 @@
-// The command's memory: handed out from one piece, front to back, and never taken back. The C library's
-// own allocator does as a dozen environment variables say, some of which end the process; a command that
-// may run with raised privileges listens to none. It runs for a millisecond and allocates a handful of
-// blocks, the largest of which holds an argument, at most 128 KiB. The C++ library reserves 71 KiB for
-// exceptions. The C library and the libraries that the command carries take about 3 KiB when they are loaded.
+// The command's allocator. It takes memory from the front of one block and never takes memory back.
 //
-// One variable remains: without raised privileges the C library takes LD_LIBRARY_PATH apart before `main`,
-// and ends the process where more than about 2,000 different directories in it leave no memory. With raised
-// privileges it ignores the variable.
+// A dozen environment variables control the C library's allocator, and some of them end the process. A
+// command that may run with raised privileges must not obey any. The command runs for a millisecond and
+// allocates a few blocks. The largest holds an argument, of at most 128 KiB. The C++ library reserves 71 KiB
+// for exceptions. The C library and the libraries that the command carries allocate about 3 KiB when they are
+// loaded.
 //
-// These are all the functions of an allocator that anything in the command refers to. Were there another,
-// the linker would take the C library's allocator for it, and complain that it finds these twice.
+// One variable remains. Without raised privileges the C library splits LD_LIBRARY_PATH before `main`. It ends
+// the process if more than about 2,000 different directories in it use up the memory. With raised privileges
+// it ignores the variable.
+//
+// These are all the allocation functions that the command refers to. If it referred to another one, the
+// linker would add the C library's allocator and report duplicate definitions.
 
 #include <algorithm>
 #include <cerrno>
@@ -21,11 +23,11 @@ namespace {
 
 constexpr std::size_t kAlignment = alignof(std::max_align_t);
 
-// Pages that are not used cost nothing, but the caller's limits on memory count them.
+// Unused pages cost nothing, but count against the caller's limits on memory.
 alignas(kAlignment) constinit unsigned char memory[std::size_t{256} << 10] = {};
 constinit std::size_t used = 0;
 
-// The size of a block stands before it, for `realloc`.
+// Stands before each block and keeps its size for `realloc`.
 struct alignas(kAlignment) Header {
   std::size_t size;
 };
@@ -54,7 +56,7 @@ void* malloc(std::size_t size) noexcept {
 
 void free(void* /*block*/) noexcept {}
 
-// Memory that was never used is zero.
+// Memory that was never used is zero, so nothing is cleared.
 void* calloc(std::size_t count, std::size_t size) noexcept {
   if (size != 0 && count > sizeof memory / size) {
     errno = ENOMEM;

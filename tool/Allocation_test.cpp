@@ -1,6 +1,6 @@
-// The command's own allocator: the file that is linked into the command, with its functions under other
-// names, so that this program keeps its own. Every call takes some of one piece of memory for good, so
-// whatever needs to know how much is left runs in a process of its own.
+// Tests the object file of the command's allocator. Its functions have other names here, so that this program
+// keeps its own allocator. Every call uses up memory for good. Tests that need to know how much is left
+// therefore run in a process of their own.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -40,7 +40,7 @@ bool isAligned(const void* block, std::size_t alignment) {
   return reinterpret_cast<std::uintptr_t>(block) % alignment == 0;
 }
 
-TEST(AllocationTest, GivesBlocksThatAreAlignedAndApart) {
+TEST(AllocationTest, ReturnsAlignedBlocksThatDoNotOverlap) {
   std::array<void*, 40> blocks{};
   for (std::size_t size = 0; size < blocks.size(); ++size) {
     blocks[size] = command_malloc(size);
@@ -53,7 +53,7 @@ TEST(AllocationTest, GivesBlocksThatAreAlignedAndApart) {
   }
 }
 
-TEST(AllocationTest, KeepsABlockThatWasGivenBack) {
+TEST(AllocationTest, DoesNotReuseAFreedBlock) {
   void* const block = command_malloc(100);
   fill(block, 100, 7);
   command_free(block);
@@ -62,7 +62,7 @@ TEST(AllocationTest, KeepsABlockThatWasGivenBack) {
   EXPECT_THAT(bytes(block, 100), Each(7));
 }
 
-TEST(AllocationTest, GivesZeroesForEachOfManyObjects) {
+TEST(AllocationTest, CallocClearsEveryObject) {
   void* const before = command_malloc(1000);
   fill(before, 1000, 0xff);
   command_free(before);
@@ -77,17 +77,17 @@ TEST(AllocationTest, GivesZeroesForEachOfManyObjects) {
   EXPECT_NE(command_calloc(SIZE_MAX, 0), nullptr);
 }
 
-// The product of these is 2, as numbers of this size go.
-TEST(AllocationTest, RefusesMoreObjectsThanCanBeCounted) {
+// As a number of this size, their product is 2.
+TEST(AllocationTest, CallocDetectsOverflow) {
   errno = 0;
   EXPECT_EQ(command_calloc(SIZE_MAX / 2 + 2, 2), nullptr);
   EXPECT_EQ(errno, ENOMEM);
 }
 
-TEST(AllocationTest, CopiesWhatFitsWhenABlockIsResized) {
+TEST(AllocationTest, ReallocCopiesWhatFits) {
   void* const block = command_malloc(48);
   fill(block, 48, 7);
-  fill(command_malloc(48), 48, 8);  // what a copy that goes too far would find
+  fill(command_malloc(48), 48, 8);  // a copy that goes too far would find this
 
   void* const larger = command_realloc(block, 200);
   ASSERT_NE(larger, nullptr);
@@ -102,7 +102,7 @@ TEST(AllocationTest, CopiesWhatFitsWhenABlockIsResized) {
   EXPECT_THAT(bytes(larger, 48), Each(7));
 }
 
-TEST(AllocationTest, KnowsTheSizeOfEachBlockThatIsResized) {
+TEST(AllocationTest, ReallocKnowsTheSizeOfEachBlock) {
   void* const zeroes = command_calloc(4, 12);
   void* const aligned = command_aligned_alloc(256, 48);
   for (void* const block : {zeroes, aligned, command_realloc(zeroes, 48)}) {
@@ -114,13 +114,13 @@ TEST(AllocationTest, KnowsTheSizeOfEachBlockThatIsResized) {
   }
 }
 
-TEST(AllocationTest, GivesANewBlockWhereThereIsNoneToResize) {
+TEST(AllocationTest, ReallocOfNullReturnsANewBlock) {
   void* const block = command_realloc(nullptr, 100);
   ASSERT_NE(block, nullptr);
   EXPECT_THAT(bytes(block, 100), Each(0));
 }
 
-TEST(AllocationTest, AlignsAsIsAskedAndNeverLessThanEver) {
+TEST(AllocationTest, AlignsAsRequestedAndAtLeastAsUsual) {
   for (std::size_t alignment = 1; alignment <= 4096; alignment *= 2) {
     void* const before = command_malloc(1);
     fill(before, 1, 5);
@@ -133,7 +133,7 @@ TEST(AllocationTest, AlignsAsIsAskedAndNeverLessThanEver) {
   }
 }
 
-TEST(AllocationTest, RefusesSizesAndAlignmentsThatNothingHolds) {
+TEST(AllocationTest, RefusesSizesAndAlignmentsThatDoNotFit) {
   for (const std::size_t size : {SIZE_MAX, SIZE_MAX - kHeader, SIZE_MAX / 2, kPiece + 1, kPiece}) {
     errno = 0;
     EXPECT_EQ(command_malloc(size), nullptr) << size;
@@ -144,21 +144,21 @@ TEST(AllocationTest, RefusesSizesAndAlignmentsThatNothingHolds) {
   for (std::size_t alignment = std::size_t{1} << 63; alignment >= 2 * kPiece; alignment /= 2) {
     errno = 0;
     void* const block = command_aligned_alloc(alignment, 1);
-    // By chance the piece may lie where such an alignment is to be had.
+    // The memory may happen to lie at such an alignment.
     if (block != nullptr) continue;
     EXPECT_EQ(errno, ENOMEM) << alignment;
   }
   EXPECT_NE(command_malloc(1), nullptr);
 }
 
-TEST(AllocationTest, LeavesABlockAloneThatCannotBeResized) {
+TEST(AllocationTest, ReallocKeepsABlockThatItCannotResize) {
   void* const block = command_malloc(10);
   fill(block, 10, 7);
   EXPECT_EQ(command_realloc(block, SIZE_MAX), nullptr);
   EXPECT_THAT(bytes(block, 10), Each(7));
 }
 
-// Exits with 0 where the first block begins and the last one ends with the piece.
+// Exits with 0 if the first block begins at the start of the memory and the last one ends at its end.
 [[noreturn]] void takeAll() {
   auto* const first = static_cast<unsigned char*>(command_malloc(0));
   std::size_t size = kPiece;
@@ -171,8 +171,8 @@ TEST(AllocationTest, LeavesABlockAloneThatCannotBeResized) {
   std::_Exit(isWhole && isExhausted ? 0 : 1);
 }
 
-TEST(AllocationDeathTest, GivesAllOfItsPieceAndNoMore) {
-  // As its own program from the start, so that nothing has been taken yet.
+TEST(AllocationDeathTest, HandsOutAllOfItsMemoryAndNoMore) {
+  // The test program is started anew, so that no memory has been taken yet.
   GTEST_FLAG_SET(death_test_style, "threadsafe");
   EXPECT_EXIT(takeAll(), testing::ExitedWithCode(0), "");
 }

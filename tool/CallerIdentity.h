@@ -1,16 +1,22 @@
 #pragma once
 
-/// Lets the calling thread meet the file system as its caller, the real user and group of the process, in all
-/// that follows: what it writes, and what `CallersDirectory.h` offers.
+/// Takes on the caller's identity: from now on the calling thread acts as its caller towards the file system.
+/// The caller is the real user and group of the process. This covers everything that the thread writes, and
+/// the functions of `CallersDirectory.h`.
 ///
-/// On Linux the caller may then write in any directory: new files belong to the caller, and of all
-/// capabilities only CAP_DAC_OVERRIDE is left, effective and permitted. There is no way back. Changes nothing
-/// in three cases: CAP_CHOWN is not effective; CAP_DAC_OVERRIDE is not permitted; the system refuses a step,
-/// as a filter of system calls may.
+/// On Linux the caller may then write in any directory, and new files belong to the caller. CAP_DAC_OVERRIDE
+/// is the only capability left, both effective and permitted. There is no way back. Nothing changes in three
+/// cases:
 ///
-/// On macOS the effective user and group become the real ones, and the saved user stays root. Changes nothing
-/// where the effective user is not root.
+/// - CAP_CHOWN is not effective.
+/// - CAP_DAC_OVERRIDE is not permitted.
+/// - The system refuses a step, as a filter of system calls may.
 ///
-/// A caller whom nobody disturbs gets the same results with it and without. Changes `errno`. Thread-safe on
-/// Linux, where the real, effective and saved identifiers of the process stay; not on macOS.
+/// On macOS the effective user and group become the real ones, and the saved user stays root. Nothing changes
+/// if the effective user is not root.
+///
+/// If nothing else interferes, the caller gets the same results with and without this call. Changes `errno`.
+///
+/// Threads: thread-safe on Linux, where the process keeps its real, effective and saved identifiers. Not
+/// thread-safe on macOS.
 void takeOnCallersIdentity();

@@ -3,29 +3,31 @@
 #include <cstdint>
 #include <string>
 
-/// What came of making a directory for the caller.
+/// The result of making a directory for the caller.
 enum class Making : std::uint8_t {
-  /// The directory is there and is the caller's.
+  /// The directory exists and belongs to the caller.
   done,
-  /// There is no new directory; `errno` tells why.
+  /// No directory was made. `errno` says why.
   notMade,
-  /// The directory is there, but was not handed over; `errno` tells why. It stays.
+  /// The directory was made but not handed over, and it stays. `errno` says why.
   notHandedOver,
 };
 
-/// Makes the directory at `path` and hands it to the real user and group of the process: the caller, on whose
-/// behalf the program may run with raised privileges. The mode is 0700 less the umask. Where the parent has a
-/// default access control list, it is what that leaves of 0700.
+/// Makes the directory at `path` and hands it to the caller, that is, the real user and group of the process.
+/// The program may run with raised privileges on the caller's behalf. The mode is 0700 less the umask. If the
+/// parent has a default access control list, the list replaces the umask.
 ///
-/// Precondition: the calling thread has taken the identity of its caller on (`CallerIdentity.h`).
+/// Precondition: the calling thread has taken on the identity of its caller (`CallerIdentity.h`).
 ///
-/// The caller may stop the process between any two of its steps, and wait until something else stands at
-/// `path`. That never becomes the caller's. docs/security.md tells how, and where this does not hold.
+/// The caller may stop the process between any two steps, and wait until something else is at `path`. The
+/// caller never gets that. docs/security.md explains how this is prevented, and where it is not.
 ///
-/// Not thread-safe.
+/// Threads: not thread-safe.
 Making makeCallersDirectory(const std::string& path);
 
-/// Removes the empty directory at `path`. Returns false where the system refuses; `errno` tells why.
+/// Removes the empty directory at `path`. Returns false if the system refuses; `errno` says why.
 ///
-/// Precondition: the calling thread has taken the identity of its caller on. Not thread-safe.
+/// Precondition: the calling thread has taken on the identity of its caller.
+///
+/// Threads: not thread-safe.
 bool removeCallersDirectory(const std::string& path);

@@ -1,3 +1,15 @@
+// Calls the file system directly. Tests run the program in a root file system of its own, where the real
+// calls are harmless.
+//
+// Writes messages with <cstdio>. Streams would set up a locale and eight objects before `main`, for a program
+// that prints at most one line. `stderr` is unbuffered, and glibc hands one `fprintf` of up to 8 KiB to the
+// kernel in one `write`. So the lines of commands that run at the same time do not mix.
+//
+// The exit status is `errno` after the message. If the message cannot be written, `write` has replaced
+// `errno`, and the status tells that failure instead.
+//
+// SIGPIPE keeps its default. A caller that ignores it gets EPIPE as the status.
+
 #include "MountPointCommand.h"
 
 #include <cerrno>
@@ -11,8 +23,8 @@
 
 namespace {
 
-// Writes "Failed to `action` [`path`], errno: `errno`" and gives the exit status: `errno` as it is
-// after the message.
+// Writes "Failed to `action` [`path`], errno: `errno`" and returns the exit status: `errno` as it is after
+// the message.
 int reportFailure(const char* action, const std::string& path) {
   std::fprintf(stderr, "Failed to %s [%s], errno: %d\n", action, path.c_str(), errno);
   std::fflush(stderr);
@@ -46,11 +58,11 @@ int removeDirectory(const std::string& path) {
 }  // namespace
 
 int runMountPointCommand(int argumentCount, const char* const* arguments) {
-  // Before any message: root's rights to write are not for the caller's bytes.
+  // Comes before any message, so that the caller's text is never written with root's rights.
   takeOnCallersIdentity();
 
-  // A message that the caller's limit on the size of files cuts short shows in the status, as EFBIG. By
-  // default the signal would end the process and leave no status at all.
+  // If the caller's limit on file size cuts a message short, the status shows that as EFBIG. By default the
+  // signal would end the process without a status.
   std::signal(SIGXFSZ, SIG_IGN);
 
   if (argumentCount <= 1) {
@@ -61,7 +73,7 @@ int runMountPointCommand(int argumentCount, const char* const* arguments) {
 
   const char* const subdirectory = arguments[1];
   if (std::string_view(subdirectory).find('/') != std::string_view::npos) {
-    // Unlike every other message this one ends without a newline; callers compare it as it stands.
+    // Unlike every other message, this one has no line feed at its end. Callers compare it byte by byte.
     std::fprintf(stderr, "The specified subdirectory is not valid: %s", subdirectory);
     return EINVAL;
   }

@@ -6,15 +6,15 @@
 
 namespace {
 
-// A parent may start a program with no arguments at all, not even its name. Newer kernels add an
-// empty name, so only a direct call shows that such a command line is read no further than it goes.
-TEST(MountPointCommandTest, ReadsNoArgumentWhereThereIsNone) {
+// A parent may start a program without any arguments, not even its name. Newer kernels then add an empty
+// name. So only a direct call shows that no argument is read beyond the end.
+TEST(MountPointCommandTest, ReadsNoArgumentBeyondTheEnd) {
   testing::internal::CaptureStderr();
   EXPECT_EQ(runMountPointCommand(0, nullptr), EINVAL);
   EXPECT_EQ(testing::internal::GetCapturedStderr(), "No subdirectory specified.\n");
 }
 
-TEST(MountPointCommandTest, ReportsANameWithASlashWithoutANewline) {
+TEST(MountPointCommandTest, ReportsANameWithASlashWithoutALineFeed) {
   const char* const arguments[] = {"mount-point", "a/b", "--remove", nullptr};
   testing::internal::CaptureStderr();
   EXPECT_EQ(runMountPointCommand(3, arguments), EINVAL);

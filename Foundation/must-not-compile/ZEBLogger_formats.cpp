@@ -1,5 +1,5 @@
-// Literal formats that their arguments do not fit, at each way to log. What can be wrong with a format is
-// tried where formats are.
+// Literal formats that do not fit their arguments, in each way to log. Other mistakes in formats are tested
+// with the formats (Runtime/Text).
 #include "Foundation/ZEBLoggerMacroHelpers.h"
 
 using namespace rt::literals;

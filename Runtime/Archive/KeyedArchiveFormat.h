@@ -2,6 +2,9 @@
 
 // What the writer and the reader of keyed archives agree on. Runtime/Archive/KeyedArchiver.h describes it.
 
+// The size of an object in an archive is bounded (`maximumSize`). Otherwise a few thousand bytes could hold
+// objects of a few hundred levels, each referring twice to the next. Hashing them would take forever.
+
 #include <cstddef>
 #include <cstdint>
 #include <string>

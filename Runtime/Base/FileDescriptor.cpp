@@ -11,7 +11,8 @@
 namespace rt {
 
 FileDescriptor::~FileDescriptor() {
-  // Not again after EINTR: the descriptor is gone and may be another thread's by then.
+  // `close` is not repeated after EINTR. The descriptor is closed by then, and another thread may have its
+  // number.
   if (descriptor_ >= 0) ::close(descriptor_);
 }
 
@@ -32,7 +33,7 @@ void FileDescriptor::write(std::string_view bytes) const {
       bytes.remove_prefix(static_cast<std::size_t>(count));
       continue;
     }
-    // A device that takes nothing and complains of nothing would be asked for ever.
+    // A write of 0 bytes counts as an error. Otherwise a device that takes nothing would be asked for ever.
     const int error = count == 0 ? EIO : errno;
     if (error == EAGAIN) {
       pollfd ready{descriptor_, POLLOUT, 0};

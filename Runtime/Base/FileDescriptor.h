@@ -1,13 +1,15 @@
 #pragma once
 
-/// An open file, closed when it goes out of scope.
+/// An open file descriptor that is closed at the end of its scope.
 ///
 ///     auto file = rt::FileDescriptor::open("/var/log/a.log", O_WRONLY | O_APPEND | O_CREAT, 0644);
 ///     file.write("whole\n");
 ///
-/// Interrupted calls are taken up again and short writes continued. Failures are std::system_error.
+/// Interrupted calls are repeated, and short writes are continued.
 ///
-/// Not for: a file that is shared (Runtime/Process/FileHandle.h).
+/// Errors: failures are std::system_error.
+///
+/// Not for: a file that threads share (Runtime/Process/FileHandle.h).
 
 #include <sys/types.h>
 
@@ -17,31 +19,32 @@
 
 namespace rt {
 
-/// As safe as an integer: one thread at a time.
+/// Threads: one thread at a time uses a `FileDescriptor`, as it would use an integer.
 class FileDescriptor {
  public:
-  /// None.
+  /// Makes an object without a descriptor.
   FileDescriptor() noexcept = default;
-  /// Takes over `descriptor`; -1 is none.
+  /// Takes ownership of `descriptor`. -1 stands for no descriptor.
   explicit FileDescriptor(int descriptor) noexcept : descriptor_(descriptor) {}
   FileDescriptor(FileDescriptor&& other) noexcept : descriptor_(std::exchange(other.descriptor_, -1)) {}
+  /// Swaps the descriptors. `other` closes the previous one at its end.
   FileDescriptor& operator=(FileDescriptor&& other) noexcept {
     std::swap(descriptor_, other.descriptor_);
     return *this;
   }
   ~FileDescriptor();
 
-  /// Opens `path` with `flags` (O_CLOEXEC is added) and, for a file that is made, `mode`. Throws
-  /// std::system_error that names the path; std::invalid_argument for a path with a NUL in it.
+  /// Opens `path` with `flags` and O_CLOEXEC. A file that is created gets `mode`. Throws a std::system_error
+  /// that names the path. Throws std::invalid_argument if the path has a NUL in it.
   static FileDescriptor open(const std::string& path, int flags, mode_t mode = 0);
 
-  /// The descriptor, or -1.
+  /// Returns the descriptor, or -1.
   int get() const noexcept { return descriptor_; }
-  /// Gives up the descriptor, which is the caller's to close from now on.
+  /// Gives up the descriptor and returns it, or -1. The caller has to close it.
   int release() noexcept { return std::exchange(descriptor_, -1); }
   explicit operator bool() const noexcept { return descriptor_ >= 0; }
 
-  /// Writes all of `bytes`. A descriptor that does not block is waited for. Throws std::system_error; some
+  /// Writes all of `bytes`. Waits for room if the descriptor is non-blocking. Throws std::system_error. Some
   /// of the bytes may have been written then.
   void write(std::string_view bytes) const;
 

@@ -36,13 +36,13 @@ class FileDescriptor : public testing::Test {
   std::array<int, 2> ends_{-1, -1};
 };
 
-TEST_F(FileDescriptor, IsClosedByWhoeverHasItLast) {
+TEST_F(FileDescriptor, IsClosedByItsLastOwner) {
   const int number = ends_[1];
   {
     rt::FileDescriptor first = takeWriter();
     EXPECT_EQ(first.get(), number);
     rt::FileDescriptor second = std::move(first);
-    EXPECT_FALSE(first);  // NOLINT(bugprone-use-after-move): it has none
+    EXPECT_FALSE(first);  // NOLINT(bugprone-use-after-move): moving leaves no descriptor
     rt::FileDescriptor third;
     third = std::move(second);
     EXPECT_TRUE(third);
@@ -51,12 +51,12 @@ TEST_F(FileDescriptor, IsClosedByWhoeverHasItLast) {
   EXPECT_FALSE(isOpen(number));
 }
 
-TEST_F(FileDescriptor, IsNotLeftToOtherPrograms) {
+TEST_F(FileDescriptor, IsClosedInOtherPrograms) {
   const rt::FileDescriptor file = rt::FileDescriptor::open("/dev/null", O_RDONLY);
   EXPECT_EQ(fcntl(file.get(), F_GETFD), FD_CLOEXEC);
 }
 
-TEST_F(FileDescriptor, NamesWhatCannotBeOpened) {
+TEST_F(FileDescriptor, NamesThePathThatCannotBeOpened) {
   try {
     rt::FileDescriptor::open("/no/such/file", O_RDONLY);
     FAIL() << "it was opened";
@@ -66,13 +66,13 @@ TEST_F(FileDescriptor, NamesWhatCannotBeOpened) {
   }
 }
 
-// The system would read no further than that.
+// The system would not read the path beyond the NUL.
 TEST_F(FileDescriptor, RefusesAPathWithANul) {
   EXPECT_THROW(rt::FileDescriptor::open(std::string("/dev/null\0x", 11), O_RDONLY), std::invalid_argument);
 }
 
-// More than a pipe has room for: it is written as there comes to be room.
-TEST_F(FileDescriptor, WaitsForRoomWhereThereIsNone) {
+// The text is longer than a pipe has room for, so it is written in several pieces.
+TEST_F(FileDescriptor, WaitsForRoomToWrite) {
   const std::string text(1'000'000, 'x');
   std::string read;
   rt::FileDescriptor writer = takeWriter();
@@ -89,7 +89,7 @@ TEST_F(FileDescriptor, WaitsForRoomWhereThereIsNone) {
   EXPECT_EQ(read, text);
 }
 
-TEST_F(FileDescriptor, SaysThatItCannotWrite) {
+TEST_F(FileDescriptor, ThrowsIfItCannotWrite) {
   const rt::FileDescriptor reader(std::exchange(ends_[0], -1));
   try {
     reader.write("text");

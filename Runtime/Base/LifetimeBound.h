@@ -1,6 +1,7 @@
 #pragma once
 
-/// An annotation by which clang sees, while compiling, that a reference outlives what it refers into.
+/// An annotation with which clang reports, at compile time, a reference that outlives the object it refers
+/// into.
 ///
 ///     class Account {
 ///      public:
@@ -9,12 +10,12 @@
 ///
 ///     const rt::Array& names = Account().names();      // clang: the account is gone by then
 ///
-/// Elsewhere it is nothing.
+/// Other compilers ignore it.
 ///
 /// Not for: pointers to objects that something else keeps alive.
 
 #if defined(__clang__)
-/// After a member function: what it returns refers into the object that it is called on.
+/// Write it after a member function that returns a reference into its object.
 #define RT_LIFETIME_BOUND [[clang::lifetimebound]]
 #else
 #define RT_LIFETIME_BOUND

@@ -1,13 +1,13 @@
 #pragma once
 
-/// The clock for durations: raw nanoseconds that only go forward.
+/// A clock for durations: raw nanoseconds that never go back.
 ///
 ///     const std::uint64_t start = rt::MonotonicClock::nanoseconds();
 ///     work();
 ///     const std::uint64_t duration = rt::MonotonicClock::nanoseconds() - start;
 ///
-/// Nobody sets it and nothing slews it, so that two durations can be compared. Where it starts is not
-/// defined. The time in which the machine sleeps is counted on macOS, not on Linux.
+/// Nobody sets the clock and nothing slews it, so durations can be compared. Its starting point is not
+/// defined. On macOS it counts the time in which the machine sleeps. On Linux it does not.
 ///
 /// Not for: the time of day (Runtime/Text/LocalTimeFormatter.h).
 
@@ -16,8 +16,10 @@
 
 namespace rt::MonotonicClock {
 
-/// The clock, in nanoseconds. Any thread may call it; it allocates nothing and, where the system maps its
-/// clocks into the process, as Linux and macOS do, asks the kernel nothing.
+/// Returns the clock's time in nanoseconds. Allocates nothing. Does not call the kernel if the system maps
+/// its clocks into the process, as Linux and macOS do.
+///
+/// Threads: any thread may call this.
 inline std::uint64_t nanoseconds() noexcept {
   timespec now{};
   clock_gettime(CLOCK_MONOTONIC_RAW, &now);

@@ -12,7 +12,7 @@ std::uint64_t raw() {
   return static_cast<std::uint64_t>(now.tv_sec) * 1'000'000'000U + static_cast<std::uint64_t>(now.tv_nsec);
 }
 
-TEST(MonotonicClock, TellsTheSystemsRawClockInNanoseconds) {
+TEST(MonotonicClock, ReadsTheSystemsRawClockInNanoseconds) {
   const std::uint64_t before = raw();
   const std::uint64_t told = rt::MonotonicClock::nanoseconds();
   const std::uint64_t after = raw();

@@ -16,7 +16,7 @@ namespace {
 
 using Clock = std::chrono::steady_clock;
 
-// Keeps SIGPIPE from the calling thread, the one that it raises itself and no other.
+// Keeps a SIGPIPE that the calling thread raises from being delivered. Leaves any other SIGPIPE pending.
 class BrokenPipeIgnored {
  public:
   BrokenPipeIgnored() noexcept {
@@ -47,8 +47,8 @@ class BrokenPipeIgnored {
   bool wasPending_;
 };
 
-// Waits until there is room, or a reason why there will be none, which the next write tells; returns whether
-// there is.
+// Waits until there is room, or until `end`. Returns whether there is room. Also returns true if there will
+// never be room. The next write then fails and gives the reason.
 bool awaitRoom(Clock::time_point end) noexcept {
   for (;;) {
     const auto left = std::chrono::ceil<std::chrono::milliseconds>(end - Clock::now());
@@ -59,7 +59,8 @@ bool awaitRoom(Clock::time_point end) noexcept {
   }
 }
 
-// Writes what there is room for: another writer may have taken what there was a moment before.
+// Writes without waiting where the system can do that, since another writer may have taken the room
+// meanwhile.
 ssize_t writeWithoutWaiting(std::string_view text) noexcept {
 #ifdef __linux__
   const iovec piece{const_cast<char*>(text.data()), text.size()};
@@ -74,7 +75,7 @@ ssize_t writeWithoutWaiting(std::string_view text) noexcept {
 bool write(std::string_view text, std::chrono::milliseconds longestWait) noexcept {
   const BrokenPipeIgnored guard;
   const Clock::time_point end = Clock::now() + longestWait;
-  // A file takes all of it at once. What anything else says it has room for is a piece of this length.
+  // A file takes the whole text at once. Any other stream that reports room has room for PIPE_BUF bytes.
   struct stat status{};
   const bool isFile = fstat(STDERR_FILENO, &status) == 0 && S_ISREG(status.st_mode);
   while (!text.empty()) {

@@ -1,24 +1,26 @@
 #pragma once
 
-/// Lines on standard error, whatever that is and whoever reads it.
+/// Writes lines on standard error, whatever it is connected to.
 ///
 ///     rt::StandardError::write("rt: the queue is full\n", std::chrono::seconds(1));
 ///
-/// A reader that is gone costs the line and no more: no SIGPIPE is raised. A stream that does not block is
-/// waited for, and one that blocks does not hold the caller up for longer than it says.
+/// If the reader is gone, only the line is lost: no SIGPIPE is raised. Writing waits for room in the stream,
+/// also if the stream is non-blocking. It waits no longer than the caller allows, also if the stream blocks.
 ///
-/// Not for: the output of a program to its user.
+/// Not for: a program's output to its user.
 
 #include <chrono>
 #include <string_view>
 
 namespace rt::StandardError {
 
-/// Writes `text`, bytes, and returns whether all of it was taken. Waits `longestWait` at most, all in all,
-/// for room, which a file always has; on a terminal, another program that writes at the same moment may
-/// make that longer. What several threads write stays apart as long as each text is not longer than a pipe
-/// takes in one piece (4096 bytes on Linux) or standard error is a file. Any thread may call it; it locks
-/// and allocates nothing and leaves `errno` undefined.
+/// Writes `text`, which may be any bytes. Returns whether all of it was written. Waits for room for
+/// `longestWait` at most, all in all. A file always has room. On a terminal, and on macOS on any stream,
+/// another writer at the same moment may make the wait longer. Leaves `errno` undefined.
+///
+/// Threads: any thread may call this. It takes no lock and allocates nothing. The texts of several threads
+/// stay apart if standard error is a file. Otherwise each text may be only as long as a pipe takes in one
+/// piece (4096 bytes on Linux).
 bool write(std::string_view text, std::chrono::milliseconds longestWait) noexcept;
 
 }  // namespace rt::StandardError

@@ -19,10 +19,10 @@ namespace {
 using std::chrono::milliseconds;
 namespace StandardError = rt::StandardError;
 
-// For what has a reader and need not be waited for long, but may be where the machine is busy.
+// A limit for waits that end early, since the stream has a reader. It is long, since the machine may be busy.
 constexpr std::chrono::minutes kLong{5};
 
-TEST(StandardError, TakesEveryByte) {
+TEST(StandardError, WritesEveryByte) {
   const std::string text("a\0b\n\xff", 5);
   StandardErrorPipe pipe;
   EXPECT_TRUE(StandardError::write(text, milliseconds(0)));
@@ -30,7 +30,7 @@ TEST(StandardError, TakesEveryByte) {
   EXPECT_EQ(pipe.text(), text);
 }
 
-TEST(StandardError, WaitsForAReaderAlsoWhereTheStreamDoesNotBlock) {
+TEST(StandardError, WaitsForAReaderEvenIfTheStreamIsNonBlocking) {
   for (const bool blocks : {true, false}) {
     StandardErrorPipe pipe;
     if (!blocks) pipe.makeNonBlocking();
@@ -45,7 +45,7 @@ TEST(StandardError, WaitsForAReaderAlsoWhereTheStreamDoesNotBlock) {
   }
 }
 
-TEST(StandardError, GivesUpWhereNobodyReads) {
+TEST(StandardError, GivesUpIfNobodyReads) {
   for (const bool blocks : {true, false}) {
     StandardErrorPipe pipe;
     pipe.fill();
@@ -55,8 +55,8 @@ TEST(StandardError, GivesUpWhereNobodyReads) {
   }
 }
 
-// Used to wait for ever: who had been told of room that another writer took first.
-TEST(StandardError, GivesUpWhereAnotherWriterTakesTheRoom) {
+// A writer used to wait for ever if another writer took the room that it had been told of.
+TEST(StandardError, GivesUpIfAnotherWriterTakesTheRoom) {
   for (int round = 0; round < 100; ++round) {
     StandardErrorPipe pipe;
     pipe.fill();
@@ -69,8 +69,8 @@ TEST(StandardError, GivesUpWhereAnotherWriterTakesTheRoom) {
   }
 }
 
-TEST(StandardError, RaisesNoSignalWhereTheReaderIsGone) {
-  // A pipe says so beforehand, a socket only when it is written to.
+TEST(StandardError, RaisesNoSignalIfTheReaderIsGone) {
+  // A pipe tells that beforehand, a socket only when it is written to.
   for (const auto kind : {StandardErrorPipe::Kind::pipe, StandardErrorPipe::Kind::socket}) {
     StandardErrorPipe pipe(kind);
     pipe.closeReader();
@@ -79,7 +79,7 @@ TEST(StandardError, RaisesNoSignalWhereTheReaderIsGone) {
   }
 }
 
-TEST(StandardError, LeavesTheSignalsOfTheThreadAsTheyAre) {
+TEST(StandardError, RestoresTheSignalMaskOfTheThread) {
   const StandardErrorPipe pipe;
   for (const int how : {SIG_BLOCK, SIG_UNBLOCK}) {
     sigset_t brokenPipe;
@@ -94,7 +94,7 @@ TEST(StandardError, LeavesTheSignalsOfTheThreadAsTheyAre) {
   }
 }
 
-TEST(StandardError, LeavesASignalOfOthersPending) {
+TEST(StandardError, LeavesAForeignSignalPending) {
   sigset_t brokenPipe;
   sigset_t previous;
   sigemptyset(&brokenPipe);
@@ -117,7 +117,7 @@ TEST(StandardError, LeavesASignalOfOthersPending) {
   pthread_sigmask(SIG_SETMASK, &previous, nullptr);
 }
 
-TEST(StandardError, GivesUpWhereItIsClosedOrFull) {
+TEST(StandardError, GivesUpIfTheStreamIsClosedOrFull) {
   const StandardErrorPipe kept;
   close(STDERR_FILENO);
   EXPECT_FALSE(StandardError::write("closed", kLong));
@@ -128,7 +128,7 @@ TEST(StandardError, GivesUpWhereItIsClosedOrFull) {
   EXPECT_FALSE(StandardError::write("full", kLong));
 }
 
-TEST(StandardError, MayBeAFile) {
+TEST(StandardError, WritesToAFile) {
   const std::string text(1'000'000, 'f');
   std::FILE* const file = std::tmpfile();
   ASSERT_NE(file, nullptr);

@@ -1,14 +1,16 @@
 #pragma once
 
-/// UTF-8: whether bytes are it, what to make of bytes that are not, and how a character is written.
+/// Checks whether bytes are UTF-8, splits them into characters and writes characters as UTF-8.
 ///
 ///     if (!rt::isValidUTF8(bytes)) return;
 ///
 ///     char text[rt::kMaximumUTF8Length];
 ///     std::size_t length = rt::encodeUTF8(U'\u20ac', text);   // 3
 ///
-/// Valid is what the Unicode standard calls well-formed: no overlong forms, no surrogates, nothing above
-/// U+10FFFF. NUL is a character like any other. All of this may be called from any thread.
+/// Valid UTF-8 is what the Unicode standard calls well-formed: no overlong forms, no surrogates, nothing
+/// above U+10FFFF. NUL is a character like any other.
+///
+/// Threads: any thread may call all of these functions.
 ///
 /// Not for: text that is to be kept, which is a `rt::String` (Runtime/Objects/String.h).
 
@@ -19,31 +21,31 @@
 
 namespace rt {
 
-/// The most bytes that one character takes.
+/// The greatest number of bytes in a character.
 inline constexpr std::size_t kMaximumUTF8Length = 4;
 
-/// U+FFFD, what stands in the place of bytes that are not UTF-8.
+/// U+FFFD, which replaces bytes that are not UTF-8.
 inline constexpr std::string_view kReplacementCharacter = "\xEF\xBF\xBD";
 
-/// What bytes begin with.
+/// Describes what some bytes begin with.
 struct UTF8Sequence {
-  /// How many bytes it is: those of one character or, where the bytes begin with none, those that could
-  /// have become one before the first that could not, at least one. 0 at the end of the bytes.
+  /// The number of bytes of the character. If the bytes do not begin with a character, the number of those
+  /// that could have begun one, at least 1. 0 if there are no bytes.
   std::size_t length;
-  /// Whether it is a character.
+  /// Whether the bytes begin with a character.
   bool isValid;
-  /// Whether the bytes ended before the character did.
+  /// Whether the bytes end before the character does.
   bool isCutShort;
 };
 
-/// What `bytes` begin with.
+/// Returns what `bytes` begin with.
 constexpr UTF8Sequence nextUTF8(std::string_view bytes) noexcept {
   if (bytes.empty()) return {0, false, false};
   const auto at = [bytes](std::size_t i) { return static_cast<unsigned char>(bytes[i]); };
   const unsigned char first = at(0);
   if (first < 0x80) return {1, true, false};
 
-  // The second byte's range is what rules out overlong forms, surrogates and what is above U+10FFFF.
+  // The range of the second byte rules out overlong forms, surrogates and values above U+10FFFF.
   std::size_t length = 0;
   unsigned char low = 0x80;
   unsigned char high = 0xBF;
@@ -69,12 +71,12 @@ constexpr UTF8Sequence nextUTF8(std::string_view bytes) noexcept {
   return {length, true, false};
 }
 
-/// How many of the leading `bytes` are valid UTF-8; all of them in valid text.
+/// Returns how many leading bytes are valid UTF-8. In valid text, that is all of them.
 constexpr std::size_t validUTF8Length(std::string_view bytes) noexcept {
   std::size_t i = 0;
   while (i < bytes.size()) {
     if (!std::is_constant_evaluated()) {
-      // Most text is ASCII, and that is skipped by the word.
+      // Most text is ASCII, which is skipped word by word.
       for (std::size_t word = 0; bytes.size() - i >= sizeof word; i += sizeof word) {
         std::memcpy(&word, bytes.data() + i, sizeof word);
         if ((word & 0x8080808080808080U) != 0) break;
@@ -88,13 +90,13 @@ constexpr std::size_t validUTF8Length(std::string_view bytes) noexcept {
   return i;
 }
 
-/// Whether all of `bytes` are valid UTF-8; true for none.
+/// Returns whether all of `bytes` are valid UTF-8. True for no bytes.
 constexpr bool isValidUTF8(std::string_view bytes) noexcept {
   return validUTF8Length(bytes) == bytes.size();
 }
 
-/// Writes `character` to `bytes`, which has room for `kMaximumUTF8Length`, and returns how many it took.
-/// What is no character (a surrogate, or above U+10FFFF) is written as U+FFFD.
+/// Writes `character` to `bytes`, which has room for `kMaximumUTF8Length` bytes. Returns how many bytes it
+/// took. Writes U+FFFD for a surrogate and for a value above U+10FFFF.
 constexpr std::size_t encodeUTF8(char32_t character, char* bytes) noexcept {
   const auto put = [bytes](std::size_t i, char32_t value) { bytes[i] = static_cast<char>(value); };
   const auto continuation = [](char32_t value) { return 0x80 | (value & 0x3F); };

@@ -23,7 +23,7 @@ std::string bytesOf(std::initializer_list<int> values) {
   return bytes;
 }
 
-TEST(UTF8, AcceptsNothingAndAscii) {
+TEST(UTF8, AcceptsEmptyTextAndASCII) {
   EXPECT_TRUE(rt::isValidUTF8(""));
   EXPECT_TRUE(rt::isValidUTF8("a"));
   EXPECT_TRUE(rt::isValidUTF8(std::string_view("a\0b", 3)));
@@ -33,7 +33,7 @@ TEST(UTF8, AcceptsNothingAndAscii) {
   static_assert(!rt::isValidUTF8("\xC3"));
 }
 
-TEST(UTF8, WritesTheExamplesOfTheStandard) {
+TEST(UTF8, EncodesTheExamplesOfTheStandard) {
   EXPECT_EQ(encoded(0), std::string(1, '\0'));
   EXPECT_EQ(encoded(U'$'), "$");
   EXPECT_EQ(encoded(U'\u00E9'), "\xC3\xA9");
@@ -42,15 +42,15 @@ TEST(UTF8, WritesTheExamplesOfTheStandard) {
   EXPECT_EQ(encoded(U'\U0010FFFF'), "\xF4\x8F\xBF\xBF");
 }
 
-TEST(UTF8, WritesTheReplacementForWhatIsNoCharacter) {
+TEST(UTF8, EncodesInvalidCharactersAsTheReplacement) {
   for (const char32_t character : {0xD800U, 0xDBFFU, 0xDC00U, 0xDFFFU, 0x110000U, 0xFFFFFFFFU}) {
     EXPECT_EQ(encoded(character), rt::kReplacementCharacter) << std::hex << std::uint32_t(character);
   }
 }
 
-// All that is valid is what some character is written as: nothing else of one to three bytes is, and of
-// four bytes nothing whose first two are not the beginning of a character.
-TEST(UTF8, AcceptsExactlyWhatCharactersAreWrittenAs) {
+// Only encodings of characters are valid. The test compares all sequences of one and two bytes, and many of
+// three. Of sequences of four bytes, it compares the first two.
+TEST(UTF8, AcceptsExactlyTheEncodingsOfCharacters) {
   std::set<std::string> characters;
   std::set<std::string> beginnings;
   for (char32_t character = 0; character <= 0x10FFFF; ++character) {
@@ -80,7 +80,7 @@ TEST(UTF8, AcceptsExactlyWhatCharactersAreWrittenAs) {
   }
 }
 
-TEST(UTF8, RefusesOverlongFormsSurrogatesAndWhatIsTooLarge) {
+TEST(UTF8, RejectsOverlongFormsSurrogatesAndTooLargeValues) {
   for (const std::string_view bytes :
        {"\xC0\x80", "\xC1\xBF", "\xE0\x80\x80", "\xE0\x9F\xBF", "\xF0\x80\x80\x80", "\xF0\x8F\xBF\xBF",
         "\xED\xA0\x80", "\xED\xBF\xBF", "\xF4\x90\x80\x80", "\xF5\x80\x80\x80", "\xF8\x88\x80\x80\x80",
@@ -89,7 +89,7 @@ TEST(UTF8, RefusesOverlongFormsSurrogatesAndWhatIsTooLarge) {
   }
 }
 
-TEST(UTF8, TellsABrokenSequenceFromOneThatIsCutShort) {
+TEST(UTF8, TellsABrokenSequenceFromATruncatedOne) {
   const rt::UTF8Sequence cut = rt::nextUTF8("\xF0\x9F\x98");
   EXPECT_TRUE(cut.isCutShort && !cut.isValid && cut.length == 3);
   const rt::UTF8Sequence broken = rt::nextUTF8("\xF0\x9Fx");
@@ -99,8 +99,9 @@ TEST(UTF8, TellsABrokenSequenceFromOneThatIsCutShort) {
   EXPECT_EQ(rt::nextUTF8("").length, 0U);
 }
 
-// Wherever the mistake stands, what comes before it counts, also across the words that are read at once.
-TEST(UTF8, FindsAMistakeAnywhere) {
+// Puts an invalid byte at every position, also within and between the words that are read at once. The bytes
+// before it count as valid.
+TEST(UTF8, FindsAnInvalidByteAnywhere) {
   for (std::size_t length = 1; length < 40; ++length) {
     for (std::size_t i = 0; i < length; ++i) {
       std::string text(length, 'a');
@@ -112,8 +113,8 @@ TEST(UTF8, FindsAMistakeAnywhere) {
   }
 }
 
-TEST(UTF8, RepairsEachMistakeOnce) {
-  // The example of the standard, of "maximal subparts".
+TEST(UTF8, RepairsEachInvalidSequenceOnce) {
+  // The example for "maximal subparts" in the Unicode standard.
   EXPECT_EQ(rt::String::fromUTF8Repaired("\x61\xF1\x80\x80\xE1\x80\xC2\x62\x80\x63\x80\xBF\x64"),
             "a\uFFFD\uFFFD\uFFFDb\uFFFDc\uFFFD\uFFFDd");
   EXPECT_EQ(rt::String::fromUTF8Repaired("\xE2\x82"), "\uFFFD");

@@ -1,13 +1,14 @@
 #pragma once
 
-/// Makes a class one and the same in a program and all shared libraries, also in those that are compiled with
-/// -fvisibility=hidden, which otherwise have one of their own: its objects are then none where they come to.
+/// Makes a class the same in a program and in all shared libraries. Without it, a library that is compiled
+/// with -fvisibility=hidden has a class of its own. Then other images do not recognise the library's objects
+/// as objects of their class.
 ///
 ///     class RT_VISIBLE Account final : public rt::Implements<Account, rt::Object> { ... };
 ///
-/// The classes and protocols of these libraries have it. So do types that stand in the signatures of added
-/// class methods (Runtime/Objects/ClassMethod.h).
+/// The classes and protocols of these libraries have it. Types in the signatures of added class methods need
+/// it, too (Runtime/Objects/ClassMethod.h).
 ///
-/// Not for: classes that are known in one program or library only.
+/// Not for: classes that only one program or library knows.
 
 #define RT_VISIBLE [[gnu::visibility("default")]]

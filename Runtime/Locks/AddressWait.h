@@ -1,11 +1,11 @@
 #pragma once
 
-// Sleeping until a word changes, within this process:
+// Lets a thread sleep until another thread of this process changes a word:
 //
 //     while (word.load() == 0) rt::detail::waitAtAddress(word, 0);
 //
-// Unlike `std::atomic::notify_one`, waking does not look at the word, which may be gone by then. So a
-// word may live in the stack frame of the thread that sleeps at it. For the runtime itself only.
+// Unlike `std::atomic::notify_one`, waking does not read the word, which may be gone by then. So a word may
+// live in the stack frame of the thread that sleeps at it. For the runtime itself only.
 
 #if defined(__APPLE__)
 #include "Runtime/Locks/Darwin/AddressWait.h"
@@ -15,7 +15,7 @@
 
 namespace rt::detail {
 
-/// Tells the processor that the caller looks at a word again and again.
+// Tells the processor that the caller reads a word again and again.
 inline void spinPause() noexcept {
 #if defined(__x86_64__) || defined(__i386__)
   __builtin_ia32_pause();

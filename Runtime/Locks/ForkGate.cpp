@@ -1,3 +1,6 @@
+// A fork does not wait for a lock that is held while callbacks run. These locks are `LongLock` and
+// `RecursiveLock`. Their owner's token tells whether the owner is a thread of this process.
+
 #include "Runtime/Locks/ForkGate.h"
 
 #include <pthread.h>
@@ -21,35 +24,37 @@ namespace {
 constexpr int kNumberBits = 22;
 constexpr std::uint32_t kGenerations = 1U << 9;
 
-// How often a fork looks whether the locks are free: at first at once again, and then each millisecond. Not
-// by the clock: a process that is stopped, or gets no processor, has had no time to let its locks go.
+// How often a fork looks whether the locks are free. It only yields the processor between the first looks.
+// The later looks are a millisecond apart. The limit is a number of looks, not a time. A process that is
+// stopped, or gets no processor, has had no time to release its locks.
 constexpr int kQuickLooks = 100;
 constexpr int kLooks = kQuickLooks + 1000;
 
-// How many milliseconds a thread waits at the gate, counted likewise: longer than the fork for the thread.
+// How many milliseconds a thread waits at the gate, counted in the same way. That is longer than a fork waits
+// for locks.
 constexpr int kPauses = 2 * kLooks;
 
 }  // namespace
 
 struct ForkGate::Forks {
-  // Held by a fork from when it waits to its end, in both processes, and while handlers are registered. The
-  // system's, since ours use the gate.
+  // A fork holds this lock from its beginning to its end, in both processes. Registering the handlers holds
+  // it, too. It is a lock of the system, since ours use the gate.
   pthread_mutex_t lock = PTHREAD_MUTEX_INITIALIZER;
   std::atomic<bool> areHandlersRegistered = false;
-  // Its value, a thread's place, is given back when the thread ends.
+  // The thread-specific key of the thread's place. The place is given back when the thread ends.
   pthread_key_t end{};
   std::uint32_t number = 0;
 };
 
-// Where a thread counts its locks. Outlives the thread, so that a fork may look at any time; the next thread
-// gets it.
+// The place in which a thread counts its locks. It outlives the thread, so that a fork may read it at any
+// time. The next thread reuses it.
 struct alignas(64) ForkGate::Place {
   std::atomic<std::uint32_t> heldLocks = 0;
   std::atomic<bool> isTaken = false;
 };
 
-// A page of places, and those that came after it. Nothing is ever taken out, so that no lock is needed: a
-// thread may get its place inside of a signal handler, and while a fork is being made.
+// A page of places, with a link to the pages that were added later. No page is ever removed, so that no lock
+// is needed. A thread may take its place inside a signal handler, and while a fork is being made.
 struct ForkGate::Places {
   std::atomic<Places*> next = nullptr;
   std::array<Place, 63> all;
@@ -76,8 +81,9 @@ struct Handlers {};
 
 constinit Handlers handlers;
 
-// A fork that has begun would not know of handlers that are registered meanwhile. Early, so that the handlers
-// of others find the gate open: of those that prepare a fork, the first registered is called last.
+// Has the fork handlers registered while the program is loaded. A fork that has already begun does not see
+// handlers that are registered meanwhile. Early registration also lets the fork handlers of others find the
+// gate open. The reason is that the prepare handler that was registered first is called last.
 void announce(Handlers& /*handlers*/) noexcept {
   currentThreadToken();
 }
@@ -93,11 +99,11 @@ void pauseFork(int look) noexcept {
 
 }  // namespace
 
-// Announced as a class is, so that an image which uses nothing but a lock stays, too: the system calls the
-// handlers, and those for the end of threads, as long as the process lives.
+// Announced like a class, so that an image that uses nothing but a lock is never unloaded either. The system
+// calls the handlers for forks and for the ends of threads as long as the process lives.
 template struct AnnouncedOnLoading<handlers>;
 
-// Called on macOS alone: on Linux, locks are freed in the child.
+// Called on macOS only. On Linux, held locks are freed in the child.
 void ForkGate::pass() noexcept {
   for (;;) {
     enter();
@@ -135,7 +141,7 @@ bool ForkGate::isGone(ThreadToken token) noexcept {
 
 bool ForkGate::registerHandlers() noexcept {
   if (forks_.areHandlersRegistered.load(std::memory_order_acquire)) return true;
-  // A signal handler on this thread must not wait for the lock.
+  // Blocks signals: a signal handler on this thread must not wait for the lock.
   sigset_t all;
   sigset_t previous;
   sigfillset(&all);
@@ -160,7 +166,7 @@ ForkGate::Place* ForkGate::takePlace() noexcept {
     return taken != nullptr;
   });
   if (taken != nullptr) return taken;
-  // Not by an allocator, which may use locks.
+  // The memory does not come from an allocator, which may use locks.
   void* const memory =
       mmap(nullptr, sizeof(Places), PROT_READ | PROT_WRITE, MAP_PRIVATE | MAP_ANONYMOUS, -1, 0);
   if (memory == MAP_FAILED) return nullptr;
@@ -183,17 +189,18 @@ std::atomic<std::uint32_t>& ForkGate::beginCounting() noexcept {
   if (place != nullptr) count = &place->heldLocks;
   std::atomic<std::uint32_t>* known = nullptr;
   if (!self.lockCount.compare_exchange_strong(known, count)) {
-    // A signal handler has been faster.
+    // A signal handler on this thread has taken a place meanwhile.
     if (place != nullptr) place->isTaken.store(false, std::memory_order_release);
   } else if (place != nullptr && pthread_setspecific(forks_.end, place) != 0) {
-    // Nobody would give it back. Forks do not wait for this thread.
+    // Nobody would give the place back, so the thread counts elsewhere. Forks do not wait for this thread.
     giveBack(*place, &self.unseenLockCount);
   }
   errno = error;
   return *self.lockCount.load(std::memory_order_relaxed);
 }
 
-// Has the calling thread count at `next` from now on, null where it is to get a place when it needs one.
+// Gives `place` back. From now on the calling thread counts at `next`. If that is null, the thread takes a
+// place when it next needs one.
 void ForkGate::giveBack(Place& place, std::atomic<std::uint32_t>* next) noexcept {
   if (next != nullptr)
     next->store(place.heldLocks.load(std::memory_order_relaxed), std::memory_order_relaxed);
@@ -202,8 +209,9 @@ void ForkGate::giveBack(Place& place, std::atomic<std::uint32_t>* next) noexcept
   place.isTaken.store(false, std::memory_order_release);
 }
 
-// What the thread still does, as it ends, has it count in a place again, and the system asks again. In its
-// last round it does not: then a place is never given back, with a count of 0.
+// A later destructor of the thread may take a lock. The thread then takes a place again, and the system calls
+// this function again. After its last round of destructors the system does not. Then the place is never given
+// back, but its count is 0.
 void ForkGate::threadEnds(void* place) noexcept {
   giveBack(*static_cast<Place*>(place), heldLocks() != 0 ? &currentThread.unseenLockCount : nullptr);
 }
@@ -221,7 +229,7 @@ bool ForkGate::isAnyLockHeldElsewhere() noexcept {
 void ForkGate::prepare() noexcept {
   const int error = errno;
   pthread_mutex_lock(&forks_.lock);
-  enter();  // This thread passes the gate, whatever the handlers of others do.
+  enter();  // Lets this thread pass the gate, whatever the handlers of others do.
   if (++forks_.number == 0) ++forks_.number;
   shutFor_.store(forks_.number, std::memory_order_relaxed);
   std::atomic_thread_fence(std::memory_order_seq_cst);
@@ -245,7 +253,7 @@ void ForkGate::continueInChild() noexcept {
   generation_.store((generation_.load(std::memory_order_relaxed) + 1) % kGenerations,
                     std::memory_order_relaxed);
   survivor_.store(thread.token, std::memory_order_relaxed);
-  // The others' places are free.
+  // The other threads are gone, so their places are free.
   const std::atomic<std::uint32_t>* const own = thread.lockCount.load(std::memory_order_relaxed);
   Places::forEach([own](Place& place) {
     if (&place.heldLocks != own) {

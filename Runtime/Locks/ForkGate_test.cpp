@@ -23,7 +23,7 @@ namespace {
 using rt::LockGuard;
 using rt::UnfairLock;
 
-// What a lock guards: two numbers that are the same whenever it is free.
+// Two numbers that a lock guards. They are equal whenever the lock is free.
 struct Pair {
   UnfairLock lock;
   int first RT_GUARDED_BY(lock) = 0;
@@ -42,7 +42,7 @@ struct Pair {
   }
 };
 
-// A lock inside of which others are taken, as a registry's is.
+// A lock under which other locks are taken, like that of a registry.
 struct Nest {
   UnfairLock lock;
   std::array<Pair, 2> pairs;
@@ -57,9 +57,9 @@ std::uint32_t heldLocks() {
   return rt::detail::ForkGate::heldLocks();
 }
 
-// Invariant: whatever the other threads were doing, all locks are free in the child, and what they guard is
-// whole.
-TEST(ForkGate, LeavesNoLockHeldInTheChildAndNoDataHalfChanged) {
+// Invariant: whatever the other threads were doing, all locks are free in the child, and the data that they
+// guard is whole.
+TEST(ForkGate, FreesAllLocksInTheChildAndKeepsTheirDataWhole) {
   std::array<Pair, 3> pairs;
   Nest nest;
   std::atomic<bool> isEnding = false;
@@ -67,7 +67,7 @@ TEST(ForkGate, LeavesNoLockHeldInTheChildAndNoDataHalfChanged) {
   for (int i = 0; i < 4; ++i) {
     threads.emplace_back([&, i] {
       while (!isEnding) {
-        // Two threads for one of them, so that some wait for each other.
+        // Two threads use each pair, so that some wait for each other.
         pairs.at(static_cast<std::size_t>(i / 2)).change();
         nest.change();
       }
@@ -79,9 +79,9 @@ TEST(ForkGate, LeavesNoLockHeldInTheChildAndNoDataHalfChanged) {
       bool isWhole = true;
       for (Pair& each : pairs) isWhole = each.isWhole() && isWhole;
       for (Pair& each : nest.pairs) isWhole = each.isWhole() && isWhole;
-      for (Pair& each : pairs) each.change();  // The last is used by children alone.
+      for (Pair& each : pairs) each.change();  // Only children use the last pair.
       nest.change();
-      // In a child of the child, too.
+      // The locks are free in a child of the child, too.
       const bool isUsableInGrandchild = statusOfChild([&] {
                                           nest.change();
                                           return 0;
@@ -96,8 +96,8 @@ TEST(ForkGate, LeavesNoLockHeldInTheChildAndNoDataHalfChanged) {
   EXPECT_EQ(heldLocks(), 0U);
 }
 
-// A lock that a fork finds held for longer than it waits is free in the child nevertheless.
-TEST(ForkGate, WaitsForALockNoLongerThanItSays) {
+// A lock that stays held for longer than the fork waits is free in the child nevertheless.
+TEST(ForkGate, FreesALockThatIsHeldForTooLongInTheChild) {
   if (RT_TEST_IS_APPLE) GTEST_SKIP() << "the system's lock stays held";
   UnfairLock lock;
   const HeldElsewhere holder(lock);
@@ -112,13 +112,14 @@ TEST(ForkGate, WaitsForALockNoLongerThanItSays) {
       << "the parent's is still held";
 }
 
-// The same for one that a thread of the child waits for, and which several threads there want.
+// A lock that stays held is free in the child even if a thread of the parent waits for it. Several threads of
+// the child want it.
 TEST(ForkGate, AnAbandonedLockKeepsThreadsApartInTheChild) {
   if (RT_TEST_IS_APPLE || RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "no new threads in the child here";
   Pair pair;
   std::atomic<bool> isWaiting = false;
   const HeldElsewhere holder(pair.lock);
-  // Its bit for those who wait is set, too.
+  // The waiting thread sets the lock's bit for waiting threads.
   std::thread waiter([&] {
     isWaiting = true;
     const LockGuard guard(pair.lock);
@@ -140,8 +141,8 @@ TEST(ForkGate, AnAbandonedLockKeepsThreadsApartInTheChild) {
   waiter.join();
 }
 
-// Two threads that fork at once, each with a lock of its own that the other's fork waits for.
-TEST(ForkGate, LetsThreadsForkAtOnce) {
+// Two threads fork at the same time. Each has a lock of its own that the other's fork waits for.
+TEST(ForkGate, LetsTwoThreadsForkAtTheSameTime) {
   std::array<Pair, 2> pairs;
   std::array<std::thread, 2> threads;
   std::atomic<int> failures = 0;
@@ -158,7 +159,7 @@ TEST(ForkGate, LetsThreadsForkAtOnce) {
   EXPECT_EQ(failures, 0);
 }
 
-TEST(ForkGate, AThreadThatForksWithALockHasItInTheChild) {
+TEST(ForkGate, AThreadKeepsItsLockInTheChildThatItForks) {
   Pair pair;
   const LockGuard guard(pair.lock);
   EXPECT_EQ(heldLocks(), 1U);
@@ -166,8 +167,8 @@ TEST(ForkGate, AThreadThatForksWithALockHasItInTheChild) {
   EXPECT_EQ(heldLocks(), 1U);
 }
 
-// Threads come and go, and what they use at their end takes locks, while others fork.
-TEST(ForkGate, CountsThreadsUntilTheyHaveEnded) {
+// Threads start and end while others fork. The destructors at the end of each thread take locks.
+TEST(ForkGate, CountsLocksOfThreadsUntilTheyHaveEnded) {
   static constinit Pair pair;
   struct AtEnd {
     ~AtEnd() { pair.change(); }
@@ -197,12 +198,12 @@ TEST(ForkGate, CountsThreadsUntilTheyHaveEnded) {
   pthread_key_delete(key);
 }
 
-// Used to follow a list into the memory of threads that had ended, for ever.
-TEST(ForkGate, LooksAtNoThreadThatHasEndedHoweverLateItsFirstLockCame) {
+// A fork used to follow a list into the memory of threads that had ended, and never returned.
+TEST(ForkGate, IgnoresEndedThreadsWhoseFirstLockCameLate) {
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer allows no new threads in the child";
   static constinit UnfairLock lock;
   static constinit pthread_key_t key{};
-  // In the last round of destructors that the system makes, and in those before it.
+  // Takes its first lock in the last round of destructors that the system makes, or in an earlier one.
   const auto end = [](void* value) {
     const auto rounds = reinterpret_cast<std::intptr_t>(value);
     if (rounds > 1) {
@@ -225,7 +226,7 @@ TEST(ForkGate, LooksAtNoThreadThatHasEndedHoweverLateItsFirstLockCame) {
   pthread_key_delete(key);
 }
 
-TEST(ForkGate, ThreadsCountOneAfterAnotherInTheSamePlace) {
+TEST(ForkGate, ReusesThePlaceOfAThreadThatHasEnded) {
   static constinit UnfairLock lock;
   std::set<const void*> places;
   for (int i = 0; i < 100; ++i) {
@@ -237,7 +238,7 @@ TEST(ForkGate, ThreadsCountOneAfterAnotherInTheSamePlace) {
   EXPECT_EQ(places.size(), 1U);
 }
 
-// More than the places that need no memory.
+// Starts more threads than there are places in the first page.
 TEST(ForkGate, WaitsForTheLocksOfManyThreads) {
   std::vector<Pair> pairs(200);
   std::atomic<bool> isEnding = false;
@@ -264,7 +265,7 @@ TEST(ForkGate, WaitsForTheLocksOfManyThreads) {
   EXPECT_EQ(status, 0);
 }
 
-// A handler that was registered before the gate's, so that it runs while the gate is shut.
+// A fork handler that is registered before the gate's, so that it runs while the gate is shut.
 constinit std::atomic<std::atomic<bool>*> forkWaitsFor = nullptr;
 constinit std::atomic<bool> isForkWaiting = false;
 
@@ -280,7 +281,7 @@ constinit std::atomic<bool> isForkWaiting = false;
       nullptr, nullptr);
 }
 
-// Used to deadlock: the handler waits for a thread that waits at the gate.
+// The handler waits for a thread that waits at the gate. This used to deadlock.
 TEST(ForkGate, OpensForAThreadThatTheForkItselfWaitsFor) {
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer allows no new threads in the child";
   EXPECT_EQ(statusOfChild([] {

@@ -1,17 +1,21 @@
 #pragma once
 
-/// A value that is made when it is first asked for, once for the process, and never destroyed.
+/// `rt::Lazy` is a value that is made when it is first asked for. It is made once for the process and never
+/// destroyed.
 ///
 ///     const rt::Ref<Clock>& Clock::shared() {
 ///       static constinit rt::Lazy<rt::Ref<Clock>> clock;
 ///       return clock.get([] { return rt::make<SystemClock>(); });
 ///     }
 ///
-/// Differs from a static variable of a function in two ways. Nothing runs at exit. In the child of a fork, a
-/// value that another thread was making counts as not begun; a static variable would be waited for for ever.
-/// Asking for a value that is there takes no lock and allocates nothing.
+/// It differs from a static variable of a function in two ways. Nothing runs at exit. In the child of a fork,
+/// a value that another thread was making counts as not begun. (A static variable would make the child wait
+/// for ever.) Asking for a value that exists takes no lock and allocates nothing.
 ///
-/// Not for: values that are made with the program; members of objects, which end.
+/// Threads: any thread may ask for the value.
+///
+/// Not for: values that exist from the start of the program; members of objects, since the value is never
+/// destroyed.
 
 #include <atomic>
 #include <cstddef>
@@ -27,13 +31,14 @@ namespace rt {
 template <class T>
 class Lazy {
  public:
-  /// Not made.
+  /// Makes a `Lazy` without a value.
   constexpr Lazy() noexcept = default;
   Lazy(const Lazy&) = delete;
   Lazy& operator=(const Lazy&) = delete;
 
-  /// The value; the first call makes it of what `make` returns. Other threads that ask meanwhile wait; `make`
-  /// must not ask itself, which ends the program. Throws what `make` throws, and the next call tries again.
+  /// Returns the value. The first call makes it from the result of `make`. Other threads that ask meanwhile
+  /// wait. `make` must not ask for the same value, which ends the program. Throws what `make` throws. The
+  /// next call then tries again.
   template <class Make>
   T& get(Make&& make) {
     if (!isMade_.load(std::memory_order_acquire)) [[unlikely]]

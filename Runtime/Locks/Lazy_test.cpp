@@ -22,7 +22,7 @@ TEST(Lazy, MakesItsValueOnce) {
   EXPECT_EQ(made, 1);
 }
 
-TEST(Lazy, MakesItsValueOnceHoweverManyThreadsAsk) {
+TEST(Lazy, MakesItsValueOnceForManyThreads) {
   static constinit rt::Lazy<int> value;
   std::atomic<int> made = 0;
   std::atomic<int> right = 0;
@@ -42,7 +42,7 @@ TEST(Lazy, MakesItsValueOnceHoweverManyThreadsAsk) {
   EXPECT_EQ(right, 8);
 }
 
-TEST(Lazy, TriesAgainWhereMakingThrows) {
+TEST(Lazy, TriesAgainAfterAnException) {
   static constinit rt::Lazy<int> value;
   EXPECT_THROW(value.get([]() -> int { throw std::runtime_error("not yet"); }), std::runtime_error);
   EXPECT_EQ(value.get([] { return 2; }), 2);
@@ -56,8 +56,8 @@ TEST(Lazy, NeverDestroysItsValue) {
   const_cast<rt::Lazy<Ending>&>(value).get([] { return Ending(); });
 }
 
-// What used to happen with a static variable of a function: the child waited for ever.
-TEST(Lazy, CountsAsNotBegunInTheChildOfAForkWhereAnotherThreadWasMakingIt) {
+// With a static variable of a function, the child used to wait for ever.
+TEST(Lazy, MakesItsValueInAForkedChildIfAnotherThreadWasMakingIt) {
   static constinit rt::Lazy<int> value;
   std::atomic<bool> isMaking = false;
   std::atomic<bool> mayEnd = false;
@@ -78,7 +78,7 @@ TEST(Lazy, CountsAsNotBegunInTheChildOfAForkWhereAnotherThreadWasMakingIt) {
 }
 
 #if !defined(__APPLE__)
-TEST(LazyDeathTest, AskingForTheValueThatIsBeingMadeEndsTheProgram) {
+TEST(LazyDeathTest, AskingForTheValueWhileMakingItEndsTheProgram) {
   static constinit rt::Lazy<int> value;
   EXPECT_DEATH(value.get([] { return value.get([] { return 1; }); }), "is taken again by thread");
 }

@@ -17,10 +17,11 @@ using rt::LongLock;
 static_assert(sizeof(LongLock) == 4);
 constinit LongLock lockAtNamespaceScope;
 
-// Death tests end the program on purpose, and others try a lock twice, which the analysis cannot know.
+// Not analysed: death tests end the program on purpose, and other tests try a lock twice. The analysis cannot
+// know that.
 #define NOT_ANALYSED [&]() RT_NO_THREAD_SAFETY_ANALYSIS
 
-TEST(LongLock, IsTakenAndLetGo) {
+TEST(LongLock, IsLockedAndUnlocked) {
   lockAtNamespaceScope.lock();
   lockAtNamespaceScope.assertOwner();
   lockAtNamespaceScope.unlock();
@@ -57,7 +58,7 @@ TEST(LongLock, IsNotCountedForForks) {
   EXPECT_EQ(rt::detail::ForkGate::heldLocks(), 0U);
 }
 
-TEST(LongLock, HeldByAnotherThreadIsFreeInTheChildOfAFork) {
+TEST(LongLock, IsFreeInAForkedChildIfAnotherThreadHeldIt) {
   LongLock lock;
   const HeldElsewhere holder(lock);
   EXPECT_FALSE(lock.isAbandoned());
@@ -77,7 +78,7 @@ TEST(LongLock, HeldByAnotherThreadIsFreeInTheChildOfAFork) {
             0);
 }
 
-TEST(LongLock, OfTheThreadThatForksStaysItsOwnThroughGenerations) {
+TEST(LongLock, TheForkingThreadKeepsItThroughGenerations) {
   LongLock lock;
   const LockGuard guard(lock);
   EXPECT_EQ(statusOfChild(NOT_ANALYSED {
@@ -95,8 +96,9 @@ TEST(LongLock, OfTheThreadThatForksStaysItsOwnThroughGenerations) {
   lock.assertOwner();
 }
 
-// A lock that the child's own thread holds is nobody's to take there; it is in a child of another thread.
-TEST(LongLock, IsFreeInTheChildOfAChildWhereTheThreadThatHeldItIsGone) {
+// In the child, the forking thread holds the lock, so no other thread can take it. If another thread of the
+// child forks, the holder does not exist in the grandchild.
+TEST(LongLock, IsFreeInAGrandchildIfItsHolderIsGone) {
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer allows no new threads in the child";
   LongLock lock;
   LongLock other;
@@ -121,7 +123,7 @@ TEST(LongLock, IsFreeInTheChildOfAChildWhereTheThreadThatHeldItIsGone) {
             0);
 }
 
-TEST(LongLock, IsKeptByItsOwnerInALineOfChildren) {
+TEST(LongLock, ItsHolderKeepsItThroughALongLineOfForks) {
   LongLock lock;
   LongLock free;
   const LockGuard guard(lock);

@@ -10,8 +10,8 @@ namespace rt::detail {
 
 namespace {
 
-// Each look at the lock while it is held takes its memory from the holder, so the looks become rarer; all
-// of them together take about as long as a short critical section.
+// Each look at a held lock takes its cache line from the holder, so the looks become rarer. All of them
+// together take about as long as a short critical section.
 constexpr int kLongestPause = 16;
 
 }  // namespace
@@ -25,14 +25,14 @@ void OwnerLock::lockSlow(ThreadToken self, bool isCounted) noexcept {
   }
   for (int pauses = 1; pauses <= kLongestPause; pauses *= 2) {
     if (state == 0 && take(self)) return;
-    if ((state & kHasWaiters) != 0) break;  // Others have waited in vain.
+    if ((state & kHasWaiters) != 0) break;  // Others have spun in vain.
     for (int i = 0; i < pauses; ++i) spinPause();
     state = state_.load(std::memory_order_relaxed);
   }
-  // A fork need not wait for a thread that sleeps and holds nothing.
+  // A fork need not wait for a thread that sleeps and holds no lock.
   const bool isUncountedAsleep = isCounted && ForkGate::heldLocks() == 1;
-  // From here on the lock is taken with the bit set: others may still sleep, and who has taken the lock
-  // must wake one of them when it lets it go.
+  // From here on the lock is taken with the bit kHasWaiters set. Other threads may still sleep, and the new
+  // holder must wake one of them when it releases the lock.
   for (;;) {
     state = state_.load(std::memory_order_relaxed);
     if (state == 0 || isAbandoned(state)) {

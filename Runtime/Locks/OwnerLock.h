@@ -1,11 +1,12 @@
 #pragma once
 
-// A lock in one word: the token of the thread that holds it and a bit for the threads that sleep until it is
-// let go. What the locks of this room are made of.
+// A lock in one word: the token of the thread that holds it, and a bit that says whether threads sleep until
+// it is free. The locks of this folder are made of it.
 //
-// Since the token says which thread it is, misuse is caught, and so is a lock that a fork has left held: its
-// owner's thread is not there in the child. Who wants it finds that out when it is about to wait, and takes
-// it over. So no list of locks is needed, and a lock that is free costs nothing more.
+// The token identifies the holder, so misuse is caught. It also reveals a lock that a fork has left held,
+// since the holder's thread does not exist in the child. A thread that wants the lock finds that out when it
+// is about to wait, and takes the lock over. So no list of locks is needed, and taking a free lock costs
+// nothing more.
 
 #include <atomic>
 #include <cstdint>
@@ -18,7 +19,8 @@ class OwnerLock {
  public:
   constexpr OwnerLock() noexcept = default;
 
-  /// `isCounted` is whether the caller has counted the lock for forks (Runtime/Locks/ForkGate.h).
+  // Takes the lock. `isCounted` says whether the caller has counted the lock for forks
+  // (Runtime/Locks/ForkGate.h).
   [[gnu::always_inline]] void lock(bool isCounted = false) noexcept {
     const ThreadToken self = currentThreadToken();
     if (!take(self)) [[unlikely]]
@@ -31,7 +33,7 @@ class OwnerLock {
   }
 
   [[gnu::always_inline]] void unlock() noexcept {
-    // Looked at before it is let go: nobody gets into what another thread guards.
+    // Checked before the lock is released, so that nobody gets into what another thread guards.
     if (!isHeldByCaller()) [[unlikely]]
       failOwner("unlocked");
     if ((state_.exchange(0, std::memory_order_release) & kHasWaiters) != 0) [[unlikely]]
@@ -47,7 +49,7 @@ class OwnerLock {
     return (state_.load(std::memory_order_relaxed) & ~kHasWaiters) == currentThreadToken();
   }
 
-  /// Whether a thread holds it that a fork has left behind in another process.
+  // Returns whether the holder is a thread that a fork has left behind in another process.
   bool isAbandoned() const noexcept { return isAbandoned(state_.load(std::memory_order_relaxed)); }
 
  private:
@@ -59,7 +61,7 @@ class OwnerLock {
 
   [[gnu::always_inline]] bool take(ThreadToken self) noexcept {
     std::uint32_t expected = 0;
-    // The release order is for the fork gate.
+    // The fork gate needs the release order (`ForkGate::isShut`).
     return state_.compare_exchange_strong(expected, self, std::memory_order_acq_rel,
                                           std::memory_order_relaxed);
   }

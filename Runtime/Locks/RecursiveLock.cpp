@@ -2,9 +2,10 @@
 
 namespace rt {
 
-// The depth begins anew with each holder: one that a fork has left behind leaves its own in the child.
+// Each new holder sets the depth to 1. A holder that a fork has left behind leaves its own depth in the
+// child.
 
-// Not analysed: whether the inner lock is taken or only counted is known at run time.
+// Not analysed, since it is known only at run time whether the inner lock is taken or counted.
 void RecursiveLock::lock() noexcept RT_NO_THREAD_SAFETY_ANALYSIS {
   if (lock_.isHeldByCaller()) {
     ++depth_;
@@ -26,7 +27,7 @@ bool RecursiveLock::tryLock() noexcept RT_NO_THREAD_SAFETY_ANALYSIS {
 
 void RecursiveLock::unlock() noexcept RT_NO_THREAD_SAFETY_ANALYSIS {
   if (lock_.isHeldByCaller() && --depth_ != 0) return;
-  lock_.unlock();  // Ends the program when the caller does not hold it.
+  lock_.unlock();  // Ends the program if the caller does not hold it.
 }
 
 void RecursiveLock::assertOwner() const noexcept {

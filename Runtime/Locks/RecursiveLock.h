@@ -1,6 +1,6 @@
 #pragma once
 
-/// A lock that the thread which holds it may take again.
+/// `rt::RecursiveLock` is a lock that its holder may take again.
 ///
 ///     void Switchboard::replace(Logger* logger) {
 ///       rt::LockGuard guard(lock_);      // a rt::RecursiveLock
@@ -8,12 +8,12 @@
 ///       add(logger);
 ///     }
 ///
-/// It is let go when it has been unlocked as often as it was locked. Letting go a lock that another
-/// thread, or none, holds ends the program with a line on standard error. Otherwise as
-/// Runtime/Locks/LongLock.h, also where a fork is concerned.
+/// The lock is free again after as many calls of `unlock` as of `lock`. Unlocking a lock that the caller does
+/// not hold ends the program with a line on standard error. Otherwise it behaves like a `LongLock`
+/// (Runtime/Locks/LongLock.h), also when the process forks.
 ///
-/// Not for: code that can be arranged to take its lock once. The annotations see one function at a time,
-/// so a function that itself takes the lock twice does not compile with clang.
+/// Not for: code that can take its lock once. clang's annotations check one function at a time. So a function
+/// that itself takes the lock twice does not compile with clang.
 
 #include <cstdint>
 
@@ -25,26 +25,26 @@ namespace rt {
 
 class RT_CAPABILITY("lock") RecursiveLock {
  public:
-  /// Not held.
+  /// Makes a free lock.
   constexpr RecursiveLock() noexcept = default;
   RecursiveLock(const RecursiveLock&) = delete;
   RecursiveLock& operator=(const RecursiveLock&) = delete;
 
-  /// Takes the lock once more, after waiting until no other thread holds it.
+  /// Waits until no other thread holds the lock, and takes it once more.
   void lock() noexcept RT_ACQUIRE();
 
-  /// Takes the lock once more and returns true, or returns false at once when another thread holds it.
+  /// Takes the lock once more and returns true. Returns false at once if another thread holds it.
   [[nodiscard]] bool tryLock() noexcept RT_TRY_ACQUIRE(true);
 
-  /// Takes back one `lock`. Ends the program when the caller does not hold the lock.
+  /// Takes back one `lock`. Ends the program if the caller does not hold the lock.
   void unlock() noexcept RT_RELEASE();
 
-  /// Ends the program when the caller does not hold the lock.
+  /// Ends the program if the caller does not hold the lock.
   void assertOwner() const noexcept RT_ASSERT_CAPABILITY(this);
 
  private:
   detail::OwnerLock lock_;
-  std::uint32_t depth_ = 0;  // The holder's.
+  std::uint32_t depth_ = 0;  // How often the holder has taken the lock.
 };
 
 }  // namespace rt

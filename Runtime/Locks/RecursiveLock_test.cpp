@@ -15,7 +15,7 @@ namespace {
 using rt::LockGuard;
 using rt::RecursiveLock;
 
-// The analysis sees one function at a time and takes a second lock in it for a mistake.
+// Not analysed: the analysis sees one function at a time and takes a second `lock` in it for a mistake.
 #define NOT_ANALYSED [&]() RT_NO_THREAD_SAFETY_ANALYSIS
 
 bool anotherThreadCanTake(RecursiveLock& lock) {
@@ -29,7 +29,7 @@ bool anotherThreadCanTake(RecursiveLock& lock) {
   return taken;
 }
 
-TEST(RecursiveLock, IsTakenAndLetGo) {
+TEST(RecursiveLock, IsLockedAndUnlocked) {
   RecursiveLock lock;
   lock.lock();
   lock.assertOwner();
@@ -38,7 +38,7 @@ TEST(RecursiveLock, IsTakenAndLetGo) {
   EXPECT_TRUE(anotherThreadCanTake(lock));
 }
 
-TEST(RecursiveLock, IsLetGoWithTheLastUnlock) {
+TEST(RecursiveLock, IsFreeAfterTheLastUnlock) {
   RecursiveLock lock;
   const auto takeThreeTimes = NOT_ANALYSED {
     lock.lock();
@@ -75,7 +75,7 @@ class Switchboard {
   int count_ RT_GUARDED_BY(lock_) = 0;
 };
 
-// Invariant: both of a thread's additions happen under one holding, so an odd count is never seen.
+// Invariant: a thread makes both of its additions under one lock, so nobody ever sees an odd count.
 TEST(RecursiveLock, ManyThreadsCountTogether) {
   constexpr int kThreads = 4;
   constexpr int kRounds = 5'000;
@@ -96,13 +96,13 @@ TEST(RecursiveLock, ManyThreadsCountTogether) {
 
 #if !defined(__APPLE__)
 
-TEST(RecursiveLock, HeldAcrossForkIsTheForkingThreadsInTheChild) {
+TEST(RecursiveLock, TheForkingThreadHoldsItInTheChild) {
   RecursiveLock lock;
   const auto forkWithTheLock = NOT_ANALYSED {
     lock.lock();
     const pid_t child = fork();
     if (child == 0) {
-      alarm(30);  // Instead of a hang.
+      alarm(30);  // Ends the child if it hangs.
       lock.assertOwner();
       lock.lock();
       lock.unlock();
@@ -119,8 +119,8 @@ TEST(RecursiveLock, HeldAcrossForkIsTheForkingThreadsInTheChild) {
   EXPECT_EQ(forkWithTheLock(), 0);
 }
 
-// Its depth, too, is the other thread's.
-TEST(RecursiveLock, HeldByAnotherThreadIsFreeInTheChildOfAFork) {
+// In the child, the lock's depth is left over from the other thread, too.
+TEST(RecursiveLock, IsFreeInAForkedChildIfAnotherThreadHeldIt) {
   RecursiveLock lock;
   struct Twice {
     void lock() RT_NO_THREAD_SAFETY_ANALYSIS {
@@ -148,7 +148,7 @@ TEST(RecursiveLock, HeldByAnotherThreadIsFreeInTheChildOfAFork) {
             0);
 }
 
-TEST(RecursiveLockDeathTest, LettingGoAFreeLockEndsTheProgram) {
+TEST(RecursiveLockDeathTest, UnlockingAFreeLockEndsTheProgram) {
   RecursiveLock lock;
   const auto letGo = NOT_ANALYSED {
     lock.unlock();
@@ -166,7 +166,7 @@ TEST(RecursiveLockDeathTest, OneUnlockTooManyEndsTheProgram) {
   EXPECT_DEATH(letGoTwice(), "is unlocked by thread [0-9]+, but no thread holds it");
 }
 
-TEST(RecursiveLockDeathTest, LettingGoAnotherThreadsLockEndsTheProgram) {
+TEST(RecursiveLockDeathTest, UnlockingAnotherThreadsLockEndsTheProgram) {
   RecursiveLock lock;
   const auto letGoForeign = NOT_ANALYSED {
     lock.lock();
@@ -175,7 +175,7 @@ TEST(RecursiveLockDeathTest, LettingGoAnotherThreadsLockEndsTheProgram) {
   EXPECT_DEATH(letGoForeign(), "is unlocked by thread [0-9]+, but thread [0-9]+ holds it");
 }
 
-TEST(RecursiveLockDeathTest, MissingLockEndsTheProgram) {
+TEST(RecursiveLockDeathTest, AssertingAFreeLockEndsTheProgram) {
   RecursiveLock lock;
   EXPECT_DEATH(lock.assertOwner(), "is needed by thread [0-9]+, but no thread holds it");
 }

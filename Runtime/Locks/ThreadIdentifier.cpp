@@ -13,7 +13,7 @@ ThreadToken learnThreadToken() noexcept {
   const ThreadIdentifier identifier = systemThreadIdentifier();
   self.isMain = systemIsMainThread();
   self.token = ForkGate::tokenOf(systemThreadNumber());
-  // Kept only where it cannot go stale; the next call asks the system again otherwise.
+  // Kept only if the fork handlers can renew it in a child. Otherwise the next call asks the system again.
   if (ForkGate::registerHandlers()) self.identifier = identifier;
   return self.token;
 }

@@ -1,20 +1,23 @@
 #pragma once
 
-/// Which thread this is, as a number, at the price of reading a variable.
+/// Numbers that identify the calling thread. Asking for one costs as much as reading a variable.
 ///
 ///     std::printf("thread %u\n", rt::currentThreadIdentifier());
 ///     if (owner_ == rt::currentThreadToken()) ...
 ///
-/// The identifier is the number that the system's tools show. It is not 0 and below 2^31, and differs between
-/// the threads of a process that are alive. The token is for what is kept in memory: a thread that forks has
-/// the same one in the child, where those of all other threads are known to be gone. Either may be given
-/// again after a thread has ended.
+/// The identifier is the number that the system's tools show. It is not 0 and is below 2^31. It differs
+/// between the living threads of a process.
 ///
-/// The first call on a thread asks the system. No call allocates. Any thread may call all of it at any time,
-/// also in signal handlers, while the program is being loaded and in the destructors of thread-local
-/// variables.
+/// The token is for data that is kept in memory, which a fork copies. A thread that forks has the same token
+/// in the child. There, `isThreadGone` is true for the tokens of all other threads. Both numbers may be
+/// reused after a thread has ended.
 ///
-/// Not for: telling threads apart that may have ended; names of threads.
+/// The first call on a thread asks the system. No call allocates.
+///
+/// Threads: any thread may call these functions at any time. This includes signal handlers, the loading of
+/// the program and the destructors of thread-local variables.
+///
+/// Not for: telling apart threads that may have ended; names of threads.
 
 #include <atomic>
 #include <cstdint>
@@ -23,7 +26,7 @@ namespace rt {
 
 using ThreadIdentifier = std::uint32_t;
 
-/// Not 0, and below 2^31.
+/// A token is not 0, and is below 2^31.
 using ThreadToken = std::uint32_t;
 
 namespace detail {
@@ -33,44 +36,45 @@ struct ThreadState {
   ThreadToken token = 0;
   bool isMain = false;
 
-  // The fork gate's (Runtime/Locks/ForkGate.h): where the thread counts its locks, null where it has no such
-  // place; and a place for the count of which no fork knows. Atomic for the sake of signal handlers.
+  // For the fork gate (Runtime/Locks/ForkGate.h). `lockCount` is where the thread counts its locks, or null
+  // if it has no such place. `unseenLockCount` is a count that no fork reads. Both are atomic because of
+  // signal handlers.
   std::atomic<std::atomic<std::uint32_t>*> lockCount = nullptr;
   std::atomic<std::uint32_t> unseenLockCount = 0;
 };
 
-// Initial-exec: read without a call, wherever the code is linked to.
+// Initial-exec: the variable is read without a call, wherever the code is linked to.
 extern constinit thread_local ThreadState currentThread [[gnu::tls_model("initial-exec")]];
 
 [[gnu::cold]] ThreadIdentifier learnThreadIdentifier() noexcept;
 [[gnu::cold]] ThreadToken learnThreadToken() noexcept;
 
-// What the system says of the calling thread; one version for each system. The number is below 2^22, and no
-// other living thread of the process has it.
+// What the system says about the calling thread. Each system has its own version. The number is below 2^22,
+// and no other living thread of the process has it.
 ThreadIdentifier systemThreadIdentifier() noexcept;
 std::uint32_t systemThreadNumber() noexcept;
 bool systemIsMainThread() noexcept;
 
 }  // namespace detail
 
-/// The identifier of the calling thread.
+/// Returns the identifier of the calling thread.
 inline ThreadIdentifier currentThreadIdentifier() noexcept {
   const ThreadIdentifier identifier = detail::currentThread.identifier;
   return identifier != 0 ? identifier : detail::learnThreadIdentifier();
 }
 
-/// The token of the calling thread.
+/// Returns the token of the calling thread.
 inline ThreadToken currentThreadToken() noexcept {
   const ThreadToken token = detail::currentThread.token;
   return token != 0 ? token : detail::learnThreadToken();
 }
 
-/// Whether `token`, which is some thread's and not 0, is that of a thread which a fork has left behind in
-/// another process.
+/// Returns whether `token` belongs to a thread that a fork has left behind in another process. `token` is the
+/// token of a thread, not 0.
 bool isThreadGone(ThreadToken token) noexcept;
 
-/// Whether the calling thread is the main thread of the process: the one that runs `main` and, in the
-/// child of a fork, the one that forked.
+/// Returns whether the calling thread is the main thread of the process. That is the thread that runs `main`
+/// or, in the child of a fork, the thread that forked.
 inline bool isMainThread() noexcept {
   currentThreadIdentifier();
   return detail::currentThread.isMain;

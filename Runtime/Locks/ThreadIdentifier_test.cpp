@@ -14,7 +14,7 @@
 
 namespace {
 
-TEST(ThreadIdentifier, IsTheSystemsAndStays) {
+TEST(ThreadIdentifier, IsTheSystemsNumberAndDoesNotChange) {
   const rt::ThreadIdentifier identifier = rt::currentThreadIdentifier();
   EXPECT_EQ(identifier, rt::detail::systemThreadIdentifier());
   EXPECT_EQ(identifier, rt::currentThreadIdentifier());
@@ -47,8 +47,8 @@ TEST(ThreadIdentifier, OnlyTheMainThreadIsMain) {
   EXPECT_FALSE(isMain);
 }
 
-/// Forks in the calling thread; 0 when the child knows its own identifier, the one its thread had in the
-/// parent, and that it is the main thread now.
+// Forks in the calling thread. Returns 0 if the child has a new identifier, has kept its thread's token and
+// is the main thread now.
 int statusOfForkedChild() {
   const rt::ThreadIdentifier inParent = rt::currentThreadIdentifier();
   const rt::ThreadToken token = rt::currentThreadToken();
@@ -65,17 +65,17 @@ int statusOfForkedChild() {
   return WEXITSTATUS(status);
 }
 
-TEST(ThreadIdentifier, IsLearnedAnewInTheChildOfAFork) {
+TEST(ThreadIdentifier, IsRenewedInAForkedChild) {
   EXPECT_EQ(statusOfForkedChild(), 0);
 }
 
-TEST(ThreadIdentifier, ForkingThreadIsTheChildsMainThread) {
+TEST(ThreadIdentifier, TheForkingThreadIsTheMainThreadOfTheChild) {
   int status = -1;
   std::thread([&] { status = statusOfForkedChild(); }).join();
   EXPECT_EQ(status, 0);
 }
 
-/// A thread that is alive, and its token.
+// A thread that lives as long as the object, and its token.
 class Other {
  public:
   Other() { hasAsked_.wait(); }
@@ -99,7 +99,7 @@ class Other {
   }};
 };
 
-TEST(ThreadToken, DiffersBetweenThreadsAndStays) {
+TEST(ThreadToken, DiffersBetweenThreadsAndDoesNotChange) {
   const Other other;
   EXPECT_NE(other.token(), 0U);
   EXPECT_NE(other.token(), rt::currentThreadToken());
@@ -108,12 +108,12 @@ TEST(ThreadToken, DiffersBetweenThreadsAndStays) {
   EXPECT_FALSE(rt::isThreadGone(other.token()));
 }
 
-TEST(ThreadToken, IsKnownToBeGoneInTheChildOfAForkUnlessTheThreadForked) {
+TEST(ThreadToken, OfEveryThreadButTheForkingOneIsGoneInAForkedChild) {
   const Other other;
   const rt::ThreadToken own = rt::currentThreadToken();
   EXPECT_EQ(statusOfChild([&] {
               if (!rt::isThreadGone(other.token()) || rt::isThreadGone(own)) return 1;
-              if (RT_TEST_THREAD_SANITIZER) return 0;  // It allows no new threads in the child.
+              if (RT_TEST_THREAD_SANITIZER) return 0;  // The sanitizer allows no new threads in the child.
               const Other ofChild;
               if (rt::isThreadGone(ofChild.token()) || ofChild.token() == other.token()) return 2;
               return statusOfChild([&] {

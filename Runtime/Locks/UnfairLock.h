@@ -1,6 +1,7 @@
 #pragma once
 
-/// The lock to use: four bytes, no allocation, no fairness, and misuse caught in every build.
+/// `rt::UnfairLock` is the lock to use by default. It has four bytes, allocates nothing, is not fair and
+/// catches misuse in every build.
 ///
 ///     class Counter {
 ///      public:
@@ -13,22 +14,26 @@
 ///       int value_ RT_GUARDED_BY(lock_) = 0;    // Runtime/Base/ThreadSafety.h
 ///     };
 ///
-/// A thread that waits spins for a moment and then sleeps. Who comes first when the lock is let go is
-/// not defined, so a thread that lets it go and takes it again at once may well get it. A thread that
-/// takes a lock it holds, and one that lets go a lock it does not hold, ends the program with a line on
-/// standard error that names lock and thread.
+/// A waiting thread spins for a moment and then sleeps. Waiting threads get the lock in no defined order. A
+/// thread that unlocks it and locks it again at once may well get it first.
 ///
-/// The lock itself needs no memory. The first that a thread takes has the thread library note the thread's
-/// end, which allocates in a process with many keys.
+/// A thread ends the program if it locks a lock that it holds, or unlocks a lock that it does not hold. On
+/// Linux a line on standard error names the lock and the thread. On macOS the crash report gives the reason.
 ///
-/// Constant-initialised: a lock at namespace scope is ready before anything runs, and needs nothing at exit.
+/// The lock itself needs no memory. A thread that takes its first lock registers with the thread library,
+/// which then tells when the thread ends. Registering allocates if the process has many thread-specific keys.
 ///
-/// Fork. A fork waits until no other thread holds a lock of this kind. So all of them are free in the child,
-/// but those of the thread that forked, and what they guard is whole. (On macOS the child cannot let go what
-/// that thread held.) A fork waits for about a second at most. A lock that is still held then is free in the
-/// child. What it guards is as its holder left it. On macOS it stays held then.
+/// The lock is constant-initialised. At namespace scope it is ready before anything runs, and nothing runs
+/// for it at exit.
 ///
-/// Not for: what takes long, such as system calls that wait and code of others (Runtime/Locks/LongLock.h);
+/// Fork: a fork waits until no other thread holds a lock of this kind. So all of them are free in the child,
+/// except those that the forking thread holds. The data that they guard is whole. (On macOS the child cannot
+/// unlock what that thread held.)
+///
+/// A fork waits for about a second at most. A lock that is still held then is free in the child. Its data is
+/// as the holder left it. (On macOS the lock stays held.)
+///
+/// Not for: sections that take long, such as blocking system calls and callbacks (Runtime/Locks/LongLock.h);
 /// locks that a thread takes again while it holds them (Runtime/Locks/RecursiveLock.h); waiting for a
 /// condition, for which a queue is better (Runtime/Queues/Queue.h).
 
@@ -45,12 +50,12 @@ namespace rt {
 
 class RT_CAPABILITY("lock") UnfairLock {
  public:
-  /// Not held.
+  /// Makes a free lock.
   constexpr UnfairLock() noexcept = default;
   UnfairLock(const UnfairLock&) = delete;
   UnfairLock& operator=(const UnfairLock&) = delete;
 
-  /// Takes the lock, after waiting until no thread holds it. Ends the program when the caller holds it.
+  /// Waits until no thread holds the lock, and takes it. Ends the program if the caller holds it.
   [[gnu::always_inline]] void lock() noexcept RT_ACQUIRE() {
     if constexpr (detail::SystemLock::kIsTakenOver) {
       detail::ForkGate::enter();
@@ -63,8 +68,7 @@ class RT_CAPABILITY("lock") UnfairLock {
     }
   }
 
-  /// Takes the lock and returns true, or returns false at once when any thread, the caller included,
-  /// holds it.
+  /// Takes the lock and returns true. Returns false at once if any thread holds it, the caller included.
   [[nodiscard, gnu::always_inline]] bool tryLock() noexcept RT_TRY_ACQUIRE(true) {
     if constexpr (detail::SystemLock::kIsTakenOver) {
       detail::ForkGate::enter();
@@ -80,17 +84,18 @@ class RT_CAPABILITY("lock") UnfairLock {
     return isTaken;
   }
 
-  /// Lets the lock go. Ends the program when the caller does not hold it.
+  /// Releases the lock. Ends the program if the caller does not hold it.
   [[gnu::always_inline]] void unlock() noexcept RT_RELEASE() {
     lock_.unlock();
     detail::ForkGate::leave();
   }
 
-  /// Ends the program when the caller does not hold the lock.
+  /// Ends the program if the caller does not hold the lock.
   void assertOwner() const noexcept RT_ASSERT_CAPABILITY(this) { lock_.assertOwner(); }
 
  private:
-  // The lock has been taken while a fork is being made: it is let go, and taken when that is done.
+  // The caller has taken the lock while a fork is being made. These functions release the lock, wait for the
+  // fork and take the lock again.
   [[gnu::cold]] void lockAfterFork() noexcept;
   [[gnu::cold]] bool tryLockAfterFork() noexcept;
   void waitForFork() noexcept;
@@ -100,12 +105,12 @@ class RT_CAPABILITY("lock") UnfairLock {
 
 static_assert(sizeof(UnfairLock) == 4);
 
-/// Holds a lock for as long as a scope lasts, however it is left. For `UnfairLock`, `LongLock`,
-/// `RecursiveLock` and what else has `lock` and `unlock`.
+/// Holds a lock until the end of a scope, also when an exception leaves it. The lock may be an `UnfairLock`,
+/// a `LongLock`, a `RecursiveLock` or anything else with `lock` and `unlock`.
 template <class Lock>
 class RT_SCOPED_CAPABILITY [[nodiscard]] LockGuard {
  public:
-  /// Takes `lock`, which outlives the guard.
+  /// Takes `lock`, which must outlive the guard.
   [[gnu::always_inline]] explicit LockGuard(Lock& lock) RT_ACQUIRE(lock) : lock_(lock) { lock_.lock(); }
   [[gnu::always_inline]] ~LockGuard() RT_RELEASE() { lock_.unlock(); }
   LockGuard(const LockGuard&) = delete;

@@ -27,17 +27,17 @@ static_assert(noexcept(UnfairLock()));
 
 constinit UnfairLock lockAtNamespaceScope;
 
-/// The lock's address as %p prints it, for patterns.
+// Returns the object's address as %p prints it, for patterns.
 std::string addressOf(const void* object) {
   std::array<char, 32> text{};
   std::snprintf(text.data(), text.size(), "%p", object);
   return text.data();
 }
 
-// Death tests end the program on purpose, which the analysis cannot know.
+// Not analysed: death tests end the program on purpose, which the analysis cannot know.
 #define NOT_ANALYSED [&]() RT_NO_THREAD_SAFETY_ANALYSIS
 
-TEST(UnfairLock, IsTakenAndLetGo) {
+TEST(UnfairLock, IsLockedAndUnlocked) {
   UnfairLock lock;
   lock.lock();
   lock.assertOwner();
@@ -58,7 +58,7 @@ TEST(UnfairLock, TryLockTakesAFreeLock) {
   lock.unlock();
 }
 
-TEST(UnfairLock, TryLockLeavesALockThatAnotherThreadHolds) {
+TEST(UnfairLock, TryLockFailsIfAnotherThreadHoldsTheLock) {
   UnfairLock lock;
   LockGuard guard(lock);
   std::thread([&] {
@@ -69,7 +69,7 @@ TEST(UnfairLock, TryLockLeavesALockThatAnotherThreadHolds) {
   }).join();
 }
 
-TEST(UnfairLock, TryLockLeavesALockThatTheCallerHolds) {
+TEST(UnfairLock, TryLockFailsIfTheCallerHoldsTheLock) {
   UnfairLock lock;
   const auto tryTwice = NOT_ANALYSED {
     lock.lock();
@@ -79,7 +79,7 @@ TEST(UnfairLock, TryLockLeavesALockThatTheCallerHolds) {
   tryTwice();
 }
 
-TEST(UnfairLock, GuardLetsGoWhenAnExceptionPasses) {
+TEST(UnfairLock, GuardUnlocksWhenAnExceptionPasses) {
   UnfairLock lock;
   try {
     LockGuard guard(lock);
@@ -91,7 +91,7 @@ TEST(UnfairLock, GuardLetsGoWhenAnExceptionPasses) {
   lock.unlock();
 }
 
-TEST(UnfairLock, ServesTheStandardGuards) {
+TEST(UnfairLock, WorksWithTheStandardGuards) {
   UnfairLock lock;
   {
     std::lock_guard guard(lock);
@@ -101,8 +101,8 @@ TEST(UnfairLock, ServesTheStandardGuards) {
   lock.unlock();
 }
 
-// Invariant: `value` is only ever touched by the holder, so no increment is lost and, under the thread
-// sanitizer, no race is seen. More threads than processors make them sleep and be woken.
+// Invariant: only the holder touches `value`. So no increment is lost, and the thread sanitizer sees no race.
+// There are more threads than processors, so that threads sleep and are woken.
 TEST(UnfairLock, ManyThreadsCountTogether) {
   constexpr int kThreads = 8;
   constexpr int kRounds = 20'000;
@@ -122,9 +122,9 @@ TEST(UnfairLock, ManyThreadsCountTogether) {
   EXPECT_EQ(value, kThreads * kRounds);
 }
 
-// Invariant: at most one thread is inside. The holder gives the processor away, so that every other
-// thread falls asleep at the lock and has to be woken by exactly one unlock.
-TEST(UnfairLock, SleepersAreWokenOneAfterTheOther) {
+// Invariant: at most one thread is inside. The holder yields the processor, so that every other thread falls
+// asleep at the lock. Exactly one unlock has to wake each of them.
+TEST(UnfairLock, WakesSleepingThreadsOneAfterTheOther) {
   constexpr int kThreads = 4;
   constexpr int kRounds = 300;
   UnfairLock lock;
@@ -163,7 +163,7 @@ TEST(UnfairLock, LeavesErrnoAloneWhileItWaits) {
 
 #if !defined(__APPLE__)
 
-TEST(UnfairLockDeathTest, TakingItAgainEndsTheProgram) {
+TEST(UnfairLockDeathTest, LockingTwiceEndsTheProgram) {
   UnfairLock lock;
   const auto takeTwice = NOT_ANALYSED {
     lock.lock();
@@ -173,7 +173,7 @@ TEST(UnfairLockDeathTest, TakingItAgainEndsTheProgram) {
                "rt: the lock at " + addressOf(&lock) + " is taken again by thread [0-9]+, which holds it");
 }
 
-TEST(UnfairLockDeathTest, LettingGoAFreeLockEndsTheProgram) {
+TEST(UnfairLockDeathTest, UnlockingAFreeLockEndsTheProgram) {
   UnfairLock lock;
   const auto letGo = NOT_ANALYSED {
     lock.unlock();
@@ -182,7 +182,7 @@ TEST(UnfairLockDeathTest, LettingGoAFreeLockEndsTheProgram) {
                             " is unlocked by thread [0-9]+, but no thread holds it");
 }
 
-TEST(UnfairLockDeathTest, LettingGoAnotherThreadsLockEndsTheProgram) {
+TEST(UnfairLockDeathTest, UnlockingAnotherThreadsLockEndsTheProgram) {
   UnfairLock lock;
   const auto letGoForeign = NOT_ANALYSED {
     lock.lock();
@@ -192,20 +192,20 @@ TEST(UnfairLockDeathTest, LettingGoAnotherThreadsLockEndsTheProgram) {
                                    " is unlocked by thread [0-9]+, but thread [0-9]+ holds it");
 }
 
-TEST(UnfairLockDeathTest, MissingLockEndsTheProgram) {
+TEST(UnfairLockDeathTest, AssertingAFreeLockEndsTheProgram) {
   UnfairLock lock;
   EXPECT_DEATH(lock.assertOwner(),
                "rt: the lock at " + addressOf(&lock) + " is needed by thread [0-9]+, but no thread holds it");
 }
 
-TEST(UnfairLockDeathTest, AnotherThreadsLockIsNotTheCallers) {
+TEST(UnfairLockDeathTest, AssertingAnotherThreadsLockEndsTheProgram) {
   UnfairLock lock;
   LockGuard guard(lock);
   const auto assertElsewhere = [&] { std::thread([&] { lock.assertOwner(); }).join(); };
   EXPECT_DEATH(assertElsewhere(), "is needed by thread [0-9]+, but thread [0-9]+ holds it");
 }
 
-/// Runs `body` in a forked child; returns its exit status, or -1 when it did not exit.
+// Runs `body` in a forked child. Returns the child's exit status, or -1 if it did not exit.
 template <class Body>
 int exitStatusOfChild(Body body) {
   const pid_t child = fork();
@@ -218,7 +218,7 @@ int exitStatusOfChild(Body body) {
   return WIFEXITED(status) ? WEXITSTATUS(status) : -1;
 }
 
-TEST(UnfairLock, HeldAcrossForkIsTheForkingThreadsInTheChild) {
+TEST(UnfairLock, TheForkingThreadHoldsItInTheChild) {
   UnfairLock lock;
   LockGuard guard(lock);
   EXPECT_EQ(0, exitStatusOfChild(NOT_ANALYSED {
@@ -230,7 +230,7 @@ TEST(UnfairLock, HeldAcrossForkIsTheForkingThreadsInTheChild) {
   lock.assertOwner();
 }
 
-TEST(UnfairLockDeathTest, TakingItAgainInTheChildOfAForkIsStillCaught) {
+TEST(UnfairLockDeathTest, LockingTwiceInAForkedChildEndsTheProgram) {
   UnfairLock lock;
   const auto takeInChild = NOT_ANALYSED {
     lock.lock();

@@ -1,23 +1,28 @@
 #pragma once
 
-/// A reference that threads read without a lock while others replace it.
+/// `rt::AtomicRef<T>` is a strong reference that threads read without a lock while others replace it.
 ///
 ///     rt::AtomicRef<Settings> settings_;
-///     const rt::Ref<Settings> now = settings_.load();     // lasts, whatever is set meanwhile
+///     const rt::Ref<Settings> now = settings_.load();     // stays valid when another is set
 ///     settings_.exchange(rt::make<Settings>("dark"_s));
 ///
-/// Reading is one atomic operation, and no thread that reads ever waits for another. Who replaces waits for
-/// others who do. An object that is replaced goes with the last reference to it that was read.
+/// Threads: reading is one atomic operation. It is repeated if another thread changed the reference
+/// meanwhile. A reader never waits for another thread. A thread that replaces the reference waits for others
+/// that replace it. A replaced object lives until the last reference that was read is released.
 ///
-/// To read a pointer and then to count would be too late: the object may be gone in between. So the object is
-/// counted beforehand, for many readers, and the word that they read holds beside the pointer how many of
-/// these counts it has lent. A reader keeps the one that it was lent. What is left when the object is
-/// replaced is given back; before the lot is used up, a reader that sees it near its end adds to it.
+/// Reading the pointer first and retaining the object afterwards would be too late. The object might be gone
+/// in between. So the object is retained many times in advance. These counts are called the lot, and each
+/// reader is lent one of them. One atomic word holds the pointer and the number of counts that have been
+/// lent.
 ///
-/// In the child of a fork the counts lent to threads that are gone are lost: an object that they were reading
-/// is never destroyed there.
+/// A reader keeps its count. When the object is replaced, the counts that are left in the lot are released. A
+/// reader that finds half of the lot lent adds new counts to it.
 ///
-/// Not for: references that one thread has; several that must fit each other, which belong in one object.
+/// In the child of a fork, counts lent to threads that are gone are lost. An object that they were reading is
+/// never destroyed there.
+///
+/// Not for: a reference that one thread uses; several references that must match each other, which belong in
+/// one object.
 
 #include <atomic>
 #include <cstdint>
@@ -31,19 +36,19 @@
 
 namespace rt {
 
-/// T is a class of objects, and no protocol.
+/// T is a class that derives from `Object`. It cannot be a protocol.
 template <class T>
 class AtomicRef {
   static_assert(sizeof(void*) == sizeof(std::uint64_t), "a pointer leaves 16 bits of a word");
 
  public:
-  /// Null.
+  /// Makes a null reference.
   constexpr AtomicRef() noexcept = default;
   AtomicRef(const AtomicRef&) = delete;
   AtomicRef& operator=(const AtomicRef&) = delete;
   ~AtomicRef() { exchange(nullptr); }
 
-  /// The object, or null.
+  /// Returns a reference to the object, or null.
   Ref<T> load() const noexcept {
     Word word = word_.load(std::memory_order_relaxed);
     do {
@@ -56,16 +61,17 @@ class AtomicRef {
     return result;
   }
 
-  /// Has `next`, which may be null, take the place of what is there, and returns that.
+  /// Replaces the reference with `next`, which may be null. Returns the previous reference.
   Ref<T> exchange(Ref<T> next) noexcept {
     const LockGuard guard(lock_);
     replace(next);
     return next;
   }
 
-  /// The same, and true, where `expected` is there; else false, and nothing has changed.
+  /// If the reference is `expected`, replaces it with `next` and returns true. Otherwise changes nothing and
+  /// returns false.
   bool compareExchange(const Ref<T>& expected, Ref<T> next) noexcept {
-    // `next` gives up what was there after the lock.
+    // `next` takes over the previous reference. It releases that after the lock.
     const LockGuard guard(lock_);
     if (current_ != expected) return false;
     replace(next);
@@ -73,7 +79,7 @@ class AtomicRef {
   }
 
  private:
-  /// The object's address above, how many counts are lent below.
+  // The object's address is in the upper bits. The number of lent counts is in the lower bits.
   using Word = std::uint64_t;
   static constexpr int kLentBits = 16;
   static constexpr std::uint32_t kLot = 1U << kLentBits;
@@ -89,18 +95,18 @@ class AtomicRef {
     if (next != nullptr) next->releaseTimes(kLot - lentIn(word));
   }
 
-  // Half of the lot is still there for the others meanwhile.
+  // Called when half of the lot is lent. Other readers use the other half meanwhile.
   [[gnu::cold]] void addToLot(const T& object, std::uint32_t count) const noexcept {
     object.retainTimes(count);
     Word word = word_.load(std::memory_order_relaxed);
     while (objectIn(word) == &object && lentIn(word) >= count) {
       if (word_.compare_exchange_weak(word, word - count, std::memory_order_relaxed)) return;
     }
-    object.releaseTimes(count);  // Meanwhile another reader has, or it was replaced: seldom seen.
+    object.releaseTimes(count);  // Rare: another reader was faster, or the object was replaced.
   }
 
   mutable std::atomic<Word> word_ = 0;
-  // The object in the word, with a reference of its own. For those who replace it.
+  // Writers hold the lock. `current_` is the object in the word, with a reference of its own.
   UnfairLock lock_;
   Ref<T> current_ RT_GUARDED_BY(lock_);
 };

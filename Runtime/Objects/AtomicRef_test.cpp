@@ -18,7 +18,7 @@ namespace {
 using rt::AtomicRef;
 using rt::Ref;
 
-/// Two numbers that are the same for as long as it lives; how many there are is counted.
+// Holds two numbers that are equal as long as the object lives. `alive` counts the objects.
 class Twins final : public rt::Implements<Twins, rt::Object> {
  public:
   explicit Twins(int number) : first_(number), second_(number) { ++alive; }
@@ -48,7 +48,7 @@ TEST_F(AtomicRefTest, StartsAsNull) {
   EXPECT_FALSE(reference.load());
 }
 
-TEST_F(AtomicRefTest, GivesWhatWasSetAndWhatThatReplaced) {
+TEST_F(AtomicRefTest, ExchangeReturnsThePreviousObject) {
   AtomicRef<Twins> reference;
   EXPECT_FALSE(reference.exchange(rt::make<Twins>(1)));
   EXPECT_EQ(reference.load()->number(), 1);
@@ -59,7 +59,7 @@ TEST_F(AtomicRefTest, GivesWhatWasSetAndWhatThatReplaced) {
   EXPECT_EQ(Twins::alive, 0);
 }
 
-TEST_F(AtomicRefTest, KeepsItsObjectAndLetsItGoAtItsEnd) {
+TEST_F(AtomicRefTest, RetainsItsObjectUntilItIsDestroyed) {
   rt::Weak<Twins> weak;
   {
     AtomicRef<Twins> reference;
@@ -70,7 +70,7 @@ TEST_F(AtomicRefTest, KeepsItsObjectAndLetsItGoAtItsEnd) {
   EXPECT_FALSE(weak.lock());
 }
 
-TEST_F(AtomicRefTest, AnObjectThatIsReplacedGoesWithTheLastReferenceToIt) {
+TEST_F(AtomicRefTest, AReplacedObjectLivesUntilItsLastReferenceIsReleased) {
   AtomicRef<Twins> reference;
   reference.exchange(rt::make<Twins>(1));
   Ref<Twins> first = reference.load();
@@ -81,7 +81,7 @@ TEST_F(AtomicRefTest, AnObjectThatIsReplacedGoesWithTheLastReferenceToIt) {
   EXPECT_EQ(second->number(), 1);
 }
 
-TEST_F(AtomicRefTest, TakesTheObjectThatItHas) {
+TEST_F(AtomicRefTest, MayBeReplacedWithTheSameObject) {
   AtomicRef<Twins> reference;
   const Ref<Twins> twins = rt::make<Twins>(1);
   reference.exchange(twins);
@@ -90,7 +90,7 @@ TEST_F(AtomicRefTest, TakesTheObjectThatItHas) {
   EXPECT_EQ(reference.load(), twins);
 }
 
-TEST_F(AtomicRefTest, IsReplacedOnlyWhereItIsWhatIsExpected) {
+TEST_F(AtomicRefTest, CompareExchangeReplacesOnlyTheExpectedObject) {
   AtomicRef<Twins> reference;
   const Ref<Twins> first = rt::make<Twins>(1);
   EXPECT_FALSE(reference.compareExchange(first, nullptr));
@@ -101,8 +101,8 @@ TEST_F(AtomicRefTest, IsReplacedOnlyWhereItIsWhatIsExpected) {
   EXPECT_EQ(reference.load()->number(), 3);
 }
 
-// More than are counted beforehand, so that readers add to them; some are kept.
-TEST_F(AtomicRefTest, LendsAsManyReferencesAsAreWanted) {
+// Reads more often than one lot has counts, so that readers add to the lot. Keeps half of the references.
+TEST_F(AtomicRefTest, LendsMoreReferencesThanOneLotHas) {
   AtomicRef<Twins> reference;
   reference.exchange(rt::make<Twins>(1));
   std::vector<Ref<Twins>> kept;
@@ -125,8 +125,8 @@ TEST_F(AtomicRefTest, ReadingAllocatesNothing) {
   EXPECT_EQ(count.allocations(), 0);
 }
 
-// Invariant: what is read is whole, and nothing is destroyed twice or kept, however often it is replaced.
-TEST_F(AtomicRefTest, ThreadsReadWhatOthersReplace) {
+// Invariant: every object that is read is whole. No object is destroyed twice or leaked.
+TEST_F(AtomicRefTest, ThreadsReadWhileOthersReplace) {
   AtomicRef<Twins> reference;
   reference.exchange(rt::make<Twins>(0));
   std::atomic<bool> isEnding = false;
@@ -150,7 +150,7 @@ TEST_F(AtomicRefTest, ThreadsReadWhatOthersReplace) {
         const Ref<Twins> known = reference.load();
         reference.compareExchange(known, rt::make<Twins>(i));
         if (i % 100 == 0) reference.exchange(nullptr);
-        // The same object again while its references are out.
+        // Replaces the reference with the same object while references to it are lent.
         if (i % 50 == 0) reference.exchange(known);
       }
     });
@@ -161,7 +161,7 @@ TEST_F(AtomicRefTest, ThreadsReadWhatOthersReplace) {
   EXPECT_EQ(wrong, 0);
 }
 
-// Invariant: whatever the other threads were doing, the child of a fork reads and replaces.
+// Invariant: the child of a fork can read and replace, whatever the other threads were doing.
 TEST_F(AtomicRefTest, IsUsableInTheChildOfAFork) {
   AtomicRef<Twins> reference;
   reference.exchange(rt::make<Twins>(0));

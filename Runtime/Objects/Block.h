@@ -1,25 +1,26 @@
 #pragma once
 
-/// A function with what it captured, shared by reference: null or counted, one pointer.
+/// `rt::Block` is a function with its captured values, shared by reference. It is one pointer, null or
+/// counted.
 ///
 ///     rt::Block<int(int)> twice = [](int value) { return 2 * value; };
 ///     rt::Block<void()> log = [message = std::move(message)] { print(message); };
 ///     if (log) log();
 ///     rt::Block<int(int)> same = twice;         // one more reference; same == twice
 ///
-/// Made from a lambda, another callable object or a pointer to a function; what is captured need only be
-/// movable. A copy is another reference to the same block, and two blocks are equal if they are the same
-/// one. A callable object that captures nothing makes the same block each time, without allocating or
-/// counting.
+/// A block is made from a lambda, another callable object or a pointer to a function. Captured values need
+/// only be movable. A copy is another reference to the same block. Two blocks are equal if they are the same
+/// block. A callable object without state makes the same block each time. Such a block neither allocates nor
+/// counts.
 ///
-/// A call keeps the block alive until it returns, also when the variable that it was called through is
-/// replaced meanwhile. Calling null ends the program with a line on standard error. An exception passes
-/// through. Different `Block` objects may be used by different threads at once, and the same block may be
-/// called by several threads at once if what it does allows that; one `Block` object is as safe as a
-/// plain pointer.
+/// A call keeps the block alive until it returns, even if its variable is replaced meanwhile. Calling a null
+/// block ends the program with a line on standard error. An exception passes through.
 ///
-/// Not for: parameters that are only called during the call, which may be templates; cycles (an object
-/// that keeps a block which captures the object: capture a `Weak`).
+/// Threads: threads may use different `Block` objects at the same time. Several threads may call the same
+/// block at once if its function allows that. One `Block` object is as thread-safe as a plain pointer.
+///
+/// Not for: parameters that a function only calls before it returns, which may be templates; cycles. A block
+/// that captures the object that keeps it is a cycle: capture a `Weak`.
 
 #include <concepts>
 #include <cstddef>
@@ -37,7 +38,7 @@ namespace rt {
 
 namespace detail {
 
-/// The class of what blocks refer to.
+// The class of the objects that blocks refer to.
 class RT_VISIBLE BlockObject : public Implements<BlockObject, Object> {
  public:
   static constexpr std::string_view kClassName = "Block";
@@ -57,7 +58,7 @@ class BlockBody : public BlockObject {
   constexpr BlockBody() noexcept = default;
 };
 
-/// A block with a function object of its own.
+// A block with a function object of its own.
 template <class Function, class Result, class... Arguments>
 class CapturingBlock final : public BlockBody<Result, Arguments...> {
  public:
@@ -72,7 +73,8 @@ class CapturingBlock final : public BlockBody<Result, Arguments...> {
   mutable Function function_;
 };
 
-/// A block of a function object without state: a constant, since any object of its type will do.
+// A block of a function object without state. It is a constant, since all objects of such a type do the
+// same.
 template <class Function, class Result, class... Arguments>
 class ConstantBlock final : public BlockBody<Result, Arguments...> {
  public:
@@ -100,13 +102,14 @@ class Block;
 template <class Result, class... Arguments>
 class Block<Result(Arguments...)> {
  public:
-  /// Null.
+  /// Makes a null block.
   constexpr Block() noexcept = default;
   constexpr Block(std::nullptr_t) noexcept {}
 
-  /// A block that calls `function` with what it is called with, from any `const` or other context.
-  /// Takes `function` over; null if it is a null pointer. Throws std::bad_alloc, and what moving or
-  /// copying `function` throws; neither if it is stateless.
+  /// Makes a block that calls `function` with the block's arguments. Moves or copies `function` into the
+  /// block. Calls may change its state, also through a `const` block. Null if `function` is a null pointer.
+  /// Throws std::bad_alloc and what moving or copying `function` throws. Throws nothing if `function` has no
+  /// state.
   template <class Function>
     requires(!std::same_as<std::remove_cvref_t<Function>, Block> &&
              std::is_invocable_r_v<Result, std::decay_t<Function>&, Arguments...>)
@@ -124,7 +127,7 @@ class Block<Result(Arguments...)> {
     }
   }
 
-  /// Calls the block, which must not be null, and keeps it alive until it returns.
+  /// Calls the block, which must not be null. Keeps it alive until it returns.
   Result operator()(Arguments... arguments) const {
     const Ref<const Body> body = body_;
     if (!body) [[unlikely]]
@@ -132,8 +135,8 @@ class Block<Result(Arguments...)> {
     return body->call(std::forward<Arguments>(arguments)...);
   }
 
-  /// The same for a caller who knows that something keeps the block until it returns, such as a constant
-  /// member of an object that the caller has a reference to. Spares the count.
+  /// Calls the block without counting a reference. Precondition: something keeps the block alive until the
+  /// call returns. An example is a constant member of an object that the caller has a reference to.
   Result callKept(Arguments... arguments) const {
     if (!body_) [[unlikely]]
       detail::trapOnNullBlock();
@@ -142,11 +145,12 @@ class Block<Result(Arguments...)> {
 
   explicit operator bool() const noexcept { return body_ != nullptr; }
 
-  /// Whether both are the same block, or both are null.
+  /// Returns whether both are the same block, or both are null.
   friend bool operator==(const Block&, const Block&) noexcept = default;
   friend bool operator==(const Block& block, std::nullptr_t) noexcept { return !block; }
 
-  /// The block as an object, equal to itself only; null for null. For where objects are kept.
+  /// Returns the block as an object, for places that keep objects. It is equal only to itself. Null for a
+  /// null block.
   Ref<Object> object() const noexcept { return const_cast<Body*>(body_.get()); }
 
  private:

@@ -30,7 +30,7 @@ TEST(Block, IsNullUntilItIsMade) {
   EXPECT_FALSE(block.object());
 }
 
-TEST(Block, IsMadeFromWhatCanBeCalled) {
+TEST(Block, IsMadeFromAnyCallable) {
   int base = 39;
   ++base;
   const rt::Block<int(int)> fromLambda = [base](int value) { return base + value; };
@@ -45,7 +45,7 @@ TEST(Block, IsMadeFromWhatCanBeCalled) {
   EXPECT_FALSE(fromNullPointer);
 }
 
-TEST(Block, DropsAResultThatNobodyWants) {
+TEST(Block, DropsTheResultOfItsFunctionIfItReturnsVoid) {
   int calls = 0;
   const rt::Block<void()> block = [&calls] { return ++calls; };
   block();
@@ -65,7 +65,7 @@ TEST(Block, PassesArgumentsAsTheyAreDeclared) {
   EXPECT_EQ(*byValue(std::make_unique<int>(41)), 42);
 }
 
-TEST(Block, CapturesWhatCanOnlyBeMoved) {
+TEST(Block, CapturesMoveOnlyValues) {
   const rt::Block<int()> block = [number = std::make_unique<int>(42)] { return *number; };
   const rt::Block<int()> copy = block;  // NOLINT(performance-unnecessary-copy-initialization)
   EXPECT_EQ(copy(), 42);
@@ -88,7 +88,7 @@ TEST(Block, IsEqualToItsCopiesOnly) {
   EXPECT_NE(one, another);
 }
 
-TEST(Block, IsTheSameEachTimeWhereNothingIsCaptured) {
+TEST(Block, IsTheSameBlockEachTimeIfNothingIsCaptured) {
   const auto make = [] { return rt::Block<int()>([] { return 42; }); };
   EXPECT_EQ(make(), make());
   EXPECT_EQ(make()(), 42);
@@ -104,7 +104,7 @@ TEST(Block, IsAnObject) {
   EXPECT_EQ(object, rt::Block<void()>(block).object());
 }
 
-TEST(Block, ReleasesWhatItCapturedWithItsLastReference) {
+TEST(Block, ReleasesItsCapturesWithItsLastReference) {
   rt::Ref<Token> token = rt::make<Token>();
   const rt::Weak<Token> weak = token;
   rt::Block<void()> block = [token = std::move(token)] {};
@@ -143,7 +143,7 @@ TEST(Block, StaysAliveDuringACallThatThrows) {
   EXPECT_FALSE(weak.lock());
 }
 
-TEST(Block, AllocatesOnceAndForCapturesOnly) {
+TEST(Block, AllocatesOnceAndOnlyForCaptures) {
   if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations on this system";
   int value = 1;
   const AllocationCount count;
@@ -157,7 +157,7 @@ TEST(Block, AllocatesOnceAndForCapturesOnly) {
   EXPECT_EQ(count.allocations(), 1);
 }
 
-TEST(Block, IsCalledWithoutACountByWhoKeepsIt) {
+TEST(Block, CallKeptCallsTheBlockAndTrapsOnNull) {
   const rt::Block<std::uint32_t()> block = [token = rt::make<Token>()] { return 42U; };
   EXPECT_EQ(block.callKept(), 42U);
   EXPECT_DEATH(rt::Block<void()>().callKept(), "");
@@ -169,8 +169,8 @@ TEST(BlockDeathTest, EndsTheProgramWhenNullIsCalled) {
   EXPECT_DEATH(static_cast<void>(block(1)), "rt: a null Block was called, from 0x");
 }
 
-// Every thread calls and drops references of its own to one block; what it captured goes once, at the
-// end.
+// Every thread calls one block and drops references of its own to it. The captured object is destroyed once,
+// at the end.
 TEST(Block, IsSharedBetweenThreads) {
   constexpr int kThreads = 4;
   constexpr int kRounds = 2000;

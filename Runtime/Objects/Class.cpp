@@ -10,12 +10,12 @@ namespace rt {
 
 namespace {
 
-/// Records by name. Ready before anything runs and never destroyed; made of the entries that the records
-/// bring along, so that nothing is allocated. Looking up takes no lock.
+// Finds records by name. It is ready before anything runs and is never destroyed. It consists of entries that
+// the records bring along, so it allocates nothing. Looking up takes no lock.
 template <class Info>
 class NameTable {
  public:
-  /// `kind` is what to call the records in a report.
+  // `kind` is what a report calls the records.
   explicit constexpr NameTable(const char* kind) noexcept : kind_(kind) {}
 
   void add(detail::NamedEntry<Info>& entry) noexcept {
@@ -59,7 +59,7 @@ constinit detail::NamedEntry<ClassInfo> objectEntry{&classInfo<Object>(), detail
 
 }  // namespace
 
-// Object's record is no template's, so that nothing else mentions it.
+// Object's record is not made by a template, so nothing else announces it.
 template struct detail::AnnouncedOnLoading<objectEntry>;
 
 namespace detail {

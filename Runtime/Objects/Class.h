@@ -1,7 +1,7 @@
 #pragma once
 
-/// Classes and protocols. A protocol is an abstract class without data that names itself; a class names
-/// itself, its superclass and its protocols.
+/// Classes and protocols. A protocol is an abstract class without data. It names itself as a template
+/// argument of its base. A class likewise names itself, its superclass and its protocols.
 ///
 ///     struct Clock : rt::Protocol<Clock> {
 ///       virtual Time now() const = 0;
@@ -21,19 +21,21 @@
 ///     if (Clock* clock = rt::cast<Clock>(object.get())) clock->now();
 ///     rt::classNamed("SystemClock");                                      // Runtime/Objects/ClassInfo.h
 ///
-/// A class is called as in the source, without the namespaces around it; likewise a protocol. One that
-/// is to be called otherwise, or whose name in the source is the compiler's choice (a template's
-/// arguments), says so:
+/// A class or protocol is called as in the source, without the namespaces around it. It may state another
+/// name as below. It must do so if the compiler chooses how its name is written, as with a template's
+/// arguments.
 ///
-///     static constexpr std::string_view kClassName = "SRLRegistry";       // kProtocolName
+///     static constexpr std::string_view kClassName = "SRLRegistry";       // in a protocol: kProtocolName
 ///
-/// A class is known by name if the program anywhere makes an object of it or asks for its record, or if
-/// it has a virtual function that is neither pure nor inline (then by the source file that defines the
-/// first of these). A protocol is known by name if a known class conforms to it or the program asks for
-/// its record.
+/// A class is known by name if the program makes an object of it or asks for its record. A class may also
+/// have a virtual function that is neither pure nor inline. The source file that defines the first such
+/// function then makes the class known. A protocol is known by name if a known class conforms to it or the
+/// program asks for its record.
 ///
-/// Not for: telling C++ types apart that are no objects. There is no virtual inheritance: a class that
-/// conforms to two protocols, both of which inherit a third, converts to the third by way of one of them.
+/// Inheritance is never virtual. A class may conform to two protocols that both inherit a third. It then
+/// converts to the third by way of one of the two.
+///
+/// Not for: telling apart C++ types that are not objects.
 
 #include <concepts>
 #include <type_traits>
@@ -44,11 +46,11 @@
 
 namespace rt {
 
-/// The root of all protocols: what leads from a protocol back to the object. Write
-/// `rt::Protocol<Self>`, never this.
+/// The base class of all protocols, which leads from a protocol back to the object. Derive from
+/// `rt::Protocol<Self>`, never from this class.
 class AnyProtocol {
  public:
-  /// The object that conforms to the protocol. Never null; not retained.
+  /// Returns the object that conforms to the protocol. Never null. Does not retain it.
   virtual Object* asObject() const noexcept = 0;
 
   AnyProtocol(const AnyProtocol&) = delete;
@@ -59,8 +61,8 @@ class AnyProtocol {
   constexpr ~AnyProtocol() = default;
 };
 
-/// A class with a record of its own, that is `Object` or one that derives from `Implements<T, ...>`.
-/// A class that only inherits another's record is none: it would go by its superclass's name.
+/// A class with a record of its own: `Object`, or a class that derives from `Implements<T, ...>`. A class
+/// that inherits its superclass's record is not a ClassType. It would go by its superclass's name.
 template <class T>
 concept ClassType = std::derived_from<T, Object> && std::same_as<typename T::ClassSelf, std::remove_cv_t<T>>;
 
@@ -69,7 +71,7 @@ template <class T>
 concept ProtocolType =
     std::derived_from<T, AnyProtocol> && std::same_as<typename T::ProtocolSelf, std::remove_cv_t<T>>;
 
-/// The base of the protocol `Self`, which inherits the protocol `Inherited` where that is given.
+/// The base of the protocol `Self`. It inherits the protocol `Inherited`, if that is given.
 template <class Self, class Inherited = AnyProtocol>
 class Protocol : public Inherited {
  public:
@@ -77,7 +79,7 @@ class Protocol : public Inherited {
   using ProtocolInherited = Inherited;
 
  protected:
-  // Not private with `Self` as a friend: g++ would then take the destructor for accessible.
+  // Not private with `Self` as a friend: g++ would then consider the destructor accessible.
   constexpr Protocol() noexcept = default;  // NOLINT(bugprone-crtp-constructor-accessibility)
   constexpr ~Protocol() = default;
 };
@@ -91,8 +93,9 @@ consteval bool isBaseOfOneOnly() {
 
 }  // namespace detail
 
-/// The base of the class `Self`: it derives from the class `Super` and conforms to `Protocols`, and
-/// to all that these inherit and `Super` conforms to. The constructors are those of `Super`.
+/// The base of the class `Self`, which derives from the class `Super` and conforms to `Protocols`. `Self`
+/// also conforms to what `Protocols` inherit and to what `Super` conforms to. It has the constructors of
+/// `Super`.
 template <class Self, class Super, class... Protocols>
 class Implements : public Super, public Protocols... {
  public:
@@ -121,7 +124,7 @@ class Implements : public Super, public Protocols... {
   constexpr Implements() = default;
 };
 
-/// The same for a class that adds no protocol.
+/// The base of a class that adds no protocol to those of `Super`.
 template <class Self, class Super>
 class Implements<Self, Super> : public Super {
  public:
@@ -142,13 +145,13 @@ class Implements<Self, Super> : public Super {
   constexpr Implements() = default;
 };
 
-/// The record of the class T.
+/// Returns the record of the class T.
 template <ClassType T>
 constexpr const ClassInfo& classInfo() noexcept {
   return T::classRecord();
 }
 
-/// The record of the protocol T.
+/// Returns the record of the protocol T.
 template <ProtocolType T>
 constexpr const ProtocolInfo& protocolInfo() noexcept {
   return detail::ProtocolRecord<std::remove_cv_t<T>>::get();
@@ -156,7 +159,7 @@ constexpr const ProtocolInfo& protocolInfo() noexcept {
 
 namespace detail {
 
-/// The object behind a pointer, not null, to a class or to a protocol.
+// Returns the object behind `pointer`, which is not null and points to a class or a protocol.
 template <class T>
 Object* objectOf(const T* pointer) noexcept {
   if constexpr (std::derived_from<T, Object>) {
@@ -172,9 +175,9 @@ using CopyConst = std::conditional_t<std::is_const_v<From>, const To, To>;
 
 }  // namespace detail
 
-/// `from`, a pointer to an object or to one of its protocols, as a T, which is a class or a protocol;
-/// null where the object is none, and for null. Takes a few nanoseconds, allocates and locks nothing.
-/// The result is not retained.
+/// Returns `from` as a T, which is a class or a protocol. `from` points to an object or to one of its
+/// protocols. Null if the object is not a T, and for null. Does not retain the object. Takes a few
+/// nanoseconds, allocates nothing and takes no lock.
 template <class T, class From>
 detail::CopyConst<From, T>* cast(From* from) noexcept {
   static_assert(ClassType<T> || ProtocolType<T>, "rt::cast leads to a class or a protocol that names itself");

@@ -9,7 +9,7 @@ namespace rt {
 
 namespace {
 
-/// In the order in which they were announced. Only ever grows, so that reading takes no lock.
+// The list of methods, in the order in which they were announced. It only grows, so reading it takes no lock.
 constinit std::atomic<detail::ClassMethodEntry*> first{nullptr};
 constinit UnfairLock lock;
 constinit std::atomic<detail::ClassMethodEntry*>* end RT_GUARDED_BY(lock) = &first;

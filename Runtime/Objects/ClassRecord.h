@@ -1,12 +1,12 @@
 #pragma once
 
-/// How the records of classes and protocols are made and announced: the inside of Runtime/Objects/Class.h,
-/// which is what to include.
-///
-/// A record is a constant of a class template, so that no class needs a line beside its definition.
-/// Announcing it is a function that the system calls when it loads the executable or library: the
-/// function is instantiated with the record. (A pointer in a section of its own would need no function,
-/// but g++ does not put constants of templates into sections.)
+// How the records of classes and protocols are made and announced. This is an implementation detail of
+// Runtime/Objects/Class.h: include that file instead.
+//
+// A record is a constant of a class template, so that a class needs no line beside its definition. The
+// system calls a function that announces the record when it loads the executable or library. The function is
+// instantiated together with the record. (A pointer in a section of its own would need no function. But g++
+// does not put constants of templates into sections.)
 
 #include <array>
 #include <atomic>
@@ -24,18 +24,18 @@ class AnyProtocol;
 
 namespace detail {
 
-/// What the table of names goes by.
+// Returns the hash by which the table of names finds a record.
 constexpr std::uint32_t nameHash(std::string_view name) noexcept {
   std::uint32_t hash = 2166136261U;
   for (const char character : name) hash = (hash ^ static_cast<unsigned char>(character)) * 16777619U;
   return hash;
 }
 
-/// A record as the table of names holds it.
+// An entry of the table of names.
 template <class Info>
 struct NamedEntry {
   const Info* info;
-  /// Of the record's name, since names of constants are known when the program is compiled.
+  // The hash of the record's name. It is a constant: names of constants are known at compile time.
   std::uint32_t nameHash;
   std::atomic<NamedEntry*> next{nullptr};
   bool isClashReported = false;
@@ -44,7 +44,7 @@ struct NamedEntry {
 void announce(NamedEntry<ClassInfo>& entry) noexcept;
 void announce(NamedEntry<ProtocolInfo>& entry) noexcept;
 
-/// The name of T as it is written in the source, without the namespaces or functions around it.
+// Returns the name of T as written in the source, without the namespaces or functions around it.
 template <class T>
 consteval std::string_view sourceName() {
   // g++: "... sourceName() [with T = NAME; std::string_view = ...]"; clang: "... sourceName() [T = NAME]".
@@ -64,8 +64,8 @@ consteval std::string_view sourceName() {
   return text.substr(start);
 }
 
-/// T's `kClassName` if T itself states it (one that T only inherits is the superclass's name), else the
-/// name in the source.
+// Returns T's `kClassName` if T itself states it, else its name in the source. A `kClassName` that T only
+// inherits is the superclass's name.
 template <class T>
 consteval std::string_view className() {
   if constexpr (requires { T::ClassSuper::kClassName; }) {
@@ -77,7 +77,7 @@ consteval std::string_view className() {
   }
 }
 
-/// The same for a protocol and its `kProtocolName`.
+// Returns the name of the protocol T by the same rules, with `kProtocolName`.
 template <class T>
 consteval std::string_view protocolName() {
   if constexpr (requires { T::ProtocolInherited::kProtocolName; }) {
@@ -89,7 +89,7 @@ consteval std::string_view protocolName() {
   }
 }
 
-/// The record of the protocol T. Whoever mentions `get` has the record announced.
+// The record of the protocol T. Code that mentions `get` has the record announced when its image is loaded.
 template <class T>
 struct [[gnu::visibility("default")]] ProtocolRecord {
   static constexpr const ProtocolInfo& get() noexcept {
@@ -116,13 +116,13 @@ constinit const ProtocolInfo ProtocolRecord<T>::kInfo{protocolName<T>(), inherit
 template <class T>
 constinit NamedEntry<ProtocolInfo> ProtocolRecord<T>::entry_{&kInfo, nameHash(protocolName<T>())};
 
-/// How many protocols T stands for: itself and those that it inherits.
+// The number of protocols that T stands for: itself and those that it inherits.
 template <class T>
 constexpr std::size_t kProtocolDepth = 1 + kProtocolDepth<typename T::ProtocolInherited>;
 template <>
 inline constexpr std::size_t kProtocolDepth<AnyProtocol> = 0;
 
-/// Goes by way of Stated, the protocol that the class names, since Protocol may be inherited twice.
+// Converts by way of Stated, the protocol that the class names, since the class may inherit Protocol twice.
 template <class Class, class Stated, class Protocol>
 void* upcast(Object* object) {
   return static_cast<Protocol*>(static_cast<Stated*>(static_cast<Class*>(object)));
@@ -146,7 +146,7 @@ inline constexpr auto kConformances = [] {
   return all;
 }();
 
-/// The record of the class T. Whoever mentions `get` has the record announced.
+// The record of the class T. Code that mentions `get` has the record announced when its image is loaded.
 template <class T, class... Protocols>
 struct [[gnu::visibility("default")]] ClassRecord {
   static constexpr const ClassInfo& get() noexcept {

@@ -41,7 +41,7 @@ class SystemClock : public rt::Implements<SystemClock, rt::Object, Empty, AlarmC
   int now_;
 };
 
-/// Inherits `Clock` twice, by way of both its own protocol and its superclass's.
+// Inherits `Clock` twice: by its own protocol and by its superclass's.
 class QuartzClock : public rt::Implements<QuartzClock, SystemClock, Stopwatch> {
  public:
   using Implements::Implements;
@@ -62,7 +62,7 @@ class NamedBox : public rt::Implements<NamedBox<Content>, rt::Object> {
   static constexpr std::string_view kClassName = "BoxByAnotherName";
 };
 
-/// Has a name of its own although its superclass states one.
+// Has its name in the source, although its superclass states another name.
 class Crate final : public rt::Implements<Crate, NamedBox<int>> {};
 
 class Chest final : public rt::Implements<Chest, NamedBox<int>> {
@@ -86,7 +86,7 @@ struct Outer {
   class Inner final : public rt::Implements<Inner, rt::Object> {};
 };
 
-// What static objects find is found while the program is being loaded.
+// Static objects look names up while the program is being loaded.
 const bool isKnownToStaticObjects =
     rt::classNamed("Stone") != nullptr && rt::protocolNamed("Clock") != nullptr;
 
@@ -94,7 +94,7 @@ static_assert(rt::ClassType<rt::Object> && rt::ClassType<SystemClock> && rt::Cla
 static_assert(rt::ProtocolType<Clock> && rt::ProtocolType<AlarmClock> && !rt::ProtocolType<SystemClock>);
 static_assert(!rt::ClassType<Clock> && !rt::ClassType<int> && !rt::ProtocolType<rt::AnyProtocol>);
 
-TEST(Class, IsCalledAsInTheSource) {
+TEST(Class, HasItsNameInTheSource) {
   EXPECT_EQ(rt::classInfo<SystemClock>().name, "SystemClock");
   EXPECT_EQ(rt::classInfo<rt::Object>().name, "Object");
   EXPECT_EQ(rt::classInfo<Outer::Inner>().name, "Inner");
@@ -104,7 +104,7 @@ TEST(Class, IsCalledAsInTheSource) {
   EXPECT_EQ(rt::protocolInfo<Clock>().name, "Clock");
 }
 
-TEST(Class, IsCalledAsItSays) {
+TEST(Class, HasTheNameThatItStates) {
   EXPECT_EQ(rt::classInfo<NamedBox<int>>().name, "BoxByAnotherName");
   EXPECT_EQ(rt::classInfo<Crate>().name, "Crate");
   EXPECT_EQ(rt::classInfo<Chest>().name, "SRLChest");
@@ -161,7 +161,7 @@ TEST(Protocol, KnowsWhatItInherits) {
   EXPECT_FALSE(rt::protocolInfo<Clock>().conformsTo(rt::protocolInfo<AlarmClock>()));
 }
 
-TEST(Class, IsAskedOfAnObject) {
+TEST(Class, ObjectsAnswerForTheirClass) {
   const rt::Ref<rt::Object> object = rt::make<QuartzClock>();
   EXPECT_EQ(&object->classInfo(), &rt::classInfo<QuartzClock>());
   EXPECT_TRUE(object->isMemberOf(rt::classInfo<QuartzClock>()));
@@ -178,7 +178,7 @@ TEST(Cast, IsNullForNull) {
   EXPECT_FALSE(rt::cast<Clock>(rt::Ref<rt::Object>()));
 }
 
-TEST(Cast, LeadsToClassesAndProtocols) {
+TEST(Cast, ConvertsToClassesAndProtocols) {
   const rt::Ref<Watch> watch = rt::make<Watch>();
   rt::Object* const object = watch.get();
   EXPECT_EQ(rt::cast<Watch>(object), watch.get());
@@ -196,7 +196,7 @@ TEST(Cast, LeadsToClassesAndProtocols) {
   EXPECT_EQ(rt::cast<Clock>(object)->now(), 5);
 }
 
-TEST(Cast, LeadsFromOneProtocolToAnother) {
+TEST(Cast, ConvertsFromOneProtocolToAnother) {
   const rt::Ref<Watch> watch = rt::make<Watch>();
   Empty* const empty = watch.get();
   EXPECT_EQ(rt::cast<Stopwatch>(empty), static_cast<Stopwatch*>(watch.get()));
@@ -222,8 +222,8 @@ TEST(Cast, AllocatesNothing) {
   EXPECT_EQ(count.allocations(), 0);
 }
 
-// As where a class is in several of the objects that a program loads, and the system takes one of them for
-// all.
+// A class is announced again when several images of a program have it and the loader uses one record for all
+// of them.
 TEST(Class, MayBeAnnouncedAgain) {
   static constinit rt::detail::NamedEntry<rt::ClassInfo> entry{&rt::classInfo<Watch>(),
                                                                rt::detail::nameHash("Watch")};
@@ -233,8 +233,8 @@ TEST(Class, MayBeAnnouncedAgain) {
   EXPECT_EQ(rt::classNamed("Watch"), &rt::classInfo<Watch>());
 }
 
-// The model is dynamic_cast, which the tests may use although the runtime does not.
-TEST(Cast, AgreesWithTheCompiler) {
+// The model is dynamic_cast. Tests may use it, although the runtime does not.
+TEST(Cast, AgreesWithDynamicCast) {
   const std::vector<rt::Ref<rt::Object>> objects = {rt::make<SystemClock>(), rt::make<QuartzClock>(),
                                                     rt::make<Watch>(),       rt::make<Stone>(),
                                                     rt::make<Box<int>>(),    rt::make<Crate>()};

@@ -1,7 +1,7 @@
 #pragma once
 
-/// What the runtime and the libraries on it throw: a name that says what kind of failure it is, and a
-/// reason for people.
+/// Exceptions that the runtime and the libraries built on it throw. An exception has a name, which tells the
+/// kind of failure, and a reason for people.
 ///
 ///     throw rt::Exception("Assertion Failed!"_s, "Expected block to report an error!"_s);
 ///
@@ -9,9 +9,11 @@
 ///       if (exception.name() == rt::InternalInconsistencyException::kName) ...
 ///     }
 ///
-/// Exceptions are values; copying one throws nothing. Any thread may read one.
+/// Exceptions are values. Copying an exception throws nothing.
 ///
-/// Not for: what the operating system answers, which is a std::system_error.
+/// Threads: any thread may read an exception.
+///
+/// Not for: failures of the operating system, which are std::system_error.
 
 #include <cstdint>
 #include <stdexcept>
@@ -23,10 +25,10 @@ namespace rt {
 
 class Exception : public std::runtime_error {
  public:
-  /// `what()` becomes "name: reason". Null counts as empty there. Throws std::bad_alloc.
+  /// Makes an exception whose `what()` is "name: reason". Null counts as empty there. Throws std::bad_alloc.
   Exception(String name, String reason);
 
-  /// As given.
+  /// The name and the reason, as given to the constructor. Either may be null.
   const String& name() const noexcept { return name_; }
   const String& reason() const noexcept { return reason_; }
 
@@ -35,12 +37,13 @@ class Exception : public std::runtime_error {
   String reason_;
 };
 
-/// That a program broke a rule of its own: what an assertion that fails raises.
+/// Says that a program broke a rule of its own. A failed assertion throws this exception.
 class InternalInconsistencyException : public Exception {
  public:
   static constexpr std::string_view kName = "InternalInconsistencyException";
 
-  /// The name is `kName` and the reason is the description. `lineNumber` counts from 1; 0 when unknown.
+  /// Makes an exception with the name `kName`. `description` becomes the reason. `lineNumber` counts from 1
+  /// and is 0 if it is unknown.
   InternalInconsistencyException(String function, String file, std::uint64_t lineNumber, String description);
 
   const String& function() const noexcept { return function_; }

@@ -15,7 +15,7 @@ TEST(Exception, CarriesItsNameAndReason) {
   EXPECT_STREQ(exception.what(), "Assertion Failed!: it was so");
 }
 
-TEST(Exception, TakesNullForWhatIsNotKnown) {
+TEST(Exception, AcceptsANullNameAndReason) {
   const rt::Exception exception(nullptr, nullptr);
   EXPECT_TRUE(exception.name().isNull());
   EXPECT_TRUE(exception.reason().isNull());
@@ -27,7 +27,7 @@ TEST(Exception, IsCopiedWithoutThrowing) {
   static_assert(std::is_nothrow_copy_constructible_v<rt::InternalInconsistencyException>);
 }
 
-TEST(InternalInconsistencyException, CarriesWhereAndWhat) {
+TEST(InternalInconsistencyException, CarriesItsPlaceAndDescription) {
   try {
     throw rt::InternalInconsistencyException("main()"_s, "main.cpp"_s, 7, "must not be"_s);
   } catch (const rt::Exception& caught) {

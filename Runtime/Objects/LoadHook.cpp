@@ -13,7 +13,7 @@ constinit UnfairLock lock;
 constinit LoadHookEntry* pending RT_GUARDED_BY(lock) = nullptr;
 constinit LoadHookEntry** end RT_GUARDED_BY(lock) = &pending;
 
-/// Takes the first hook that has yet to run; null when there is none.
+// Takes the first hook that has not run. Null if there is none.
 LoadHookEntry* takePending() noexcept {
   const LockGuard guard(lock);
   LoadHookEntry* entry = pending;

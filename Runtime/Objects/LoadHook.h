@@ -1,6 +1,6 @@
 #pragma once
 
-/// A function of a class that runs when the program is loaded.
+/// A load hook is a function of a class that runs when the program is loaded.
 ///
 ///     class Catalogue : public rt::Implements<Catalogue, rt::Object> {
 ///      public:
@@ -10,14 +10,15 @@
 ///
 ///     template struct rt::LoadHook<Catalogue>;         // in Catalogue.cpp, outside any namespace
 ///
-/// The hook runs once, before `main`, on the thread that loads the program, when every class, protocol
-/// and class method of the program and of all libraries that it links is known. Hooks run in the order
-/// in which their images are initialised (libraries first) and, in one image, in the order of linking;
-/// all before the static objects of the executable are made, so that a hook must not rely on those. The
-/// hook of a library that is opened later runs while it is being opened. An exception that leaves a hook
-/// ends the program.
+/// The hook runs once, before `main`, on the thread that loads the program. By then every class, protocol and
+/// class method of the program and of all libraries that it links is known.
 ///
-/// Not for: work that can wait until it is first needed.
+/// Hooks run in the order in which their images are initialised: libraries come first. Within an image they
+/// run in the order of linking. All of them run before the static objects of the executable are made, so a
+/// hook must not use those. The hook of a library that is opened later runs while the library is being
+/// opened. An exception that leaves a hook ends the program.
+///
+/// Not for: work that can wait until its result is needed.
 
 #include "Runtime/Objects/Class.h"
 
@@ -35,14 +36,14 @@ void announce(LoadHookEntry& entry) noexcept;
 
 }  // namespace detail
 
-/// Makes `Class::load()` the load hook of `Class`, where it is instantiated explicitly as above.
+/// Makes `Class::load()` the load hook of `Class`. Instantiate it explicitly, as above.
 template <ClassType Class>
   requires requires { Class::load(); }
 struct [[gnu::visibility("default")]] LoadHook {
  private:
   static void run() { Class::load(); }
 
-  // Never called: what it mentions is there once it is instantiated.
+  // Never called. It exists so that what it mentions is instantiated.
   static void mention() {
     static_cast<void>(&detail::AnnouncedOnLoading<entry_>::run);
     static_cast<void>(classInfo<Class>());

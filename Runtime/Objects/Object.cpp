@@ -53,7 +53,7 @@ bool Object::retainUnlessDestroyed() const noexcept {
 
 void Object::destroy() const noexcept {
   count_.store(kDestroying, std::memory_order_relaxed);
-  // No cell comes from now on: a weak reference made in a destructor refers to nothing.
+  // No cell is added from here on: a weak reference made in a destructor refers to nothing.
   if (auto* cell = static_cast<detail::WeakCell*>(cellOrClass_.load(std::memory_order_acquire))) {
     cell->clear();
     cell->release();
@@ -64,7 +64,7 @@ void Object::destroy() const noexcept {
 
 void Object::checkNotEscaped() const noexcept {
   const std::uint32_t count = count_.load(std::memory_order_relaxed);
-  // On the stack, or left by its constructor with an exception.
+  // The object is on the stack, or its constructor has thrown.
   if (count == 1) return;
   std::string_view name = "object";
   if ((count & kDestroying) != 0) {

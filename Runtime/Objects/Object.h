@@ -1,6 +1,7 @@
 #pragma once
 
-/// The root of all objects: counted references, equality, hash, description and class.
+/// `rt::Object` is the base class of all objects. It has a reference count, equality, a hash, a description
+/// and a class.
 ///
 ///     class Point final : public rt::Implements<Point, rt::Object> {
 ///      public:
@@ -16,13 +17,14 @@
 ///
 ///     rt::Ref<Point> point = rt::make<Point>(3, 4);      // Runtime/Objects/Ref.h
 ///
-/// An object starts with one reference and is destroyed by the thread that gives up the last. A
-/// destructor may refer to its object, but no reference may outlive it: that is a bug which ends the
-/// program with a line on standard error. Counting is safe from any thread; what a class adds is as
-/// safe as it says.
+/// An object starts with one reference. The thread that releases the last one destroys the object. A
+/// destructor may make references to its object, but none may outlive the object. A reference that does ends
+/// the program with a line on standard error.
 ///
-/// Not for: values, which need no identity and no count; objects on the stack of which references
-/// outlive the scope.
+/// Threads: counting references is thread-safe. Everything else is as thread-safe as the class says.
+///
+/// Not for: values, which need neither identity nor a count; objects on the stack to which references outlive
+/// the scope.
 
 #include <atomic>
 #include <cstdint>
@@ -53,57 +55,58 @@ class Object {
       checkNotEscaped();
   }
 
-  /// Adds a reference. `Ref` does this; call it only where a reference is kept in something untyped.
+  /// Adds a reference. `Ref` calls this. Call it yourself only to keep a reference in something untyped.
   void retain() const noexcept {
     if (isImmortal()) return;
     count_.fetch_add(1, std::memory_order_relaxed);
   }
 
-  /// Gives up a reference; the object is destroyed with the last, on the calling thread.
+  /// Releases a reference. The last release destroys the object on the calling thread.
   void release() const noexcept {
     const std::uint32_t count = count_.load(std::memory_order_acquire);
     if ((count & kImmortal) != 0) return;
-    // Where this is the only reference and there is no weak one, nobody else can add any.
+    // With one strong and no weak reference, no other thread can add a reference. So a read is enough.
     const bool isOnlyOne = count == 1 && cellOrClass_.load(std::memory_order_relaxed) == nullptr;
     if (isOnlyOne || count_.fetch_sub(1, std::memory_order_acq_rel) == 1) [[unlikely]]
       destroy();
   }
 
-  /// Whether `other` is an equal object; false for null. By default only the object itself is.
-  /// Equal objects have equal hashes.
+  /// Returns whether `other` is equal to this object. False for null. By default an object equals only
+  /// itself. Equal objects must have equal hashes.
   virtual bool isEqual(const Object* other) const;
 
-  /// A hash that suits `isEqual`. By default made from the address.
+  /// Returns a hash that is consistent with `isEqual`. By default it is derived from the address.
   virtual std::uint64_t hash() const;
 
-  /// The object as text, for people. By default "<ClassName: 0x...>" with the address.
+  /// Returns a text for people. By default "<ClassName: 0x...>" with the object's address.
   virtual String description() const;
 
-  /// The object for somebody who keeps it as it is now: a copy of one that may change, by default the object
-  /// itself, which suits all that never do. Never null. Throws what making the copy throws.
+  /// Returns an object to keep, which has the present value and never changes. A class whose objects change
+  /// returns a copy. The default returns the object itself, which suits immutable classes. Never null. Throws
+  /// what making the copy throws.
   virtual Ref<Object> copy() const;
 
-  /// The record of the object's class. Overridden by `Implements`, by nothing else.
+  /// Returns the record of the object's class. Only `Implements` overrides this function.
   virtual const ClassInfo& classInfo() const noexcept;
 
-  /// Whether the object is of the class `other` or one that derives from it.
+  /// Returns whether the object's class is `other` or derives from it.
   bool isKindOf(const ClassInfo& other) const noexcept;
 
-  /// Whether the object is of the class `other` itself.
+  /// Returns whether the object's class is `other` itself.
   bool isMemberOf(const ClassInfo& other) const noexcept;
 
-  /// Whether the object's class, or one that it derives from, conforms to `protocol`.
+  /// Returns whether the object's class, or one of its superclasses, conforms to `protocol`.
   bool conformsTo(const ProtocolInfo& protocol) const noexcept;
 
-  /// The record of this class.
+  /// Returns the record of this class.
   static constexpr const ClassInfo& classRecord() noexcept { return kInfo; }
 
  protected:
   constexpr Object() noexcept = default;
 
-  /// Says that the object is a constant that is never destroyed, as a string literal is: counting its
-  /// references writes nothing. Such an object is declared `constexpr`, so that nothing is registered to
-  /// run for it at exit; g++ wants its class to write out `constexpr ~Self() override {}` for that.
+  /// Marks an object as a constant that is never destroyed, such as a string literal. Counting its references
+  /// writes nothing. Declare such an object `constexpr`, so that no destructor is registered to run at exit.
+  /// For that, g++ wants its class to write out `constexpr ~Self() override {}`.
   struct Immortal {};
   explicit constexpr Object(Immortal) noexcept : count_(kImmortal) {}
 
@@ -112,9 +115,9 @@ class Object {
   template <class T>
   friend class AtomicRef;
 
-  // The count is below both bits as long as the object lives. While the object is being destroyed
-  // kDestroying is set, so that references which come and go in a destructor do not destroy it again. A
-  // count that runs over ends in kImmortal: the object leaks, which harms nobody.
+  // The count is below both bits as long as the object lives. kDestroying is set while the object is being
+  // destroyed. So references that come and go in a destructor do not destroy the object again. A count that
+  // overflows ends in kImmortal. The object then leaks, which is harmless.
   static constexpr std::uint32_t kImmortal = 0x80000000;
   static constexpr std::uint32_t kDestroying = 0x40000000;
   static const ClassInfo kInfo;
@@ -125,7 +128,8 @@ class Object {
   }
   bool retainUnlessDestroyed() const noexcept;
 
-  // As many calls of `retain`, or of `release` by somebody who has one reference more.
+  // Each stands for `times` calls of `retain` or `release`. The caller of `releaseTimes` owns one more
+  // reference, so that the object lives on.
   void retainTimes(std::uint32_t times) const noexcept {
     if (!isImmortal()) count_.fetch_add(times, std::memory_order_relaxed);
   }
@@ -136,13 +140,14 @@ class Object {
   [[gnu::noinline]] void destroy() const noexcept;
   [[gnu::cold]] void checkNotEscaped() const noexcept;
 
-  // The cell of the weak references, if there are any; while the object is being destroyed, its class's
-  // record instead, which ~Object would not know.
+  // Points to the cell of the weak references, or is null if there are none. While the object is being
+  // destroyed, it points to the record of the object's class instead. ~Object could not find that record
+  // otherwise.
   mutable std::atomic<void*> cellOrClass_{nullptr};
   mutable std::atomic<std::uint32_t> count_{1};
 };
 
-/// Whether two objects, either of which may be null, are equal. Two nulls are.
+/// Returns whether two objects are equal. Either may be null. Two nulls are equal.
 inline bool isEqual(const Object* first, const Object* second) {
   return first == second || (first != nullptr && second != nullptr && first->isEqual(second));
 }

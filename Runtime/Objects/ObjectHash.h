@@ -1,12 +1,12 @@
 #pragma once
 
-/// Objects by their `isEqual` and `hash` in the standard library's tables, which may then be searched by
-/// pointer, without a reference.
+/// Function objects with which the standard library's hash tables compare objects by `isEqual` and `hash`.
+/// Such a table may be searched by pointer, without a reference.
 ///
 ///     std::unordered_set<rt::Ref<rt::Object>, rt::ObjectHash, rt::ObjectEqual> objects;
 ///     objects.find(object.get());
 ///
-/// Not for: objects by their identity, which is what std::hash and == of references go by.
+/// Not for: tables that go by identity. std::hash and == of references do that.
 
 #include <cstddef>
 

@@ -15,7 +15,7 @@
 
 namespace {
 
-/// Notes its destruction.
+// Counts its destructions.
 class Noted : public rt::Implements<Noted, rt::Object> {
  public:
   explicit Noted(int& destructions) : destructions_(destructions) {}
@@ -65,7 +65,7 @@ TEST(Object, IsDestroyedWithItsLastReference) {
   EXPECT_EQ(destructions, 1);
 }
 
-TEST(Object, MayRefuseToBeMade) {
+TEST(Object, MayThrowFromItsConstructor) {
   class Refusing final : public rt::Implements<Refusing, Noted> {
    public:
     explicit Refusing(int& destructions) : Implements(destructions) {
@@ -136,7 +136,7 @@ TEST(ObjectDeathTest, EndsTheProgramWhenAReferenceOutlivesTheStack) {
       "rt: a reference to the object at 0x[0-9a-f]+ outlives its destructor");
 }
 
-TEST(Object, IsEqualToItselfOnlyUnlessItSaysOtherwise) {
+TEST(Object, IsEqualOnlyToItselfByDefault) {
   int destructions = 0;
   const rt::Ref<Noted> one = rt::make<Noted>(destructions);
   const rt::Ref<Noted> another = rt::make<Noted>(destructions);
@@ -153,7 +153,7 @@ TEST(Object, IsEqualToItselfOnlyUnlessItSaysOtherwise) {
   EXPECT_FALSE(point->isEqual(one.get()));
 }
 
-TEST(Object, IsComparedWithNullInMind) {
+TEST(Object, ComparesWithNull) {
   const rt::Ref<Point> point = rt::make<Point>(3, 4);
   const rt::Ref<rt::Object> equal = rt::make<Point>(3, 4);
   const rt::Ref<Point> null;
@@ -165,7 +165,7 @@ TEST(Object, IsComparedWithNullInMind) {
   EXPECT_TRUE(rt::isEqual(static_cast<const rt::Object*>(nullptr), nullptr));
 }
 
-TEST(Object, IsItsOwnCopyUnlessItSaysOtherwise) {
+TEST(Object, IsItsOwnCopyByDefault) {
   const rt::Ref<Point> point = rt::make<Point>(3, 4);
   EXPECT_EQ(point->copy(), point);
   EXPECT_EQ(kConstant.copy(), &kConstant);
@@ -180,12 +180,12 @@ TEST(Object, IsDescribedByClassAndAddress) {
 
 class Unnamed final : public rt::Object {};
 
-TEST(Object, HasTheRecordOfItsSuperclassWhereItHasNone) {
+TEST(Object, HasItsSuperclassRecordIfItHasNoneOfItsOwn) {
   const Unnamed object;
   EXPECT_EQ(&object.classInfo(), &rt::classInfo<rt::Object>());
 }
 
-TEST(Object, IsNeitherCountedNorDestroyedAsAConstant) {
+TEST(Object, AConstantIsNeitherCountedNorDestroyed) {
   char bytes[sizeof(Constant)];
   std::memcpy(bytes, static_cast<const void*>(&kConstant), sizeof bytes);
   {
@@ -198,7 +198,8 @@ TEST(Object, IsNeitherCountedNorDestroyedAsAConstant) {
   EXPECT_EQ(kConstant.value(), 42);
 }
 
-// Each thread adds and gives up references of its own; the object goes exactly once, after the last.
+// Each thread adds and releases references of its own. The object is destroyed exactly once, with the last
+// reference.
 TEST(Object, IsCountedByManyThreads) {
   constexpr int kThreads = 4;
   constexpr int kRounds = 20'000;

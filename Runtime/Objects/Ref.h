@@ -1,19 +1,21 @@
 #pragma once
 
-/// The strong reference: one pointer, null or counted.
+/// `rt::Ref<T>` is a strong reference: one pointer, which is null or owns one reference to an object.
 ///
 ///     rt::Ref<SystemClock> clock = rt::make<SystemClock>();
-///     rt::Ref<Clock> shared = clock;                    // by a protocol, or a superclass
+///     rt::Ref<Clock> shared = clock;                    // to a protocol, or a superclass
 ///     rt::Ref<Clock> found = rt::cast<Clock>(object);   // from a pointer: adds a reference
 ///     if (found) found->now();
 ///
-/// T is a class that derives from `rt::Object`, or a protocol; it may be incomplete until a reference
-/// is made or dropped. Copying adds a reference, moving leaves null behind. Two references are equal
-/// when they refer to the same object. Different `Ref` objects may be used by different threads at
-/// once; one `Ref` object is as safe as a plain pointer.
+/// T is a class that derives from `rt::Object`, or a protocol. T may be incomplete until a reference is made
+/// or dropped. Copying adds a reference. Moving leaves null behind. Two references are equal if they refer to
+/// the same object.
 ///
-/// Not for: cycles (see Runtime/Objects/Weak.h); parameters of functions that keep nothing, which take `T&`
-/// or `T*`.
+/// Threads: threads may use different `Ref` objects at the same time. One `Ref` object is as thread-safe as a
+/// plain pointer.
+///
+/// Not for: cycles of objects that refer to each other (Runtime/Objects/Weak.h); parameters of functions that
+/// keep nothing, which are `T&` or `T*`.
 
 #include <concepts>
 #include <cstddef>
@@ -31,17 +33,17 @@ class Ref {
  public:
   using Element = T;
 
-  /// Null.
+  /// Makes a null reference.
   constexpr Ref() noexcept = default;
   constexpr Ref(std::nullptr_t) noexcept {}
 
-  /// Adds a reference to `object`, which may be null.
+  /// Retains `object`, which may be null.
   Ref(T* object) noexcept : pointer_(object) { retain(); }
 
   Ref(const Ref& other) noexcept : pointer_(other.pointer_) { retain(); }
   Ref(Ref&& other) noexcept : pointer_(other.detach()) {}
 
-  /// From a reference to a subclass, or to a class that conforms to the protocol T.
+  /// Converts from a reference to a subclass of T, or to a class that conforms to the protocol T.
   template <class Other>
     requires std::convertible_to<Other*, T*>
   Ref(const Ref<Other>& other) noexcept : pointer_(other.get()) {
@@ -51,7 +53,7 @@ class Ref {
     requires std::convertible_to<Other*, T*>
   Ref(Ref<Other>&& other) noexcept : pointer_(other.detach()) {}
 
-  /// From a reference to a protocol to one to the object behind it.
+  /// Converts a reference to a protocol into a reference to the object behind it.
   template <std::derived_from<AnyProtocol> Other>
     requires(std::same_as<T, Object> && !std::derived_from<Other, Object>)
   Ref(const Ref<Other>& other) noexcept : Ref(other ? other->asObject() : nullptr) {}
@@ -63,19 +65,20 @@ class Ref {
     return *this;
   }
 
-  /// Takes over a reference that `object`, which may be null, has already.
+  /// Returns a reference to `object` without retaining it. The caller hands over a reference that it owns.
+  /// `object` may be null.
   static Ref adopt(T* object) noexcept {
     Ref result;
     result.pointer_ = object;
     return result;
   }
 
-  /// Becomes null and hands its reference, if any, to the caller.
+  /// Becomes null. Returns the object, or null. The caller now owns its reference.
   [[nodiscard]] T* detach() noexcept { return std::exchange(pointer_, nullptr); }
 
   void swap(Ref& other) noexcept { std::swap(pointer_, other.pointer_); }
 
-  /// The object, or null; not retained.
+  /// Returns the object, or null. Does not retain it.
   T* get() const noexcept { return pointer_; }
   T* operator->() const noexcept { return pointer_; }
   T& operator*() const noexcept RT_LIFETIME_BOUND { return *pointer_; }
@@ -95,15 +98,15 @@ class Ref {
   T* pointer_ = nullptr;
 };
 
-/// Whether both refer to the same object, or both are null.
+/// Returns whether both refer to the same object, or both are null.
 template <class T, class Other>
   requires requires(T* first, Other* second) { first == second; }
 bool operator==(const Ref<T>& first, const Ref<Other>& second) noexcept {
   return first.get() == second.get();
 }
 
-/// A new T, made from `arguments`, and the only reference to it. Throws what T's constructor throws,
-/// and std::bad_alloc.
+/// Makes a T from `arguments` and returns its first reference. Throws what T's constructor throws, and
+/// std::bad_alloc.
 template <ClassType T, class... Arguments>
 [[nodiscard]] Ref<T> make(Arguments&&... arguments) {
   return Ref<T>::adopt(new T(std::forward<Arguments>(arguments)...));
@@ -115,13 +118,13 @@ Ref<T> make(Arguments&&...) {
   return nullptr;
 }
 
-/// `ref` as a T; null where the object is none, and for null.
+/// Returns `ref` as a reference to T. Null if the object is not a T, and for null.
 template <class T, class From>
 Ref<T> cast(const Ref<From>& ref) noexcept {
   return cast<T>(ref.get());
 }
 
-/// The object as somebody keeps it (`Object::copy`), which is a T too; null for null.
+/// Returns a copy of the object (`Object::copy`). Null for a null reference, and if the copy is not a T.
 template <class T>
 Ref<T> copy(const Ref<T>& ref) {
   if (!ref) return nullptr;
@@ -133,7 +136,7 @@ Ref<T> copy(const Ref<T>& ref) {
   }
 }
 
-/// Whether the objects of two references are equal, or both are null.
+/// Returns whether the objects are equal (`Object::isEqual`), or both references are null.
 template <class T, class Other>
 bool isEqual(const Ref<T>& first, const Ref<Other>& second) {
   return isEqual(first ? detail::objectOf(first.get()) : nullptr,
@@ -142,8 +145,8 @@ bool isEqual(const Ref<T>& first, const Ref<Other>& second) {
 
 }  // namespace rt
 
-/// Of the object's identity, as `==` compares references.
+/// Hashes the object's address, consistent with `operator==`.
 template <class T>
-struct std::hash<rt::Ref<T>> {  // NOLINT(cert-dcl58-cpp): what it is for
+struct std::hash<rt::Ref<T>> {  // NOLINT(cert-dcl58-cpp): a user's specialisation is allowed
   std::size_t operator()(const rt::Ref<T>& ref) const noexcept { return std::hash<T*>()(ref.get()); }
 };

@@ -39,7 +39,7 @@ class QuartzClock final : public rt::Implements<QuartzClock, SystemClock> {
   using Implements::Implements;
 };
 
-/// Conforms to one protocol only, and so is an object and a protocol without doubt.
+// Conforms to one protocol only. So its conversions to `Object` and to a protocol are not ambiguous.
 class Sundial final : public rt::Implements<Sundial, rt::Object, Clock> {
  public:
   int now() const override { return 12; }
@@ -154,7 +154,7 @@ TEST(Ref, AdoptsAndDetaches) {
   EXPECT_FALSE(rt::Ref<SystemClock>::adopt(nullptr));
 }
 
-TEST(Ref, IsWholeWhenADestructorLooksAtIt) {
+TEST(Ref, IsConsistentWhenADestructorReadsIt) {
   class Looking final : public rt::Implements<Looking, rt::Object> {
    public:
     Looking(rt::Ref<rt::Object>& place, bool& sawNull) : place_(place), sawNull_(sawNull) {}
@@ -203,8 +203,8 @@ TEST(Ref, AllocatesNothingButTheObject) {
   EXPECT_EQ(count.allocations(), 1);
 }
 
-// The model: for each object the number of references that should exist. What has none must be gone, and
-// what has one must be alive.
+// The model knows for each object how many references exist. An object without references must be gone. An
+// object with a reference must be alive.
 TEST(Ref, CountsLikeTheModel) {
   constexpr std::size_t kRefs = 16;
   constexpr std::size_t kObjects = 8;
@@ -265,8 +265,8 @@ TEST(Ref, CountsLikeTheModel) {
   }
 }
 
-// Every thread copies and drops references to one object through a class, a protocol and the root. The
-// object is alive as long as one thread has a reference, and gone when none has.
+// Every thread copies and drops references to one object through a class, a protocol and the root. The object
+// lives as long as a thread has a reference, and is gone afterwards.
 TEST(Ref, IsCopiedByManyThreads) {
   rt::Ref<SystemClock> shared = rt::make<SystemClock>(7);
   std::vector<std::jthread> threads;

@@ -8,7 +8,7 @@ namespace rt {
 
 namespace {
 
-// Word by word, the last one with some bytes that have been looked at, so that no byte is looked at alone.
+// Reads whole words. The last word may overlap the one before it, so that no byte is read alone.
 bool isASCII(std::string_view bytes) noexcept {
   constexpr std::uint64_t kHighBits = 0x8080808080808080U;
   constexpr std::size_t kSize = sizeof kHighBits;
@@ -23,7 +23,7 @@ bool isASCII(std::string_view bytes) noexcept {
   return (all & kHighBits) == 0;
 }
 
-/// How many bytes the white space or line end takes that `text` begins with; 0 where it begins with none.
+// Returns the length of the white space or line end that `text` begins with. 0 if there is none.
 std::size_t leadingSpace(std::string_view text) {
   if (text.empty()) return 0;
   const auto first = static_cast<unsigned char>(text[0]);
@@ -36,7 +36,7 @@ std::size_t leadingSpace(std::string_view text) {
   return 0;
 }
 
-/// Where the last character of `text`, which is not empty, begins.
+// Returns where the last character of `text`, which is not empty, begins.
 std::size_t lastCharacter(std::string_view text) {
   std::size_t i = text.size() - 1;
   while (i > 0 && (static_cast<unsigned char>(text[i]) & 0xC0) == 0x80) --i;
@@ -118,7 +118,7 @@ std::int64_t String::integerValue() const noexcept {
   std::string_view text = withoutLeadingSpace(view());
   const bool isNegative = text.starts_with('-');
   if (isNegative || text.starts_with('+')) text.remove_prefix(1);
-  // Negative throughout, as there is one negative number more than there are positive ones.
+  // The value is kept negative, since there is one negative number more than there are positive ones.
   using Limits = std::numeric_limits<std::int64_t>;
   std::int64_t value = 0;
   for (const char c : text) {
@@ -132,7 +132,7 @@ std::int64_t String::integerValue() const noexcept {
 }
 
 String String::lastPathComponent() const {
-  // Without a slash `rfind` gives the value before 0, so that the whole text is kept.
+  // Without a slash, `rfind` returns npos. Adding 1 gives 0, so the whole text is kept.
   return part(view().substr(view().rfind('/') + 1));
 }
 

@@ -1,23 +1,25 @@
 #pragma once
 
-/// Text: one pointer to an immutable, shared run of UTF-8, or null.
+/// `rt::String` is a text: one pointer to an immutable, shared run of UTF-8, or null.
 ///
 ///     using namespace rt::literals;
 ///
 ///     constexpr rt::String kGreeting = "hello"_s;          // neither allocates nor counts, ever
-///     rt::String name = rt::String::fromUTF8(bytes);       // a copy; null where they are not UTF-8
+///     rt::String name = rt::String::fromUTF8(bytes);       // a copy; null if they are not UTF-8
 ///     if (!name) return;
 ///     rt::String line = kGreeting + ", "_s + name.trimmed();
 ///     rt::Ref<rt::Object> object = line;                   // a string is an object, too
 ///
-/// Null and empty are different values: null is no text, and false as a condition. Most questions may be
-/// put to null all the same and get the answer of an empty text; those that may not say so.
+/// Null and empty are different values. Null means that there is no text, and is false as a condition. Most
+/// functions accept null and answer as for an empty text. Those that differ say so.
 ///
-/// Lengths and positions count bytes. NUL is a character like any other. Two strings are equal when they
-/// have the same bytes, and are ordered by them, which is the order of their code points.
+/// Lengths and positions count bytes. NUL is a character like any other. Two strings are equal if they have
+/// the same bytes. Strings are ordered by their bytes, which is the order of their code points.
 ///
-/// Copying adds a reference and moving leaves null behind. Different `String` objects may be used by
-/// different threads at once; one `String` object is as safe as a plain pointer.
+/// Copying adds a reference. Moving leaves null behind.
+///
+/// Threads: threads may use different `String` objects at the same time. One `String` object is as
+/// thread-safe as a plain pointer.
 ///
 /// Not for: bytes that are not text; building a text piece by piece (Runtime/Objects/StringBuilder.h).
 
@@ -37,7 +39,7 @@ namespace rt {
 
 namespace detail {
 
-/// The characters of a literal, as an argument of a template.
+// Holds the characters of a literal, as an argument of a template.
 template <std::size_t size>
 struct StringLiteral {
   consteval StringLiteral(const char (&text)[size]) { std::copy_n(text, size, characters); }
@@ -47,7 +49,7 @@ struct StringLiteral {
   char characters[size];
 };
 
-/// The one object of all literals with these characters.
+// The object that all literals with these characters share.
 template <StringLiteral literal>
 inline constexpr StringObject kStringLiteral{literal.characters, literal.view().size()};
 
@@ -57,9 +59,9 @@ class String;
 
 inline namespace literals {
 
-/// The string of a literal, which is valid UTF-8. Neither allocates nor counts, also when it is copied; it
-/// can be a constant, and then nothing runs for it at start-up or at exit. It is there as long as the program
-/// is: a library with literals is never unloaded (Runtime/Objects/ClassInfo.h).
+/// Returns the string of a literal, which must be valid UTF-8. Neither the string nor a copy of it allocates
+/// or counts. It can be a constant, for which nothing runs at start-up or at exit. It lives as long as the
+/// program, since a library with literals is never unloaded (Runtime/Objects/ClassInfo.h).
 template <detail::StringLiteral literal>
 constexpr String operator""_s() noexcept;
 
@@ -69,7 +71,7 @@ class String {
  public:
   static constexpr std::size_t kNotFound = std::string_view::npos;
 
-  /// Null.
+  /// Makes a null string.
   constexpr String() noexcept = default;
   constexpr String(std::nullptr_t) noexcept {}
 
@@ -84,28 +86,29 @@ class String {
 
   constexpr void swap(String& other) noexcept { std::swap(object_, other.object_); }
 
-  /// A copy of `bytes`; null where they are not valid UTF-8. Throws std::bad_alloc.
+  /// Returns a copy of `bytes`. Null if they are not valid UTF-8. Throws std::bad_alloc.
   static String fromUTF8(std::string_view bytes);
 
-  /// The same for a text that ends with NUL; null for null.
+  /// Returns a copy of a text that ends with NUL. Null for null, and if it is not valid UTF-8. Throws
+  /// std::bad_alloc.
   static String fromUTF8(const char* text);
 
-  /// A copy of `bytes` with U+FFFD in the place of what is not UTF-8: once for each run of bytes that could
-  /// have become one character. Never null. Throws std::bad_alloc.
+  /// Returns a copy of `bytes` with U+FFFD in place of what is not UTF-8. One U+FFFD replaces each longest
+  /// run that could have begun a character, or else a single byte. Never null. Throws std::bad_alloc.
   static String fromUTF8Repaired(std::string_view bytes);
 
-  /// A string over `bytes`, which must never change nor go away: they are not copied. Constants of a library
-  /// that calls this, or uses classes, will do, since it is never unloaded. Null where they are not valid
-  /// UTF-8. Throws std::bad_alloc.
+  /// Returns a string over `bytes`, which are not copied. The bytes must never change or go away. Constants
+  /// of a library that calls this function or uses classes qualify, since it is never unloaded. Null if the
+  /// bytes are not valid UTF-8. Throws std::bad_alloc.
   static String overStatic(std::string_view bytes);
 
-  /// `object` as a string; null where it is none, and for null.
+  /// Returns `object` as a string. Null if it is not a string, and for null.
   static String from(const Object* object) noexcept;
 
-  /// A string with the object `object`, which may be null.
+  /// Returns the string of `object`. Null for null.
   static String from(Ref<StringObject> object) noexcept { return String(object.detach()); }
 
-  /// The object; null for null. Not retained.
+  /// Returns the string's object, or null. Does not retain it.
   constexpr StringObject* object() const noexcept { return const_cast<StringObject*>(object_); }
   operator Ref<Object>() const noexcept { return {object()}; }
 
@@ -117,17 +120,17 @@ class String {
   }
   constexpr explicit operator bool() const noexcept { return !isNull(); }
 
-  /// Whether there are no characters: null has none either.
+  /// Returns whether there are no characters. True for null.
   constexpr bool isEmpty() const noexcept { return length() == 0; }
 
-  /// How many bytes; 0 for null.
+  /// Returns the number of bytes. 0 for null.
   constexpr std::size_t length() const noexcept { return view().size(); }
 
-  /// The bytes, as long as the string lives. They need not end with NUL.
+  /// Returns the bytes, which live as long as the string. No NUL need follow them. Empty for null.
   constexpr std::string_view view() const noexcept { return isNull() ? std::string_view() : object_->view(); }
   constexpr operator std::string_view() const noexcept { return view(); }
 
-  /// A hash that suits `==`: the standard library's of the bytes. 0 for null.
+  /// Returns a hash that is consistent with `==`: the standard library's hash of the bytes. 0 for null.
   std::uint64_t hash() const noexcept {
     return object_ != nullptr ? std::hash<std::string_view>()(object_->view()) : 0;
   }
@@ -136,23 +139,26 @@ class String {
   constexpr bool hasSuffix(std::string_view suffix) const noexcept { return view().ends_with(suffix); }
   constexpr bool contains(std::string_view text) const noexcept { return find(text) != kNotFound; }
 
-  /// Where `text` first begins at or after `start`, or `kNotFound`. An empty text is found at `start`.
+  /// Returns the first position of `text` at or after `start`, or `kNotFound`. An empty text is found at
+  /// `start`, if that is not past the end.
   constexpr std::size_t find(std::string_view text, std::size_t start = 0) const noexcept {
     return view().find(text, start);
   }
 
-  /// Without the white space and line ends of Unicode at both ends. Null for null. Throws std::bad_alloc.
+  /// Returns the text without the Unicode white space and line ends at both ends. Null for null. Throws
+  /// std::bad_alloc.
   String trimmed() const;
 
-  /// With A to Z in the place of a to z; other characters stay. Null for null. Throws std::bad_alloc.
+  /// Returns the text with A to Z in place of a to z. Other characters stay. Null for null. Throws
+  /// std::bad_alloc.
   String uppercased() const;
 
-  /// The decimal integer that the text begins with, after white space and a sign, if any; 0 where there is
-  /// none, the nearest value where it is out of range.
+  /// Returns the decimal integer that the text begins with. White space, and then a sign, may precede it. 0
+  /// if there is no integer. The nearest value if the integer is out of range.
   std::int64_t integerValue() const noexcept;
 
-  /// What follows the last slash, or all where there is none: "c.m" of "a/b/c.m", "" of "a/b/". Null for
-  /// null. Throws std::bad_alloc.
+  /// Returns the text after the last slash, or the whole text if there is no slash. For "a/b/c.m" that is
+  /// "c.m", for "a/b/" it is "". Null for null. Throws std::bad_alloc.
   String lastPathComponent() const;
 
   friend constexpr bool operator==(const String& first, const String& second) noexcept {
@@ -160,31 +166,31 @@ class String {
     return first.object_ != nullptr && second.object_ != nullptr && first.view() == second.view();
   }
 
-  /// Null comes before all others.
+  /// Orders strings by their bytes. Null comes before all other strings.
   friend constexpr std::strong_ordering operator<=>(const String& first, const String& second) noexcept {
     if (first && second) return first.view() <=> second.view();
     if (first.isNull() && second.isNull()) return std::strong_ordering::equal;
     return first.isNull() ? std::strong_ordering::less : std::strong_ordering::greater;
   }
 
-  /// Whether the string has these bytes. Null equals none, not even "".
+  /// Returns whether the string has these bytes. Null is not equal to any bytes, not even to "".
   friend constexpr bool operator==(const String& string, std::string_view bytes) noexcept {
     return string.object_ != nullptr && string.view() == bytes;
   }
   friend constexpr bool operator==(const String& string, std::nullptr_t) noexcept { return string.isNull(); }
 
-  /// One after the other, in one allocation; null counts as empty, and the result is never null. Throws
-  /// std::bad_alloc.
+  /// Returns both texts, one after the other, in at most one allocation. Null counts as empty. Never null.
+  /// Throws std::bad_alloc.
   friend String operator+(const String& first, const String& second);
 
  private:
   template <detail::StringLiteral>
   friend constexpr String literals::operator""_s() noexcept;
 
-  // Takes over a reference that the object has already.
+  // Takes over a reference that the caller owns.
   constexpr explicit String(const StringObject* adopted) noexcept : object_(adopted) {}
 
-  // A string that is a constant has a literal's object, which is not counted.
+  // A constant string refers to the object of a literal, which is not counted.
   constexpr void retain() const noexcept {
     if (!std::is_constant_evaluated() && object_ != nullptr) object_->retain();
   }
@@ -192,10 +198,10 @@ class String {
     if (!std::is_constant_evaluated() && object_ != nullptr) object_->release();
   }
 
-  /// A copy of `text`, which is valid UTF-8.
+  // Returns a copy of `text`, which is valid UTF-8.
   static String copy(std::string_view text);
 
-  /// This string where `part`, of its bytes, is all of them; otherwise a copy of `part`.
+  // Returns this string if `part`, a view of its bytes, has all of them. Otherwise returns a copy of `part`.
   String part(std::string_view part) const;
 
   const StringObject* object_ = nullptr;

@@ -1,16 +1,18 @@
 #pragma once
 
-/// Builds a text piece by piece.
+/// `rt::StringBuilder` builds a text piece by piece.
 ///
 ///     rt::StringBuilder builder;
 ///     builder.append("{ ");
 ///     for (const Frame& frame : frames) builder.append(frame.name);
 ///     rt::String trace = builder.string();
 ///
-/// What fits in `kInlineCapacity` bytes allocates once, for the string; longer texts grow on the heap. A
-/// builder is used by one thread at a time.
+/// Building a text of up to `kInlineCapacity` bytes allocates once, for the string. A longer text is built on
+/// the heap.
 ///
-/// Not for: two or three strings, where `+` will do; values (Runtime/Text/Format.h).
+/// Threads: one thread at a time uses a builder.
+///
+/// Not for: two or three strings, which `+` joins; formatting values (Runtime/Text/Format.h).
 
 #include <cstddef>
 #include <cstring>
@@ -29,8 +31,8 @@ class StringBuilder {
   StringBuilder& operator=(const StringBuilder&) = delete;
   ~StringBuilder();
 
-  /// Appends bytes, which should add up to UTF-8: see `string`. Throws std::bad_alloc, and then has
-  /// appended nothing.
+  /// Appends bytes. All appended bytes together should be UTF-8: see `string`. Throws std::bad_alloc, and
+  /// then appends nothing.
   void append(std::string_view bytes) {
     if (bytes.empty()) return;
     std::memcpy(prepare(bytes.size()), bytes.data(), bytes.size());
@@ -46,8 +48,8 @@ class StringBuilder {
     length_ += count;
   }
 
-  /// Room for `count` bytes more, to be written and then handed to `commit`. Good until the next call of
-  /// any other function. Throws std::bad_alloc.
+  /// Returns room for `count` more bytes. Write them, then call `commit`. The pointer is valid until the next
+  /// call of any other function. Throws std::bad_alloc.
   char* prepare(std::size_t count) {
     if (capacity_ - length_ < count) grow(count);
     return bytes_ + length_;
@@ -55,20 +57,20 @@ class StringBuilder {
   /// Appends the first `count` bytes of what `prepare` returned.
   void commit(std::size_t count) noexcept { length_ += count; }
 
-  /// How many bytes `prepare` returns without allocating.
+  /// Returns how many bytes `prepare` can return without allocating.
   std::size_t available() const noexcept { return capacity_ - length_; }
 
-  /// What has been appended so far, until the next append.
+  /// Returns what has been appended so far. The view is valid until the next append.
   std::string_view view() const noexcept { return {bytes_, length_}; }
 
-  /// What has been appended so far as a string, never null; U+FFFD stands in it for what is not UTF-8.
-  /// Throws std::bad_alloc.
+  /// Returns what has been appended so far, with U+FFFD in place of what is not UTF-8. Never null. Throws
+  /// std::bad_alloc.
   String string() const { return String::fromUTF8Repaired(view()); }
 
  private:
   void grow(std::size_t count);
 
-  // What is prepared may be more than what is then committed.
+  // Makes the buffer larger than `kInlineCapacity`, since callers may prepare more bytes than they commit.
   static constexpr std::size_t kSlack = 32;
 
   char* bytes_ = inline_;

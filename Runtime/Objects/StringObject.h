@@ -1,14 +1,15 @@
 #pragma once
 
-/// The object behind a `rt::String`: an immutable run of UTF-8 bytes.
+/// `rt::StringObject` is the object behind a `rt::String`: an immutable run of UTF-8 bytes.
 ///
 ///     rt::Ref<rt::Object> object = "name"_s;
 ///     rt::String name = rt::String::from(object.get());
 ///
-/// Its class is called "String". It is immutable: any thread may use it. Equal to any other string object
-/// with the same bytes.
+/// Its class is called "String". It is equal to any other string object with the same bytes.
 ///
-/// Not for: everyday code, which says `rt::String` (Runtime/Objects/String.h).
+/// Threads: any thread may use a string object, since it is immutable.
+///
+/// Not for: everyday code, which uses `rt::String` (Runtime/Objects/String.h).
 
 #include <cstddef>
 #include <new>
@@ -26,40 +27,40 @@ class RT_VISIBLE StringObject final : public Implements<StringObject, Object> {
  public:
   static constexpr std::string_view kClassName = "String";
 
-  /// A constant over bytes that are there as long as the program is; never counted, never destroyed.
+  /// Makes a constant over `bytes`, which live as long as the program. It is never counted and never
+  /// destroyed.
   consteval StringObject(const char* bytes, std::size_t length)
       : Implements(Immortal()), bytes_(bytes), length_(length) {}
 
-  // Written out, for g++ does not find a defaulted one in constants of templates.
+  // Written out, since g++ does not find a defaulted destructor in constants of templates.
   constexpr ~StringObject() override {}  // NOLINT(modernize-use-equals-default)
 
-  /// A copy of `text`, which is valid UTF-8, in one allocation. Throws std::bad_alloc.
+  /// Returns a copy of `text`, which is valid UTF-8, in one allocation. Throws std::bad_alloc.
   static Ref<StringObject> copyOf(std::string_view text);
 
-  /// One with room for `length` bytes, which the caller fills before anyone else sees the object.
-  /// Throws std::bad_alloc.
+  /// Returns an object with room for `length` bytes, to which `bytes` then points. The caller fills the room
+  /// before anyone else sees the object. Throws std::bad_alloc.
   static Ref<StringObject> make(std::size_t length, char*& bytes);
 
-  /// One over `text`, which is valid UTF-8 and outlives the object; nothing is copied. Throws
+  /// Returns an object over `text`, which is valid UTF-8 and outlives the object. Copies nothing. Throws
   /// std::bad_alloc.
   static Ref<StringObject> over(std::string_view text);
 
-  /// A copy of `text`, which is valid UTF-8, that is there as long as the program is; never counted, never
-  /// destroyed. Not null. Throws std::bad_alloc.
+  /// Returns a copy of `text`, which is valid UTF-8. The copy lives as long as the program. It is never
+  /// counted and never destroyed. Never null. Throws std::bad_alloc.
   static StringObject* immortalCopyOf(std::string_view text);
 
-  /// The bytes.
+  /// Returns the bytes, which live as long as the object.
   constexpr std::string_view view() const noexcept { return {bytes_, length_}; }
 
   bool isEqual(const Object* other) const override;
   std::uint64_t hash() const override;
 
-  /// The string itself.
+  /// Returns the string itself.
   String description() const override;
 
-  // The bytes of a copy follow the object, so its size is not what `delete` thinks. Constant only because
-  // g++ has a constant's destructor mention it.
-  // NOLINTNEXTLINE(misc-new-delete-overloads,cert-dcl54-cpp): it goes with the one that takes a length
+  // The bytes of a copy follow the object, so the allocated size is not that of the class. The function is
+  // constexpr only because g++ has the destructor of a constant mention it.
   static constexpr void operator delete(void* memory) noexcept {
     if (!std::is_constant_evaluated()) ::operator delete(memory);
   }

@@ -67,17 +67,17 @@ TEST(String, LiteralsAreConstants) {
   static_assert("abc"_s.hasPrefix("ab") && "abc"_s.hasSuffix("bc") && "abc"_s.find("c") == 2);
   static_assert("a"_s < "b"_s);
   EXPECT_EQ(kConstant, "constant");
-  // Wherever they stand, equal literals are one object.
+  // Equal literals are one object, wherever they stand.
   EXPECT_EQ(kConstant.object(), "constant"_s.object());
   EXPECT_EQ("\u20AC"_s.view(), "\xE2\x82\xAC");
 }
 
-TEST(String, LiteralsMayBeReferredToWeakly) {
+TEST(String, LiteralsMayHaveWeakReferences) {
   const rt::Weak<rt::Object> weak{rt::Ref<rt::Object>("weakly"_s)};
   EXPECT_EQ(rt::String::from(weak.lock().get()), "weakly");
 }
 
-TEST(String, ComesFromBytes) {
+TEST(String, IsMadeFromBytes) {
   EXPECT_EQ(rt::String::fromUTF8("caf\xC3\xA9"), "café");
   EXPECT_EQ(rt::String::fromUTF8(std::string_view("a\0b", 3)).length(), 3U);
   EXPECT_TRUE(rt::String::fromUTF8(""));
@@ -87,7 +87,7 @@ TEST(String, ComesFromBytes) {
   EXPECT_TRUE(rt::String::fromUTF8(std::string_view("ok\0\xC0\x80", 5)).isNull());
 }
 
-TEST(String, CopiesBytesUnlessToldThatTheyStay) {
+TEST(String, CopiesBytesUnlessTheyAreStatic) {
   std::string bytes = "first";
   const rt::String copy = rt::String::fromUTF8(bytes);
   bytes[0] = 'F';
@@ -127,12 +127,12 @@ TEST(String, ComparesByBytes) {
   EXPECT_EQ(table.at(nullptr), 0);
 }
 
-TEST(String, SharesAndMoves) {
+TEST(String, CopiesShareTheObjectAndMovesLeaveNull) {
   rt::String first = rt::String::fromUTF8("shared");
   rt::String second = first;
   EXPECT_EQ(first.object(), second.object());
   const rt::String third = std::move(first);
-  EXPECT_TRUE(first.isNull());  // NOLINT(bugprone-use-after-move): what moving leaves is promised
+  EXPECT_TRUE(first.isNull());  // NOLINT(bugprone-use-after-move): moving leaves null
   EXPECT_EQ(third, "shared");
   rt::String& alias = second;
   second = alias;
@@ -161,7 +161,7 @@ TEST(String, TrimsWhiteSpaceAndLineEnds) {
   EXPECT_EQ("\u0085\u00A0\u1680\u2000\u200A\u2028\u2029\u202F\u205F\u3000é\u3000"_s.trimmed(), "é");
   EXPECT_EQ("   "_s.trimmed(), "");
   EXPECT_EQ(""_s.trimmed(), "");
-  // No white space, though some bytes of it.
+  // These characters are not white space, but share bytes with white space.
   EXPECT_EQ("\u00E0x\u2003\u00E0"_s.trimmed(), "\u00E0x\u2003\u00E0");
   EXPECT_EQ("\u200Ba"_s.trimmed(), "\u200Ba");
   const rt::String plain = rt::String::fromUTF8("plain");
@@ -222,7 +222,7 @@ TEST(String, Concatenates) {
   EXPECT_EQ("a\0b"_s + "c\0"_s, std::string_view("a\0bc\0", 5));
 }
 
-// Against std::string, which holds the same bytes.
+// The model is a std::string with the same bytes.
 TEST(String, BehavesLikeTheModel) {
   std::mt19937 random(20240229);
   const std::vector<std::string> pieces{
@@ -248,7 +248,7 @@ TEST(String, BehavesLikeTheModel) {
   }
 }
 
-// The invariant: whatever threads do with their own copies, the text is whole, and gone after the last.
+// Invariant: the text stays whole while threads copy and assign it. It is gone after the last copy.
 TEST(String, IsSharedByThreads) {
   rt::Weak<rt::Object> weak;
   {
@@ -340,15 +340,15 @@ TEST(StringBuilder, AllocatesOnlyTheStringForShortTexts) {
   EXPECT_EQ(count.allocations(), 1);
 }
 
-TEST(StringBuilder, RefusesWhatCannotBe) {
+TEST(StringBuilder, ThrowsIfTheSizeOverflows) {
   rt::StringBuilder builder;
   builder.append("kept");
   EXPECT_THROW(builder.prepare(std::numeric_limits<std::size_t>::max()), std::bad_alloc);
   EXPECT_EQ(builder.string(), "kept");
 }
 
-// Wherever in a text of whatever length the one byte is that is not UTF-8.
-TEST(String, IsRepairedAtEveryPlace) {
+// Puts one invalid byte at each position of texts of many lengths.
+TEST(String, RepairsAnInvalidByteAtAnyPosition) {
   for (std::size_t length = 1; length <= 40; ++length) {
     const std::string plain(length, 'a');
     EXPECT_EQ(rt::String::fromUTF8Repaired(plain).view(), plain);

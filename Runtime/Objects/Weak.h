@@ -1,18 +1,21 @@
 #pragma once
 
-/// The weak reference: it does not keep the object alive, and knows when it is gone.
+/// `rt::Weak<T>` is a weak reference: it does not keep the object alive. `lock` returns null once the object
+/// is gone.
 ///
 ///     rt::Weak<Delegate> delegate_;                                  // a class or a protocol
 ///     delegate_ = delegate;
 ///     if (rt::Ref<Delegate> delegate = delegate_.lock()) delegate->didLog("started"_s);
 ///
-/// An object that is being destroyed counts as gone: `lock` gives null, or a reference that keeps the
-/// object whole. Different `Weak` objects may be used by different threads at once; one `Weak` object
-/// is as safe as a plain pointer.
+/// An object that is being destroyed counts as gone. `lock` returns either null or a reference that keeps the
+/// whole object alive.
 ///
-/// The first weak reference to an object allocates; the others do not.
+/// Threads: threads may use different `Weak` objects at the same time. One `Weak` object is as thread-safe as
+/// a plain pointer.
 ///
-/// Not for: a look at an object that is certainly alive, where a plain pointer will do.
+/// The first weak reference to an object allocates. The others do not.
+///
+/// Not for: using an object that is certainly alive, for which a plain pointer is enough.
 
 #include <atomic>
 #include <concepts>
@@ -28,20 +31,21 @@ namespace rt {
 
 namespace detail {
 
-/// What all weak references to one object share. It outlives the object until they are gone.
+// The state that all weak references to one object share. It lives until the object and all of these
+// references are gone.
 class WeakCell {
  public:
-  /// The cell of `object`, made if there is none yet, with a reference for the caller; null when the
-  /// object is being destroyed already.
+  // Returns the cell of `object` with a reference for the caller. Makes the cell if there is none. Null if
+  // the object is being destroyed. Throws std::bad_alloc.
   static WeakCell* of(const Object& object);
 
   void retain() noexcept { count_.fetch_add(1, std::memory_order_relaxed); }
   void release() noexcept;
 
-  /// Adds a reference to the object and returns true, or returns false when it is gone.
+  // Retains the object and returns true. Returns false if the object is gone.
   bool retainObject() noexcept;
 
-  /// Says that the object is gone. Waits for a `retainObject` on another thread that is looking at it.
+  // Notes that the object is gone. Waits if another thread is in `retainObject`.
   void clear() noexcept;
 
  private:
@@ -57,12 +61,12 @@ class WeakCell {
 template <class T>
 class Weak {
  public:
-  /// Refers to nothing.
+  /// Makes a weak reference to nothing.
   constexpr Weak() noexcept = default;
   constexpr Weak(std::nullptr_t) noexcept {}
 
-  /// Refers to `object`, which may be null; to nothing if the object is being destroyed. Throws
-  /// std::bad_alloc.
+  /// Makes a weak reference to `object`. It refers to nothing if `object` is null or is being destroyed.
+  /// Throws std::bad_alloc.
   Weak(T* object) {
     if (object == nullptr) return;
     cell_ = detail::WeakCell::of(*detail::objectOf(object));
@@ -92,7 +96,7 @@ class Weak {
     std::swap(pointer_, other.pointer_);
   }
 
-  /// A strong reference to the object, or null when it is gone.
+  /// Returns a strong reference to the object, or null if the object is gone.
   [[nodiscard]] Ref<T> lock() const noexcept {
     return cell_ != nullptr && cell_->retainObject() ? Ref<T>::adopt(pointer_) : Ref<T>();
   }

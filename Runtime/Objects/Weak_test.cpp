@@ -27,7 +27,7 @@ struct Other : rt::Protocol<Other> {
   ~Other() = default;
 };
 
-/// Spoils its answer when it is destroyed, so that whoever sees a dying object sees it.
+// Changes its answer in its destructor, so that a test notices an object that is being destroyed.
 class Listener : public rt::Implements<Listener, rt::Object, Other, Delegate> {
  public:
   explicit Listener(std::atomic<int>* destructions = nullptr) : destructions_(destructions) {}
@@ -58,7 +58,7 @@ TEST(Weak, RefersToNothingUntilItIsMade) {
   EXPECT_FALSE(rt::Weak<Delegate>(rt::Ref<Listener>()).lock());
 }
 
-TEST(Weak, KnowsWhenTheObjectIsGone) {
+TEST(Weak, LocksNullOnceTheObjectIsGone) {
   std::atomic<int> destructions = 0;
   rt::Ref<Listener> listener = rt::make<Listener>(&destructions);
   const rt::Weak<Listener> weak = listener;
@@ -69,7 +69,7 @@ TEST(Weak, KnowsWhenTheObjectIsGone) {
   EXPECT_FALSE(weak.lock());
 }
 
-TEST(Weak, GivesAReferenceThatKeepsTheObject) {
+TEST(Weak, LocksAReferenceThatKeepsTheObjectAlive) {
   rt::Ref<Listener> listener = rt::make<Listener>();
   const rt::Weak<Listener> weak = listener;
   const rt::Ref<Listener> locked = weak.lock();
@@ -78,7 +78,7 @@ TEST(Weak, GivesAReferenceThatKeepsTheObject) {
   EXPECT_TRUE(weak.lock());
 }
 
-TEST(Weak, MayBeOfAProtocol) {
+TEST(Weak, MayReferToAProtocol) {
   rt::Ref<Listener> listener = rt::make<Listener>();
   const rt::Weak<Delegate> fromClass = listener;
   const rt::Ref<Delegate> delegate = listener;
@@ -146,7 +146,7 @@ TEST(Weak, MayReferToAConstant) {
   EXPECT_EQ(weak.lock().get(), &kConstant);
 }
 
-TEST(Weak, AllocatesAtTheFirstReferenceOnly) {
+TEST(Weak, AllocatesForTheFirstReferenceOnly) {
   if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations on this system";
   rt::Ref<Listener> listener = rt::make<Listener>();
   const AllocationCount count;
@@ -164,9 +164,9 @@ TEST(Weak, AllocatesAtTheFirstReferenceOnly) {
   EXPECT_EQ(count.balance(), -1) << "the cell is freed with the last weak reference";
 }
 
-// One thread gives up the last reference while others take weak ones to strong: each gets null or an
-// object that stays whole until it lets go, and the object is destroyed once.
-TEST(Weak, GivesNullOrTheWholeObjectWhileTheLastReferenceGoes) {
+// One thread releases the last reference while others call `lock`. Each of them gets null or an object that
+// stays whole until it is released. The object is destroyed once.
+TEST(Weak, LocksNullOrTheWholeObjectDuringTheLastRelease) {
   constexpr int kRounds = 3000;
   constexpr int kLockers = 2;
   std::atomic<int> destructions = 0;
@@ -200,8 +200,9 @@ TEST(Weak, GivesNullOrTheWholeObjectWhileTheLastReferenceGoes) {
   EXPECT_EQ(wrongAnswers, 0);
 }
 
-// Threads that make the first weak reference at once share one cell: when the object goes, all know.
-TEST(Weak, IsMadeFirstByManyThreads) {
+// Threads that make the first weak reference at the same time share one cell. All of them see that the object
+// is gone.
+TEST(Weak, ManyThreadsMakeTheFirstReferenceAtOnce) {
   constexpr int kRounds = 2000;
   constexpr int kThreads = 3;
   rt::Ref<Listener> strong;

@@ -13,13 +13,13 @@ namespace {
 
 using CurrentHandler = ThreadReference<AssertionHandler, struct CurrentHandlerTag>;
 
-// What the failure may hold the thread up for where nobody reads it.
+// How long a failure may block its thread if nobody reads standard error.
 constexpr std::chrono::seconds kLongestWait{1};
 
 }  // namespace
 
 Ref<AssertionHandler> AssertionHandler::currentHandler() {
-  // Never destroyed: assertions may fail until the process is gone.
+  // Never destroyed: assertions may fail in code that runs at exit.
   static AssertionHandler* const defaultHandler = make<AssertionHandler>().detach();
   AssertionHandler* const own = CurrentHandler::get();
   return own != nullptr ? own : defaultHandler;

@@ -1,18 +1,19 @@
 #pragma once
 
-/// Where programming errors end: each thread has a handler that is told of the assertions that fail on it.
+/// Handles programming errors. Each thread has a handler, which is called when an assertion fails on that
+/// thread.
 ///
 ///     if (writer != nullptr) {
 ///       rt::AssertionHandler::currentHandler()->handleFailureInFunction(
 ///           "-[Logger setWriter:]"_s, "Shared/Logger"_s, 118, "no writer can be set."_s);
 ///     }
 ///
-/// A test or a host that wants to hear of them derives a handler and makes it the thread's:
+/// A test or a host may derive a handler of its own and set it for the thread:
 ///
 ///     class Recorder : public rt::Implements<Recorder, rt::AssertionHandler> { ... };
 ///     rt::AssertionHandler::setCurrentHandler(rt::make<Recorder>());
 ///
-/// Not for: failures that a correct program can meet.
+/// Not for: errors that can occur in a correct program.
 
 #include <cstdint>
 
@@ -26,26 +27,29 @@ namespace rt {
 
 class RT_VISIBLE AssertionHandler : public Implements<AssertionHandler, Object> {
  public:
-  /// The calling thread's handler; never null. A thread that has set none has the default one, which is
-  /// an AssertionHandler itself and shared by all threads.
+  /// Returns the calling thread's handler. Never null. A thread that has set no handler has the default one,
+  /// an AssertionHandler that all threads share.
   static Ref<AssertionHandler> currentHandler();
 
-  /// Makes `handler` the calling thread's until the thread ends; null brings the default one back. Does
-  /// nothing in destructors of the thread's own variables that run after the handler was given up.
+  /// Sets the calling thread's handler. Null restores the default one. The thread releases the handler when
+  /// it ends. Code that the ending thread runs after that cannot set a handler: the call does nothing.
   static void setCurrentHandler(Ref<AssertionHandler> handler);
 
-  /// Told that an assertion failed in `function`, in `file` at `lineNumber`. Writes all of it to standard
-  /// error, the description as it stands, however many lines it has, and throws an
-  /// InternalInconsistencyException with it, also where standard error is closed, has lost its reader or
-  /// takes nothing for a second. "<Unknown Function>" and "<Unknown File>" stand for null.
+  /// Handles the failure of an assertion in `function`, in `file` at `lineNumber`. Writes these and
+  /// `description` to standard error, then throws an InternalInconsistencyException with all of them. A
+  /// description of several lines is written as it is. "<Unknown Function>" and "<Unknown File>" replace
+  /// null.
   ///
-  /// One that overrides this may return: then whoever found the failure goes on after it, as its own
-  /// description says. It may be called by any thread that it is the handler of, at once.
+  /// The exception is also thrown if standard error is closed, has no reader, or does not take everything.
+  /// The call waits for standard error for a second at most.
+  ///
+  /// An override may return. The code that found the failure then continues, as its own contract says.
+  /// Threads: several threads may share a handler and call it at the same time.
   virtual void handleFailureInFunction(const String& function, const String& file, std::uint64_t lineNumber,
                                        const String& description);
 
-  /// The same for a failure in the operation `selector` of `object`, which is not null: the function is
-  /// "-[ClassName selector]".
+  /// Handles a failure in the operation `selector` of `object`. Calls `handleFailureInFunction` with the
+  /// function "-[ClassName selector]".
   virtual void handleFailureInMethod(const String& selector, const Object& object, const String& file,
                                      std::uint64_t lineNumber, const String& description);
 };

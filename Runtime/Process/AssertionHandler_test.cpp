@@ -46,7 +46,7 @@ class AssertionHandlerTest : public testing::Test {
   }
 };
 
-TEST_F(AssertionHandlerTest, RecordsTheFailureAndRaises) {
+TEST_F(AssertionHandlerTest, WritesTheFailureAndThrows) {
   testing::internal::CaptureStderr();
   bool isRaised = false;
   try {
@@ -72,7 +72,7 @@ TEST_F(AssertionHandlerTest, NamesTheOperationOfAnObject) {
   EXPECT_EQ(testing::internal::GetCapturedStderr(), "Assertion failed in -[Asserting set:to:], a/b:2: no\n");
 }
 
-TEST_F(AssertionHandlerTest, SaysWhatIsUnknown) {
+TEST_F(AssertionHandlerTest, ReplacesANullFunctionAndANullFile) {
   testing::internal::CaptureStderr();
   try {
     rt::AssertionHandler::currentHandler()->handleFailureInFunction(nullptr, nullptr, 0, nullptr);
@@ -90,8 +90,8 @@ void fail(const rt::String& description) {
   rt::AssertionHandler::currentHandler()->handleFailureInFunction("f"_s, "a"_s, 1, description);
 }
 
-// Used to end the process by SIGPIPE, with no exception for anybody to catch.
-TEST_F(AssertionHandlerTest, RaisesWhereNobodyReadsStandardError) {
+// SIGPIPE used to end the process before the exception was thrown.
+TEST_F(AssertionHandlerTest, ThrowsIfNobodyReadsStandardError) {
   for (const auto kind : {StandardErrorPipe::Kind::pipe, StandardErrorPipe::Kind::socket}) {
     StandardErrorPipe standardError(kind);
     standardError.closeReader();
@@ -102,9 +102,9 @@ TEST_F(AssertionHandlerTest, RaisesWhereNobodyReadsStandardError) {
   EXPECT_THROW(fail("closed"_s), rt::InternalInconsistencyException);
 }
 
-// Used to lose the end of what a stream that does not block had no room for, and to wait for ever where
-// one that blocks was full.
-TEST_F(AssertionHandlerTest, WaitsForWhoReadsStandardErrorButNotForEver) {
+// The end of a long failure used to be lost on a full non-blocking stream. On a full blocking stream the
+// thread used to wait for ever.
+TEST_F(AssertionHandlerTest, WaitsForTheReaderOfStandardErrorForALimitedTime) {
   std::string lines;
   for (int i = 0; i < 20'000; ++i) lines += "line " + std::to_string(i) + "\n";
   const std::string expected = "Assertion failed in f, a:1: " + lines + "\n";
@@ -138,7 +138,7 @@ TEST_F(AssertionHandlerTest, CanBeReplacedAndMayReturn) {
   EXPECT_FALSE(rt::AssertionHandler::currentHandler()->isKindOf(rt::classInfo<Recorder>()));
 }
 
-TEST_F(AssertionHandlerTest, IsEachThreadsOwnAndGoesWithIt) {
+TEST_F(AssertionHandlerTest, BelongsToItsThreadAndIsReleasedAtItsEnd) {
   rt::AssertionHandler::setCurrentHandler(rt::make<Recorder>());
   std::thread([] {
     EXPECT_TRUE(rt::AssertionHandler::currentHandler()->isMemberOf(rt::classInfo<rt::AssertionHandler>()));
@@ -149,13 +149,14 @@ TEST_F(AssertionHandlerTest, IsEachThreadsOwnAndGoesWithIt) {
   EXPECT_TRUE(rt::AssertionHandler::currentHandler()->isMemberOf(rt::classInfo<Recorder>()));
 }
 
-// What a thread still does when it has given up its variables.
+// Sets a handler on a thread that has already released its own.
 struct Late {
   static void setHandler(void* /*value*/) {
     rt::AssertionHandler::setCurrentHandler(rt::make<Recorder>());
     isDefault = rt::AssertionHandler::currentHandler()->isMemberOf(rt::classInfo<rt::AssertionHandler>());
     ++runs;
-    // The first time the handler may not have been given up yet: once more, after all other keys.
+    // At the first run the thread may not have released its handler yet. The second run comes after all other
+    // keys.
     if (runs == 1) pthread_setspecific(key, &key);
   }
   static inline pthread_key_t key{};
@@ -163,8 +164,8 @@ struct Late {
   static inline bool isDefault = false;
 };
 
-// Used to stay alive for ever: what is set when the thread has given its handler up already.
-TEST_F(AssertionHandlerTest, IsNotKeptByAThreadThatHasGivenUpItsOwn) {
+// A handler that was set after the thread had released its own used to leak.
+TEST_F(AssertionHandlerTest, IsNotKeptByAThreadThatHasReleasedItsHandler) {
   ASSERT_EQ(pthread_key_create(&Late::key, Late::setHandler), 0);
   std::thread([] {
     pthread_setspecific(Late::key, &Late::key);
@@ -176,8 +177,7 @@ TEST_F(AssertionHandlerTest, IsNotKeptByAThreadThatHasGivenUpItsOwn) {
   EXPECT_EQ(recordersAlive, 0U);
 }
 
-// The default handler is one for all threads, made once.
-TEST_F(AssertionHandlerTest, IsTheSameForAllThreadsThatSetNone) {
+TEST_F(AssertionHandlerTest, AllThreadsShareTheDefaultHandler) {
   const rt::Ref<rt::AssertionHandler> here = rt::AssertionHandler::currentHandler();
   rt::Ref<rt::AssertionHandler> there;
   std::thread([&] { there = rt::AssertionHandler::currentHandler(); }).join();

@@ -8,7 +8,7 @@ namespace rt::Bundle {
 namespace {
 
 constinit UnfairLock lock;
-// Never destroyed: identifiers are asked for until the process is gone.
+// Never destroyed: code that runs at exit may still read the identifier.
 constinit Object* chosen RT_GUARDED_BY(lock) = nullptr;
 
 }  // namespace

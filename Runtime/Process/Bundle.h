@@ -1,17 +1,17 @@
 #pragma once
 
-/// The main bundle's identifier: what tells a host program apart from all others, in the system log and
-/// among the files of user defaults.
+/// The main bundle's identifier. It identifies the host program in the system log and among the files of user
+/// defaults.
 ///
-/// On Linux, where no bundles are, a host says it when it is built, with a definition in any of its files:
+/// On Linux, which has no bundles, a host defines its identifier in any of its source files:
 ///
 ///     extern "C" const char kMainBundleIdentifier[] = "com.example.Importer";
 ///
-/// or when it starts, before anything asks:
+/// or sets it when it starts, before anything reads it:
 ///
 ///     rt::Bundle::setMainIdentifier("com.example.Importer"_s);
 ///
-/// On macOS the application's own bundle has it; what is set when the program starts goes before it.
+/// On macOS the application's own bundle has the identifier. An identifier that is set takes precedence.
 ///
 /// Not for: names that people read.
 
@@ -19,11 +19,11 @@
 
 namespace rt::Bundle {
 
-/// The identifier; "" when the host has none. Never null. Any thread may call it.
+/// Returns the identifier. Never null; "" if the host has no identifier. Threads: thread-safe.
 String mainIdentifier();
 
-/// Sets the identifier from now on; null brings back what the host was built with. Any thread may call
-/// it, but who has asked before keeps what it was told.
+/// Sets the identifier. Null restores the identifier that the host was built with. Code that has already read
+/// the identifier keeps what it read. Threads: thread-safe.
 void setMainIdentifier(const String& identifier);
 
 }  // namespace rt::Bundle

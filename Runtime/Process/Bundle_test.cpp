@@ -24,7 +24,7 @@ TEST(Bundle, HasTheIdentifierThatTheHostWasBuiltWith) {
   EXPECT_EQ(rt::Bundle::mainIdentifier(), BUNDLE_IDENTIFIER);
 }
 
-TEST(Bundle, TakesAnIdentifierWhenTheHostStarts) {
+TEST(Bundle, ReturnsTheIdentifierThatWasSet) {
   rt::Bundle::setMainIdentifier("com.example.Started"_s);
   EXPECT_EQ(rt::Bundle::mainIdentifier(), "com.example.Started");
   rt::Bundle::setMainIdentifier(""_s);
@@ -33,8 +33,8 @@ TEST(Bundle, TakesAnIdentifierWhenTheHostStarts) {
   EXPECT_EQ(rt::Bundle::mainIdentifier(), BUNDLE_IDENTIFIER);
 }
 
-// Every answer is one of the identifiers that were set, whole.
-TEST(Bundle, IsAskedAndSetByAllThreadsAtOnce) {
+// Every result is one of the identifiers that were set.
+TEST(Bundle, IsReadAndSetByThreadsAtTheSameTime) {
   const auto first = rt::String::fromUTF8("com.example.First");
   const auto second = rt::String::fromUTF8("com.example.Second");
   rt::Bundle::setMainIdentifier(first);
@@ -49,7 +49,7 @@ TEST(Bundle, IsAskedAndSetByAllThreadsAtOnce) {
   rt::Bundle::setMainIdentifier(nullptr);
 }
 
-// Used to wait for ever where another thread of the parent was about to set it.
+// The child used to wait for ever if another thread of the parent was setting the identifier.
 TEST(Bundle, HasItsIdentifierInTheChildOfAFork) {
   const auto identifier = rt::String::fromUTF8("com.example.Forked");
   std::atomic<bool> isEnding = false;

@@ -28,8 +28,7 @@ struct Capture {
   bool isOwnFrame = true;
 };
 
-// Not glibc's backtrace(), which does the same after loading a library, and which the sanitizers put a
-// frame of their own before.
+// glibc's backtrace() does the same, but it loads a library first, and sanitizers add a frame to its result.
 _Unwind_Reason_Code addFrame(_Unwind_Context* context, void* argument) noexcept {
   Capture& capture = *static_cast<Capture*>(argument);
   if (capture.isOwnFrame) {
@@ -39,7 +38,7 @@ _Unwind_Reason_Code addFrame(_Unwind_Context* context, void* argument) noexcept 
   const std::uint64_t address = _Unwind_GetIP(context);
   const std::uint64_t frame = _Unwind_GetCFA(context);
   if (address == 0 || capture.count == capture.addresses.size()) return _URC_END_OF_STACK;
-  // Unwind tables that are wrong may lead to the same frame again and again.
+  // Wrong unwind tables may lead to the same frame again and again.
   if (capture.count > 0 && address == capture.addresses[capture.count - 1] && frame == capture.frame) {
     return _URC_END_OF_STACK;
   }
@@ -69,7 +68,7 @@ std::string hexadecimal(std::uint64_t value, int width) {
   return text.data();
 }
 
-// Appends `text`, blanks up to `width`, and one that parts it from the next column.
+// Appends `text`, padded with blanks to `width`, and one more blank before the next column.
 void appendColumn(std::string& line, std::string_view text, std::size_t width) {
   line += text;
   if (text.size() < width) line.append(width - text.size(), ' ');
@@ -77,7 +76,7 @@ void appendColumn(std::string& line, std::string_view text, std::size_t width) {
 }
 
 String symbol(std::size_t number, std::uint64_t address, detail::SymbolTables& tables) {
-  // A return address lies behind the call, which may have been the last thing in its function.
+  // If the call is the last instruction of its function, the return address lies beyond the function.
   const std::uint64_t call = address - 1;
   std::string image = "???";
   std::uint64_t imageStart = 0;
@@ -85,7 +84,7 @@ String symbol(std::size_t number, std::uint64_t address, detail::SymbolTables& t
   std::uint64_t functionStart = 0;
   Dl_info information{};
   if (address == 0) {
-    // No call leads there.
+    // 0 is not a return address, so the line has only "???".
   } else if (dladdr(std::bit_cast<const void*>(call), &information) != 0 &&
              information.dli_fname != nullptr) {
     image = lastElement(information.dli_fname);
@@ -97,7 +96,7 @@ String symbol(std::size_t number, std::uint64_t address, detail::SymbolTables& t
   }
   if (address != 0 && function.empty()) {
     if (std::optional<detail::SymbolTables::Symbol> symbol = tables.find(call)) {
-      // In a program that is linked statically, of which `dladdr` knows nothing.
+      // `dladdr` does not know the images of a statically linked program.
       if (imageStart == 0) {
         image =
             symbol->image.empty() ? std::string(Process::name().view()) : lastElement(symbol->image.c_str());

@@ -1,15 +1,16 @@
 #pragma once
 
-/// Where the program is: the calls that led here, as addresses, and as text.
+/// Captures the call stack as addresses, and turns addresses into text.
 ///
 ///     std::array<std::uint64_t, 64> addresses;
 ///     const std::size_t count = rt::CallStack::capture(addresses);
 ///     for (const rt::String& line : rt::CallStack::symbols(std::span(addresses).first(count))) ...
 ///
-/// Capturing costs about a tenth of a microsecond a frame and neither allocates nor locks; turning
-/// addresses into text reads the symbols of the images they are in and is for the few stacks that people
-/// look at. Both work on any thread, in a statically linked program, and in the child of a fork.
+/// `capture` takes about a tenth of a microsecond for each frame. It neither allocates nor locks. `symbols`
+/// is slow: it reads the symbols of the images that the addresses are in. It is for the few stacks that
+/// people read. Both work in statically linked programs and in the child of a fork.
 ///
+/// Threads: thread-safe.
 /// Not for: signal handlers; unwinding.
 
 #include <cstddef>
@@ -21,28 +22,30 @@
 
 namespace rt::CallStack {
 
-/// Fills `addresses` with the return addresses of the calls that led to this one, the innermost first:
-/// the first lies in the function that called `capture`, the second in that function's caller. Gives how
-/// many there are; what does not fit is left out, so that a result as large as `addresses` may not be
-/// the whole stack. What cannot be unwound ends it. A function that was compiled into its caller, or that
-/// called as its last act, has no frame of its own.
+/// Fills `addresses` with the return addresses of the calls that led here, the innermost first. The first
+/// lies in the caller of `capture`, the second in that function's caller. Returns how many addresses it has
+/// set.
+///
+/// Outer frames that do not fit are left out. So if all of `addresses` is set, the stack may be longer. The
+/// capture ends at a frame that cannot be unwound. A function that is inlined, or that has made a tail call,
+/// has no frame.
 [[gnu::noinline]] std::size_t capture(std::span<std::uint64_t> addresses) noexcept;
 
-/// Called behind the last call of a function, keeps the compiler from making that call the function's last
-/// act, so that it has a frame of its own.
+/// Keeps the frame of a function that would otherwise end in a tail call. Call it after the function's last
+/// call.
 [[gnu::always_inline]] inline void keepFrame() noexcept {
-  asm volatile("" ::: "memory");  // NOLINT(hicpp-no-assembler): does nothing, which cannot be left out
+  asm volatile("" ::: "memory");  // NOLINT(hicpp-no-assembler): does nothing, and the compiler must keep it
 }
 
-/// A line for each of `addresses`: its number, from 0, the image it is in, the address, and the function
-/// with the distance from its start, as in
+/// Returns a line for each of `addresses`. It has a number, from 0, the image, the address, and the function
+/// with the distance from its start:
 ///
 ///     | 0   mount-point                         0x000055d0c0de1234 main + 52
 ///
-/// C++ names are spelt out. The names of functions that an image does not export are read from the symbol
-/// table in its file, if that is there and still the same. "???" stands for an image that is not known; where
-/// no function is known, as in an image that was stripped, the image's start and the distance from it stand
-/// for it. Throws std::bad_alloc.
+/// C++ names are demangled. Functions that an image does not export are looked up in the symbol table of its
+/// file, if the file still is the one that was loaded. "???" stands for an unknown image. If the function is
+/// unknown, as in a stripped image, the line has the image's start and the distance from it. Throws
+/// std::bad_alloc.
 std::vector<String> symbols(std::span<const std::uint64_t> addresses);
 
 }  // namespace rt::CallStack

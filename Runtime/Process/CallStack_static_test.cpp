@@ -1,5 +1,5 @@
-// Prints its call stack: what a statically linked program sees of it, of which the system's functions know no
-// image. Used to be nothing but addresses.
+// Prints its call stack in a statically linked program, whose image the system's functions do not know. The
+// lines used to have nothing but addresses.
 
 #include <array>
 #include <cstdio>

@@ -20,8 +20,8 @@
 #include "tests/support/AllocationCount.h"
 #include "tests/support/Process.h"
 
-// The test program exports these, so that symbols() can name them. Each does something after its call, so
-// that none of them leaves its frame to the function that it calls.
+// The test program exports these functions, so that symbols() can name them. Each does something after its
+// call. So no call is a tail call, and each function has a frame.
 #define EXPORTED [[gnu::visibility("default"), gnu::noinline]]
 
 namespace call_stack_test {
@@ -46,7 +46,7 @@ EXPORTED std::size_t recursive(std::span<std::uint64_t> addresses, int depth) {
   return count;
 }
 
-// Calls itself from nowhere: what the unwind tables say of it leads to the same frame again and again.
+// The unwind tables of this function are wrong: they lead to the same frame again and again.
 #if defined(__x86_64__) && defined(__linux__)
 extern "C" std::size_t callFromStuckFrame(std::uint64_t* addresses, std::size_t size);
 extern "C" std::size_t callStackTestCapture(std::uint64_t* addresses, std::size_t size);
@@ -75,7 +75,7 @@ callFromStuckFrame:
 
 namespace {
 
-// One that the program does not export.
+// A function that the program does not export.
 [[gnu::noinline]] std::size_t hidden(std::span<std::uint64_t> addresses) {
   const std::size_t count = call_stack_test::innermost(addresses);
   asm volatile("");
@@ -90,7 +90,7 @@ std::string symbolOf(const Addresses& addresses, std::size_t index) {
   return std::string(rt::CallStack::symbols(addresses).at(index).view());
 }
 
-TEST(CallStack, BeginsWithTheFunctionThatAsked) {
+TEST(CallStack, BeginsWithTheCallerOfCapture) {
   Addresses addresses{};
   const std::size_t count = middle(addresses);
   ASSERT_GT(count, 3U);
@@ -107,8 +107,7 @@ TEST(CallStack, HasAFrameForEachCall) {
   for (std::size_t i = 1; i < 101; ++i) EXPECT_THAT(symbolOf(deep, i), HasSubstr("recursive(")) << i;
 }
 
-// The C library's own finds the same callers.
-TEST(CallStack, AgreesWithTheSystems) {
+TEST(CallStack, FindsTheCallersThatTheCLibraryFinds) {
   Addresses own{};
   const auto ownEnd = own.begin() + static_cast<std::ptrdiff_t>(middle(own));
   std::array<void*, 512> pointers{};
@@ -117,8 +116,8 @@ TEST(CallStack, AgreesWithTheSystems) {
   std::transform(pointers.begin(), pointers.end(), systems.begin(),
                  [](void* pointer) { return reinterpret_cast<std::uint64_t>(pointer); });
   const auto systemsEnd = systems.begin() + count;
-  // Both were called by this function, at different places; from its caller on they are the same. Above it,
-  // sanitizers put frames of their own.
+  // This function made both calls, at different places. The two stacks agree from its caller on. Sanitizers
+  // add inner frames of their own.
   const auto caller = own.begin() + 3;
   ASSERT_LT(caller, ownEnd);
   const auto systemsCaller = std::find(systems.begin(), systemsEnd, *caller);
@@ -127,8 +126,8 @@ TEST(CallStack, AgreesWithTheSystems) {
   EXPECT_TRUE(std::equal(caller, ownEnd, systemsCaller, systemsEnd));
 }
 
-// Used to fill all that there was room for with the same address.
-TEST(CallStack, EndsWhereUnwindingLeadsNoFurther) {
+// The rest of the array used to be filled with one address.
+TEST(CallStack, EndsAtAFrameThatLeadsToItself) {
 #if defined(__x86_64__) && defined(__linux__)
   Addresses addresses{};
   EXPECT_EQ(callFromStuckFrame(addresses.data(), addresses.size()), 3U);
@@ -138,13 +137,13 @@ TEST(CallStack, EndsWhereUnwindingLeadsNoFurther) {
 #endif
 }
 
-TEST(CallStack, LeavesOutWhatDoesNotFit) {
+TEST(CallStack, LeavesOutOuterFramesThatDoNotFit) {
   Addresses whole{};
   const std::size_t count = recursive(whole, 20);
   for (std::size_t capacity = 0; capacity < 10; ++capacity) {
     Addresses part{};
     EXPECT_EQ(recursive(std::span(part).first(capacity), 20), capacity);
-    // The frames above this one are the same each time.
+    // The innermost frames are the same each time.
     EXPECT_TRUE(
         std::equal(part.begin(), part.begin() + static_cast<std::ptrdiff_t>(capacity), whole.begin()));
     EXPECT_EQ(part[capacity], 0U);
@@ -191,7 +190,7 @@ TEST(CallStackSymbols, SayTheDistanceFromTheFunctionsStart) {
   EXPECT_THAT(std::string(rt::CallStack::symbols(addresses).at(0).view()), HasSubstr(") + 7"));
 }
 
-// Used to be given by their distance from the start of the image alone.
+// Such functions used to appear only as a distance from the start of the image.
 TEST(CallStackSymbols, NameFunctionsThatAreNotExported) {
   Addresses addresses{};
   hidden(addresses);
@@ -204,8 +203,7 @@ TEST(CallStackSymbols, NameFunctionsThatAreNotExported) {
 }
 
 #ifdef __linux__
-// Of files that are damaged or not those that were loaded, what they say is left alone.
-TEST(CallStackSymbols, ReadNoFileThatIsNotTheImages) {
+TEST(CallStackSymbols, IgnoreFilesThatAreDamagedOrNotTheLoadedOnes) {
   namespace fs = std::filesystem;
   const fs::path copy = fs::path(testing::TempDir()) / "call-stack-test.so";
   if (runProcess({"sh", "-c", "command -v cc"}).exitStatus != 0)
@@ -228,7 +226,7 @@ TEST(CallStackSymbols, ReadNoFileThatIsNotTheImages) {
     content.assign(std::istreambuf_iterator<char>(stream), {});
   }
   const auto replaceBy = [&](std::string_view bytes) {
-    // A file of its own: the one that is loaded stays as it is.
+    // Makes a new file. The loaded one stays as it is.
     fs::remove(copy);
     std::ofstream(copy, std::ios::binary) << bytes;
   };
@@ -239,7 +237,7 @@ TEST(CallStackSymbols, ReadNoFileThatIsNotTheImages) {
   std::mt19937 random(20'261'121);
   for (std::size_t round = 0; round < 3000; ++round) {
     std::string damaged = content;
-    // What says where things are is at both ends.
+    // The headers are at both ends of the file.
     const std::size_t ends = 2500;
     for (int i = 0; i < 4; ++i) {
       const std::size_t offset = random() % ends;
@@ -255,7 +253,7 @@ TEST(CallStackSymbols, ReadNoFileThatIsNotTheImages) {
 }
 #endif
 
-TEST(CallStackSymbols, SayWhatIsKnownOfAnAddressOfNoFunction) {
+TEST(CallStackSymbols, HaveNoImageForAnUnknownAddress) {
   const std::array<std::uint64_t, 2> addresses = {0, 16};
   const std::vector<rt::String> lines = rt::CallStack::symbols(addresses);
   ASSERT_EQ(lines.size(), 2U);
@@ -263,7 +261,7 @@ TEST(CallStackSymbols, SayWhatIsKnownOfAnAddressOfNoFunction) {
   EXPECT_EQ(lines[1], "1   ???                                 0x0000000000000010");
 }
 
-// Used to lose the end of the name, and the blank that parts it from the address.
+// The end of the name and the blank before the address used to be missing.
 TEST(CallStackSymbols, NameAnImageWithALongNameInFull) {
   namespace fs = std::filesystem;
   Dl_info information{};
@@ -284,7 +282,7 @@ TEST(CallStackSymbols, NameAnImageWithALongNameInFull) {
   fs::remove(copy);
 }
 
-TEST(CallStackSymbols, AreNoneForNoAddresses) {
+TEST(CallStackSymbols, AreEmptyForNoAddresses) {
   EXPECT_TRUE(rt::CallStack::symbols({}).empty());
 }
 

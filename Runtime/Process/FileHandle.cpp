@@ -23,7 +23,7 @@ iovec pieceOf(std::string_view text) noexcept {
   return {const_cast<char*>(text.data()), text.size()};
 }
 
-// What is still to be written of a line.
+// The rest of a line that is being written.
 class Pieces {
  public:
   Pieces(std::string_view before, std::string_view line) noexcept
@@ -36,7 +36,7 @@ class Pieces {
 
   bool isEmpty() const noexcept { return first_ == pieces_.size(); }
 
-  // Hands all of it to the system at once; gives what `writev` gives.
+  // Passes the rest to the system in one call. Returns the result of `write` or `writev`.
   ssize_t write(int descriptor) const noexcept {
     const iovec* const first = pieces_.data() + first_;
     const std::size_t count = pieces_.size() - first_;
@@ -57,8 +57,7 @@ class Pieces {
   }
 
  private:
-  // Makes the last piece all of them. Measured: the system takes half as long again for two pieces as for
-  // one.
+  // Joins all pieces into the last one. Measured: two pieces take the system half as long again as one.
   void join() noexcept {
     char* end = joined_.data();
     for (const iovec& piece : pieces_) {

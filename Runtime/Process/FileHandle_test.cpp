@@ -86,8 +86,8 @@ TEST_F(FileHandleTest, WritesALineOfAnyLength) {
   EXPECT_EQ(contents(path()), line + "\n");
 }
 
-// Short lines are put together before they are written, long ones are not.
-TEST_F(FileHandleTest, WritesLinesOfEveryLengthAroundThatOfShortOnes) {
+// A short line is joined with its line feed before it is written. A long one is written in two pieces.
+TEST_F(FileHandleTest, WritesLinesAroundTheLengthUpToWhichPiecesAreJoined) {
   const rt::Ref<rt::FileHandle> handle = open();
   std::string expected;
   for (std::size_t length = 1000; length < 1050; ++length) {
@@ -119,7 +119,7 @@ TEST_F(FileHandleTest, LeavesTheStandardStreamsOpen) {
   EXPECT_EQ(testing::internal::GetCapturedStderr(), "to standard error\n");
 }
 
-TEST_F(FileHandleTest, GivesNoneWhereTheFileCannotBeOpened) {
+TEST_F(FileHandleTest, ReturnsNullIfTheFileCannotBeOpened) {
   errno = 0;
   EXPECT_FALSE(rt::FileHandle::openForAppending(rt::String::fromUTF8(path("no/file").c_str()), 0644));
   EXPECT_EQ(errno, ENOENT);
@@ -130,13 +130,13 @@ TEST_F(FileHandleTest, GivesNoneWhereTheFileCannotBeOpened) {
   EXPECT_EQ(errno, ENOENT);
 }
 
-TEST_F(FileHandleTest, GivesNoneWithoutAPath) {
+TEST_F(FileHandleTest, ReturnsNullForANullPath) {
   errno = 0;
   EXPECT_FALSE(rt::FileHandle::openForAppending(nullptr, 0644));
   EXPECT_EQ(errno, EINVAL);
 }
 
-TEST_F(FileHandleTest, DoesNotTakeWhatStandsBeforeANulForThePath) {
+TEST_F(FileHandleTest, ReturnsNullForAPathThatContainsNul) {
   const std::string name = path().string() + std::string("\0more", 5);
   errno = 0;
   EXPECT_FALSE(rt::FileHandle::openForAppending(rt::String::fromUTF8(std::string_view(name)), 0644));
@@ -144,7 +144,7 @@ TEST_F(FileHandleTest, DoesNotTakeWhatStandsBeforeANulForThePath) {
   EXPECT_FALSE(fs::exists(path()));
 }
 
-TEST_F(FileHandleTest, ThrowsWhereTheDeviceIsFull) {
+TEST_F(FileHandleTest, ThrowsIfTheDeviceIsFull) {
   if (!fs::exists("/dev/full")) GTEST_SKIP() << "no /dev/full here";
   const rt::Ref<rt::FileHandle> handle = rt::FileHandle::openForAppending("/dev/full"_s, 0644);
   ASSERT_TRUE(handle);
@@ -152,23 +152,23 @@ TEST_F(FileHandleTest, ThrowsWhereTheDeviceIsFull) {
   EXPECT_EQ(errorOf(*handle, "line"), ENOSPC);
 }
 
-TEST_F(FileHandleTest, ThrowsWhereTheDescriptorIsClosed) {
+TEST_F(FileHandleTest, ThrowsIfTheDescriptorIsClosed) {
   const rt::Ref<rt::FileHandle> handle = open();
   close(handle->descriptor());
   EXPECT_EQ(errorOf(*handle, "line"), EBADF);
-  // The handle closes its descriptor, so there must be one to close.
+  // The handle's destructor closes this descriptor, so it must be open again.
   ASSERT_EQ(dup2(STDERR_FILENO, handle->descriptor()), handle->descriptor());
 }
 
-TEST_F(FileHandleTest, GoesOnWritingAFileThatWasRemoved) {
+TEST_F(FileHandleTest, KeepsWritingToAFileThatWasRemoved) {
   const rt::Ref<rt::FileHandle> handle = open();
   fs::remove(path());
   EXPECT_EQ(errorOf(*handle, "line"), 0);
   EXPECT_FALSE(fs::exists(path()));
 }
 
-// A line that the system took in part stays torn, but takes no later line with it.
-TEST_F(FileHandleTest, StartsTheNextLineOnALineOfItsOwn) {
+// A line that the system took in part stays incomplete. Later lines are complete.
+TEST_F(FileHandleTest, StartsANewLineAfterAnIncompleteOne) {
   const rt::Ref<rt::FileHandle> handle = open();
   rlimit before{};
   ASSERT_EQ(getrlimit(RLIMIT_FSIZE, &before), 0);
@@ -185,8 +185,8 @@ TEST_F(FileHandleTest, StartsTheNextLineOnALineOfItsOwn) {
   EXPECT_EQ(contents(path()), "0123456789\nnext\nlast\n");
 }
 
-// Used to leave an empty line that nobody wrote: the torn line was ended, but the next one did not begin.
-TEST_F(FileHandleTest, EndsATornLineOnce) {
+// An empty line used to follow if the system took the line feed that ends an incomplete line, and no more.
+TEST_F(FileHandleTest, EndsAnIncompleteLineOnce) {
   const rt::Ref<rt::FileHandle> handle = open();
   rlimit before{};
   ASSERT_EQ(getrlimit(RLIMIT_FSIZE, &before), 0);
@@ -222,7 +222,7 @@ struct Pipe {
   int ends[2] = {-1, -1};
 };
 
-TEST_F(FileHandleTest, DropsALineForADescriptorThatDoesNotBlockAndIsFull) {
+TEST_F(FileHandleTest, DropsALineIfANonBlockingDescriptorIsFull) {
   const Pipe pipe;
   rt::FileHandle& handle =
       *rt::make<rt::FileHandle>(pipe.ends[1], rt::FileHandle::Closing::leavesOpen).detach();
@@ -236,8 +236,7 @@ TEST_F(FileHandleTest, DropsALineForADescriptorThatDoesNotBlockAndIsFull) {
   handle.release();
 }
 
-// Invariant: a line that was begun is ended, whatever the descriptor does in between.
-TEST_F(FileHandleTest, EndsALineThatADescriptorWhichDoesNotBlockTookInPart) {
+TEST_F(FileHandleTest, EndsALineThatANonBlockingDescriptorTookInPart) {
   const Pipe pipe;
   const rt::Ref<rt::FileHandle> handle =
       rt::make<rt::FileHandle>(pipe.ends[1], rt::FileHandle::Closing::leavesOpen);
@@ -259,7 +258,7 @@ TEST_F(FileHandleTest, AllocatesNothingForALine) {
   EXPECT_EQ(count.allocations(), 0);
 }
 
-// Invariant: every line of every writer is in the file once, whole, and those of one writer in its order.
+// Expects each line of each writer once and complete, and the lines of a writer in order.
 void expectWholeLines(const std::string& text, int writers, int lines) {
   std::istringstream stream(text);
   std::map<int, int> next;
@@ -285,7 +284,7 @@ void writeLines(rt::FileHandle& handle, int writer, int lines) {
   }
 }
 
-TEST_F(FileHandleTest, KeepsLinesOfThreadsWhole) {
+TEST_F(FileHandleTest, DoesNotMixLinesOfThreads) {
   const rt::Ref<rt::FileHandle> handle = open();
   std::vector<std::thread> threads;
   threads.reserve(8);
@@ -296,7 +295,7 @@ TEST_F(FileHandleTest, KeepsLinesOfThreadsWhole) {
   expectWholeLines(contents(path()), 8, 500);
 }
 
-TEST_F(FileHandleTest, KeepsLinesOfProcessesWhole) {
+TEST_F(FileHandleTest, DoesNotMixLinesOfProcesses) {
   std::vector<pid_t> children;
   for (int writer = 0; writer < 4; ++writer) {
     children.push_back(fork());

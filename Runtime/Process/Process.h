@@ -7,7 +7,7 @@
 ///     rt::String mode = rt::Process::environmentValue("OS_ACTIVITY_MODE");
 ///     if (mode == "debug") ...
 ///
-/// Not for: a program that runs with raised privileges and decides anything by its environment.
+/// Not for: programs with raised privileges. They must not base decisions on the environment.
 
 #include <cstdint>
 
@@ -15,16 +15,16 @@
 
 namespace rt::Process {
 
-/// The program's name: the last element of the path by which it was started. Never null; "" in a process
-/// that was started without one. Bytes that are not UTF-8 come as U+FFFD.
+/// Returns the program's name, the last element of the path by which it was started. Never null; "" for a
+/// process that was started without a path. Bytes that are not UTF-8 become U+FFFD.
 String name();
 
-/// The process's identifier; in the child of a fork, the child's.
+/// Returns the identifier of this process. In the child of a fork, that is the child's.
 std::int32_t identifier() noexcept;
 
-/// The value of the environment variable `name`, which ends with NUL; null when it is not set, "" when it
-/// is set to nothing. Bytes that are not UTF-8 come as U+FFFD. As with the system's own look-up, no other
-/// thread may change the environment at the same time.
+/// Returns the value of the environment variable `name`. Null if it is not set, "" if its value is empty.
+/// Bytes that are not UTF-8 become U+FFFD.
+/// Threads: as with the system's own look-up, no other thread may change the environment at the same time.
 String environmentValue(const char* name);
 
 }  // namespace rt::Process

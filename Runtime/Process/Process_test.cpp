@@ -25,7 +25,7 @@ TEST(Process, HasAnotherIdentifierInTheChildOfAFork) {
   EXPECT_EQ(status, 0);
 }
 
-TEST(Process, TellsUnsetEmptyAndSetVariablesApart) {
+TEST(Process, DistinguishesUnsetEmptyAndSetVariables) {
   ASSERT_EQ(unsetenv("RT_PROCESS_TEST"), 0);
   EXPECT_TRUE(rt::Process::environmentValue("RT_PROCESS_TEST").isNull());
   ASSERT_EQ(setenv("RT_PROCESS_TEST", "", 1), 0);

@@ -1,6 +1,6 @@
 #pragma once
 
-// The names of functions that their images do not export. Inside of the call stacks.
+// Finds the names of functions that their images do not export. Internal to Runtime/Process/CallStack.h.
 
 #include <cstdint>
 #include <map>
@@ -10,30 +10,30 @@
 
 namespace rt::detail {
 
-/// Reads the symbol tables in the files that the process's images were loaded from, each once, when it is
-/// needed. A file that is no longer the one that was loaded, is damaged, or has no table, has no names. One
-/// thread at a time.
+/// Reads the symbol tables in the files of the images that this process has loaded. Reads each file at most
+/// once, when it is first needed. Finds no names in a file that is damaged, has no symbol table, or is not
+/// the one that was loaded. Threads: not thread-safe.
 class SymbolTables {
  public:
   struct Symbol {
     /// The path of the image; "" for the program itself.
     std::string image;
-    /// Where the image was loaded.
+    /// The address at which the image was loaded.
     std::uint64_t imageStart = 0;
-    /// The function, as the linker knows it, and where it starts; "" where it is not known.
+    /// The function's mangled name, or "" if it is unknown, and its address.
     std::string function;
     std::uint64_t functionStart = 0;
   };
 
-  /// What is known of `address`; none where it is in no image, and on systems that say by other means what
-  /// there is to say. Throws std::bad_alloc.
+  /// Returns the image and the function that contain `address`. Returns std::nullopt if no image contains it,
+  /// and always on macOS, where `dladdr` finds such functions itself. Throws std::bad_alloc.
   std::optional<Symbol> find(std::uint64_t address);
 
  private:
   struct Function {
     std::uint64_t start;
     std::uint64_t size;
-    // Within `names`.
+    // An index in `names`.
     std::uint32_t name;
   };
   struct Table {
@@ -44,7 +44,7 @@ class SymbolTables {
 
   static Table read(const Image& image);
 
-  // By where their images were loaded.
+  // The key is the address at which the image was loaded.
   std::map<std::uint64_t, Table> tables_;
 };
 

@@ -1,12 +1,12 @@
 #pragma once
 
-// What the operating system, or the host's build, says of the main bundle.
+// The main bundle as the operating system, or the host's build, defines it.
 
 #include "Runtime/Objects/String.h"
 
 namespace rt::detail {
 
-/// The main bundle's identifier; null when there is none.
+/// Returns the main bundle's identifier, or null if it has none.
 String systemBundleIdentifier();
 
 }  // namespace rt::detail

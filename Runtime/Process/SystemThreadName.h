@@ -1,15 +1,15 @@
 #pragma once
 
-// How the operating system names the calling thread.
+// The name of the calling thread in the operating system.
 
 #include "Runtime/Objects/String.h"
 
 namespace rt::detail {
 
-/// The name that the system knows the calling thread by; null when it has none or it may be another's.
+/// Returns the system's name of the calling thread. Null if it has none, or may have inherited the name.
 String systemThreadName();
 
-/// Tells the system the calling thread's name; null takes it away. What is too long is cut.
+/// Sets the system's name of the calling thread. Null removes it. Too long a name is cut.
 void setSystemThreadName(const String& name) noexcept;
 
 }  // namespace rt::detail

@@ -11,7 +11,7 @@ namespace {
 
 using Name = ThreadReference<StringObject, struct NameTag>;
 
-// Whether `Name` is right, null included.
+// Whether `Name` has been set on this thread, perhaps to null.
 constinit thread_local bool isKnown = false;
 
 }  // namespace

@@ -12,21 +12,23 @@
 
 namespace rt::Thread {
 
-/// The calling thread's name; null when it has none. That is the last one given with `setCurrentName`. On
-/// macOS a thread that was never given one there is looked at once, the first time it is asked, for a name
-/// that the system knows. On Linux what the system knows does not count: a thread bears its creator's name
-/// there until it is given another. Costs a look at a variable. Null in what the thread still runs after
-/// its name was given up, such as destructors of keys of the thread library. Throws std::bad_alloc on macOS,
-/// at the first call on a thread.
+/// Returns the last name that `setCurrentName` gave to the calling thread, or null. It only reads a variable.
+///
+/// On macOS the first call on a thread without such a name takes over the system's name of the thread. On
+/// Linux the system's name does not count, since a thread inherits it from its creator.
+///
+/// A thread releases its name when it ends. Code that runs after that, such as destructors of keys of the
+/// thread library, gets null.
+/// Errors: throws std::bad_alloc on macOS, at the first call on a thread.
 String currentName();
 
-/// Names the calling thread; null takes its name away. The system shows the name too, on Linux the first
-/// 15 bytes of it, less where they would end within a character. Throws
-/// std::bad_alloc at the first name of a thread, which then has none.
+/// Names the calling thread. Null removes its name. The system shows the name too. On Linux it shows the
+/// first 15 bytes at most, without an incomplete character at the end.
+/// Errors: throws std::bad_alloc at the first name of a thread. The thread has no name then.
 void setCurrentName(const String& name);
 
-/// The calling thread as the system's thread library knows it (pthread_self); never null, and the same as
-/// long as the thread lives.
+/// Returns the calling thread's handle in the system's thread library (pthread_self). Never null, and the
+/// same as long as the thread lives.
 const void* currentHandle() noexcept;
 
 }  // namespace rt::Thread

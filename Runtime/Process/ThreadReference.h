@@ -1,16 +1,17 @@
 #pragma once
 
-/// A reference that each thread has for itself, given up when the thread ends.
+/// A strong reference for each thread, which the thread releases when it ends.
 ///
 ///     using CurrentHandler = rt::ThreadReference<rt::AssertionHandler, struct CurrentHandlerTag>;
 ///     CurrentHandler::set(handler);
 ///     if (rt::AssertionHandler* handler = CurrentHandler::get()) ...
 ///
-/// Reading is reading a variable. Null on every thread until it is set, and again where the thread still runs
-/// something after it has given the reference up; what is set then is given up at once. The main thread gives
-/// it up only where it ends before the process. `Tag` tells apart references to one class.
+/// `get` reads a variable. The reference is null on every thread until it is set. It is null again in code
+/// that an ending thread runs after it has released the object. An object that is set then is released at
+/// once. The main thread releases its object only if it ends before the process. `Tag` distinguishes several
+/// references to one class.
 ///
-/// Not for: what is no object; values that another thread is to see.
+/// Not for: values that are not objects; values that other threads read.
 
 #include <pthread.h>
 
@@ -25,13 +26,13 @@ namespace rt {
 template <class T, class Tag>
 class ThreadReference {
  public:
-  /// The calling thread's object, or null. Not retained.
+  /// Returns the calling thread's object, or null. Ownership: the thread keeps its reference.
   static T* get() noexcept { return object_; }
 
-  /// Gives up the calling thread's object and takes `object`, which may be null, in its place. Throws
-  /// std::bad_alloc where a thread has its first object; then nothing has changed.
+  /// Replaces the calling thread's object by `object`, which may be null, and releases the previous one.
+  /// Throws std::bad_alloc at a thread's first object, without a change.
   static void set(Ref<T> object) {
-    // Nothing would give it up any more.
+    // `giveUp` has already run on this thread, so nothing would release the object later.
     if (hasEnded_) return;
     if (object) giveUpAtEnd();
     Ref<T> previous = Ref<T>::adopt(object_);
@@ -39,8 +40,8 @@ class ThreadReference {
   }
 
  private:
-  // By a key of the thread library, which refuses where there is no memory: for the destructor of a variable
-  // the C library needs some, too, and ends the program where there is none.
+  // Uses a key of the thread library, which reports a lack of memory. The destructor of a thread_local
+  // variable would need memory too, and the C library ends the program if it gets none.
   static void giveUpAtEnd() {
     static constinit Lazy<pthread_key_t> shared;
     const pthread_key_t key = shared.get([] {

@@ -25,7 +25,7 @@ std::string systemName() {
   return name.data();
 }
 
-TEST(Thread, HasNoNameWhereNobodyGaveOne) {
+TEST(Thread, HasNoNameUntilItIsNamed) {
   EXPECT_TRUE(rt::Thread::currentName().isNull());
   onNewThread([] { EXPECT_TRUE(rt::Thread::currentName().isNull()); });
 }
@@ -41,7 +41,7 @@ TEST(Thread, HasTheNameThatItWasGiven) {
   EXPECT_TRUE(rt::Thread::currentName().isNull());
 }
 
-TEST(Thread, KeepsAnEmptyNameApartFromNone) {
+TEST(Thread, DistinguishesAnEmptyNameFromNoName) {
   onNewThread([] {
     rt::Thread::setCurrentName(""_s);
     EXPECT_FALSE(rt::Thread::currentName().isNull());
@@ -49,7 +49,7 @@ TEST(Thread, KeepsAnEmptyNameApartFromNone) {
   });
 }
 
-TEST(Thread, LosesItsName) {
+TEST(Thread, LosesItsNameWhenItIsSetToNull) {
   onNewThread([] {
     const std::string before = systemName();
     rt::Thread::setCurrentName("Importer"_s);
@@ -59,8 +59,9 @@ TEST(Thread, LosesItsName) {
   });
 }
 
-// Used to be called by the process's former name: on Linux the main thread's name is the process's.
-TEST(Thread, HasNoNameWhenTheMainThreadGetsOne) {
+// On Linux the main thread's name is the process's. Naming the main thread used to give other threads the
+// process's former name.
+TEST(Thread, HasNoNameAfterTheMainThreadIsNamed) {
   const std::string before = systemName();
   std::binary_semaphore isNamed(0);
   std::thread older([&] {
@@ -76,7 +77,7 @@ TEST(Thread, HasNoNameWhenTheMainThreadGetsOne) {
   EXPECT_EQ(systemName(), before);
 }
 
-TEST(Thread, LosesItsNameWhereNoFileCanBeOpened) {
+TEST(Thread, LosesItsNameEvenIfNoFileCanBeOpened) {
 #if defined(__has_feature)
 #if __has_feature(undefined_behavior_sanitizer)
   GTEST_SKIP() << "the sanitizer looks at objects by way of descriptors";
@@ -97,8 +98,8 @@ TEST(Thread, LosesItsNameWhereNoFileCanBeOpened) {
   });
 }
 
-// Used to be called by its creator's name where that had one.
-TEST(Thread, DoesNotBearItsCreatorsName) {
+// A thread used to report its creator's name.
+TEST(Thread, DoesNotInheritItsCreatorsName) {
   onNewThread([] {
     rt::Thread::setCurrentName("Importer"_s);
     onNewThread([] {
@@ -111,15 +112,15 @@ TEST(Thread, DoesNotBearItsCreatorsName) {
 }
 
 #ifdef __APPLE__
-TEST(Thread, IsCalledWhatTheSystemCallsIt) {
+TEST(Thread, HasTheNameThatTheSystemKnows) {
   onNewThread([] {
     pthread_setname_np("worker");
     EXPECT_EQ(rt::Thread::currentName(), "worker");
   });
 }
 #else
-// There the name that the system knows may be the creator's.
-TEST(Thread, HasNoNameOfTheSystems) {
+// On Linux the name that the system knows may be the creator's.
+TEST(Thread, IgnoresTheNameThatTheSystemKnows) {
   onNewThread([] {
     pthread_setname_np(pthread_self(), "worker");
     EXPECT_TRUE(rt::Thread::currentName().isNull());
@@ -128,9 +129,9 @@ TEST(Thread, HasNoNameOfTheSystems) {
 }
 #endif
 
-TEST(Thread, KeepsALongNameWholeAndTellsTheSystemWholeCharacters) {
+TEST(Thread, KeepsALongNameAndShortensItForTheSystemBetweenCharacters) {
   onNewThread([] {
-    // The bytes 15 and 16 are one character.
+    // Bytes 15 and 16 form one character.
     const rt::String name = "abcdefghijklmn\xc3\xa9 and more"_s;
     rt::Thread::setCurrentName(name);
     EXPECT_EQ(rt::Thread::currentName(), name);
@@ -140,7 +141,7 @@ TEST(Thread, KeepsALongNameWholeAndTellsTheSystemWholeCharacters) {
   });
 }
 
-TEST(Thread, TellsItsNameWithoutAllocating) {
+TEST(Thread, ReturnsItsNameWithoutAllocating) {
   if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
   onNewThread([] {
     rt::Thread::setCurrentName("Importer"_s);

@@ -1,34 +1,37 @@
 #pragma once
 
-/// The system's log: entries that the operator of the machine reads.
+/// Writes entries to the system's log, which the operator of the machine reads.
 ///
 ///     const rt::SystemLog log("com.example.host"_s, "network"_s);
 ///     if (log.isEnabled(rt::SystemLog::Type::error)) {
 ///       log.write(rt::SystemLog::Type::error, "no route to 192.0.2.1");
 ///     }
 ///
-/// A handle is two strings; making one opens nothing and costs nothing to speak of.
+/// A `SystemLog` holds two strings. Making one opens nothing.
 ///
-/// On Linux an entry goes to the journal (read it with `journalctl SUBSYSTEM=com.example.host`) with the
-/// fields MESSAGE, PRIORITY (debug 7, info 6, error 3, fault 2), SUBSYSTEM, CATEGORY, SYSLOG_IDENTIFIER
-/// (the program's name) and TID. Entries of any size arrive whole, with every byte. Where no journal
-/// listens it goes to the classic socket /dev/log, and where nobody listens there either to standard
-/// error; there an entry is one line, `name[pid] error: [subsystem:category] text`, and control characters
-/// are written out ("\n", "\x1b"). A packet on the classic socket has 1024 bytes at most, as daemons
-/// expect, so that a long entry becomes several.
+/// On Linux an entry goes to the journal. `journalctl SUBSYSTEM=com.example.host` shows it. Its fields are
+/// MESSAGE, PRIORITY (debug 7, info 6, error 3, fault 2), SUBSYSTEM, CATEGORY, SYSLOG_IDENTIFIER (the
+/// program's name) and TID. The journal receives entries of any size, with every byte.
 ///
-/// A daemon that is alive but takes nothing holds a caller up for `kLongestWait` at most. Once one has
-/// waited in vain, and nobody else's entry was taken meanwhile, entries are dropped at once until the daemon
-/// takes one again. What was dropped is counted, and the count is written in the place of what is missing:
-/// an error entry of subsystem "rt" with the number in the field DROPPED. What is left to tell when the
-/// program ends by `exit` is tried once more then, and otherwise goes to standard error.
+/// If no journal listens, the entry goes to the classic socket /dev/log. If nobody listens there either, it
+/// goes to standard error. In both places control characters are escaped ("\n", "\x1b"). On standard error an
+/// entry is one line, `name[pid] error: [subsystem:category] text`. On the classic socket a packet has 1024
+/// bytes at most, as daemons expect, so a long entry becomes several packets.
 ///
-/// The first entry opens a socket, closed on exec, which the process keeps. A daemon that is started anew
-/// is found again with the next entry. The child of a fork logs on, and begins to count anew.
+/// A daemon that is alive but takes nothing blocks a caller for `kLongestWait` at most. If no other entry was
+/// taken during such a wait, later calls do not wait any more. They drop their entries at once, until the
+/// daemon takes one again.
 ///
-/// On macOS an entry goes to the unified log, which decides what is enabled and what is kept.
+/// Dropped entries are counted. The next entry that can be written is preceded by a report: an error entry of
+/// the subsystem "rt" with the number in the field DROPPED. `exit` tries once more to report a number that is
+/// left. If that fails, it writes the report to standard error.
 ///
-/// Not for: text that nobody but the user of a program reads; secrets, since entries are public.
+/// The first entry opens a socket, which the process keeps. It is closed on exec. The next entry after the
+/// restart of a daemon finds the daemon again. In the child of a fork the log works, and counts from 0.
+///
+/// On macOS an entry goes to the unified log. That log decides which entries are enabled and kept.
+///
+/// Not for: messages to the user of a program; secrets, since entries are public.
 
 #include <chrono>
 #include <cstdint>
@@ -40,25 +43,26 @@ namespace rt {
 
 class SystemLog {
  public:
-  /// What an entry is, in the order of how bad it is.
+  /// The type of an entry, in ascending order of severity.
   enum class Type : std::uint8_t { debug, info, error, fault };
 
-  /// The longest that `write` waits for a daemon, all in all.
+  /// The longest time that one call of `write` waits for daemons.
   static constexpr std::chrono::milliseconds kLongestWait{250};
 
-  /// A handle for the entries of `category` in `subsystem`; null counts as empty.
+  /// Makes a log for the entries of `category` in `subsystem`. Null counts as empty.
   SystemLog(String subsystem, String category) noexcept;
 
-  /// Whether entries of `type` are kept. On Linux always: the journal has its own say (MaxLevelStore=).
+  /// Returns whether entries of `type` are enabled. Always true on Linux, where the journal's own setting
+  /// MaxLevelStore= decides what is stored.
   bool isEnabled(Type type) const noexcept;
 
-  /// Writes the entry `text`, bytes that should be UTF-8. Any thread may call it, at any time, also while
-  /// the program is being loaded or after `main`; threads do not wait for each other. Where a journal
-  /// listens it takes no lock and allocates nothing. Leaves `errno` alone. See above for what happens to an
-  /// entry that cannot be written.
+  /// Writes the entry `text`, which should be UTF-8. If a journal listens, takes no lock and allocates
+  /// nothing. Preserves `errno`. May also be called while the program is being loaded, and after `main`.
+  /// Threads: thread-safe. Threads do not wait for each other's entries.
+  /// Errors: drops and counts an entry that cannot be written, as described above.
   void write(Type type, std::string_view text) const noexcept;
 
-  /// How many entries of the whole process were dropped so far, reported or not. Any thread may call it.
+  /// Returns how many entries of this process were dropped so far, reported or not. Threads: thread-safe.
   static std::uint64_t droppedCount() noexcept;
 
  private:

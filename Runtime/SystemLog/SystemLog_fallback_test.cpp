@@ -1,4 +1,4 @@
-// The system log where no journal is: a classic daemon's socket, and standard error.
+// Tests of the system log without a journal: a classic daemon's socket, and standard error.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -19,7 +19,7 @@ namespace fs = std::filesystem;
 using testing::ElementsAre;
 using Type = rt::SystemLog::Type;
 
-TEST_F(SystemLogTest, WritesToTheClassicSocketWhereNoJournalIs) {
+TEST_F(SystemLogTest, WritesToTheClassicSocketIfThereIsNoJournal) {
   ClassicSocket socket;
   testLog().write(Type::error, "no\nway\x1b[0m \xc3\xa9");
   const std::vector<std::string> packets = socket.packets();
@@ -32,7 +32,7 @@ TEST_F(SystemLogTest, WritesToTheClassicSocketWhereNoJournalIs) {
   EXPECT_EQ(dropped(), 0U);
 }
 
-TEST_F(SystemLogTest, WritesSeverityOfUserMessagesToTheClassicSocket) {
+TEST_F(SystemLogTest, WritesFacilityAndSeverityToTheClassicSocket) {
   ClassicSocket socket;
   std::vector<std::string> heads;
   for (const Type type : {Type::debug, Type::info, Type::error, Type::fault}) testLog().write(type, "x");
@@ -57,7 +57,7 @@ TEST_F(SystemLogTest, CutsALongEntryIntoClassicPacketsBetweenCharacters) {
   EXPECT_EQ(whole, "[com.example.test:unit] " + text);
 }
 
-// journald itself is a daemon that listens for classic packets.
+// journald also listens for classic packets.
 TEST_F(SystemLogTest, IsUnderstoodByAClassicDaemon) {
   PrivateJournal journal;
   journal.start();
@@ -74,7 +74,7 @@ TEST_F(SystemLogTest, IsUnderstoodByAClassicDaemon) {
   EXPECT_TRUE(entries[0].contains("SYSLOG_TIMESTAMP"));
 }
 
-TEST_F(SystemLogTest, WritesALineToStandardErrorWhereNobodyListens) {
+TEST_F(SystemLogTest, WritesALineToStandardErrorIfNoDaemonListens) {
   StandardErrorPipe standardError;
   testLog().write(Type::error, std::string_view("a\tb\0c\nd\x7f", 8));
   rt::SystemLog(nullptr, nullptr).write(Type::debug, "e");
@@ -91,7 +91,7 @@ TEST_F(SystemLogTest, WritesALongLineToStandardErrorWhole) {
   EXPECT_THAT(standardError.text(), testing::EndsWith("] " + text + "\n"));
 }
 
-TEST_F(SystemLogTest, CountsWhatStandardErrorDoesNotTake) {
+TEST_F(SystemLogTest, CountsEntriesThatStandardErrorDoesNotTake) {
   {
     StandardErrorPipe stuck;
     stuck.fill();
@@ -101,7 +101,7 @@ TEST_F(SystemLogTest, CountsWhatStandardErrorDoesNotTake) {
     EXPECT_EQ(dropped(), 2U);
   }
   {
-    // Its reader is gone; that must not end the process.
+    // The pipe has no reader. That must not end the process.
     StandardErrorPipe broken;
     broken.closeReader();
     testLog().write(Type::info, "broken");

@@ -1,5 +1,4 @@
-// The system log where what should read its entries does not: nobody waits long, and what is dropped is
-// counted.
+// Tests of the system log while daemons do not read: no caller waits long, and dropped entries are counted.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -28,8 +27,9 @@ namespace {
 
 using Type = rt::SystemLog::Type;
 
-/// While this lives, the clock that the log looks at goes on by what each send may wait at most, and by
-/// nothing else. So what the log asks for is measured, and not what keeps the machine busy. One at a time.
+// Replaces the clock that the log reads. Only sends that may wait advance it, as if they had waited. So the
+// tests measure the waits that the log allows, and not the load of the machine. At most one object may exist
+// at a time.
 class WorstCase {
  public:
   WorstCase() {
@@ -49,10 +49,10 @@ class WorstCase {
 
   static WorstCase* current() noexcept { return current_; }
 
-  /// Since this was made.
+  // The time since this object was made.
   std::chrono::nanoseconds time() const noexcept { return time_; }
 
-  /// How many sends that might wait were refused after all.
+  // How many sends that were allowed to wait were refused.
   int waitsInVain() const noexcept { return waitsInVain_; }
 
   void sent(int socket, int flags, bool isTaken) {
@@ -67,7 +67,7 @@ class WorstCase {
       time_ += limit / 2;
       return;
     }
-    // For room of its own socket, and for room of the daemon's.
+    // A send may wait for room in its own socket and for room in the daemon's.
     time_ += 2 * limit;
     ++waitsInVain_;
   }
@@ -83,7 +83,7 @@ constinit std::atomic<WorstCase*> WorstCase::current_ = nullptr;
 
 }  // namespace
 
-// The program's own goes before that of the C library.
+// The program's own function replaces that of the C library.
 extern "C" ssize_t sendmsg(int socket, const msghdr* message, int flags) {
   const ssize_t result = syscall(SYS_sendmsg, socket, message, flags);
   const int error = errno;
@@ -94,8 +94,8 @@ extern "C" ssize_t sendmsg(int socket, const msghdr* message, int flags) {
 
 namespace {
 
-// A suspended daemon's socket is filled; what does not fit is counted and told of, and one entry alone waits.
-TEST_F(SystemLogTest, NeitherWaitsForADaemonThatIsStuckNorLosesCount) {
+// Fills the socket of a suspended daemon. Further entries are counted and reported. Only one entry waits.
+TEST_F(SystemLogTest, DropsAndCountsEntriesWhileTheJournalIsStuck) {
   PrivateJournal journal;
   journal.start();
   testLog().write(Type::info, "before");
@@ -124,7 +124,7 @@ TEST_F(SystemLogTest, NeitherWaitsForADaemonThatIsStuckNorLosesCount) {
   EXPECT_EQ(reports[0]["CATEGORY"], "SystemLog");
 }
 
-TEST_F(SystemLogTest, CountsWhatAClassicDaemonThatIsStuckDoesNotTake) {
+TEST_F(SystemLogTest, DropsAndCountsEntriesWhileAClassicDaemonIsStuck) {
   ClassicSocket socket;
   std::uint64_t sent = 0;
   while (dropped() < 2000) {
@@ -140,9 +140,10 @@ TEST_F(SystemLogTest, CountsWhatAClassicDaemonThatIsStuckDoesNotTake) {
   EXPECT_THAT(packets[1], testing::EndsWith("]: [com.example.test:unit] after"));
 }
 
-// An entry that is to become many packets, or a file, waits no longer than any other.
-TEST_F(SystemLogTest, HoldsACallerUpNoLongerThanItSays) {
-  // The longest that an entry may take until one is dropped, which has waited in vain.
+// An entry that becomes many packets, or a file, waits no longer than any other.
+TEST_F(SystemLogTest, HoldsACallerUpNoLongerThanTheLimit) {
+  // Writes entries until one has waited in vain and is dropped. Returns the longest time that one of them
+  // took.
   const auto longestWait = [&](const std::string& text) {
     const WorstCase worstCase;
     std::chrono::nanoseconds longest{0};
@@ -159,7 +160,7 @@ TEST_F(SystemLogTest, HoldsACallerUpNoLongerThanItSays) {
     ClassicSocket socket;
     for (const std::string& text : {std::string("short"), huge}) {
       socket.packets();
-      testLog().write(Type::info, "taken");  // which ends the state in which nobody waits
+      testLog().write(Type::info, "taken");  // callers may wait again after this
       EXPECT_LE(longestWait(text), rt::SystemLog::kLongestWait) << text.size();
     }
   }
@@ -175,7 +176,7 @@ TEST_F(SystemLogTest, HoldsACallerUpNoLongerThanItSays) {
   }
 }
 
-TEST_F(SystemLogTest, DropsWhatIsTooLargeForADaemonThatIsStuck) {
+TEST_F(SystemLogTest, DropsLargeEntriesWhileTheJournalIsStuck) {
   PrivateJournal journal;
   journal.start();
   journal.suspend();
@@ -189,8 +190,8 @@ TEST_F(SystemLogTest, DropsWhatIsTooLargeForADaemonThatIsStuck) {
   EXPECT_EQ(messages(journal).size() + dropped(), sent);
 }
 
-// Signals interrupt what waits; the caller neither waits for ever nor loses an entry without its count.
-TEST_F(SystemLogTest, KeepsToItsBoundWhileSignalsArrive) {
+// Signals interrupt a waiting send. The caller does not wait for ever, and each lost entry is counted.
+TEST_F(SystemLogTest, DropsAndCountsEntriesWhileSignalsArrive) {
   PrivateJournal journal;
   journal.start();
   journal.suspend();
@@ -210,7 +211,7 @@ TEST_F(SystemLogTest, KeepsToItsBoundWhileSignalsArrive) {
   EXPECT_EQ(messages(journal).size() + dropped(), sent);
 }
 
-TEST_F(SystemLogTest, TellsAtExitWhatWasDropped) {
+TEST_F(SystemLogTest, ReportsDroppedEntriesAtExit) {
   PrivateJournal journal;
   journal.start();
   journal.suspend();
@@ -230,7 +231,7 @@ TEST_F(SystemLogTest, TellsAtExitWhatWasDropped) {
   journal.resume();
 }
 
-TEST_F(SystemLogTest, CountsAnewInTheChildOfAFork) {
+TEST_F(SystemLogTest, CountsFromZeroInTheChildOfAFork) {
   PrivateJournal journal;
   journal.start();
   journal.suspend();

@@ -1,6 +1,6 @@
-// The system log against the machine's journald, run in a private root. The suite runs as root and as an
-// ordinary user. Where no journal is, and daemons that do not read, are in SystemLog_fallback_test.cpp and
-// SystemLog_stuck_test.cpp.
+// Tests of the system log with the machine's journald, in a private root. They run as root and as an ordinary
+// user. SystemLog_fallback_test.cpp has the tests without a journal, SystemLog_stuck_test.cpp those with
+// daemons that do not read.
 
 #include "Runtime/SystemLog/SystemLog.h"
 
@@ -80,7 +80,7 @@ TEST_F(SystemLogTest, WritesTheFieldsOfTheJournal) {
   }
 }
 
-TEST_F(SystemLogTest, TakesNullForEmptyAndLineFeedsEverywhere) {
+TEST_F(SystemLogTest, AcceptsNullNamesAndLineFeedsInEveryValue) {
   PrivateJournal journal;
   journal.start();
   rt::SystemLog(nullptr, nullptr).write(Type::info, "nothing around it");
@@ -111,7 +111,7 @@ TEST_F(SystemLogTest, KeepsEveryByteOfEveryValue) {
   EXPECT_EQ(dropped(), 0U);
 }
 
-// The lengths at which values are no longer copied together, or no longer fit a datagram, and others.
+// Tries lengths around those from which values are not copied or do not fit a datagram, and random lengths.
 TEST_F(SystemLogTest, KeepsValuesOfAnyLength) {
   PrivateJournal journal;
   journal.start();
@@ -137,7 +137,7 @@ TEST_F(SystemLogTest, KeepsValuesOfAnyLength) {
   EXPECT_EQ(dropped(), 0U);
 }
 
-TEST_F(SystemLogTest, AllocatesNothingWhereTheJournalListens) {
+TEST_F(SystemLogTest, AllocatesNothingIfTheJournalListens) {
   if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
   PrivateJournal journal;
   journal.start();
@@ -151,7 +151,7 @@ TEST_F(SystemLogTest, AllocatesNothingWhereTheJournalListens) {
   EXPECT_EQ(messages(journal).size(), 3U);
 }
 
-TEST_F(SystemLogTest, LeavesErrnoAlone) {
+TEST_F(SystemLogTest, PreservesErrno) {
   const StandardErrorPipe standardError;
   errno = EDOM;
   testLog().write(Type::info, "nobody listens");
@@ -163,7 +163,7 @@ TEST_F(SystemLogTest, LeavesErrnoAlone) {
   EXPECT_EQ(errno, EDOM);
 }
 
-TEST_F(SystemLogTest, FindsAJournalThatWasStartedAnew) {
+TEST_F(SystemLogTest, FindsARestartedJournal) {
   closeSockets();
   PrivateJournal journal;
   journal.start();
@@ -178,10 +178,10 @@ TEST_F(SystemLogTest, FindsAJournalThatWasStartedAnew) {
   journal.start();
   testLog().write(Type::info, "after");
   EXPECT_THAT(messages(journal), ElementsAre("before", "after"));
-  EXPECT_EQ(sockets().size(), 2U);  // of the journal and of the classic daemon, kept
+  EXPECT_EQ(sockets().size(), 2U);  // one for the journal and one for the classic daemon
 }
 
-TEST_F(SystemLogTest, LogsOnWhenTheProgramHasClosedItsDescriptors) {
+TEST_F(SystemLogTest, KeepsLoggingAfterTheProgramHasClosedItsDescriptors) {
   closeSockets();
   PrivateJournal journal;
   journal.start();
@@ -190,7 +190,7 @@ TEST_F(SystemLogTest, LogsOnWhenTheProgramHasClosedItsDescriptors) {
   ASSERT_EQ(opened.size(), 1U);
   close(opened[0]);
   testLog().write(Type::info, "closed");
-  // What has taken the number is left alone: a file, a socket.
+  // A file, and then a socket, takes over the descriptor's number. The log must leave both alone.
   const int number = sockets().at(0);
   ASSERT_EQ(dup2(STDOUT_FILENO, number), number);
   testLog().write(Type::info, "a file");
@@ -207,8 +207,8 @@ TEST_F(SystemLogTest, LogsOnWhenTheProgramHasClosedItsDescriptors) {
   EXPECT_THAT(messages(journal), ElementsAre("before", "closed", "a file", "a socket"));
 }
 
-// Used to write the entry to whoever was at the other end of what had taken the number.
-TEST_F(SystemLogTest, WritesNothingToAConnectionThatTookItsNumber) {
+// The entry used to be sent over a connection that had taken over the descriptor's number.
+TEST_F(SystemLogTest, WritesNothingToAConnectionThatTookOverItsDescriptor) {
   closeSockets();
   PrivateJournal journal;
   journal.start();
@@ -226,7 +226,7 @@ TEST_F(SystemLogTest, WritesNothingToAConnectionThatTookItsNumber) {
   EXPECT_THAT(messages(journal), ElementsAre("before", "after"));
 }
 
-TEST_F(SystemLogTest, NeverTakesTheNumberOfAStandardStream) {
+TEST_F(SystemLogTest, NeverUsesTheDescriptorOfAStandardStream) {
   closeSockets();
   PrivateJournal journal;
   journal.start();
@@ -239,7 +239,7 @@ TEST_F(SystemLogTest, NeverTakesTheNumberOfAStandardStream) {
   EXPECT_THAT(messages(journal), ElementsAre("without standard input"));
 }
 
-TEST_F(SystemLogTest, LogsOnInTheChildOfAFork) {
+TEST_F(SystemLogTest, KeepsLoggingInTheChildOfAFork) {
   PrivateJournal journal;
   journal.start();
   testLog().write(Type::info, "parent");
@@ -259,8 +259,7 @@ TEST_F(SystemLogTest, LogsOnInTheChildOfAFork) {
   EXPECT_EQ(entries[2]["_PID"], std::to_string(getpid()));
 }
 
-// Invariant: a child logs whatever the threads of its parent were doing when it was forked.
-TEST_F(SystemLogTest, LogsOnInTheChildrenOfAProcessWhoseThreadsWrite) {
+TEST_F(SystemLogTest, KeepsLoggingInAChildIfThreadsWriteDuringTheFork) {
   if (RT_TEST_THREAD_SANITIZER) {
     GTEST_SKIP() << "the thread sanitizer's own locks may be held in the child of a fork";
   }
@@ -268,7 +267,7 @@ TEST_F(SystemLogTest, LogsOnInTheChildrenOfAProcessWhoseThreadsWrite) {
   journal.start();
   std::atomic<bool> isEnding = false;
   std::atomic<std::uint64_t> sent = 0;
-  // So many for each child, or the journal has more than can be read again.
+  // Bounds the entries for each child, so that the journal can be read back.
   std::atomic<std::uint64_t> allowed = 0;
   std::vector<std::thread> threads;
   for (int thread = 0; thread < 3; ++thread) {
@@ -310,9 +309,8 @@ TEST_F(SystemLogTest, LogsOnInTheChildrenOfAProcessWhoseThreadsWrite) {
   EXPECT_EQ(ofParent + dropped(), sent);
 }
 
-// Invariant: every entry arrives once, and those of one thread in the order in which it wrote them, under
-// the thread's own number.
-TEST_F(SystemLogTest, IsUsedByAllThreadsAtOnce) {
+// Each entry arrives once, with the identifier of its thread. The entries of a thread arrive in order.
+TEST_F(SystemLogTest, KeepsTheEntriesOfEachThreadInOrder) {
   PrivateJournal journal(PrivateJournal::Sockets::ownedByManager);
   journal.start();
   constexpr int kThreads = 8;
@@ -340,15 +338,15 @@ TEST_F(SystemLogTest, IsUsedByAllThreadsAtOnce) {
     if (identifiers.at(thread).empty()) identifiers.at(thread) = entry["TID"];
     EXPECT_EQ(entry["TID"], identifiers.at(thread));
   }
-  // A machine that is too busy to run the daemon in time drops some, and says so.
+  // If the machine is too busy to run the daemon in time, entries are dropped and counted.
   for (const int index : next) missing += static_cast<std::uint64_t>(kEntries - index);
   EXPECT_EQ(missing, dropped());
   EXPECT_EQ(std::set<std::string>(identifiers.begin(), identifiers.end()).size(), kThreads);
 }
 
-// Invariant: what was written and what was counted as dropped is what was sent, although the daemon is
-// ended and started while threads write.
-TEST_F(SystemLogTest, AccountsForEveryEntryWhileTheJournalIsStartedAnew) {
+// The written and the dropped entries together are those that were sent, although the daemon stops and starts
+// while threads write.
+TEST_F(SystemLogTest, AccountsForEveryEntryWhileTheJournalRestarts) {
   PrivateJournal journal(PrivateJournal::Sockets::ownedByManager);
   journal.start();
   constexpr int kThreads = 8;
@@ -366,7 +364,7 @@ TEST_F(SystemLogTest, AccountsForEveryEntryWhileTheJournalIsStartedAnew) {
   }
   for (int i = 0; i < 3; ++i) {
     journal.stop();
-    // Until the socket is full and entries are dropped.
+    // Waits until the socket is full and an entry is dropped.
     const std::uint64_t before = dropped();
     while (dropped() == before) std::this_thread::yield();
     journal.start();
@@ -375,7 +373,7 @@ TEST_F(SystemLogTest, AccountsForEveryEntryWhileTheJournalIsStartedAnew) {
   for (std::thread& thread : threads) thread.join();
   EXPECT_EQ(messages(journal).size() + dropped(), sent);
   EXPECT_GT(messages(journal).size(), 0U);
-  // The socket is empty now, so that it takes what is left to tell.
+  // The socket is empty now, so it takes the report.
   testLog().write(Type::info, "after");
   EXPECT_EQ(reportedDropped(journal), dropped());
 }

@@ -16,7 +16,7 @@
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/StringBuilder.h"
 
-// Directives are built at run time here; this is the one place that may.
+// `writeAsC` builds formats for snprintf at run time.
 #pragma GCC diagnostic ignored "-Wformat-nonliteral"
 
 namespace rt {
@@ -27,7 +27,7 @@ using Length = FormatDirective::Length;
 
 constexpr std::string_view kNullText = "(null)";
 
-// All 64-bit integers are read alike.
+// All 64-bit integers are read as `long`, and wide characters as `char32_t`.
 static_assert(sizeof(long) == 8 && sizeof(long long) == 8 && sizeof(void*) == 8 && sizeof(wchar_t) == 4);
 
 union Value {
@@ -38,7 +38,7 @@ union Value {
   const void* pointer;
 };
 
-/// The arguments, one after the other. The list that it is made from stays where it is.
+// Reads the arguments in order, from a copy of the caller's list.
 class ArgumentList {
  public:
   explicit ArgumentList(std::va_list list) noexcept { va_copy(list_, list); }
@@ -46,7 +46,7 @@ class ArgumentList {
   ArgumentList& operator=(const ArgumentList&) = delete;
   ~ArgumentList() { va_end(list_); }
 
-  /// The next argument, until the one after it is asked for.
+  // Returns the next argument. The reference is valid until the next call.
   const Value& next(FormatArgument type) noexcept {
     switch (type) {
       case FormatArgument::kNone:
@@ -75,7 +75,8 @@ class ArgumentList {
   Value value_{};
 };
 
-/// The arguments of a format that goes by positions: read in one go, once it is known what they are.
+// The arguments of a format that goes by positions. The constructor first collects their types from all
+// directives, then reads them all: a list can only be read in order, and by type.
 class PositionalArguments {
  public:
   PositionalArguments(std::string_view format, std::size_t start, ArgumentList& list) noexcept {
@@ -96,7 +97,7 @@ class PositionalArguments {
     }
   }
 
-  /// Whether all arguments of the directive are there, and are what it takes.
+  // Returns whether all arguments of the directive are known and have the types that it takes.
   bool suit(const FormatDirective& directive) const noexcept {
     bool result = !directive.takesNext();
     if (result) {
@@ -108,7 +109,7 @@ class PositionalArguments {
     return result;
   }
 
-  /// The argument at `position` of a directive that they suit.
+  // Returns the argument at `position`. Precondition: `suit` is true for the directive that names it.
   const Value& at(int position) const noexcept { return values_[static_cast<std::size_t>(position) - 1]; }
 
  private:
@@ -149,7 +150,7 @@ std::uint64_t unsignedValue(Length length, const Value& value) noexcept {
   }
 }
 
-/// `text`, which goes on or not, without the character at its end of which only the beginning is there.
+// Returns `text` without an incomplete character at its end.
 std::string_view withoutCutCharacter(std::string_view text) noexcept {
   for (std::size_t i = 1; i < kMaximumUTF8Length && i <= text.size(); ++i) {
     if (nextUTF8(text.substr(text.size() - i)).isCutShort) return text.substr(0, text.size() - i);
@@ -197,10 +198,10 @@ class Formatter {
 
   const std::string_view format_;
   ArgumentList list_;
-  // Whether it is known that the format goes by positions or that it does not.
+  // Whether a directive has decided if the format goes by positions.
   bool isDecided_ = false;
   std::optional<PositionalArguments> positional_;
-  // Those of the directive at hand, be they from the format or from arguments.
+  // The width and precision of the current directive, whether the format or an argument gives them.
   int width_ = 0;
   int precision_ = FormatDirective::kNone;
   StringBuilder out_;
@@ -226,8 +227,8 @@ String Formatter::run() {
   }
 }
 
-// Writes what stands from `start` to the next '%', or to the end, and returns where that is. Word by word,
-// since most of it is short.
+// Copies the text from `start` to the next '%' or to the end, and returns where it stopped. It goes word by
+// word, since most literal text is short.
 std::size_t Formatter::writeLiteral(std::size_t start) {
   constexpr std::uint64_t kEach = 0x0101010101010101U;
   constexpr std::uint64_t kLow = 0x7F * kEach;
@@ -237,7 +238,7 @@ std::size_t Formatter::writeLiteral(std::size_t start) {
     std::uint64_t word = 0;
     std::memcpy(&word, format_.data() + i, kSize);
     std::memcpy(out_.prepare(kSize), &word, kSize);
-    // The highest bit of each byte that is a '%', which comes first in the lowest byte.
+    // `found` has the highest bit of each byte that is a '%'. The first byte of the text is the lowest.
     const std::uint64_t other = word ^ ('%' * kEach);
     if (const std::uint64_t found = ~(((other & kLow) + kLow) | other | kLow); found != 0) {
       const auto count = static_cast<std::size_t>(std::countr_zero(found)) / 8;
@@ -250,8 +251,8 @@ std::size_t Formatter::writeLiteral(std::size_t start) {
   return i;
 }
 
-// Writes "%@", "%s" and "%d" without anything between, which is what most directives are, and returns true;
-// returns false, having done nothing, for any other, and where the format goes by positions.
+// Writes "%@", "%s" or "%d" with nothing between the two characters, and returns true. Most directives are of
+// this sort. Returns false without effect for other directives, and if the format goes by positions.
 bool Formatter::writeSimple(char conversion) {
   constexpr FormatDirective kPlain;
   if (positional_ || (conversion != '@' && conversion != 's' && conversion != 'd')) return false;
@@ -332,7 +333,7 @@ void Formatter::write(FormatDirective& directive) {
 
 template <class T>
 void Formatter::writeDigits(T value, int base) {
-  constexpr std::size_t kRoom = 24;  // for 64 bits in octal, with a sign
+  constexpr std::size_t kRoom = 24;  // 64 bits in octal and a sign fit
   char* first = out_.prepare(kRoom);
   out_.commit(static_cast<std::size_t>(std::to_chars(first, first + kRoom, value, base).ptr - first));
 }
@@ -387,7 +388,7 @@ void Formatter::writeCharacter(const FormatDirective& directive, int value) {
 
 void Formatter::writePointer(const FormatDirective& directive, const void* pointer) {
   char text[32];
-  // How null looks is the system's affair.
+  // snprintf decides how a null pointer is printed.
   const int length = std::snprintf(text, sizeof text, "%p", pointer);
   writeText(directive, {text, static_cast<std::size_t>(length)});
 }
@@ -396,7 +397,7 @@ void Formatter::writeObject(const FormatDirective& directive, const Object* obje
   if (object == nullptr) {
     writeText(directive, cut(kNullText));
   } else if (object->isMemberOf(classInfo<StringObject>())) {
-    // The usual case by far, and one that need not count a reference.
+    // Most objects are strings. `description()` would retain and release them.
     writeText(directive, cut(static_cast<const StringObject*>(object)->view()));
   } else {
     const String description = object->description();
@@ -410,7 +411,7 @@ void Formatter::writeBytes(const FormatDirective& directive, const char* text) {
   } else if (precision_ < 0) {
     writeText(directive, text);
   } else {
-    // There need be no NUL beyond the precision.
+    // The text need not end with NUL if it is at least as long as the precision.
     writeText(directive, cut({text, ::strnlen(text, static_cast<std::size_t>(precision_))}));
   }
 }

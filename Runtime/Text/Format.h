@@ -1,6 +1,6 @@
 #pragma once
 
-/// Formatting: printf's directives, and "%@" for the description of an object.
+/// Formats text by the directives of printf, and by "%@" for the description of an object.
 ///
 ///     rt::String text = rt::format("%@ took %.1f ms (%d%%)", name, 12.5, 80);   // checked when compiling
 ///
@@ -12,28 +12,31 @@
 ///       return text;
 ///     }
 ///
-/// The directives are those of C, with positions ("%2$d"), and print what snprintf prints; their grammar is
-/// in Runtime/Text/FormatDirective.h. Beyond C, or where C leaves it open:
+/// The directives are those of C, with positions ("%2$d"), and print what snprintf prints. Their grammar is
+/// in Runtime/Text/FormatDirective.h. These rules extend C, or settle what C leaves open:
 ///
-/// - "%@" prints an object's `description`; "(null)" for null and for a description that is null.
-///   Flags, width and precision are as with "%s".
+/// - "%@" prints an object's `description`. It prints "(null)" for null and for a null description.
+///   Flags, width and precision work as with "%s".
 /// - "%s" and "%S" print "(null)" for null. "%S" and "%C" are "%ls" and "%lc".
 /// - Wide characters are written as UTF-8 in every locale.
 /// - Widths and precisions of text count bytes. A character that a precision would cut in two is left out.
-/// - A directive that is unknown or incomplete, or has a length that its conversion can do nothing with, is
-///   printed as it stands and takes no argument.
+/// - Some directives are printed as they stand and take no argument: unknown ones, incomplete ones, and
+///   those whose conversion does not allow their length.
 /// - "%n" takes its argument and does nothing.
-/// - A width over `kMaximumFieldWidth`, or such a precision of a number, counts as `kMaximumFieldWidth`.
-///   A format of n bytes hence grows by its arguments' text and less than 700 n bytes beyond it.
+/// - A width over `kMaximumFieldWidth` counts as `kMaximumFieldWidth`. So does such a precision of a number.
+///   A result thus exceeds its arguments' text by less than 700 bytes for each byte of the format.
 /// - The first directive that takes an argument decides whether the format goes by positions. Directives of
-///   the other sort are printed as they stand. So are those whose position is out of range, is used for
-///   another type before, or comes after one that no directive uses: what is there cannot be known.
-/// - The result is valid UTF-8: where the bytes of "%s", "%c" or the format are not, it has U+FFFD.
+///   the other sort are printed as they stand.
+/// - A directive is printed as it stands if its position is out of range, or has another type in an earlier
+///   directive. So it is if no directive uses some lower position: the type of that argument is unknown.
+/// - The result is valid UTF-8. Invalid bytes of "%s", of "%c" or of the format become U+FFFD.
 ///
-/// Any thread may format. No lock is held while descriptions run; an exception that one throws passes
-/// through, and nothing is leaked. What fits in `StringBuilder::kInlineCapacity` bytes allocates once.
+/// A result of up to `StringBuilder::kInlineCapacity` bytes allocates once.
 ///
-/// Not for: formats from strangers. As in C, the arguments must be what a format at run time takes.
+/// Threads: thread-safe. No lock is held while descriptions run.
+/// Errors: an exception that a description throws passes through, and nothing leaks.
+/// Not for: formats from untrusted sources. As in C, wrong arguments for a format at run time are undefined
+/// behaviour.
 
 #include <cstdarg>
 #include <cstddef>
@@ -45,23 +48,24 @@
 
 namespace rt {
 
-/// The largest width of any directive and the largest precision of a number: what C promises to support.
+/// The largest width of a directive, and the largest precision of a number. C guarantees no more.
 inline constexpr int kMaximumFieldWidth = 4095;
 
-/// `format` with `arguments` in the place of its directives; null for a null format. The list itself is left
-/// where it is. Throws what a description throws, and std::bad_alloc.
+/// Returns `format` with its directives replaced by `arguments`. Null for a null format. Reads a copy of the
+/// list: `arguments` does not advance. Throws what a description throws, and std::bad_alloc.
 String formatV(const String& format, std::va_list arguments);
 
-/// The same for a text that ends with NUL.
+/// Does the same for a text that ends with NUL.
 String formatV(const char* format, std::va_list arguments);
 
 namespace detail {
-/// `formatV` for the `length` bytes at `format`.
+/// Does what `formatV` does, for the `length` bytes at `format`.
 String formatVariadic(const char* format, std::size_t length, ...);
 }  // namespace detail
 
-/// The literal `format` with `arguments` in the place of its directives. A format that the arguments do not
-/// fit does not compile (Runtime/Text/FormatString.h). Throws what a description throws, and std::bad_alloc.
+/// Returns the literal `format` with its directives replaced by `arguments`. A format that does not fit its
+/// arguments does not compile (Runtime/Text/FormatString.h). Throws what a description throws, and
+/// std::bad_alloc.
 template <class... Arguments>
 String format(FormatString<std::type_identity_t<Arguments>...> format, const Arguments&... arguments) {
   return detail::formatVariadic(format.view().data(), format.view().size(), toVariadic(arguments)...);

@@ -1,7 +1,7 @@
 #pragma once
 
-/// What each C++ type is as an argument of a format: how it is passed to a C function with variable
-/// arguments, and which kind it counts as there.
+/// Says how each C++ type is passed as an argument of a format to a C function with variable arguments, and
+/// which kind of argument it is there.
 ///
 ///     template <class... Arguments>
 ///     void record(const char* format, const Arguments&... arguments) {
@@ -9,9 +9,10 @@
 ///                      rt::toVariadic(arguments)...);
 ///     }
 ///
-/// Objects come as `rt::String`, `rt::Ref<T>` or a pointer to a class or protocol, and are passed as
-/// `rt::Object*`. Any other pointer may be passed; numbers, characters, booleans and enumerations that
-/// convert to integers as well. A class, such as std::string, may not: what is printed would be its insides.
+/// An object may be an `rt::String`, an `rt::Ref<T>`, or a pointer to a class or protocol. It is passed as
+/// `rt::Object*`. Other arguments may be any pointer, number, character or boolean, and any enumeration
+/// that converts to an integer. Other classes, such as std::string, do not compile: a format would print
+/// their internal bytes.
 ///
 /// Not for: arguments whose types are known only at run time.
 
@@ -29,8 +30,8 @@
 
 namespace rt {
 
-/// What one argument is. The numbers are part of the interface between programs and libraries. All but
-/// objects and the two last are passed like an integer of at most 64 bits.
+/// The kind of an argument. The numbers are part of the binary interface between programs and libraries.
+/// Arguments of the kinds 0 and 2 to 4 are all passed like an integer of at most 64 bits.
 // NOLINTNEXTLINE(performance-enum-size): the size is part of the interface, too
 enum class ArgumentKind : std::uint32_t {
   kSigned = 0,
@@ -46,7 +47,7 @@ enum class ArgumentKind : std::uint32_t {
 
 namespace detail {
 
-/// What the check of a format knows of one argument.
+/// What the check of a format knows about one argument.
 struct ArgumentTraits {
   ArgumentKind kind;
   FormatArgument passedAs;
@@ -99,19 +100,20 @@ consteval ArgumentTraits argumentTraits() {
   }
 }
 
-/// Arrays count as pointers.
+/// The traits of an argument of type T. An array is passed as a pointer.
 template <class T>
 inline constexpr ArgumentTraits kArgumentTraits = argumentTraits<std::decay_t<const T>>();
 
 }  // namespace detail
 
-/// The kinds of arguments of these types, one each, in order.
+/// The kind of each of these argument types, in order.
 template <class... Arguments>
 inline constexpr std::array<std::uint32_t, sizeof...(Arguments)> kArgumentKinds{
     static_cast<std::uint32_t>(detail::kArgumentTraits<Arguments>.kind)...};
 
-/// `argument` as it is passed to a function with variable arguments. Objects are passed without a reference
-/// of their own: they must live until the function returns, which those in the call's own expression do.
+/// Returns `argument` in the form in which it is passed to a function with variable arguments.
+/// Ownership: an object is not retained. It must live until that function returns. Temporaries of the call's
+/// own expression do.
 template <class T>
 constexpr auto toVariadic(const T& argument) noexcept {
   using Argument = std::decay_t<const T>;

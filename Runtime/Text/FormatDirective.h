@@ -1,25 +1,25 @@
 #pragma once
 
-/// One directive of a format, such as "%-5.*2$ld": the grammar that both the formatter and the check at
-/// compile time go by.
+/// Parses one directive of a format, such as "%-5.*2$ld". The formatter and the check at compile time share
+/// this grammar.
 ///
 ///     | %[POSITION$][FLAGS][WIDTH][.PRECISION][LENGTH]CONVERSION
 ///     |
-///     | POSITION    1 to 64: the argument, counted from 1; without one, the next
+///     | POSITION    1 to 64: the argument, counted from 1; the next argument if there is no position
 ///     | FLAGS       any of - + space # 0 '
 ///     | WIDTH       a number, or * for an int argument, or *POSITION$
-///     | PRECISION   the same; none after the dot is 0
-///     | LENGTH      h hh l ll j z t q L, where the conversion can do with it
+///     | PRECISION   the same; 0 if nothing follows the dot
+///     | LENGTH      h hh l ll j z t q L, if the conversion allows it
 ///     | CONVERSION  d i u o x X   integer: int, or 64 bits with l ll j z t q L
 ///     |             f F e E g G a A   double; long double with L
 ///     |             c, s          byte, and bytes that end with NUL; wide with l
 ///     |             C, S          wide character, and wide characters that end with NUL
 ///     |             p             pointer
 ///     |             @             object, or null
-///     |             n             pointer, which is passed over: nothing is printed, nothing written
+///     |             n             pointer, which is ignored: nothing is printed or written
 ///     |             %             a percent sign; takes no argument
 ///
-/// Not for: callers of the formatter (Runtime/Text/Format.h).
+/// Not for: formatting, which is in Runtime/Text/Format.h.
 
 #include <cstddef>
 #include <cstdint>
@@ -27,13 +27,13 @@
 
 namespace rt {
 
-/// What a directive takes from the argument list; which is all that has to be known to get past it.
+/// The type that a directive reads from the argument list. It suffices for stepping over the argument.
 enum class FormatArgument : std::uint8_t { kNone, kInt, kLong, kDouble, kLongDouble, kPointer };
 
 struct FormatDirective {
   /// The largest position. A larger one makes the directive invalid.
   static constexpr int kMaximumPosition = 64;
-  /// What a width or precision without a number of its own has as `value`.
+  /// The `value` of a width or precision that has no number in the format.
   static constexpr int kNone = -1;
 
   enum Flag : std::uint8_t {
@@ -44,16 +44,16 @@ struct FormatDirective {
     kZero = 16,
     kGroup = 32,
   };
-  // kLongLong stands for all that are neither int nor long: they have 64 bits, too.
+  // kLongLong stands for ll, j, z, t and q, which all mean 64 bits.
   enum class Length : std::uint8_t { kDefault, kByte, kShort, kLong, kLongLong, kLongDouble };
 
   /// A width or precision.
   struct Number {
     /// The number, at most INT_MAX, or `kNone`.
     int value = kNone;
-    /// Whether it is an argument.
+    /// Whether an argument gives the number.
     bool isArgument = false;
-    /// The position of that argument; 0 for the next.
+    /// The position of that argument. 0 means the next argument.
     int position = 0;
   };
 
@@ -92,12 +92,13 @@ struct FormatDirective {
     }
   }
 
-  /// Whether its character or text is a wide one.
+  /// Returns whether the directive prints a wide character or wide text.
   constexpr bool isWide() const noexcept {
     return conversion == 'C' || conversion == 'S' || length == Length::kLong;
   }
 
-  /// Whether any of its arguments is taken by position, and whether any is simply the next.
+  /// `hasPositions` returns whether the directive takes an argument by position. `takesNext` returns whether
+  /// it takes an argument without a position.
   constexpr bool hasPositions() const noexcept {
     return position != 0 || width.position != 0 || precision.position != 0;
   }
@@ -107,8 +108,8 @@ struct FormatDirective {
   }
 };
 
-/// Reads the directive that begins with the "%" at `format[start]` and returns how many bytes it takes; 0
-/// where it is unknown, incomplete, or has a position out of range.
+/// Reads the directive that begins with the "%" at `format[start]`. Returns its length in bytes. Returns 0 if
+/// it is unknown or incomplete, or if a position is out of range.
 constexpr std::size_t parseFormatDirective(std::string_view format, std::size_t start,
                                            FormatDirective& directive) noexcept;
 
@@ -140,7 +141,7 @@ class FormatDirectiveParser {
     }
     directive.length = parseLength();
     directive.conversion = peek();
-    if (directive.conversion == '%') directive.position = 0;  // it has no argument
+    if (directive.conversion == '%') directive.position = 0;  // "%%" takes no argument
     if (next_++ >= format_.size()) return false;
     return suits(directive.length, directive.conversion);
   }
@@ -171,7 +172,7 @@ class FormatDirectiveParser {
     }
   }
 
-  /// The number of digits at `next_` and, where there are any, their value; INT_MAX for larger ones.
+  // Returns the number of digits at `next_`. Sets `value` if there are any, to at most INT_MAX.
   constexpr std::size_t digits(int& value) const noexcept {
     constexpr int kLargest = 0x7FFFFFFF;
     std::size_t count = 0;
@@ -183,7 +184,7 @@ class FormatDirectiveParser {
     return count;
   }
 
-  /// "N$", if it is there; false where N is out of range.
+  // Reads "N$", if it is there. Returns false if N is out of range.
   constexpr bool parsePosition(int& position) noexcept {
     int value = 0;
     const std::size_t count = digits(value);

@@ -1,6 +1,6 @@
 #pragma once
 
-/// A literal format that has been checked, while compiling, against the types of its arguments.
+/// A literal format that the compiler has checked against the types of its arguments.
 ///
 ///     template <class... Arguments>
 ///     void report(rt::FormatString<std::type_identity_t<Arguments>...> format,
@@ -10,12 +10,12 @@
 ///     // report("%@ has %d entries", name);                does not compile: tooFewArguments
 ///     // report("%@ has %d entries"_s, name, "three");     does not compile: directiveTakesAnInteger
 ///
-/// The compiler refuses a mistake by saying that it cannot call one of the functions of
-/// `rt::formatMistake`, the names of which tell what is wrong. Signed and unsigned integers pass for each
-/// other; sizes must fit, as they must for C.
+/// A mistake does not compile: the compiler says that it cannot call a function of `rt::formatMistake`. The
+/// name of the function says what is wrong. Signed and unsigned integers are interchangeable. As in C, the
+/// size of an integer must fit.
 ///
-/// From `"..."_s` comes a format that is a `rt::String` for free; one from a plain literal allocates when
-/// it is asked for that string.
+/// A format made from `"..."_s` returns that string without allocating. A format made from a plain literal
+/// allocates each time `string()` is called.
 ///
 /// Not for: formats that are known only at run time (`rt::formatV`, Runtime/Text/Format.h).
 
@@ -29,7 +29,8 @@
 
 namespace rt {
 
-/// What can be wrong with a literal format. Never called: a call to one of them is what does not compile.
+/// The mistakes that a literal format can have. These functions are not constexpr, so a call to one of them
+/// does not compile. They have no definitions.
 namespace formatMistake {
 void tooFewArguments();
 void tooManyArguments();
@@ -51,7 +52,7 @@ void formatIsNotValidUTF8();
 
 namespace detail {
 
-/// Follows a format as the formatter does and calls a `formatMistake` at the first.
+/// Reads a format as the formatter does. Calls a function of `formatMistake` at the first mistake.
 class FormatCheck {
  public:
   constexpr FormatCheck(std::string_view format, std::span<const ArgumentTraits> arguments)
@@ -148,25 +149,24 @@ class FormatCheck {
 
 }  // namespace detail
 
-/// A format for arguments of these types. Constant; lives as long as the program.
+/// A format for arguments of these types. It is a constant, and its text lives as long as the program.
 template <class... Arguments>
 class FormatString {
  public:
-  /// From a plain literal.
+  /// Checks a plain literal.
   template <std::size_t size>
   consteval FormatString(const char (&literal)[size]) : text_(literal, size - 1) {
     check();
   }
 
-  /// From `"..."_s`, or a constant that was made from it.
+  /// Checks `"..."_s`, or a constant that was made from it.
   consteval FormatString(const String& literal) : text_(literal.view()), object_(literal.object()) {
     check();
   }
 
-  /// The text.
   constexpr std::string_view view() const noexcept { return text_; }
 
-  /// The text as a string; allocates if the format was a plain literal, and may throw std::bad_alloc then.
+  /// Returns the text as a string. Allocates and may throw std::bad_alloc if the format was a plain literal.
   String string() const {
     return object_ != nullptr ? String::from(Ref<StringObject>(object_)) : String::overStatic(text_);
   }

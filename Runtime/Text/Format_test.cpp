@@ -23,14 +23,14 @@
 #include "Runtime/Values/Number.h"
 #include "tests/support/AllocationCount.h"
 
-// Formats are made up here.
+// These tests build formats at run time.
 #pragma GCC diagnostic ignored "-Wformat-nonliteral"
 
 namespace {
 
 using namespace rt::literals;
 
-/// A format at run time, with whatever follows.
+// Formats by a format that is known at run time.
 rt::String formatted(const char* format, ...) {
   std::va_list arguments;
   va_start(arguments, format);
@@ -48,7 +48,7 @@ std::string expected(const char* format, ...) {
   return {text.data(), static_cast<std::size_t>(length)};
 }
 
-/// The same for a format that is a string.
+// Does what `formatted` does, for a format that is a string object.
 rt::String formattedFromObject(const rt::StringObject* format, ...) {
   std::va_list arguments;
   va_start(arguments, format);
@@ -57,7 +57,7 @@ rt::String formattedFromObject(const rt::StringObject* format, ...) {
   return text;
 }
 
-/// Describes itself as told; throws where it is told nothing.
+// Has the description that its constructor is given. Throws from `description` if it was given none.
 class Witness final : public rt::Implements<Witness, rt::Object> {
  public:
   Witness() = default;
@@ -105,7 +105,7 @@ TEST(Format, Objects) {
   EXPECT_EQ(rt::format("%@", rt::make<Witness>("é"_s)), "é");
 }
 
-TEST(Format, TakesObjectsByWhateverRefersToThem) {
+TEST(Format, TakesObjectsByReferenceAndByPointer) {
   const rt::Ref<Teller> teller = rt::make<Teller>();
   const rt::Ref<Telling> protocol = teller;
   const Teller* pointer = teller.get();
@@ -134,7 +134,7 @@ TEST(Format, Texts) {
   EXPECT_EQ(rt::format("%c", '\0').length(), 1U);
 }
 
-TEST(Format, PrecisionsDoNotReadOnNorCutCharacters) {
+TEST(Format, PrecisionsNeitherReadPastTheEndNorCutCharacters) {
   const std::vector<char> bytes{'a', 'b', 'c'};  // without NUL
   EXPECT_EQ(rt::format("%.3s", bytes.data()), "abc");
   EXPECT_EQ(rt::format("%.*s", 2, bytes.data()), "ab");
@@ -166,7 +166,7 @@ TEST(Format, Integers) {
             "-9223372036854775808 9223372036854775807 1 2 3 -9223372036854775808");
   EXPECT_EQ(rt::format("%lu %llx", UINT64_MAX, UINT64_MAX), "18446744073709551615 ffffffffffffffff");
   EXPECT_EQ(rt::format("%d %d %d", true, 'a', short{3}), "1 97 3");
-  // Nothing separates thousands.
+  // The locale of the tests has no separator of thousands.
   EXPECT_EQ(formatted("%'d", 1234567), "1234567");
   enum Small : unsigned char { kOne = 1 };
   enum Large : std::uint64_t { kTwo = 2 };
@@ -208,24 +208,24 @@ TEST(Format, Positions) {
   EXPECT_EQ(rt::format("%3$Lg %1$g %2$d %%", 1.5, 7, 2.5L), "2.5 1.5 7 %");
 }
 
-TEST(Format, PositionsWithoutSenseArePrintedAsTheyStand) {
+TEST(Format, InvalidPositionsArePrintedAsTheyStand) {
   EXPECT_EQ(formatted("%0$d %1$d", 1), "%0$d 1");
   EXPECT_EQ(formatted("%1$d %65$d", 1), "1 %65$d");
   EXPECT_EQ(formatted("%1$d %99999999999999999999$d", 1), "1 %99999999999999999999$d");
-  // Nothing tells what the second is, hence where the third begins.
+  // No directive gives the type of the second argument, so the third cannot be found.
   EXPECT_EQ(formatted("%1$d %3$s", 1, 2, "three"), "1 %3$s");
   EXPECT_EQ(formatted("%2$d", 1, 2), "%2$d");
   EXPECT_EQ(formatted("%1$d %1$s", 1), "1 %1$s");
   EXPECT_EQ(formatted("%1$d %1$ld", 1), "1 %1$ld");
-  // The first decides.
+  // The first directive decides whether the format goes by positions.
   EXPECT_EQ(formatted("%1$d %d %2$d", 1, 2), "1 %d 2");
   EXPECT_EQ(formatted("%d %1$d %d", 1, 2), "1 %1$d 2");
   EXPECT_EQ(formatted("%1$*d %1$d", 1), "%1$*d 1");
   EXPECT_EQ(formatted("%% %1$d", 1), "% 1");
 }
 
-// It used to ask for an argument at a position before there were any.
-TEST(Format, PercentSignsWithPositions) {
+// A "%2$%" at the start of a format used to read positional arguments before they existed.
+TEST(Format, PercentSignsMayHavePositions) {
   EXPECT_EQ(formatted("%2$%|"), "%|");
   EXPECT_EQ(formatted("%1$% %1$d %1$%", 1), "% 1 %");
   EXPECT_EQ(formatted("%1$% %d", 1), "% 1");
@@ -275,7 +275,7 @@ TEST(Format, WidthsAreBounded) {
   EXPECT_EQ(formatted("%*d|", INT_MIN, 1).view().substr(0, 2), "1 ");
   EXPECT_EQ(formatted("%.*d", INT_MIN, 1), "1");
   EXPECT_EQ(formatted("%.2147483647f", 0.5).length(), kMost + 2);
-  // Text is not numbers: what it has is printed.
+  // The bound does not hold for precisions of text.
   const std::string text(100000, 'x');
   EXPECT_EQ(formatted("%.99999s", text.c_str()).length(), 99999U);
   EXPECT_EQ(formatted("%.2147483647s", text.c_str()), text);
@@ -292,9 +292,9 @@ TEST(Format, LongResultsGrow) {
   }
 }
 
-// Text between directives is copied in words, which a text may end in the middle of. Of the bytes, some
-// differ from '%' in one bit.
-TEST(Format, TextOfAnyLengthStandsBetweenDirectives) {
+// Text between directives is copied word by word, and may end in the middle of a word. Some bytes of this
+// text differ from '%' in one bit.
+TEST(Format, CopiesTextOfAnyLengthBetweenDirectives) {
   const std::string text = "\u00a5$&\x05'e\u20ac5-\u00e5!\x7f\u0425 tail of it all";
   for (std::size_t before = 0; before < text.size(); ++before) {
     for (std::size_t after = 0; after < text.size(); ++after) {
@@ -307,7 +307,7 @@ TEST(Format, TextOfAnyLengthStandsBetweenDirectives) {
   }
 }
 
-TEST(Format, LeavesTheListWhereItIs) {
+TEST(Format, DoesNotAdvanceTheCallersList) {
   const auto twice = [](const char* format, auto... rest) {
     const auto call = [](const char* text, ...) {
       std::va_list arguments;
@@ -326,7 +326,7 @@ TEST(Format, LeavesTheListWhereItIs) {
 TEST(Format, ExceptionsPassAndNothingIsLeaked) {
   const rt::Ref<Witness> thrower = rt::make<Witness>();
   const std::string filler(2 * rt::StringBuilder::kInlineCapacity, 'a');
-  // What an exception itself allocates is freed by then.
+  // The exception itself is freed before the count is read.
   const AllocationCount count;
   EXPECT_THROW(rt::format("%s %@", filler.c_str(), thrower), std::runtime_error);
   EXPECT_THROW(rt::format("%2$s %1$@", thrower, filler.c_str()), std::runtime_error);
@@ -362,7 +362,7 @@ TEST(Format, AllocatesTheStringAndNothingElse) {
   EXPECT_EQ(count.allocations(), 2);
 }
 
-TEST(Format, WhatFitsExactlyAllocatesNothingElse) {
+TEST(Format, AllocatesOnceForAResultOfExactlyTheInlineCapacity) {
   if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
   const std::string text(rt::StringBuilder::kInlineCapacity - 1, 'a');
   const auto allocationsFor = [&](const char* format) {
@@ -374,8 +374,8 @@ TEST(Format, WhatFitsExactlyAllocatesNothingElse) {
   for (const char* format : {"%sx", "%s%%", "%s%d", "%s%x", "%s%c"}) EXPECT_EQ(allocationsFor(format), 1);
 }
 
-// Random directives, one at a time, against snprintf.
-TEST(Format, PrintsWhatCPrints) {
+// Compares random directives with snprintf, one at a time.
+TEST(Format, PrintsWhatSnprintfPrints) {
   std::mt19937_64 random(1234);
   const auto oneOf = [&](std::string_view choices) { return choices[random() % choices.size()]; };
   const auto directive = [&](std::string_view flags, bool hasPrecision, std::string_view length,
@@ -424,7 +424,7 @@ TEST(Format, MayBeUsedByThreads) {
   for (std::thread& thread : threads) thread.join();
 }
 
-TEST(FormatString, IsAStringForFreeIfItIsALiteralOne) {
+TEST(FormatString, ReturnsTheStringThatItWasMadeFrom) {
   const rt::FormatString<int> free = "%d"_s;
   EXPECT_EQ(free.string().object(), "%d"_s.object());
   const rt::FormatString<int> plain = "%d";
@@ -450,8 +450,8 @@ TEST(FormatArguments, HaveKinds) {
   EXPECT_EQ(kinds(1.0, 1.0F, 1.0L), (Kinds{5, 5, 6}));
 }
 
-/// A logging function as C would have it, behind a front that checks: takes objects by the kinds, and the
-/// text.
+// A C function with variable arguments, which `recordChecked` calls after it has checked the format. It
+// returns the text and, found by their kinds, the objects among the arguments.
 std::string record(int count, const std::uint32_t* kinds, const rt::StringObject* format, ...) {
   std::va_list arguments;
   va_start(arguments, format);
@@ -487,7 +487,7 @@ TEST(FormatArguments, PassThroughVariableArguments) {
   EXPECT_EQ(recordChecked("%d %@ %g %Lg %s %@ %lu"_s, 1, "two"_s, 3.5F, 4.5L, "five",
                           rt::Ref<rt::Object>("six"_s), std::size_t{7}),
             "1 two 3.5 4.5 five six 7|two|six");
-  // Made for the call, and there until it returns.
+  // A temporary string lives until the call returns.
   EXPECT_EQ(recordChecked("%@"_s, "a"_s + "b"_s), "ab|ab");
 }
 

@@ -13,7 +13,7 @@ bool isLetter(char character) noexcept {
   return (character >= 'a' && character <= 'z') || (character >= 'A' && character <= 'Z');
 }
 
-// `value` in decimal, with zeros in front up to `width` digits.
+// Appends `value` in decimal, with leading zeros up to `width` digits.
 void appendPadded(std::string& text, std::int64_t value, std::size_t width) {
   const std::string digits = std::to_string(value < 0 ? -value : value);
   if (value < 0) text += '-';
@@ -44,7 +44,7 @@ bool LocalTimeFormatter::parse(std::string_view pattern, std::vector<Piece>& pie
   while (!pattern.empty()) {
     const char character = pattern.front();
     if (pattern.starts_with("''")) {
-      // Two in a row are one that stands for itself, within a quoted text as well as outside.
+      // Two apostrophes stand for one, inside quoted text and outside.
       appendLiteral("'");
       pattern.remove_prefix(2);
     } else if (character == '\'') {
@@ -82,7 +82,7 @@ bool LocalTimeFormatter::hasZoneChanged() {
 
 bool LocalTimeFormatter::renderSecond(std::time_t second) {
   isRendered_ = false;
-  // `localtime_r` alone would go on with the zone that it found first.
+  // `localtime_r` alone would keep using the zone that it read at its first call.
   tzset();
   std::tm local{};
   if (localtime_r(&second, &local) == nullptr) return false;
@@ -123,7 +123,8 @@ bool LocalTimeFormatter::renderSecond(std::time_t second) {
 }
 
 String LocalTimeFormatter::stringFromTime(std::chrono::system_clock::time_point time) {
-  // Rounded down by hand: rounding towards minus infinity in one step would overflow at the clock's start.
+  // Rounds down in two steps: `std::chrono::floor` and the subtraction after it overflow at the clock's
+  // minimum.
   auto whole = std::chrono::duration_cast<std::chrono::seconds>(time.time_since_epoch());
   auto rest = std::chrono::duration_cast<std::chrono::nanoseconds>(time.time_since_epoch() - whole);
   if (rest.count() < 0) {

@@ -1,26 +1,27 @@
 #pragma once
 
-/// Dates and times of day as text, in the local time zone, by a pattern.
+/// Formats dates and times of day by a pattern, in the local time zone.
 ///
 ///     rt::Ref<rt::LocalTimeFormatter> formatter =
 ///         rt::LocalTimeFormatter::initWithPattern("yyyy-MM-dd HH:mm:ss.SSS"_s);
 ///     formatter->stringFromTime(std::chrono::system_clock::now());    // "2026-11-21 08:04:20.123"
 ///
-/// A pattern is made of these fields, of text between apostrophes ('T'; two apostrophes stand for one),
-/// and of any other characters but letters, which stand for themselves:
+/// A pattern consists of the fields below, of quoted text ('T') and of other characters. Characters that are
+/// not letters stand for themselves. Two apostrophes stand for one. The fields:
 ///
 ///     | yyyy  the year, at least four digits      HH  the hour, 00 to 23
 ///     | MM    the month, 01 to 12                 mm  the minute
 ///     | dd    the day of the month                ss  the second
 ///     |                                           SSS the millisecond, cut off, not rounded
 ///
-/// The zone is the one that the environment's TZ or the system's setting names at the time of the call:
-/// a change of TZ counts from the next call on, a change of the system's setting from the next second. As
-/// with the system's own functions, no other thread may change the environment at the same time.
+/// If the environment variable TZ is set, it names the zone. Otherwise the system's setting does. A change of
+/// TZ takes effect at the next call. A change of the system's setting takes effect at the next call with a
+/// time in another second.
 ///
-/// One formatter may be used by all threads, which wait for each other, and works on in the child of a fork.
-/// The text of a second is kept, so that formatting many times in one second costs little.
+/// A formatter keeps the text of the last second, so formatting often within a second costs little.
 ///
+/// Threads: thread-safe. All formatters share one lock. They also work in the child of a fork. As with the
+/// system's own functions, no other thread may change the environment at the same time.
 /// Not for: other zones and calendars; names of months and days; reading dates.
 
 #include <array>
@@ -42,12 +43,12 @@ namespace rt {
 
 class RT_VISIBLE LocalTimeFormatter final : public Implements<LocalTimeFormatter, Object> {
  public:
-  /// A formatter for `pattern`; null where that is null, has letters that are no field, or an apostrophe
-  /// without its partner.
+  /// Returns a formatter for `pattern`. Returns null if `pattern` is null, has unquoted letters that are not
+  /// a field, or has an unpaired apostrophe.
   static Ref<LocalTimeFormatter> initWithPattern(const String& pattern);
 
-  /// `time` as text. Null where the system cannot count its year, which no time of the clock is known to
-  /// have. Throws std::bad_alloc.
+  /// Returns `time` as text. Returns null if the system cannot represent the year. No value of the system
+  /// clock is known to have such a year. Throws std::bad_alloc.
   String stringFromTime(std::chrono::system_clock::time_point time);
 
  private:
@@ -58,29 +59,30 @@ class RT_VISIBLE LocalTimeFormatter final : public Implements<LocalTimeFormatter
 
   struct Piece {
     Field field;
-    std::string text;  // of a literal
+    std::string text;  // empty unless `field` is `literal`
   };
 
   explicit LocalTimeFormatter(std::vector<Piece> pieces) noexcept : pieces_(std::move(pieces)) {}
 
   static bool parse(std::string_view pattern, std::vector<Piece>& pieces);
 
-  /// Makes `text_` the text of `second` in the zone of now; false where the system cannot.
+  // Makes `text_` the text of `second` in the current zone. Returns false if `localtime_r` fails.
   bool renderSecond(std::time_t second) RT_REQUIRES(lock_);
 
-  /// Whether TZ is not what it was when `text_` was made; remembers what it is.
+  // Returns whether TZ has changed since the previous call, and remembers its value.
   bool hasZoneChanged() RT_REQUIRES(lock_);
 
   const std::vector<Piece> pieces_;
 
-  // One for all formatters, as it is for the system's function, whose own lock a fork must not catch either.
+  // All formatters share this lock. It is held around `localtime_r`, which has one lock of its own for the
+  // process. So a fork, which waits for our lock, never copies the system's lock while it is held.
   static constinit UnfairLock lock_;
-  // The text of `second_`, with three digits to be filled in at each of `milliseconds_`.
+  // The text of `second_`. Each index in `milliseconds_` is where three digits are filled in.
   bool isRendered_ RT_GUARDED_BY(lock_) = false;
   std::time_t second_ RT_GUARDED_BY(lock_) = 0;
   std::string text_ RT_GUARDED_BY(lock_);
   std::vector<std::size_t> milliseconds_ RT_GUARDED_BY(lock_);
-  // TZ as it was then.
+  // TZ at the last call.
   bool hasZone_ RT_GUARDED_BY(lock_) = false;
   std::string zone_ RT_GUARDED_BY(lock_);
 };

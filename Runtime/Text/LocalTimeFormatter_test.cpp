@@ -35,7 +35,7 @@ class LocalTimeFormatterTest : public testing::Test {
     tzset();
   }
 
-  // False where the zone database lacks the zone.
+  // Returns false if the zone database lacks the zone.
   static bool setZone(const char* zone) {
     setenv("TZ", zone, 1);
     return std::filesystem::exists(std::string("/usr/share/zoneinfo/") + zone);
@@ -63,19 +63,19 @@ TEST_F(LocalTimeFormatterTest, FillsInEveryField) {
   EXPECT_EQ(text(951'782'400), "2000-02-29 00:00:00.000");
 }
 
-TEST_F(LocalTimeFormatterTest, CutsOffWhatIsLessThanAMillisecond) {
+TEST_F(LocalTimeFormatterTest, TruncatesToMilliseconds) {
   setenv("TZ", "UTC0", 1);
   const Time time = at(59) + std::chrono::nanoseconds(999'999'999);
   EXPECT_EQ(formatter_->stringFromTime(time), "1970-01-01 00:00:59.999");
 }
 
-TEST_F(LocalTimeFormatterTest, CountsForwardBefore1970) {
+TEST_F(LocalTimeFormatterTest, RoundsDownBefore1970) {
   setenv("TZ", "UTC0", 1);
   EXPECT_EQ(text(0, -1), "1969-12-31 23:59:59.999");
   EXPECT_EQ(text(-1), "1969-12-31 23:59:59.000");
 }
 
-TEST_F(LocalTimeFormatterTest, TakesPatternsApart) {
+TEST_F(LocalTimeFormatterTest, ReadsFieldsAndQuotedText) {
   setenv("TZ", "UTC0", 1);
   const auto format = [](const rt::String& pattern) {
     const rt::Ref<rt::LocalTimeFormatter> formatter = rt::LocalTimeFormatter::initWithPattern(pattern);
@@ -86,27 +86,27 @@ TEST_F(LocalTimeFormatterTest, TakesPatternsApart) {
   EXPECT_EQ(format("SSS SSS"_s), "042 042");
   EXPECT_EQ(format("yyyyMMdd'T'HHmmss"_s), "19700101T010101");
   EXPECT_EQ(format("dd.MM.yyyy, HH 'o''clock' ''"_s), "01.01.1970, 01 o'clock '");
-  // Used to have one apostrophe too many: a quoted text that ends with one.
+  // A quoted text that ends with an apostrophe used to be printed with two.
   EXPECT_EQ(format("'a'''"_s), "a'");
   EXPECT_EQ(format("'a''''b'HH"_s), "a''b01");
   EXPECT_EQ(format("'''a'"_s), "'a");
   EXPECT_EQ(format("HH \xe2\x80\x94 mm"_s), "01 \xe2\x80\x94 01");
 }
 
-TEST_F(LocalTimeFormatterTest, RefusesPatternsThatItCannotFillIn) {
+TEST_F(LocalTimeFormatterTest, ReturnsNullForInvalidPatterns) {
   for (const rt::String& pattern :
        {rt::String(), "yy"_s, "yyyyy"_s, "EEE"_s, "H"_s, "HH:m"_s, "SS"_s, "SSSS"_s, "'open"_s, "T"_s}) {
     EXPECT_FALSE(rt::LocalTimeFormatter::initWithPattern(pattern)) << pattern.view();
   }
 }
 
-TEST_F(LocalTimeFormatterTest, TellsEveryTimeOfTheClock) {
+TEST_F(LocalTimeFormatterTest, FormatsTheFirstAndLastTimeOfTheClock) {
   setenv("TZ", "UTC0", 1);
   EXPECT_EQ(formatter_->stringFromTime(Time::max()).view().substr(0, 4), "2262");
   EXPECT_EQ(formatter_->stringFromTime(Time::min()).view().substr(0, 4), "1677");
 }
 
-TEST_F(LocalTimeFormatterTest, NoticesAnotherZoneAtOnce) {
+TEST_F(LocalTimeFormatterTest, NoticesAChangeOfTheZoneAtTheNextCall) {
   setenv("TZ", "UTC0", 1);
   EXPECT_EQ(text(0), "1970-01-01 00:00:00.000");
   setenv("TZ", "XYZ-05:30", 1);
@@ -117,7 +117,7 @@ TEST_F(LocalTimeFormatterTest, NoticesAnotherZoneAtOnce) {
   EXPECT_EQ(text(0), "1970-01-01 00:00:00.000");
 }
 
-TEST_F(LocalTimeFormatterTest, NoticesThatTheZoneIsNotSetAnyMore) {
+TEST_F(LocalTimeFormatterTest, UsesTheSystemsZoneAfterTheZoneIsUnset) {
   setenv("TZ", "XYZ-05:30", 1);
   EXPECT_EQ(text(0), "1970-01-01 05:30:00.000");
   unsetenv("TZ");
@@ -144,13 +144,12 @@ TEST_F(LocalTimeFormatterTest, SwitchesInTheSouthernHemisphereAndByHalfAnHour) {
   EXPECT_EQ(text(1'775'314'800), "2026-04-05 01:30:00.000");
 }
 
-TEST_F(LocalTimeFormatterTest, KnowsZonesOfFractionsOfAnHour) {
+TEST_F(LocalTimeFormatterTest, KnowsZonesWithOffsetsThatAreNotWholeHours) {
   if (!setZone("Asia/Kathmandu")) GTEST_SKIP() << "the zone database lacks Asia/Kathmandu";
   EXPECT_EQ(text(1'000'000'000), "2001-09-09 07:31:40.000");
 }
 
-// The model is the system's own strftime.
-TEST_F(LocalTimeFormatterTest, AgreesWithTheSystemOnTimesAtRandom) {
+TEST_F(LocalTimeFormatterTest, AgreesWithStrftimeOnRandomTimes) {
   std::mt19937_64 random(20261121);
   for (const char* const zone :
        {"Europe/Berlin", "America/New_York", "Pacific/Chatham", "UTC0", "Asia/Kolkata"}) {
@@ -177,7 +176,7 @@ TEST_F(LocalTimeFormatterTest, AllocatesTheTextAndNothingElseWithinASecond) {
   EXPECT_EQ(count.allocations(), 1);
 }
 
-// Invariant: each thread gets the text of the time that it asked for, whatever the others ask.
+// Each thread gets the text of the time that it asked for, whatever the others ask.
 TEST_F(LocalTimeFormatterTest, ServesAllThreadsAtOnce) {
   setenv("TZ", "UTC0", 1);
   std::vector<std::thread> threads;
@@ -196,8 +195,8 @@ TEST_F(LocalTimeFormatterTest, ServesAllThreadsAtOnce) {
   EXPECT_EQ(wrong, 0);
 }
 
-// Used to wait for ever where another thread of the parent was using any formatter.
-TEST_F(LocalTimeFormatterTest, WorksOnInTheChildOfAFork) {
+// The child used to wait for ever if another thread of the parent was using any formatter during the fork.
+TEST_F(LocalTimeFormatterTest, WorksInTheChildOfAFork) {
   setenv("TZ", "UTC0", 1);
   std::atomic<bool> isEnding = false;
   std::thread user([&] {

@@ -6,14 +6,16 @@
 ///     for (const rt::Ref<rt::Object>& name : *names) ...
 ///     rt::String first = names->stringAt(0);
 ///
-///     std::vector<rt::Ref<rt::Object>> elements;            // built piece by piece
+///     std::vector<rt::Ref<rt::Object>> elements;            // built element by element
 ///     elements.push_back(rt::Number::of(3));
 ///     rt::Ref<rt::Array> array = rt::make<rt::Array>(std::move(elements));
 ///
-/// Holds no nulls. Two arrays are equal when their elements are, one by one. Any thread may use an array
-/// whose elements bear that. Its description is that of Runtime/Values/CollectionDescription.h.
+/// No element is null. Two arrays are equal if their elements are equal, in order.
+/// Runtime/Values/CollectionDescription.h defines the description.
 ///
-/// Not for: lists that nobody needs as an object, which are std::vectors.
+/// Ownership: an array retains its elements.
+/// Threads: thread-safe if the elements are.
+/// Not for: lists that need not be objects. Use std::vector for those.
 
 #include <cstddef>
 #include <cstdint>
@@ -29,10 +31,11 @@ namespace rt {
 
 class RT_VISIBLE Array : public Implements<Array, Object> {
  public:
-  /// Throws std::invalid_argument if one of the elements is null.
+  /// Throws std::invalid_argument if an element is null.
   explicit Array(std::vector<Ref<Object>> elements = {});
 
-  /// An array of strings and references to objects. Throws like the constructor, and std::bad_alloc.
+  /// Returns an array of strings and references to objects. Throws as the constructor does, and
+  /// std::bad_alloc.
   template <class... Elements>
   static Ref<Array> of(const Elements&... elements) {
     return make<Array>(std::vector<Ref<Object>>{Ref<Object>(elements)...});
@@ -41,20 +44,20 @@ class RT_VISIBLE Array : public Implements<Array, Object> {
   std::size_t count() const noexcept { return elements_.size(); }
   bool isEmpty() const noexcept { return elements_.empty(); }
 
-  /// The element at `index`, not null, not retained. Throws std::out_of_range.
+  /// Returns the element at `index`, never null. The array retains it. Throws std::out_of_range.
   Object* at(std::size_t index) const { return elements_.at(index).get(); }
 
-  /// The same as a T; null where it is none.
+  /// Returns the element at `index` as a T, or null if it is not a T. Throws std::out_of_range.
   template <class T>
     requires(ClassType<T> || ProtocolType<T>)
   T* at(std::size_t index) const {
     return cast<T>(at(index));
   }
 
-  /// The same as a string; null where it is none.
+  /// Returns the element at `index` as a string, or null if it is not a string. Throws std::out_of_range.
   String stringAt(std::size_t index) const { return String::from(at(index)); }
 
-  /// Whether an element equals `object`; none equals null.
+  /// Returns whether an element equals `object`. False for null.
   bool contains(const Object* object) const;
 
   using Iterator = std::vector<Ref<Object>>::const_iterator;

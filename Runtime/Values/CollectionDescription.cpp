@@ -52,7 +52,7 @@ void appendIndented(StringBuilder& builder, std::string_view text) {
   builder.append(text);
 }
 
-/// Appends an object that has described itself as `description`.
+// Appends `object`, whose description is `description`.
 void append(StringBuilder& builder, const Object& object, const String& description) {
   if (object.isKindOf(classInfo<StringObject>()) && !isWord(description)) {
     appendQuoted(builder, description);
@@ -65,7 +65,7 @@ void append(StringBuilder& builder, const Object& object) {
   append(builder, object, object.description());
 }
 
-/// A key with what its place depends on.
+// A key and what its order depends on.
 struct OrderedEntry {
   explicit OrderedEntry(const DescribedEntry& described)
       : entry(described),

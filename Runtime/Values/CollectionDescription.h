@@ -1,30 +1,32 @@
 #pragma once
 
-/// How collections describe themselves. All of them, whatever holds them, go by one rule:
+/// Describes collections as text. All collections use one layout:
 ///
-///     | (                            an array in parentheses, one element a line, in its order
+///     | (                            an array has parentheses, and one element a line, in order
 ///     |     first,
 ///     |     "second one",
-///     |     {                        a dictionary in braces, one entry a line, ordered by key
+///     |     {                        a dictionary has braces, and one entry a line, sorted by key
 ///     |         count = 3;
 ///     |         "full name" = "A \"B\"\n";
 ///     |     },
-///     |     {(                       a set in both, one element a line, ordered
+///     |     {(                       a set has both brackets, and one element a line, sorted
 ///     |         1,
 ///     |         10
 ///     |     )},
-///     |     (                        an empty collection has no line of its own between its brackets
+///     |     (                        an empty collection has no line between its brackets
 ///     |     )
 ///     | )
 ///
-/// An element is described by its `description`, and what follows a line end in it is indented by four
-/// blanks, so that collections nest. A string is written as it is if it is made of A-Z a-z 0-9 _ . / - only
-/// and not empty. Otherwise it stands in double quotes, with \" \\ \n \r \t for these characters and \xNN
-/// for other control characters. Keys of dictionaries and elements of sets are ordered: numbers by value,
-/// then strings by their bytes, then others by their descriptions; so equal collections of strings and
-/// numbers have equal descriptions.
+/// An element appears as its `description`. Each further line of it is indented by four blanks, so that
+/// collections nest. A string appears as it is if it is not empty and consists of A-Z a-z 0-9 _ . / - only.
+/// Other strings are in double quotes. In them \" and \\ stand for a quote and a backslash, and \n \r \t and
+/// \xNN for control characters.
 ///
-/// Not for: callers of collections, who ask for `description`.
+/// The keys of dictionaries and the elements of sets are sorted. Numbers come first, by value, then strings,
+/// by their bytes, then other objects, by their descriptions. So equal collections of strings and numbers
+/// have equal descriptions.
+///
+/// Not for: users of collections. They call `description`.
 
 #include <span>
 
@@ -34,14 +36,14 @@
 
 namespace rt::detail {
 
-/// An element of a set, or a key of a dictionary with its value. Neither is retained.
+/// An element of a set, or a key and its value in a dictionary. Neither object is retained.
 struct DescribedEntry {
   const Object* key;
   const Object* value = nullptr;
 };
 
-/// The descriptions of the collections with these elements, none of which is null, in any order. Throw what
-/// the elements' descriptions throw, and std::bad_alloc.
+/// Return the description of a collection with these elements, which must not be null. The elements of sets
+/// and dictionaries may be in any order. Throw what the elements' descriptions throw, and std::bad_alloc.
 String describeArray(std::span<const Ref<Object>> elements);
 String describeSet(std::span<const DescribedEntry> elements);
 String describeDictionary(std::span<const DescribedEntry> entries);

@@ -1,4 +1,4 @@
-// Arrays, dictionaries and sets, and how they describe themselves.
+// Tests of arrays, dictionaries and sets, and of their descriptions.
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
@@ -20,7 +20,7 @@ namespace {
 
 using namespace rt::literals;
 
-/// Something whose description is what it was made with.
+// An object with a given description.
 class Stone final : public rt::Implements<Stone, rt::Object> {
  public:
   explicit Stone(rt::String description) : description_(std::move(description)) {}
@@ -37,7 +37,7 @@ struct Ringing : rt::Protocol<Ringing> {
   ~Ringing() = default;
 };
 
-/// An array that a library makes conform to a protocol of its own.
+// A class derived from Array that conforms to another protocol.
 class Bells final : public rt::Implements<Bells, rt::Array, Ringing> {
  public:
   using Implements::Implements;
@@ -145,7 +145,7 @@ TEST(Dictionary, ComparesItsEntries) {
   EXPECT_FALSE(dictionary->isEqual(nullptr));
 }
 
-TEST(Dictionary, BehavesLikeTheModel) {
+TEST(Dictionary, BehavesLikeAMap) {
   std::mt19937 random(5);
   rt::Dictionary::Builder builder;
   std::map<int, int> model;
@@ -214,17 +214,17 @@ TEST(CollectionDescription, Empty) {
   EXPECT_EQ(rt::Set::of()->description(), "{(\n)}");
 }
 
-TEST(CollectionDescription, OneElementALine) {
+TEST(CollectionDescription, HasOneElementALine) {
   EXPECT_EQ(rt::Array::of(number(2), number(1))->description(), "(\n    2,\n    1\n)");
   EXPECT_EQ(rt::Set::of(number(2), number(1))->description(), "{(\n    1,\n    2\n)}");
-  // Strings come before what only describes itself, and numbers before both.
+  // Numbers come first, then strings, then other objects.
   EXPECT_EQ(rt::Set::of(rt::make<Stone>("a"_s), "b"_s, rt::make<Stone>("c"_s), number(3))->description(),
             "{(\n    3,\n    b,\n    a,\n    c\n)}");
   EXPECT_EQ(rt::Dictionary::of({{"b"_s, number(1)}, {"a"_s, "x"_s}})->description(),
             "{\n    a = x;\n    b = 1;\n}");
 }
 
-TEST(CollectionDescription, QuotesStringsThatAreNoWords) {
+TEST(CollectionDescription, QuotesStringsWithSpecialCharacters) {
   const auto describe = [](std::string_view text) {
     const rt::String description = rt::Array::of(rt::String::fromUTF8(text))->description();
     return std::string(description.view().substr(6, description.length() - 8));
@@ -255,13 +255,13 @@ TEST(CollectionDescription, NestsByIndentation) {
 ))");
 }
 
-TEST(CollectionDescription, ShowsOtherObjectsAsTheyDescribeThemselves) {
+TEST(CollectionDescription, ShowsOtherObjectsByTheirDescriptions) {
   EXPECT_EQ(rt::Array::of(rt::make<Stone>("<Stone: \"1\">"_s))->description(), "(\n    <Stone: \"1\">\n)");
   EXPECT_EQ(rt::Array::of(rt::make<Stone>("two\nlines"_s))->description(), "(\n    two\n    lines\n)");
   EXPECT_EQ(rt::Array::of(rt::make<Stone>(rt::String()))->description(), "(\n    (null)\n)");
 }
 
-TEST(CollectionDescription, OrdersKeysWhateverTheOrderOfMaking) {
+TEST(CollectionDescription, SortsKeysWhateverTheOrderOfInsertion) {
   std::vector<std::pair<rt::Ref<rt::Object>, rt::Ref<rt::Object>>> entries;
   for (const int value : {10, 9, 2, -1}) entries.emplace_back(number(value), number(0));
   for (const rt::String& key : {"b"_s, "a"_s, "B"_s, "10"_s}) entries.emplace_back(key, number(0));

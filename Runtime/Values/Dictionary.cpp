@@ -44,7 +44,7 @@ bool Dictionary::isEqual(const Object* other) const {
 }
 
 std::uint64_t Dictionary::hash() const {
-  // A sum, for the order of the entries means nothing.
+  // A sum does not depend on the order of the entries, which differs between equal dictionaries.
   std::uint64_t hash = count();
   for (const auto& [key, value] : entries_) hash += key->hash() * 41 + value->hash();
   return hash;

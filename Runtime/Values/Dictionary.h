@@ -5,18 +5,19 @@
 ///     rt::Ref<rt::Dictionary> ages = rt::Dictionary::of({{"Ann"_s, rt::Number::of(41)}});
 ///     if (rt::Number* age = ages->objectForKey<rt::Number>("Ann"_s)) ...
 ///
-///     rt::Dictionary::Builder builder(*ages);               // another one, from it
+///     rt::Dictionary::Builder builder(*ages);               // builds a changed copy
 ///     builder.set("Bob"_s, rt::Number::of(7));
 ///     builder.remove("Ann"_s);
 ///     ages = builder.dictionary();
 ///
-/// Keys are strings, numbers, or any objects whose `isEqual` and `hash` never change; neither keys nor values
-/// are null. Two dictionaries are equal when they have equal values for equal keys. The order of a walk over
-/// the entries is not specified. Any thread may use a dictionary whose keys and values bear that. Its
-/// description is that of Runtime/Values/CollectionDescription.h.
+/// A key is a string, a number, or any object whose `isEqual` and `hash` never change. No key and no value is
+/// null. Two dictionaries are equal if they have equal values for equal keys. The order of iteration is
+/// unspecified. Runtime/Values/CollectionDescription.h defines the description.
 ///
-/// Not for: tables that nobody needs as an object, which are std::unordered_maps
-/// (Runtime/Objects/ObjectHash.h).
+/// Ownership: a dictionary retains its keys and values.
+/// Threads: thread-safe if the keys and values are.
+/// Not for: tables that need not be objects. Use std::unordered_map for those, with the hash and equality of
+/// Runtime/Objects/ObjectHash.h.
 
 #include <cstddef>
 #include <cstdint>
@@ -37,25 +38,25 @@ class RT_VISIBLE Dictionary final : public Implements<Dictionary, Object> {
  public:
   using Entries = std::unordered_map<Ref<Object>, Ref<Object>, ObjectHash, ObjectEqual>;
 
-  /// A dictionary in the making; for one thread at a time.
+  /// Builds a dictionary. Threads: not thread-safe.
   class Builder {
    public:
     Builder() = default;
     /// Starts with the entries of `dictionary`.
     explicit Builder(const Dictionary& dictionary) : entries_(dictionary.entries_) {}
 
-    /// Has `key`, not null, stand for `value`, whatever it stood for before; for nothing, where `value` is
-    /// null. Throws std::invalid_argument for a null key, what a key's `hash` or `isEqual` throws, and
-    /// std::bad_alloc; nothing has changed then.
+    /// Sets the value for `key`, and replaces the previous value. A null `value` removes the entry.
+    /// Errors: throws std::invalid_argument for a null key, what a key's `hash` or `isEqual` throws, and
+    /// std::bad_alloc. The builder is unchanged then.
     void set(const Ref<Object>& key, const Ref<Object>& value);
 
-    /// Has `key`, which may be null, stand for nothing.
+    /// Removes the entry for `key`, if there is one. Does nothing for null.
     void remove(const Object* key);
     void remove(const String& key) { remove(key.object()); }
 
     std::size_t count() const noexcept { return entries_.size(); }
 
-    /// A dictionary with the entries that there are now. Throws std::bad_alloc.
+    /// Returns a dictionary with the present entries. Throws std::bad_alloc.
     Ref<Dictionary> dictionary() const& { return make<Dictionary>(entries_); }
     Ref<Dictionary> dictionary() && { return make<Dictionary>(std::move(entries_)); }
 
@@ -63,34 +64,35 @@ class RT_VISIBLE Dictionary final : public Implements<Dictionary, Object> {
     Entries entries_;
   };
 
-  /// Empty.
+  /// Makes an empty dictionary.
   Dictionary() = default;
 
-  /// With `entries`, neither keys nor values of which are null.
+  /// Makes a dictionary of `entries`. Precondition: no key and no value is null.
   explicit Dictionary(Entries entries) noexcept : entries_(std::move(entries)) {}
 
-  /// With these entries, of equal keys the last; one whose value is null is left out. Throws like
-  /// `Builder::set`.
+  /// Returns a dictionary that is built by calling `Builder::set` for each entry in order. So the last value
+  /// for a key counts, and a null value removes the key. Throws what `Builder::set` throws.
   static Ref<Dictionary> of(std::initializer_list<std::pair<Ref<Object>, Ref<Object>>> entries);
 
   std::size_t count() const noexcept { return entries_.size(); }
   bool isEmpty() const noexcept { return entries_.empty(); }
 
-  /// What `key` stands for, not retained; null where that is nothing, and for a null key.
+  /// Returns the value for `key`. Returns null if there is no such entry, and for a null key. The dictionary
+  /// retains the value.
   Object* objectForKey(const Object* key) const;
   Object* objectForKey(const String& key) const { return objectForKey(key.object()); }
 
-  /// The same as a T; null also where it is none.
+  /// Returns the value for `key` as a T. Also null if it is not a T.
   template <class T>
     requires(ClassType<T> || ProtocolType<T>)
   T* objectForKey(const auto& key) const {
     return cast<T>(objectForKey(key));
   }
 
-  /// The same as a string; null also where it is none.
+  /// Returns the value for `key` as a string. Also null if it is not a string.
   String stringForKey(const auto& key) const { return String::from(objectForKey(key)); }
 
-  /// The entries, as pairs of key and value.
+  /// Iterate over the entries, which are pairs of key and value.
   Entries::const_iterator begin() const noexcept { return entries_.begin(); }
   Entries::const_iterator end() const noexcept { return entries_.end(); }
 

@@ -22,7 +22,7 @@ std::strong_ordering compareReals(double first, double second) noexcept {
   return first < second ? std::strong_ordering::less : std::strong_ordering::greater;
 }
 
-/// Compares the integer with the 64 bits `integer` with `real`, neither of which is rounded.
+// Compares an integer with a real number and rounds neither. `integer` has the 64 bits of the integer.
 std::strong_ordering compareWithReal(std::uint64_t integer, bool isNegative, double real) noexcept {
   if (std::isnan(real) || real < -kTwoTo63) return std::strong_ordering::greater;
   if (real >= kTwoTo64) return std::strong_ordering::less;
@@ -82,7 +82,8 @@ bool Number::isEqual(const Object* other) const {
 std::uint64_t Number::hash() const {
   std::uint64_t bits = integer_;
   if (kind_ == Kind::kReal) {
-    // What equals an integer has its hash; all that is not a number has one.
+    // A real number has the hash of the integer that it equals. All values that are not a number have one
+    // hash.
     if (real_ == std::trunc(real_) && real_ >= -kTwoTo63 && real_ < kTwoTo64) {
       bits = real_ < 0 ? static_cast<std::uint64_t>(static_cast<std::int64_t>(real_))
                        : static_cast<std::uint64_t>(real_);
@@ -95,7 +96,7 @@ std::uint64_t Number::hash() const {
 }
 
 String Number::description() const {
-  // The longest is the negative least real number: "-0.", 323 zeros and up to 17 digits.
+  // The longest text is that of the negative real number nearest to 0: "-0.", 323 zeros and up to 17 digits.
   std::array<char, 400> text{};
   char* const end = text.data() + text.size();
   char* last = nullptr;

@@ -1,15 +1,15 @@
 #pragma once
 
-/// A number as an object: an integer of up to 64 bits, a real number, or a truth value.
+/// A number as an object: an integer of up to 64 bits, a real number, or a boolean.
 ///
 ///     rt::Ref<rt::Number> count = rt::Number::of(3);
 ///     count->integerValue();                                          // 3
 ///     rt::isEqual(count, rt::Number::of(3.0));                        // true: equality is by value
 ///
-/// Numbers are equal when their values are, whatever they were made from: true, 1 and 1.0 are. Integers and
-/// real numbers are compared exactly, not by rounding one of them. Not-a-number equals itself. Immutable:
-/// any thread may use it.
+/// Numbers are equal if their values are, whatever their kinds: true, 1 and 1.0 are equal. Comparing an
+/// integer with a real number rounds neither. Not-a-number equals itself.
 ///
+/// Threads: thread-safe. Numbers are immutable.
 /// Not for: arithmetic.
 
 #include <compare>
@@ -28,7 +28,7 @@ class RT_VISIBLE Number final : public Implements<Number, Object> {
  public:
   enum class Kind : std::uint8_t {
     kBoolean,
-    /// An integer that a std::int64_t can hold, whatever it was made from.
+    /// An integer that a std::int64_t can hold, whatever type it was made from.
     kSigned,
     /// An integer that only a std::uint64_t can hold.
     kUnsigned,
@@ -44,33 +44,34 @@ class RT_VISIBLE Number final : public Implements<Number, Object> {
                                                                               : Kind::kSigned),
         integer_(static_cast<std::uint64_t>(value)) {}
 
-  /// A new number. Throws std::bad_alloc.
+  /// Returns a new number. Throws std::bad_alloc.
   static Ref<Number> of(std::integral auto value) { return make<Number>(value); }
   static Ref<Number> of(double value) { return make<Number>(value); }
 
   Kind kind() const noexcept { return kind_; }
 
-  /// The value as a signed integer. Of a real number without its fraction, or the nearest there is, and 0
-  /// for not-a-number; of an unsigned integer with the same 64 bits.
+  /// Returns the value as a signed integer. An unsigned integer keeps its 64 bits. A real number loses its
+  /// fraction; out of range it gives the nearest integer in range. Not-a-number gives 0.
   std::int64_t integerValue() const noexcept;
 
-  /// The same as an unsigned integer: of a signed one with the same 64 bits.
+  /// Returns the value as an unsigned integer. A signed integer keeps its 64 bits. Real numbers are converted
+  /// as by `integerValue`.
   std::uint64_t unsignedValue() const noexcept;
 
-  /// The nearest real number.
+  /// Returns the real number that is nearest to the value.
   double realValue() const noexcept;
 
-  /// Whether the value is other than 0.
+  /// Returns whether the value is other than 0. True for not-a-number.
   bool booleanValue() const noexcept;
 
-  /// How this value compares with the other. Not-a-number is equal to itself and less than all others.
+  /// Compares this value with the other. Not-a-number equals itself and is less than all other values.
   std::strong_ordering compare(const Number& other) const noexcept;
 
   bool isEqual(const Object* other) const override;
   std::uint64_t hash() const override;
 
-  /// The value as a plain decimal, without an exponent, that reads back as the same value: "-3", "0.1";
-  /// "1" and "0" for true and false; "nan", "inf", "-inf".
+  /// Returns the value as a decimal without an exponent, such as "-3" or "0.1". Reading it back gives the
+  /// same value. True and false give "1" and "0". Values that are not finite give "nan", "inf" and "-inf".
   String description() const override;
 
  private:

@@ -72,8 +72,8 @@ TEST(Number, IsEqualByValue) {
   EXPECT_FALSE(rt::Number::of(1)->isEqual(nullptr));
 }
 
-TEST(Number, DoesNotRoundToCompare) {
-  // As real numbers both would be 2^63, or 2^53.
+TEST(Number, ComparesWithoutRounding) {
+  // Both numbers of the first line would round to 2^63, those of the second to 2^53.
   EXPECT_FALSE(rt::isEqual(rt::Number::of(kLargest), rt::Number::of(9223372036854775808.0)));
   EXPECT_FALSE(rt::isEqual(rt::Number::of(9007199254740993), rt::Number::of(9007199254740992.0)));
   EXPECT_TRUE(rt::isEqual(rt::Number::of(std::uint64_t{1} << 63), rt::Number::of(9223372036854775808.0)));
@@ -81,7 +81,8 @@ TEST(Number, DoesNotRoundToCompare) {
   EXPECT_FALSE(rt::isEqual(rt::Number::of(kLargestUnsigned), rt::Number::of(18446744073709551616.0)));
 }
 
-// All values in their order: each compares with each as their places do, and those in one place are equal.
+// `places` lists values in ascending order. The values in one place are equal. Values in two places must
+// compare as the indices of their places do.
 TEST(Number, OrdersAllKinds) {
   const std::vector<std::vector<rt::Ref<rt::Number>>> places{
       {rt::Number::of(kNan), rt::Number::of(-kNan)},
@@ -139,7 +140,7 @@ TEST(Number, DescribesItselfAsAPlainDecimal) {
   EXPECT_EQ(rt::Number::of(-kNan)->description(), "nan");
 }
 
-TEST(Number, ReadsBackFromItsDescription) {
+TEST(Number, DescriptionReadsBackAsTheSameValue) {
   std::mt19937_64 random(42);
   std::vector<double> values{std::numeric_limits<double>::max(), -std::numeric_limits<double>::denorm_min(),
                              std::numeric_limits<double>::min(), 5e-324, 1.7976931348623157e308};
@@ -156,14 +157,14 @@ TEST(Number, ReadsBackFromItsDescription) {
   }
 }
 
-// Integers that a real number holds exactly, and their neighbours.
-TEST(Number, ComparesLikeTheModel) {
+// Compares random integers and real numbers. The model is the comparison of long doubles.
+TEST(Number, ComparesAsLongDoublesDo) {
   std::mt19937_64 random(11);
   for (int i = 0; i < 100000; ++i) {
     const auto integer = static_cast<std::int64_t>(random()) >> (random() % 64);
     const double real =
         std::ldexp(static_cast<double>(static_cast<std::int64_t>(random())), -int(random() % 70));
-    // As long double has 64 bits of precision, both are exact in it.
+    // A long double has 64 bits of precision, so it holds both values exactly.
     const auto first = static_cast<long double>(integer);
     const auto second = static_cast<long double>(real);
     static_assert(std::numeric_limits<long double>::digits >= 64);

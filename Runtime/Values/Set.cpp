@@ -36,7 +36,7 @@ bool Set::isEqual(const Object* other) const {
 }
 
 std::uint64_t Set::hash() const {
-  // A sum, for the order of the elements means nothing.
+  // A sum does not depend on the order of the elements, which differs between equal sets.
   std::uint64_t hash = count();
   for (const Ref<Object>& element : elements_) hash += element->hash();
   return hash;

@@ -5,16 +5,18 @@
 ///     rt::Ref<rt::Set> tags = rt::Set::of("one"_s, "two"_s);
 ///     if (tags->contains("one"_s)) ...
 ///
-///     rt::Set::Builder builder(*tags);                      // another one, from it
+///     rt::Set::Builder builder(*tags);                      // builds a changed copy
 ///     builder.add("three"_s);
 ///     tags = builder.set();
 ///
-/// No two elements are equal, and none is null; their `isEqual` and `hash` must never change. Two sets are
-/// equal when they have equal elements. The order of a walk over the elements is not specified. Any thread
-/// may use a set whose elements bear that. Its description is that of Runtime/Values/CollectionDescription.h.
+/// No two elements are equal, and no element is null. Their `isEqual` and `hash` must never change. Two sets
+/// are equal if they have equal elements. The order of iteration is unspecified.
+/// Runtime/Values/CollectionDescription.h defines the description.
 ///
-/// Not for: sets that nobody needs as an object, which are std::unordered_sets
-/// (Runtime/Objects/ObjectHash.h).
+/// Ownership: a set retains its elements.
+/// Threads: thread-safe if the elements are.
+/// Not for: sets that need not be objects. Use std::unordered_set for those, with the hash and equality of
+/// Runtime/Objects/ObjectHash.h.
 
 #include <cstddef>
 #include <cstdint>
@@ -34,25 +36,25 @@ class RT_VISIBLE Set final : public Implements<Set, Object> {
  public:
   using Elements = std::unordered_set<Ref<Object>, ObjectHash, ObjectEqual>;
 
-  /// A set in the making; for one thread at a time.
+  /// Builds a set. Threads: not thread-safe.
   class Builder {
    public:
     Builder() = default;
     /// Starts with the elements of `set`.
     explicit Builder(const Set& set) : elements_(set.elements_) {}
 
-    /// Adds `object`, not null, unless there is an equal one, which stays; returns whether it was added.
-    /// Throws std::invalid_argument for null, what an element's `hash` or `isEqual` throws, and
-    /// std::bad_alloc; nothing has changed then.
+    /// Adds `object` and returns true. If an element equals it, keeps that element and returns false.
+    /// Errors: throws std::invalid_argument for null, what an element's `hash` or `isEqual` throws, and
+    /// std::bad_alloc. The builder is unchanged then.
     bool add(const Ref<Object>& object);
 
-    /// Removes the element that equals `object`, which may be null; returns whether there was one.
+    /// Removes the element that equals `object`. Returns whether there was such an element. False for null.
     bool remove(const Object* object);
     bool remove(const String& string) { return remove(string.object()); }
 
     std::size_t count() const noexcept { return elements_.size(); }
 
-    /// A set with the elements that there are now. Throws std::bad_alloc.
+    /// Returns a set with the present elements. Throws std::bad_alloc.
     Ref<Set> set() const& { return make<Set>(elements_); }
     Ref<Set> set() && { return make<Set>(std::move(elements_)); }
 
@@ -60,13 +62,14 @@ class RT_VISIBLE Set final : public Implements<Set, Object> {
     Elements elements_;
   };
 
-  /// Empty.
+  /// Makes an empty set.
   Set() = default;
 
-  /// With `elements`, none of which is null.
+  /// Makes a set of `elements`. Precondition: no element is null.
   explicit Set(Elements elements) noexcept : elements_(std::move(elements)) {}
 
-  /// A set of strings and references to objects, of equal ones the first. Throws like `Builder::add`.
+  /// Returns a set of strings and references to objects. It has the first of several equal objects. Throws
+  /// what `Builder::add` throws.
   template <class... Objects>
   static Ref<Set> of(const Objects&... objects) {
     Builder builder;
@@ -77,10 +80,11 @@ class RT_VISIBLE Set final : public Implements<Set, Object> {
   std::size_t count() const noexcept { return elements_.size(); }
   bool isEmpty() const noexcept { return elements_.empty(); }
 
-  /// The element that equals `object`, not retained; null where there is none, and for null.
+  /// Returns the element that equals `object`. Returns null if there is no such element, and for null. The
+  /// set retains the element.
   Object* member(const Object* object) const;
 
-  /// Whether an element equals `object`; none equals null.
+  /// Returns whether an element equals `object`. False for null.
   bool contains(const Object* object) const { return member(object) != nullptr; }
   bool contains(const String& string) const { return contains(string.object()); }
 

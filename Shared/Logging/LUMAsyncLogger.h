@@ -1,6 +1,6 @@
 #pragma once
 
-/// A logger that is called on a queue of its own, later.
+/// A logger that the multiplexer calls on the logger's own queue.
 ///
 ///     class FileLogger : public rt::Implements<FileLogger, rt::Object, LUMAsyncLogger> {
 ///      public:
@@ -12,16 +12,16 @@
 ///       }
 ///     };
 ///
-/// Messages of one thread that come later are in the order in which they were logged, given that the logger
-/// keeps to one queue. One that is wanted at once may overtake those that still wait.
+/// Order: deferred messages of one thread arrive in the order in which they were logged, provided that the
+/// logger always returns the same queue. A message that the logger wants at once may overtake deferred ones.
 ///
-/// What a logger throws when it is called later has no caller to go to, whether `logWithMessage`, its filter
-/// or `operationQueue` throws it: it leaves a task of a queue, and unless rt::Queue's
-/// `setUncaughtExceptionHandler` says otherwise, the program ends with a line that names the queue. What is
-/// thrown while the caller waits, `LUMLog` throws: by the filter and `dispatchModeForMessage`, which every
-/// message asks first, and by a logger that wants the message at once.
+/// Errors: `LUMLog` throws what the logger throws while the caller waits. The caller waits for the filter and
+/// `dispatchModeForMessage`, which are called for every message. It also waits for all calls for a message
+/// that the logger wants at once. The other calls are deferred: `operationQueue`, the filter again and
+/// `logWithMessage`. An exception from a deferred call has no caller to reach. It ends the program with a
+/// line that names the queue, unless `rt::Queue::setUncaughtExceptionHandler` has set a handler.
 ///
-/// Not for: what must see a message before the caller goes on, as a rule; see LUMSyncLogger.
+/// Not for: a logger whose messages usually must be written before the caller goes on; see LUMSyncLogger.
 
 #include <cstdint>
 
@@ -30,21 +30,22 @@
 #include "Runtime/Queues/Queue.h"
 #include "Shared/Logging/LUMLogger.h"
 
-/// How a LUMAsyncLogger wants to be called.
+/// How a LUMAsyncLogger wants to be called with a message.
 using LUMLogDispatchMode = std::uint32_t;
 
-/// Before `LUMLog` returns. Any other value: later.
+/// Call the logger before `LUMLog` returns. Any other value: call it later.
 inline constexpr LUMLogDispatchMode LUMLogDispatchModeSynchronous = 2;
 
 struct RT_VISIBLE LUMAsyncLogger : rt::Protocol<LUMAsyncLogger, LUMLogger> {
-  /// The queue to be called on; without one the logger receives nothing. Asked on the multiplexer's queue,
-  /// or on the thread that logs where the logger wants the message at once.
+  /// Returns the queue to call the logger on. If it is null, the logger receives nothing. Called on the
+  /// multiplexer's queue, or on the logging thread if the logger wants the message at once.
   virtual rt::Ref<rt::Queue> operationQueue() const = 0;
 
-  /// How to be called with `message`; asked on the thread that logs. Must not be
-  /// LUMLogDispatchModeSynchronous for what is logged on the logger's own queue, which would wait for
-  /// itself, nor where a task of that queue may wait for a lock that a thread holds while it logs, as a
-  /// service registry does.
+  /// Returns how to call the logger with `message`. Called on the logging thread.
+  ///
+  /// LUMLogDispatchModeSynchronous deadlocks for a message that is logged on the logger's own queue. It also
+  /// deadlocks if a task of that queue waits for a lock that the logging thread holds. A service registry,
+  /// for example, logs with its lock held.
   virtual LUMLogDispatchMode dispatchModeForMessage(const LUMLogMessage& message) const = 0;
 
  protected:

@@ -1,14 +1,14 @@
 #pragma once
 
-/// Lets pass what the environment asks for: from LUMLogLevelDebug on where OS_ACTIVITY_MODE is "debug", from
-/// LUMLogLevelInfo on where it is "info", else from LUMLogLevelError on.
+/// Lets messages pass from a minimum level on, which the environment variable OS_ACTIVITY_MODE sets. The
+/// minimum is LUMLogLevelDebug for "debug", LUMLogLevelInfo for "info", and LUMLogLevelError otherwise.
 ///
 ///     rt::Ref<LUMSystemLogger> logger =
 ///         LUMSystemLogger::initWithFilter(LUMDefaultMinimumLogLevelFilter::init());
 ///
-/// The environment is read once in a process, the first time that any such filter is asked.
+/// The variable is read once per process, when the first such filter is asked.
 ///
-/// Not for: a level that the program decides; see LUMLogMinimumLevelFilter.
+/// Not for: a level that the program chooses; see LUMLogMinimumLevelFilter.
 
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Class.h"

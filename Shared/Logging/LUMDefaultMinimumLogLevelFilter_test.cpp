@@ -1,5 +1,5 @@
-// What the environment is asked for once in a process takes a process for each answer: every death test here
-// is one, started anew, that has asked nothing.
+// A process reads the environment once, so each answer needs a process of its own. Every death test here is a
+// new process that has not read it.
 
 #include "Shared/Logging/LUMDefaultMinimumLogLevelFilter.h"
 
@@ -32,7 +32,8 @@ class LUMDefaultMinimumLogLevelFilterDeathTest : public testing::Test {
     }
   }
 
-  // The lowest level that passes, if all above it do and none below it.
+  // Returns the lowest level that passes, if all levels above it pass too. Otherwise returns which levels
+  // pass.
   static std::string threshold() {
     const Ref<LUMDefaultMinimumLogLevelFilter> filter = LUMDefaultMinimumLogLevelFilter::init();
     std::string passed;
@@ -44,7 +45,7 @@ class LUMDefaultMinimumLogLevelFilterDeathTest : public testing::Test {
     return passed.find('n', lowest) == std::string::npos ? std::to_string(lowest) : passed;
   }
 
-  // Writes the threshold of this process, in which `mode` is the first, and ends it.
+  // Prints the threshold of this process, which must not have read another mode before, and exits.
   [[noreturn]] static void tellThreshold(const char* mode) {
     setMode(mode);
     std::fprintf(stderr, "threshold %s.\n", threshold().c_str());
@@ -52,15 +53,15 @@ class LUMDefaultMinimumLogLevelFilterDeathTest : public testing::Test {
   }
 };
 
-TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsDebugPassWhereTheModeIsDebug) {
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsDebugPassIfTheModeIsDebug) {
   EXPECT_EXIT(tellThreshold("debug"), testing::ExitedWithCode(0), "threshold 1\\.");
 }
 
-TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsInfoPassWhereTheModeIsInfo) {
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsInfoPassIfTheModeIsInfo) {
   EXPECT_EXIT(tellThreshold("info"), testing::ExitedWithCode(0), "threshold 2\\.");
 }
 
-TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsErrorPassWhereTheModeIsNotSet) {
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsErrorPassIfTheModeIsNotSet) {
   EXPECT_EXIT(tellThreshold(nullptr), testing::ExitedWithCode(0), "threshold 3\\.");
 }
 
@@ -72,7 +73,7 @@ TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, LetsErrorPassInEveryOtherMode) 
   EXPECT_EXIT(tellThreshold("1"), testing::ExitedWithCode(0), "threshold 3\\.");
 }
 
-TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, AsksOnceForAllFiltersOfTheProcess) {
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, ReadsTheEnvironmentOncePerProcess) {
   const auto body = [] {
     setMode("info");
     const std::string first = threshold();
@@ -83,7 +84,7 @@ TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, AsksOnceForAllFiltersOfTheProce
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "threshold 2, then 2\\.");
 }
 
-TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, AsksWhenAMessageComesAndNotWhenAFilterIsMade) {
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, ReadsTheEnvironmentAtTheFirstMessage) {
   const auto body = [] {
     setMode("info");
     const Ref<LUMDefaultMinimumLogLevelFilter> filter = LUMDefaultMinimumLogLevelFilter::init();
@@ -92,7 +93,7 @@ TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, AsksWhenAMessageComesAndNotWhen
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "threshold 1\\.");
 }
 
-TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, TellsAllThreadsTheSameWhenTheyAskAtOnce) {
+TEST_F(LUMDefaultMinimumLogLevelFilterDeathTest, GivesTheSameAnswerOnAllThreads) {
   const auto body = [] {
     setMode("debug");
     constexpr int kThreads = 8;

@@ -1,3 +1,10 @@
+// `LUMLogAt` and `PECReport` are always compiled into their callers. An empty statement behind the call keeps
+// the caller's frame. The functions below them are never compiled into each other. So the number of frames to
+// leave out of a call stack is the same in every build.
+//
+// `LUMLog` is for programs that make calls, with counts and kinds of the arguments. `LUMLogAt` is for people.
+// They have two names because a call of the first sort would also fit an overload of the second.
+
 #include "Shared/Logging/LUMLog.h"
 
 #include <algorithm>
@@ -18,7 +25,7 @@ namespace {
 
 using namespace rt::literals;
 
-/// Ends the use of an argument list, also where something throws.
+// Calls va_end on an argument list, also if something throws.
 class ListEnd {
  public:
   explicit ListEnd(std::va_list& list) noexcept : list_(list) {}
@@ -39,7 +46,7 @@ bool isSafeParameter(const rt::Object& object) {
 
 constexpr LUMLogArgumentKind kObject = 1;
 
-/// The safe parameters in the list by their places among all arguments; null where there are none.
+// Returns the safe parameters in the list, keyed by their index among all arguments. Null if there are none.
 rt::Ref<rt::Dictionary> safeParametersIn(std::va_list list, std::int32_t count,
                                          const LUMLogArgumentKind* kinds) {
   const std::span<const LUMLogArgumentKind> all(kinds, static_cast<std::size_t>(std::max(count, 0)));
@@ -58,7 +65,7 @@ rt::Ref<rt::Dictionary> safeParametersIn(std::va_list list, std::int32_t count,
           parameters.set(rt::Number::of(i), object);
         }
         break;
-      case 5:  // NOLINT(bugprone-branch-clone): it is another type that is read
+      case 5:  // NOLINT(bugprone-branch-clone): reads another type
         static_cast<void>(va_arg(list, double));
         break;
       case 6:
@@ -71,10 +78,10 @@ rt::Ref<rt::Dictionary> safeParametersIn(std::va_list list, std::int32_t count,
   return parameters.count() > 0 ? std::move(parameters).dictionary() : nullptr;
 }
 
-// The calls that a call stack leaves out: that of `logArguments` and that of `LUMLog`.
+// The innermost frames that a call stack leaves out: those of `logArguments` and `LUMLog`.
 constexpr std::uint64_t kOwnFrameCount = 2;
 
-// Flat, but a frame of its own.
+// Inlines its calls, but keeps a frame of its own, which `kOwnFrameCount` counts.
 [[gnu::noinline, gnu::flatten]] rt::Ref<LUMLogMessage> logArguments(
     LUMLogLevel level, const char* file, const char* function, std::uint64_t line,
     const rt::Ref<LUMLogMetadata>& metadata, std::int32_t argumentCount,
@@ -108,7 +115,7 @@ rt::Ref<LUMLogMessage> LUMLog(LUMLogLevel level, const char* file, const char* f
   std::va_list arguments;
   va_start(arguments, format);
   const ListEnd end(arguments);
-  // NOLINTNEXTLINE(clang-analyzer-valist.Unterminated): `end` does
+  // NOLINTNEXTLINE(clang-analyzer-valist.Unterminated): `end` calls va_end
   return logArguments(level, file, function, line, metadata, argumentCount, argumentKinds, format, arguments);
 }
 
@@ -119,7 +126,7 @@ rt::Ref<LUMLogMessage> LUMLogV(LUMLogLevel level, rt::String file, rt::String fu
                                std::va_list arguments) {
   std::va_list walked;
   va_copy(walked, arguments);
-  const ListEnd end(walked);  // NOLINT(clang-analyzer-valist.Unterminated): that is what ends it
+  const ListEnd end(walked);  // NOLINT(clang-analyzer-valist.Unterminated): `end` calls va_end
   rt::String text = rt::formatV(format, arguments);
   return LUMLogMessage::initWithLevel(level, format, std::move(text), std::move(file), std::move(function),
                                       line, nullptr, nullptr, callstack,

@@ -1,27 +1,32 @@
 #pragma once
 
-/// Logging: the entry for everybody.
+/// The logging functions, which all code calls to log a message.
 ///
 ///     using namespace rt::literals;
 ///
 ///     LUMLogAt(LUMLogLevelInfo, "%@ has %d entries"_s, name, count);
 ///     LUMLogAt(LUMLogLevelError, metadata, "cannot open %s (error %d)"_s, path, errno);
 ///
-/// A message is made of the text, the place in the source, the thread and its queue, and goes to the loggers
-/// of the shared multiplexer (Shared/Logging/LUMLogMultiplexer.h), by default the system's log. At the levels
-/// 3 and 4 it has a call stack, unless the multiplexer is told otherwise; the caller's own function is first
-/// in it. Arguments that are a LUMSafeParameter are kept in the message besides.
+/// Each call builds a message and hands it to the shared multiplexer (Shared/Logging/LUMLogMultiplexer.h). By
+/// default the multiplexer writes it to the system's log. The message holds the text, the source location,
+/// and the names of the thread and of its queue.
 ///
-/// The format is a literal and is checked, while compiling, against the arguments
-/// (Runtime/Text/FormatString.h). With `_s` it costs no allocation.
+/// Messages of levels 3 and 4 carry a call stack, unless the multiplexer is set not to capture one. The first
+/// frame is the function that logs. If an argument is a LUMSafeParameter, the message also keeps it by
+/// itself.
 ///
-/// Any thread may log, at any time, also while the program is being loaded. What a description throws passes
-/// through, and what filters and loggers throw before the call returns (Shared/Logging/LUMLogMultiplexing.h);
-/// so does std::bad_alloc.
+/// The format is a literal. It is checked against the arguments at compile time
+/// (Runtime/Text/FormatString.h). A format with the suffix `_s` costs no allocation.
 ///
-/// Not for: signal handlers, since logging allocates and takes locks, and deadlocks or ends the program where
-/// the signal interrupts a thread that holds one; text that was made beforehand and may hold a '%': log it as
-/// an argument of "%@".
+/// Threads: any thread may log at any time, also while the program is being loaded.
+///
+/// Errors: throws what the description of an argument throws, and std::bad_alloc. Also throws what filters
+/// and loggers throw before the call returns (Shared/Logging/LUMLogMultiplexing.h).
+///
+/// Not for: signal handlers. Logging allocates and takes locks. If a signal interrupts a thread that holds
+/// such a lock, logging in the handler deadlocks or ends the program.
+///
+/// Not for: text made beforehand that may contain a '%'. Log it as an argument of "%@".
 
 #include <concepts>
 #include <cstdarg>
@@ -39,30 +44,38 @@
 #include "Shared/Logging/LUMLogMessage.h"
 #include "Shared/Logging/LUMLogMetadata.h"
 
-/// How each argument of a message is passed: rt::ArgumentKind by another name.
+/// The kind of a variadic argument, with the values of rt::ArgumentKind.
 using LUMLogArgumentKind = std::uint32_t;
 
-/// Makes a message, logs it and returns it. `file` and `function` end with NUL; where they are not UTF-8,
-/// "(invalid file)" and "(invalid function)" stand for them. `argumentCount` arguments follow, as
-/// `argumentKinds` says of each: 1 for an `rt::Object*`, 5 for a double, 6 for a long double, 0, 2, 3 or 4
-/// for all that is passed like an integer of at most 64 bits; any other stands for none. `argumentKinds` is
-/// not looked at where `argumentCount` is not above 0. A null format is logged as no text.
+/// Makes a message, logs it and returns it.
 ///
-/// For programs that make calls. People call `LUMLogAt`, which counts and checks the arguments itself.
+/// `file` and `function` end with NUL. If one is null or not UTF-8, "(invalid file)" or "(invalid function)"
+/// takes its place. A null format is logged as a null text.
+///
+/// `argumentCount` arguments follow the format. `argumentKinds` gives the kind of each:
+///
+/// - 1 for an `rt::Object*`
+/// - 0, 2, 3 or 4 for anything that is passed like an integer of at most 64 bits
+/// - 5 for a double
+/// - 6 for a long double
+///
+/// Any other kind stands for no argument. `argumentKinds` is not read if `argumentCount` is 0 or negative.
+///
+/// For generated code. Code written by hand calls `LUMLogAt`, which counts and checks the arguments.
 [[gnu::noinline]] rt::Ref<LUMLogMessage> LUMLog(LUMLogLevel level, const char* file, const char* function,
                                                 std::uint64_t line, const rt::Ref<LUMLogMetadata>& metadata,
                                                 std::int32_t argumentCount,
                                                 const LUMLogArgumentKind* argumentKinds, rt::String format,
                                                 ...);
 
-/// Makes a message and returns it, without logging it; otherwise as above. The list stays where it is.
+/// Makes a message like `LUMLog` and returns it without logging it. Does not advance `arguments`.
 rt::Ref<LUMLogMessage> LUMLogV(LUMLogLevel level, rt::String file, rt::String function, std::uint64_t line,
                                const rt::Ref<LUMLogCallstack>& callstack,
                                const rt::Ref<LUMLogMetadata>& metadata, std::int32_t argumentCount,
                                const LUMLogArgumentKind* argumentKinds, const rt::String& format,
                                std::va_list arguments);
 
-/// A literal format for `Arguments`, and where it is.
+/// A literal format that is checked against `Arguments`, with the source location of the call.
 template <class... Arguments>
 struct LUMLogFormat {
   template <class Literal>
@@ -75,8 +88,8 @@ struct LUMLogFormat {
   std::source_location location;
 };
 
-/// Logs the literal `format` with `arguments` in the place of its directives, and returns the message.
-// Compiled into its caller, so that the caller is first in the call stack.
+/// Logs `arguments`, formatted by the literal `format`, and returns the message. Always inlined, so that the
+/// caller is the first frame of the call stack.
 template <class... Arguments>
 [[gnu::always_inline]] inline rt::Ref<LUMLogMessage> LUMLogAt(
     LUMLogLevel level, const rt::Ref<LUMLogMetadata>& metadata,
@@ -89,7 +102,7 @@ template <class... Arguments>
   return message;
 }
 
-/// The same without metadata.
+/// Same as above, without metadata.
 template <class... Arguments>
 [[gnu::always_inline]] inline rt::Ref<LUMLogMessage> LUMLogAt(
     LUMLogLevel level, const LUMLogFormat<std::type_identity_t<Arguments>...>& format,

@@ -14,7 +14,7 @@
 
 rt::Ref<LUMLogAddressCallstack> LUMLogAddressCallstack::addressCallstackIgnoringFrameCount(
     std::uint64_t count) {
-  // One more, for this function.
+  // One more, for the frame of this function.
   if (count == std::numeric_limits<std::uint64_t>::max()) return nullptr;
   rt::Ref<LUMLogAddressCallstack> stack = initWithAddressesIgnoringFrameCount(count + 1);
   rt::CallStack::keepFrame();
@@ -35,7 +35,7 @@ rt::Ref<LUMLogAddressCallstack> LUMLogAddressCallstack::initWithAddressesIgnorin
     depth = rt::CallStack::capture({grown, capacity});
     if (depth < capacity) break;
   }
-  // The first lies in this function.
+  // The first address is in this function.
   if (depth <= 1 || depth - 1 <= count) return nullptr;
   try {
     return initWithAddresses(addresses.release(), depth, count + 1);

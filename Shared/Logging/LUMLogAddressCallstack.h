@@ -1,7 +1,7 @@
 #pragma once
 
-/// A call stack as the addresses that its calls return to, the innermost first. Cheap to take: nothing is
-/// looked up.
+/// A call stack as the return addresses of its calls, innermost first. Capturing one is cheap, because no
+/// symbol is looked up.
 ///
 ///     rt::Ref<LUMLogAddressCallstack> stack = LUMLogAddressCallstack::addressCallstackIgnoringFrameCount(0);
 ///     stack->enumerateAddressesWithBlock([](std::uint64_t address, std::uint64_t index, bool* stop) {
@@ -9,12 +9,12 @@
 ///       *stop = index == 9;
 ///     });
 ///
-/// Frames may be left out at the inner end, so that what logs is not in what it logs. Nobody sees them, but
-/// they are in memory until the object is destroyed.
+/// The innermost frames can be left out, so that the logging functions themselves do not appear. Their
+/// addresses are hidden, but stay in memory until the object is destroyed.
 ///
-/// Immutable: any thread may use it.
+/// Threads: thread-safe, because it is immutable.
 ///
-/// Not for: people, who read names (LUMLogSymbolCallstack, or any debugger, with these addresses).
+/// Not for: readers who need names. See LUMLogSymbolCallstack, or give these addresses to a debugger.
 
 #include <cstdint>
 #include <cstdlib>
@@ -33,40 +33,44 @@
 class RT_VISIBLE LUMLogAddressCallstack
     : public rt::Implements<LUMLogAddressCallstack, rt::Object, LUMLogCallstack> {
  public:
-  /// Called with an address, its place from 0, and where to write true for this call to be the last.
+  /// Receives an address and its index, which counts from 0. Set `*stop` to true to end the enumeration.
   using Visitor = rt::Block<void(std::uint64_t address, std::uint64_t index, bool* stop)>;
 
-  /// Where the calling thread is, without its `count` innermost calls, of which the caller of this function
-  /// is the first. Null where nothing would be left, and without memory.
+  /// Captures the calling thread's stack without its `count` innermost calls, counted from the caller of this
+  /// function. Returns null if no call would be left, or if memory runs out.
   [[gnu::noinline]] static rt::Ref<LUMLogAddressCallstack> addressCallstackIgnoringFrameCount(
       std::uint64_t count);
 
-  /// The same.
+  /// Same as `addressCallstackIgnoringFrameCount`.
   [[gnu::noinline]] static rt::Ref<LUMLogAddressCallstack> initWithAddressesIgnoringFrameCount(
       std::uint64_t count);
 
-  /// With the `addressCount` addresses at `addresses`, which is from `malloc` (or null, if there are none)
-  /// and is the object's from now on. The first `ignoreFrameCount` are left out: no more than there are,
-  /// which is not checked. Throws std::bad_alloc, and has freed the addresses then.
+  /// Makes a call stack of the `addressCount` addresses at `addresses`, without the first `ignoreFrameCount`.
+  /// Precondition, not checked: `ignoreFrameCount` is at most `addressCount`.
+  ///
+  /// Ownership: takes `addresses`, which comes from `malloc`, or is null if there are no addresses.
+  /// Errors: throws std::bad_alloc after freeing `addresses`.
   static rt::Ref<LUMLogAddressCallstack> initWithAddresses(std::uint64_t* addresses,
                                                            std::uint64_t addressCount,
                                                            std::uint64_t ignoreFrameCount);
 
-  /// With the values of the numbers in `addresses`; what is no number counts as 0. Null counts as empty.
-  /// Throws std::bad_alloc.
+  /// Makes a call stack of the numbers in `addresses`. An element that is not a number counts as 0. A null
+  /// array counts as empty. Throws std::bad_alloc.
   static rt::Ref<LUMLogAddressCallstack> initWithAddresses(const rt::Ref<rt::Array>& addresses);
 
-  /// How many addresses are kept.
+  /// Returns the number of addresses that are not left out.
   std::uint64_t frameCount() const noexcept { return filteredAddressCount_; }
 
-  /// Calls `visitor`, unless it is null, with each kept address in turn. Throws what it throws.
+  /// Calls `visitor` with each address that is not left out, in order. Does nothing if `visitor` is null.
+  /// Throws what `visitor` throws.
   void enumerateAddressesWithBlock(const Visitor& visitor) const;
 
-  /// Whether `other` is such a call stack with the same kept addresses.
+  /// Returns whether `other` is a LUMLogAddressCallstack with the same addresses. Those left out do not
+  /// count.
   bool isEqual(const rt::Object* other) const override;
   std::uint64_t hash() const override;
 
-  /// "<LUMLogAddressCallstack 0x...> { 0x..., 0x... }".
+  /// Returns "<LUMLogAddressCallstack 0x...> { 0x..., 0x... }".
   rt::String description() const override;
 
  protected:

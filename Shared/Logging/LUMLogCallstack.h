@@ -1,7 +1,7 @@
 #pragma once
 
-/// A call stack that goes with a log message. It has no operations of its own: who shows messages prints its
-/// `description`, or asks for the class that it knows.
+/// A call stack attached to a log message. This protocol has no operations. A logger prints its
+/// `description`, or casts it to a class that the logger knows.
 ///
 ///     if (const auto addresses = rt::cast<LUMLogAddressCallstack>(message->callstack())) {
 ///       send(addresses->frameCount());

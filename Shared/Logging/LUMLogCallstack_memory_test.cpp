@@ -1,4 +1,5 @@
-// Call stacks where memory runs out: null, and nothing thrown. In this program allocations fail on demand.
+// When memory runs out, capturing a call stack returns null and throws nothing. Allocations here fail on
+// demand.
 
 #include <gtest/gtest.h>
 
@@ -12,7 +13,7 @@
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
 #include "tests/support/Sanitizers.h"
 
-// Whether malloc and its relatives fail too, where the C library lets a program bring its own.
+// Whether malloc and its relatives fail too, if the C library lets a program replace them.
 #if defined(__GLIBC__) && !RT_TEST_ADDRESS_SANITIZER && !RT_TEST_THREAD_SANITIZER
 #define FAILS_MALLOC 1
 #else
@@ -21,9 +22,9 @@
 
 namespace {
 
-// How many allocations more the calling thread gets; less than none for any number.
+// How many more allocations the calling thread gets. A negative number allows any number.
 constinit thread_local int allowed = -1;
-// How many it was refused.
+// How many allocations the thread was refused.
 constinit thread_local int refused = 0;
 
 [[maybe_unused]] bool isRefused() noexcept {
@@ -67,9 +68,9 @@ void* realloc(void* ptr, std::size_t size) {
 }  // extern "C"
 // NOLINTEND(bugprone-reserved-identifier,cert-dcl37-c,cert-dcl51-cpp,readability-identifier-naming,readability-inconsistent-declaration-parameter-name)
 
-#elif !RT_TEST_THREAD_SANITIZER  // Which brings its own operator new.
+#elif !RT_TEST_THREAD_SANITIZER  // It brings its own operator new.
 
-// Not inlined, or g++ sees `free` where it looks for a `delete`.
+// Not inlined, because g++ would warn of `free` in place of `delete`.
 [[gnu::noinline]] void* operator new(std::size_t size) {
   if (isRefused()) throw std::bad_alloc();
   if (void* memory = std::malloc(size)) return memory;
@@ -86,7 +87,7 @@ void* realloc(void* ptr, std::size_t size) {
 
 namespace {
 
-// Takes stacks with one allocation more each time, until none is refused; returns how often there was no
+// Captures stacks with one more allocation each time, until none is refused. Returns how often there was no
 // stack.
 template <class Take>
 int failuresOf(Take take) {
@@ -111,7 +112,7 @@ int failuresOf(Take take) {
   return -1;
 }
 
-// The same of a stack of addresses that is taken `depth` calls further in.
+// Does the same for a stack of addresses that is captured `depth` calls further in.
 // NOLINTNEXTLINE(misc-no-recursion)
 [[gnu::noinline]] int failuresAtDepth(int depth) {
   const int failures =
@@ -128,14 +129,15 @@ class LUMLogCallstackMemoryTest : public testing::Test {
   }
 };
 
-// Without the object, or any of the buffers, which begin with room for 128 addresses and double.
-TEST_F(LUMLogCallstackMemoryTest, IsMissedAsAStackOfAddressesIs) {
+// One failure is that of the object. The others are those of the buffer, which holds 128 addresses at first
+// and doubles.
+TEST_F(LUMLogCallstackMemoryTest, AddressCallstackIsNullWithoutMemory) {
   EXPECT_EQ(failuresAtDepth(0), FAILS_MALLOC ? 2 : 1);
   EXPECT_EQ(failuresAtDepth(150), FAILS_MALLOC ? 3 : 1);
   EXPECT_EQ(failuresAtDepth(300), FAILS_MALLOC ? 4 : 1);
 }
 
-TEST_F(LUMLogCallstackMemoryTest, IsMissedAsAStackOfNamesIs) {
+TEST_F(LUMLogCallstackMemoryTest, SymbolCallstackIsNullWithoutMemory) {
   EXPECT_GE(failuresOf([] { return LUMLogSymbolCallstack::symbolCallstackIgnoringFrameCount(0); }), 3);
 }
 

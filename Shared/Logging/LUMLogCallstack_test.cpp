@@ -1,4 +1,4 @@
-// Both classes of call stacks.
+// Tests both classes of call stacks.
 
 #include "Shared/Logging/LUMLogCallstack.h"
 
@@ -55,7 +55,7 @@ std::vector<std::string> linesOf(const LUMLogSymbolCallstack& stack) {
   return lines;
 }
 
-// Functions with frames of their own.
+// These functions have frames of their own.
 
 [[gnu::noinline]] rt::Ref<LUMLogAddressCallstack> innerTakesAddresses(std::uint64_t count) {
   auto stack = LUMLogAddressCallstack::addressCallstackIgnoringFrameCount(count);
@@ -87,7 +87,7 @@ std::vector<std::string> linesOf(const LUMLogSymbolCallstack& stack) {
   return stack;
 }
 
-/// Calls `function` with `depth` frames of its own below.
+// Calls `function` below `depth` frames of this function.
 [[gnu::noinline]] void descend(int depth, const std::function<void()>& function) {
   if (depth > 0) {
     descend(depth - 1, function);
@@ -97,7 +97,7 @@ std::vector<std::string> linesOf(const LUMLogSymbolCallstack& stack) {
   rt::CallStack::keepFrame();
 }
 
-TEST(LUMLogAddressCallstack, LeavesOutTheFramesAtItsInnerEnd) {
+TEST(LUMLogAddressCallstack, LeavesOutTheInnermostFrames) {
   const std::vector<std::uint64_t> all = kept(*outerTakesAddresses(0));
   ASSERT_GT(all.size(), 2U);
   EXPECT_THAT(symbolOf(all[0]), HasSubstr("innerTakesAddresses"));
@@ -108,12 +108,12 @@ TEST(LUMLogAddressCallstack, LeavesOutTheFramesAtItsInnerEnd) {
   EXPECT_THAT(symbolOf(kept(*fewer).front()), HasSubstr("outerTakesAddresses"));
 }
 
-TEST(LUMLogAddressCallstack, HasItsCallerFirstWhereItIsInitialized) {
+TEST(LUMLogAddressCallstack, BeginsWithTheCallerOfTheInitializer) {
   const std::vector<std::uint64_t> all = kept(*callerInitializesWithAddresses(0));
   EXPECT_THAT(symbolOf(all[0]), HasSubstr("callerInitializesWithAddresses"));
 }
 
-TEST(LUMLogAddressCallstack, IsNullWhereNothingIsLeft) {
+TEST(LUMLogAddressCallstack, IsNullIfNoFrameIsLeft) {
   const std::uint64_t depth = outerTakesAddresses(0)->frameCount();
   EXPECT_EQ(outerTakesAddresses(depth - 1)->frameCount(), 1U);
   EXPECT_FALSE(outerTakesAddresses(depth));
@@ -122,17 +122,17 @@ TEST(LUMLogAddressCallstack, IsNullWhereNothingIsLeft) {
   EXPECT_FALSE(callerInitializesWithAddresses(kMany));
 }
 
-TEST(LUMLogAddressCallstack, TakesStacksOfAnyDepth) {
+TEST(LUMLogAddressCallstack, CapturesStacksOfAnyDepth) {
   std::uint64_t depth = 0;
   descend(0, [&] { depth = innerTakesAddresses(0)->frameCount(); });
-  // One below, at and above each size of the buffer that it is taken into: 128, 256, 512.
+  // One below, at and above each size of the capture's buffer: 128, 256, 512.
   for (const int size : {127, 128, 129, 255, 256, 257, 511, 512, 513, 3000}) {
     const int added = size - static_cast<int>(depth);
     descend(added, [&] { EXPECT_EQ(innerTakesAddresses(0)->frameCount(), std::uint64_t(size)); });
   }
 }
 
-TEST(LUMLogAddressCallstack, IsMadeOfAddresses) {
+TEST(LUMLogAddressCallstack, HoldsTheGivenAddresses) {
   EXPECT_THAT(kept(*addresses({1, 2, 3})), ElementsAre(1, 2, 3));
   EXPECT_THAT(kept(*addresses({1, 2, 3}, 1)), ElementsAre(2, 3));
   EXPECT_EQ(addresses({1, 2, 3}, 1)->frameCount(), 2U);
@@ -140,7 +140,7 @@ TEST(LUMLogAddressCallstack, IsMadeOfAddresses) {
   EXPECT_EQ(LUMLogAddressCallstack::initWithAddresses(nullptr, 0, 0)->frameCount(), 0U);
 }
 
-TEST(LUMLogAddressCallstack, IsMadeOfNumbers) {
+TEST(LUMLogAddressCallstack, HoldsTheValuesOfNumbers) {
   const auto stack = LUMLogAddressCallstack::initWithAddresses(
       rt::Array::of(rt::Number::of(7), rt::Number::of(-1), "no number"_s, rt::Number::of(kMany - 1)));
   EXPECT_THAT(kept(*stack), ElementsAre(7, kMany, 0, kMany - 1));
@@ -148,7 +148,7 @@ TEST(LUMLogAddressCallstack, IsMadeOfNumbers) {
   EXPECT_EQ(LUMLogAddressCallstack::initWithAddresses(rt::Ref<rt::Array>())->frameCount(), 0U);
 }
 
-TEST(LUMLogAddressCallstack, IsEnumeratedUntilItIsStopped) {
+TEST(LUMLogAddressCallstack, EnumeratesAddressesUntilStopped) {
   std::vector<std::pair<std::uint64_t, std::uint64_t>> visited;
   const auto visit = [&](std::uint64_t last) {
     visited.clear();
@@ -181,7 +181,7 @@ TEST(LUMLogAddressCallstack, DescribesItself) {
             rt::format("<LUMLogAddressCallstack %p> {  }", static_cast<const void*>(none.get())));
 }
 
-TEST(LUMLogAddressCallstack, IsEqualByWhatIsKept) {
+TEST(LUMLogAddressCallstack, ComparesAddressesThatAreNotLeftOut) {
   const auto stack = addresses({1, 2, 3}, 1);
   EXPECT_TRUE(stack->isEqual(stack.get()));
   EXPECT_TRUE(rt::isEqual(stack, addresses({2, 3})));
@@ -197,12 +197,12 @@ TEST(LUMLogAddressCallstack, IsEqualByWhatIsKept) {
   EXPECT_EQ(stack->copy(), stack);
 }
 
-TEST(LUMLogSymbolCallstack, LeavesOutTheFramesAtItsInnerEnd) {
+TEST(LUMLogSymbolCallstack, LeavesOutTheInnermostFrames) {
   const std::vector<std::string> all = linesOf(*outerTakesSymbols(0));
   ASSERT_GT(all.size(), 2U);
   EXPECT_THAT(all[0], HasSubstr("innerTakesSymbols"));
   EXPECT_THAT(all[1], HasSubstr("outerTakesSymbols"));
-  // The lines are those of the whole stack, the first of which is left out.
+  // Lines keep their numbers in the whole stack, and the first line is left out.
   EXPECT_THAT(all[0], testing::StartsWith("1 "));
 
   const std::vector<std::string> fewer = linesOf(*outerTakesSymbols(1));
@@ -211,17 +211,17 @@ TEST(LUMLogSymbolCallstack, LeavesOutTheFramesAtItsInnerEnd) {
   EXPECT_THAT(fewer[0], testing::StartsWith("2 "));
 }
 
-TEST(LUMLogSymbolCallstack, IsNullWhereThereAreTooFewFrames) {
+TEST(LUMLogSymbolCallstack, IsNullIfThereAreTooFewFrames) {
   const std::uint64_t depth = outerTakesSymbols(0)->symbols()->count();
   EXPECT_EQ(outerTakesSymbols(depth - 1)->symbols()->count(), 1U);
-  // As many as there are, with the one that takes it: nothing is left, which is no failure.
+  // The stack has exactly this many frames, counting the capturing function. An empty result is no failure.
   ASSERT_TRUE(outerTakesSymbols(depth));
   EXPECT_TRUE(outerTakesSymbols(depth)->symbols()->isEmpty());
   EXPECT_FALSE(outerTakesSymbols(depth + 1));
   EXPECT_FALSE(outerTakesSymbols(kMany));
 }
 
-TEST(LUMLogSymbolCallstack, TakesStacksOfAnyDepth) {
+TEST(LUMLogSymbolCallstack, CapturesStacksOfAnyDepth) {
   std::size_t depth = 0;
   descend(0, [&] { depth = innerTakesSymbols(0)->symbols()->count(); });
   for (const int size : {126, 127, 128, 129, 300}) {
@@ -230,7 +230,7 @@ TEST(LUMLogSymbolCallstack, TakesStacksOfAnyDepth) {
   }
 }
 
-TEST(LUMLogSymbolCallstack, IsItsSymbols) {
+TEST(LUMLogSymbolCallstack, BehavesAsItsSymbolsDo) {
   const rt::Ref<rt::Array> symbols = rt::Array::of("one"_s, "two"_s);
   const auto stack = LUMLogSymbolCallstack::initWithSymbols(symbols);
   EXPECT_EQ(stack->symbols(), symbols);

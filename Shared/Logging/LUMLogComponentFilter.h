@@ -1,13 +1,13 @@
 #pragma once
 
-/// Lets the messages of one component pass: those whose metadata names it.
+/// Lets a message pass if its metadata names a given component.
 ///
 ///     multiplexer->addLogFilter(LUMLogComponentFilter::initWithComponent("Importer"_s));
 ///     const auto importer = LUMLogMetadata::metadataWithComponent("Importer"_s);
 ///     LUMLogAt(LUMLogLevelInfo, importer, "started"_s);      // passes
 ///     LUMLogAt(LUMLogLevelInfo, "started"_s);                // does not
 ///
-/// Not for: categories or other metadata, which take a filter of one's own.
+/// Not for: categories or other metadata. Write a filter for them.
 
 #include <utility>
 
@@ -21,8 +21,8 @@
 class RT_VISIBLE LUMLogComponentFilter
     : public rt::Implements<LUMLogComponentFilter, rt::Object, LUMLogFilter> {
  public:
-  /// Lets nothing pass if `component` is null: a message without metadata or without a component has none
-  /// that could be equal.
+  /// Makes a filter for `component`. If `component` is null, no message passes, not even one without a
+  /// component.
   static rt::Ref<LUMLogComponentFilter> initWithComponent(rt::String component) {
     return rt::Ref<LUMLogComponentFilter>::adopt(new LUMLogComponentFilter(std::move(component)));
   }

@@ -4,7 +4,7 @@
 ///
 ///     multiplexer->addLogFilter(LUMLogDropAllFilter::init());           // silence
 ///
-/// Not for: a logger that is to hear nothing any more, which is removed.
+/// Not for: silencing one logger for good. Remove that logger instead.
 
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Class.h"

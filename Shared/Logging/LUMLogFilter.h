@@ -1,23 +1,23 @@
 #pragma once
 
-/// What decides which messages go somewhere: to all loggers, where it is one of the multiplexer's, or to the
-/// logger that has it.
+/// Decides which messages pass. A filter of the multiplexer decides for all loggers, a logger's filter for
+/// that logger.
 ///
 ///     class OfficeHours : public rt::Implements<OfficeHours, rt::Object, LUMLogFilter> {
 ///      public:
 ///       bool allowLogMessage(const LUMLogMessage& message) const override;
 ///     };
 ///
-/// Called on any thread, on several at once, and for one message possibly more than once.
+/// Threads: called on any thread, also on several at once. May be called more than once for one message.
 ///
-/// Not for: changing messages, which nobody can.
+/// Not for: changing messages, which are immutable.
 
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Class.h"
 #include "Shared/Logging/LUMLogMessage.h"
 
 struct RT_VISIBLE LUMLogFilter : rt::Protocol<LUMLogFilter> {
-  /// Whether `message` may pass.
+  /// Returns whether `message` may pass.
   virtual bool allowLogMessage(const LUMLogMessage& message) const = 0;
 
  protected:

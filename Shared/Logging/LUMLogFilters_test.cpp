@@ -1,4 +1,4 @@
-// The stock filters but the one that asks the environment, which has a test of its own.
+// Tests all filters except the one that reads the environment, which has its own test.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -31,7 +31,7 @@ constexpr std::uint64_t kHighest = std::numeric_limits<std::uint64_t>::max();
 
 const std::vector<LUMLogLevel> kLevels = {0, 1, 2, 3, 4, 5, kHighest};
 
-// Of the levels above, those that `filter` lets pass.
+// Returns which of the levels above `filter` lets pass.
 std::vector<LUMLogLevel> levelsThrough(const LUMLogFilter& filter) {
   std::vector<LUMLogLevel> passed;
   for (const LUMLogLevel level : kLevels) {
@@ -48,7 +48,7 @@ TEST(LUMLogDropAllFilter, LetsNoMessagePass) {
   EXPECT_THAT(levelsThrough(*LUMLogDropAllFilter::init()), IsEmpty());
 }
 
-TEST(LUMLogMinimumLevelFilter, LetsTheLevelPassAndThoseAboveIt) {
+TEST(LUMLogMinimumLevelFilter, LetsItsLevelAndHigherOnesPass) {
   EXPECT_EQ(levelsThrough(*LUMLogMinimumLevelFilter::initWithMinimumLevel(0)), kLevels);
   EXPECT_THAT(levelsThrough(*LUMLogMinimumLevelFilter::initWithMinimumLevel(LUMLogLevelDebug)),
               ElementsAre(1, 2, 3, 4, 5, kHighest));
@@ -56,8 +56,8 @@ TEST(LUMLogMinimumLevelFilter, LetsTheLevelPassAndThoseAboveIt) {
               ElementsAre(4, 5, kHighest));
 }
 
-// All 64 bits count, and none of them is a sign.
-TEST(LUMLogMinimumLevelFilter, ComparesWithoutSign) {
+// All 64 bits count, and none is a sign.
+TEST(LUMLogMinimumLevelFilter, ComparesLevelsAsUnsigned) {
   EXPECT_THAT(levelsThrough(*LUMLogMinimumLevelFilter::initWithMinimumLevel(kHighest)),
               ElementsAre(kHighest));
   EXPECT_THAT(levelsThrough(*LUMLogMinimumLevelFilter::initWithMinimumLevel(std::uint64_t{1} << 32U)),
@@ -76,7 +76,7 @@ TEST(LUMLogComponentFilter, LetsTheMessagesOfItsComponentPass) {
       LUMLogMetadata::metadataWithComponent("Importer"_s)->metadataByAddingCategory("network"_s)));
 }
 
-TEST(LUMLogComponentFilter, RefusesEveryOther) {
+TEST(LUMLogComponentFilter, RefusesOtherComponents) {
   EXPECT_FALSE(importerPasses(LUMLogMetadata::metadataWithComponent("importer"_s)));
   EXPECT_FALSE(importerPasses(LUMLogMetadata::metadataWithComponent("Importer.Network"_s)));
   EXPECT_FALSE(importerPasses(LUMLogMetadata::metadataWithComponent("Import"_s)));
@@ -84,14 +84,14 @@ TEST(LUMLogComponentFilter, RefusesEveryOther) {
   EXPECT_FALSE(importerPasses(LUMLogMetadata::init()->metadataByAddingCategory("Importer"_s)));
 }
 
-TEST(LUMLogComponentFilter, RefusesWhatHasNoComponent) {
+TEST(LUMLogComponentFilter, RefusesMessagesWithoutAComponent) {
   EXPECT_FALSE(importerPasses(nullptr));
   EXPECT_FALSE(importerPasses(LUMLogMetadata::init()));
   EXPECT_FALSE(importerPasses(
       LUMLogMetadata::init()->messageWithKey(LUMLogMetadata::kComponentKey, rt::Number::of(1))));
 }
 
-TEST(LUMLogComponentFilter, TellsTheEmptyComponentFromNone) {
+TEST(LUMLogComponentFilter, DistinguishesAnEmptyComponentFromNone) {
   const Ref<LUMLogComponentFilter> filter = LUMLogComponentFilter::initWithComponent(""_s);
   EXPECT_TRUE(filter->allowLogMessage(
       *messageWith(LUMLogLevelInfo, "x"_s, LUMLogMetadata::metadataWithComponent(""_s))));
@@ -99,7 +99,7 @@ TEST(LUMLogComponentFilter, TellsTheEmptyComponentFromNone) {
   EXPECT_FALSE(filter->allowLogMessage(*messageWith(LUMLogLevelInfo, "x"_s, LUMLogMetadata::init())));
 }
 
-TEST(LUMLogComponentFilter, OfNoComponentRefusesAll) {
+TEST(LUMLogComponentFilter, RefusesAllIfItsComponentIsNull) {
   const Ref<LUMLogComponentFilter> filter = LUMLogComponentFilter::initWithComponent(nullptr);
   EXPECT_FALSE(filter->allowLogMessage(*messageWith(LUMLogLevelInfo)));
   EXPECT_FALSE(filter->allowLogMessage(*messageWith(LUMLogLevelInfo, "x"_s, LUMLogMetadata::init())));
@@ -107,7 +107,7 @@ TEST(LUMLogComponentFilter, OfNoComponentRefusesAll) {
       *messageWith(LUMLogLevelInfo, "x"_s, LUMLogMetadata::metadataWithComponent(""_s))));
 }
 
-// What filters answer to one message, and which of them were asked.
+// Records which filters were asked about one message.
 class LogicalFilterTest : public testing::Test {
  protected:
   Ref<LUMLogFilter> answering(const char* name, bool answer) {
@@ -134,7 +134,7 @@ class LogicalFilterTest : public testing::Test {
 using LUMLogLogicalAndFilterTest = LogicalFilterTest;
 using LUMLogLogicalOrFilterTest = LogicalFilterTest;
 
-TEST_F(LUMLogLogicalAndFilterTest, LetsPassWhatAllLetPassAndAsksInOrder) {
+TEST_F(LUMLogLogicalAndFilterTest, AsksAllFiltersInOrderAndLetsPassWhatAllLetPass) {
   EXPECT_TRUE(allOf(Array::of(yes("a"), yes("b"), yes("c"))));
   EXPECT_THAT(trace_.events(), ElementsAre("a", "b", "c"));
 }
@@ -144,51 +144,51 @@ TEST_F(LUMLogLogicalAndFilterTest, StopsAtTheFirstRefusal) {
   EXPECT_THAT(trace_.events(), ElementsAre("a", "b"));
 }
 
-// Unlike the "and" of logic, on purpose.
-TEST_F(LUMLogLogicalAndFilterTest, OfNoFiltersRefuses) {
+// Deliberately unlike the "and" of logic.
+TEST_F(LUMLogLogicalAndFilterTest, RefusesAllWithoutFilters) {
   EXPECT_FALSE(allOf(Array::of()));
   EXPECT_FALSE(allOf(nullptr));
 }
 
-TEST_F(LUMLogLogicalAndFilterTest, RefusesWithWhatIsNoFilter) {
+TEST_F(LUMLogLogicalAndFilterTest, RefusesIfAnElementIsNotAFilter) {
   EXPECT_FALSE(allOf(Array::of(yes("a"), "no filter"_s)));
 }
 
-TEST_F(LUMLogLogicalAndFilterTest, PassesOnWhatAFilterThrows) {
+TEST_F(LUMLogLogicalAndFilterTest, ThrowsWhatAFilterThrows) {
   EXPECT_THROW(allOf(Array::of(yes("a"), rt::make<TestFilter>([](const LUMLogMessage&) -> bool {
                                  throw std::runtime_error("from a filter");
                                }))),
                std::runtime_error);
 }
 
-TEST_F(LUMLogLogicalOrFilterTest, StopsAtTheFirstThatLetsPass) {
+TEST_F(LUMLogLogicalOrFilterTest, StopsAtTheFirstFilterThatLetsPass) {
   EXPECT_TRUE(anyOf(Array::of(no("a"), yes("b"), no("c"), yes("d"))));
   EXPECT_THAT(trace_.events(), ElementsAre("a", "b"));
 }
 
-TEST_F(LUMLogLogicalOrFilterTest, RefusesWhatAllRefuseAndAsksInOrder) {
+TEST_F(LUMLogLogicalOrFilterTest, AsksAllFiltersInOrderAndRefusesWhatAllRefuse) {
   EXPECT_FALSE(anyOf(Array::of(no("a"), no("b"), no("c"))));
   EXPECT_THAT(trace_.events(), ElementsAre("a", "b", "c"));
 }
 
-TEST_F(LUMLogLogicalOrFilterTest, OfNoFiltersRefuses) {
+TEST_F(LUMLogLogicalOrFilterTest, RefusesAllWithoutFilters) {
   EXPECT_FALSE(anyOf(Array::of()));
   EXPECT_FALSE(anyOf(nullptr));
 }
 
-TEST_F(LUMLogLogicalOrFilterTest, PassesOverWhatIsNoFilter) {
+TEST_F(LUMLogLogicalOrFilterTest, SkipsElementsThatAreNotFilters) {
   EXPECT_FALSE(anyOf(Array::of("no filter"_s)));
   EXPECT_TRUE(anyOf(Array::of("no filter"_s, yes("a"))));
 }
 
-TEST_F(LUMLogLogicalOrFilterTest, PassesOnWhatAFilterThrows) {
+TEST_F(LUMLogLogicalOrFilterTest, ThrowsWhatAFilterThrows) {
   EXPECT_THROW(anyOf(Array::of(no("a"), rt::make<TestFilter>([](const LUMLogMessage&) -> bool {
                                  throw std::runtime_error("from a filter");
                                }))),
                std::runtime_error);
 }
 
-TEST_F(LogicalFilterTest, NestInEachOther) {
+TEST_F(LogicalFilterTest, MayBeNested) {
   const auto either = LUMLogLogicalOrFilter::initWithFilters(Array::of(no("a"), yes("b")));
   EXPECT_TRUE(allOf(Array::of(either, yes("c"))));
   EXPECT_THAT(trace_.events(), ElementsAre("a", "b", "c"));

@@ -1,14 +1,14 @@
 #pragma once
 
-/// What makes a line of a message, for a logger that writes lines.
+/// Turns a message into text, for a logger that writes text.
 ///
 ///     rt::String Terse::formattedLogMessage(const LUMLogMessage& message) const {
 ///       return message.formattedString();
 ///     }
 ///
-/// Called on any thread, on several at once.
+/// Threads: called on any thread, also on several at once.
 ///
-/// Not for: leaving messages out, which takes a LUMLogFilter.
+/// Not for: leaving messages out; see LUMLogFilter.
 
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Class.h"
@@ -16,7 +16,7 @@
 #include "Shared/Logging/LUMLogMessage.h"
 
 struct RT_VISIBLE LUMLogFormatter : rt::Protocol<LUMLogFormatter> {
-  /// The text for `message`; may be null.
+  /// Returns the text for `message`, or null.
   virtual rt::String formattedLogMessage(const LUMLogMessage& message) const = 0;
 
  protected:

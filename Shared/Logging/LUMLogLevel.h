@@ -1,22 +1,23 @@
 #pragma once
 
-/// How bad an event is. A higher level is worse, and whoever asks for a least level admits all levels from
-/// it on. Other values than these travel like them; the system's log takes none of those.
+/// The severity of an event. A higher level is more severe, and a minimum level admits itself and all higher
+/// levels. A level other than these four is passed on like any other, but the system logger does not write
+/// it.
 ///
 ///     LUMLogAt(LUMLogLevelError, "no route to %@", host);         // Shared/Logging/LUMLog.h
 ///
-/// Not for: who may read an event (Shared/Logging/LUMSafeParameter.h).
+/// Not for: privacy, that is, who may read an event (Shared/Logging/LUMSafeParameter.h).
 
 #include <cstdint>
 
 using LUMLogLevel = std::uint64_t;
 
-/// For whoever looks for a mistake.
+/// Details that help to find a mistake.
 inline constexpr LUMLogLevel LUMLogLevelDebug = 1;
 /// What a program does.
 inline constexpr LUMLogLevel LUMLogLevelInfo = 2;
-/// What a program could not do. At this level and the next a message has a call stack.
+/// What a program failed to do. Messages of this level and of the next carry a call stack.
 inline constexpr LUMLogLevel LUMLogLevelError = 3;
-/// What must not happen in a correct program. The error handler is told
+/// What must not happen in a correct program. The error handler reports it
 /// (Libraries/Util/ErrorHandler/PECErrorHandler.h).
 inline constexpr LUMLogLevel LUMLogLevelFault = 4;

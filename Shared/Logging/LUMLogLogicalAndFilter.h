@@ -1,15 +1,15 @@
 #pragma once
 
-/// Lets a message pass that all of several filters let pass.
+/// Lets a message pass if all of several filters let it pass.
 ///
 ///     filter = LUMLogLogicalAndFilter::initWithFilters(rt::Array::of(
 ///         LUMLogComponentFilter::initWithComponent("Importer"_s),
 ///         LUMLogMinimumLevelFilter::initWithMinimumLevel(LUMLogLevelError)));
 ///
-/// Without any filter it lets nothing pass, unlike the "and" of logic: a list that came out empty by mistake
-/// is rather silent than flooding.
+/// Without filters it lets nothing pass, although a logical "and" of nothing is true. A list that is empty by
+/// mistake then silences a logger instead of flooding it.
 ///
-/// Not for: one of them; see LUMLogLogicalOrFilter.
+/// Not for: messages that only one of the filters must let pass; see LUMLogLogicalOrFilter.
 
 #include <utility>
 
@@ -23,8 +23,8 @@
 class RT_VISIBLE LUMLogLogicalAndFilter
     : public rt::Implements<LUMLogLogicalAndFilter, rt::Object, LUMLogFilter> {
  public:
-  /// Of `filters`, which are asked in order until one refuses the message; what is no LUMLogFilter refuses
-  /// all. Where there are none, or `filters` is null, nothing passes.
+  /// Makes a filter of `filters`, which are asked in order until one refuses the message. An element that is
+  /// not a LUMLogFilter refuses every message. If `filters` is null or empty, nothing passes.
   static rt::Ref<LUMLogLogicalAndFilter> initWithFilters(rt::Ref<rt::Array> filters) {
     return rt::Ref<LUMLogLogicalAndFilter>::adopt(new LUMLogLogicalAndFilter(std::move(filters)));
   }

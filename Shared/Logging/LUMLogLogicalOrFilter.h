@@ -1,12 +1,12 @@
 #pragma once
 
-/// Lets a message pass that one of several filters lets pass.
+/// Lets a message pass if at least one of several filters lets it pass.
 ///
 ///     filter = LUMLogLogicalOrFilter::initWithFilters(rt::Array::of(
 ///         LUMLogComponentFilter::initWithComponent("Importer"_s),
 ///         LUMLogMinimumLevelFilter::initWithMinimumLevel(LUMLogLevelError)));
 ///
-/// Not for: all of them; see LUMLogLogicalAndFilter.
+/// Not for: messages that all of the filters must let pass; see LUMLogLogicalAndFilter.
 
 #include <utility>
 
@@ -20,8 +20,8 @@
 class RT_VISIBLE LUMLogLogicalOrFilter
     : public rt::Implements<LUMLogLogicalOrFilter, rt::Object, LUMLogFilter> {
  public:
-  /// Of `filters`, which are asked in order until one lets the message pass; what is no LUMLogFilter lets
-  /// none pass. Where there are none, or `filters` is null, nothing passes.
+  /// Makes a filter of `filters`, which are asked in order until one lets the message pass. An element that
+  /// is not a LUMLogFilter lets no message pass. If `filters` is null or empty, nothing passes.
   static rt::Ref<LUMLogLogicalOrFilter> initWithFilters(rt::Ref<rt::Array> filters) {
     return rt::Ref<LUMLogLogicalOrFilter>::adopt(new LUMLogLogicalOrFilter(std::move(filters)));
   }

@@ -1,16 +1,16 @@
 #pragma once
 
-/// One event: what was logged, where, on which thread, with which arguments. `LUMLog` makes messages
-/// (Shared/Logging/LUMLog.h); loggers and filters read them.
+/// One logged event: its text, its source location, its thread and its arguments. `LUMLog` makes messages
+/// (Shared/Logging/LUMLog.h). Loggers and filters read them.
 ///
 ///     void FileLogger::logWithMessage(const rt::Ref<LUMLogMessage>& message) {
 ///       file_->writeLine(rt::format("%@ (%@:%lu)", message->formattedString(), message->file(),
 ///                                   message->line()));
 ///     }
 ///
-/// Immutable: any thread may use it.
+/// Threads: thread-safe, because it is immutable.
 ///
-/// Not for: making an event known, which takes LUMLog or LUMLogMultiplexer.
+/// Not for: logging an event. Call LUMLog, or hand a message to LUMLogMultiplexer.
 
 #include <cstdint>
 
@@ -26,9 +26,11 @@
 
 class RT_VISIBLE LUMLogMessage : public rt::Implements<LUMLogMessage, rt::Object> {
  public:
-  /// A message with these fields. Where `threadName` or `dispatchQueueLabel` is null, the calling thread's
-  /// name or the label of the queue that it runs for stands there instead, "" without one. All others may be
-  /// null. Throws std::bad_alloc, and what copying the call stack throws.
+  /// Makes a message of these fields, each of which may be null. A null `threadName` becomes the calling
+  /// thread's name. A null `dispatchQueueLabel` becomes the label of the queue whose task the calling thread
+  /// runs. Without a name or a queue they become "".
+  ///
+  /// Errors: throws std::bad_alloc, and what copying the call stack throws.
   static rt::Ref<LUMLogMessage> initWithLevel(LUMLogLevel level, rt::String format,
                                               rt::String formattedString, rt::String file,
                                               rt::String function, std::uint64_t line, rt::String threadName,
@@ -39,31 +41,31 @@ class RT_VISIBLE LUMLogMessage : public rt::Implements<LUMLogMessage, rt::Object
 
   LUMLogLevel level() const noexcept { return level_; }
 
-  /// The text before anything was substituted, and after; null if there was none.
+  /// Return the text before and after the arguments were substituted, or null if it was not given.
   const rt::String& format() const noexcept { return format_; }
   const rt::String& formattedString() const noexcept { return formattedString_; }
 
-  /// Where it was logged: the source file's path, the function's whole signature, and the line; null and 0
-  /// where that is not known.
+  /// Return the source location: the file's path, the function's full signature and the line. An unknown path
+  /// or function is null, and an unknown line is 0.
   const rt::String& file() const noexcept { return file_; }
   const rt::String& function() const noexcept { return function_; }
   std::uint64_t line() const noexcept { return line_; }
 
-  /// Who logged it; never null.
+  /// Return the thread that logged the message, and the queue whose task it ran. Never null, but possibly "".
   const rt::String& threadName() const noexcept { return threadName_; }
   const rt::String& dispatchQueueLabel() const noexcept { return dispatchQueueLabel_; }
 
-  /// The calls that led there, or null.
+  /// Returns the call stack of the call that logged the message, or null.
   const rt::Ref<LUMLogCallstack>& callstack() const noexcept { return callstack_; }
 
-  /// The arguments that are a LUMSafeParameter, by the names of their classes, each under its place among all
-  /// arguments, a number from 0; null if there were none.
+  /// Returns the arguments that are safe parameters (LUMSafeParameter.h). The key of each is its index among
+  /// all arguments, a number from 0. Null if there are none.
   const rt::Ref<rt::Dictionary>& safeParameters() const noexcept { return safeParameters_; }
 
-  /// What the caller added, or null.
+  /// Returns the metadata that the caller gave, or null.
   const rt::Ref<LUMLogMetadata>& logMetadata() const noexcept { return logMetadata_; }
 
-  /// Whether `other` is a message all fields of which are equal.
+  /// Returns whether `other` is a message with equal fields.
   bool isEqual(const rt::Object* other) const override;
   std::uint64_t hash() const override;
 

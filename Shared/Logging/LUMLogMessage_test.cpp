@@ -17,7 +17,7 @@ namespace {
 
 using namespace rt::literals;
 
-/// The fields of a message, to be changed one by one.
+// The fields of a message, which tests change one by one.
 struct Fields {
   LUMLogLevel level = 3;
   rt::String format = "%@ entries"_s;
@@ -45,7 +45,7 @@ rt::Ref<LUMLogMessage> messageOf(const rt::String& threadName, const rt::String&
   return fields.message();
 }
 
-TEST(LUMLogMessage, HasItsFields) {
+TEST(LUMLogMessage, HoldsItsFields) {
   const Fields fields;
   const rt::Ref<LUMLogMessage> message = fields.message();
   EXPECT_EQ(message->level(), 3U);
@@ -61,7 +61,7 @@ TEST(LUMLogMessage, HasItsFields) {
   EXPECT_EQ(message->logMetadata(), fields.logMetadata);
 }
 
-TEST(LUMLogMessage, MayHaveNothing) {
+TEST(LUMLogMessage, FieldsMayBeNull) {
   const rt::Ref<LUMLogMessage> message = LUMLogMessage::initWithLevel(
       0, nullptr, nullptr, nullptr, nullptr, 0, ""_s, ""_s, nullptr, nullptr, nullptr);
   EXPECT_EQ(message->level(), 0U);
@@ -75,7 +75,7 @@ TEST(LUMLogMessage, MayHaveNothing) {
   EXPECT_EQ(message->hash(), ""_s.hash() + ""_s.hash());
 }
 
-TEST(LUMLogMessage, TellsTheThreadThatMadeIt) {
+TEST(LUMLogMessage, RecordsTheThreadThatMadeIt) {
   std::thread([] {
     EXPECT_EQ(messageOf(nullptr, nullptr)->threadName(), "");
     EXPECT_EQ(messageOf(nullptr, nullptr)->dispatchQueueLabel(), "");
@@ -83,13 +83,13 @@ TEST(LUMLogMessage, TellsTheThreadThatMadeIt) {
     EXPECT_FALSE(messageOf(nullptr, nullptr)->dispatchQueueLabel().isNull());
     rt::Thread::setCurrentName("Importer"_s);
     EXPECT_EQ(messageOf(nullptr, nullptr)->threadName(), "Importer");
-    // What is given goes before, also when it is empty.
+    // A given name takes precedence, even an empty one.
     EXPECT_EQ(messageOf(""_s, nullptr)->threadName(), "");
     EXPECT_EQ(messageOf("Other"_s, nullptr)->threadName(), "Other");
   }).join();
 }
 
-TEST(LUMLogMessage, TellsTheQueueThatMadeIt) {
+TEST(LUMLogMessage, RecordsTheQueueThatMadeIt) {
   const rt::Ref<rt::Queue> queue = rt::make<rt::Queue>("Letters"_s);
   queue->sync([] {
     EXPECT_EQ(messageOf(nullptr, nullptr)->dispatchQueueLabel(), "Letters");
@@ -99,7 +99,7 @@ TEST(LUMLogMessage, TellsTheQueueThatMadeIt) {
   EXPECT_EQ(messageOf(nullptr, nullptr)->dispatchQueueLabel(), "");
 }
 
-/// A call stack of a host's that changes.
+// A host's own call stack, which is mutable.
 class HostCallstack final : public rt::Implements<HostCallstack, rt::Object, LUMLogCallstack> {
  public:
   rt::Ref<rt::Object> copy() const override { return rt::make<HostCallstack>(); }
@@ -122,7 +122,7 @@ class SubMessage final : public rt::Implements<SubMessage, LUMLogMessage> {
                    fields.safeParameters, fields.logMetadata) {}
 };
 
-TEST(LUMLogMessage, IsEqualByAllFields) {
+TEST(LUMLogMessage, ComparesAllFields) {
   const rt::Ref<LUMLogMessage> message = Fields().message();
   EXPECT_TRUE(message->isEqual(message.get()));
   EXPECT_TRUE(rt::isEqual(message, Fields().message()));
@@ -169,7 +169,7 @@ TEST(LUMLogMessage, HashesTheSumOfItsFields) {
                 fields.safeParameters->hash() + fields.logMetadata->hash());
 }
 
-TEST(LUMLogMessage, IsItsOwnCopy) {
+TEST(LUMLogMessage, CopyReturnsTheSameObject) {
   const rt::Ref<LUMLogMessage> message = Fields().message();
   EXPECT_EQ(message->copy(), message);
 }

@@ -2,7 +2,7 @@
 
 using namespace rt::literals;
 
-// Constants, not just initialised like constants: nothing runs for them at exit.
+// `constexpr` and not just `constinit`, so that no destructor runs at exit.
 constexpr rt::String LUMLogMetadata::kObfuscatedKiriIDKey = "LUMLogMetadataObfuscatedKiriID"_s;
 constexpr rt::String LUMLogMetadata::kComponentKey = "LUMLogMetadataComponent"_s;
 constexpr rt::String LUMLogMetadata::kCategoryKey = "LUMLogMetadataCategory"_s;

@@ -1,14 +1,14 @@
 #pragma once
 
-/// What a log message says beside its text: a table of keys and values.
+/// The metadata of a log message: keys and values that accompany its text.
 ///
 ///     rt::Ref<LUMLogMetadata> metadata = LUMLogMetadata::metadataWithComponent("Importer"_s);
 ///     metadata = metadata->metadataByAddingCategory("network"_s);
 ///     LUMLogAt(LUMLogLevelError, metadata, "no route to %@", host);
 ///
-/// Four keys are known by name; a host adds its own. Values are kept as copies (`rt::Object::copy`).
+/// Four keys are predefined. A host may add its own. Values are stored as copies (`rt::Object::copy`).
 ///
-/// Immutable: any thread may use it if the values bear that.
+/// Threads: immutable. Safe on any thread if its values are.
 ///
 /// Not for: arguments of the text (Shared/Logging/LUMSafeParameter.h).
 
@@ -24,20 +24,20 @@
 
 class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Object> {
  public:
-  /// The keys, as they are in `properties`.
+  /// The predefined keys, as they appear in `properties`.
   static const rt::String kObfuscatedKiriIDKey;  // "LUMLogMetadataObfuscatedKiriID"
   static const rt::String kComponentKey;         // "LUMLogMetadataComponent"
   static const rt::String kCategoryKey;          // "LUMLogMetadataCategory"
   static const rt::String kCauseKey;             // "LUMLogMetadataCause"
 
-  /// With `properties`, strings and what they stand for; null stands for none. Like all that make metadata,
-  /// throws what copying a value throws, and std::bad_alloc.
+  /// Makes metadata of `properties`, whose keys are strings. Null counts as empty. Like every function that
+  /// makes metadata, it throws what copying a value throws, and std::bad_alloc.
   static rt::Ref<LUMLogMetadata> initWithProperties(const rt::Ref<rt::Dictionary>& properties);
 
-  /// Without properties.
+  /// Makes metadata without properties.
   static rt::Ref<LUMLogMetadata> init() { return initWithProperties(nullptr); }
 
-  /// With these properties; a null one is left out. There is none with a category alone.
+  /// Make metadata of the given properties. Null ones are left out. No function takes a category alone.
   static rt::Ref<LUMLogMetadata> metadataWithObfuscatedKiriID(const rt::Ref<rt::Object>& obfuscatedKiriID) {
     return metadataWithObfuscatedKiriID(obfuscatedKiriID, nullptr);
   }
@@ -61,11 +61,11 @@ class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Obje
                                                               const rt::String& category,
                                                               const rt::Ref<rt::Object>& cause);
 
-  /// Metadata, whatever the name says: this one's properties, but `key` stands for a copy of `value`, or for
-  /// nothing where that is null. A null key changes nothing.
+  /// Returns a copy of this metadata in which `key` has a copy of `value`. A null `value` removes the key. A
+  /// null `key` changes nothing. Despite its name, this function returns metadata and not a message.
   rt::Ref<LUMLogMetadata> messageWithKey(const rt::String& key, const rt::Ref<rt::Object>& value) const;
 
-  /// The same for the keys above.
+  /// Same as `messageWithKey`, for the predefined keys.
   rt::Ref<LUMLogMetadata> metadataByAddingObfuscatedKiriID(
       const rt::Ref<rt::Object>& obfuscatedKiriID) const {
     return messageWithKey(kObfuscatedKiriIDKey, obfuscatedKiriID);
@@ -80,24 +80,24 @@ class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Obje
     return messageWithKey(kCauseKey, cause);
   }
 
-  /// All there is; never null.
+  /// Returns all properties; never null.
   const rt::Ref<rt::Dictionary>& properties() const noexcept { return properties_; }
 
-  /// What `key` stands for; null where that is nothing, and for null.
+  /// Returns the value for `key`. Null if there is no value, or if `key` is null.
   rt::Ref<rt::Object> propertyForKey(const rt::String& key) const { return properties_->objectForKey(key); }
 
-  /// What the keys above stand for. A component or category that is no string counts as none.
+  /// Return the values for the predefined keys. If a component or category is not a string, they return null.
   rt::Ref<rt::Object> obfuscatedKiriID() const { return propertyForKey(kObfuscatedKiriIDKey); }
   rt::String component() const { return properties_->stringForKey(kComponentKey); }
   rt::String category() const { return properties_->stringForKey(kCategoryKey); }
   rt::Ref<rt::Object> cause() const { return propertyForKey(kCauseKey); }
 
-  /// Whether `other` is metadata with equal properties.
+  /// Returns whether `other` is metadata with equal properties.
   bool isEqual(const rt::Object* other) const override;
   std::uint64_t hash() const override;
 
  protected:
-  /// With `properties`, not null, as they are.
+  /// Precondition: `properties` is not null. Stores it without copying the values.
   explicit LUMLogMetadata(rt::Ref<rt::Dictionary> properties) noexcept : properties_(std::move(properties)) {}
 
  private:

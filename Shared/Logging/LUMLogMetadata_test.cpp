@@ -8,7 +8,7 @@ namespace {
 
 using namespace rt::literals;
 
-/// An object that changes, and whose copies do not.
+// A mutable object whose copies do not change with it.
 class Box final : public rt::Implements<Box, rt::Object> {
  public:
   explicit Box(int given) : value(given) {}
@@ -21,7 +21,7 @@ int valueOf(const rt::Ref<rt::Object>& box) {
   return rt::cast<Box>(box.get())->value;
 }
 
-TEST(LUMLogMetadata, IsEmptyAtFirst) {
+TEST(LUMLogMetadata, IsEmptyByDefault) {
   const rt::Ref<LUMLogMetadata> metadata = LUMLogMetadata::init();
   ASSERT_TRUE(metadata->properties());
   EXPECT_TRUE(metadata->properties()->isEmpty());
@@ -41,7 +41,7 @@ TEST(LUMLogMetadata, NamesItsKeys) {
   EXPECT_EQ(LUMLogMetadata::kCauseKey, "LUMLogMetadataCause");
 }
 
-TEST(LUMLogMetadata, ReadsWhatStandsUnderItsKeys) {
+TEST(LUMLogMetadata, ReturnsTheValuesOfItsKeys) {
   const rt::Ref<LUMLogMetadata> metadata =
       LUMLogMetadata::initWithProperties(rt::Dictionary::of({{"LUMLogMetadataObfuscatedKiriID"_s, "id"_s},
                                                              {"LUMLogMetadataComponent"_s, "component"_s},
@@ -55,14 +55,14 @@ TEST(LUMLogMetadata, ReadsWhatStandsUnderItsKeys) {
   EXPECT_EQ(rt::String::from(metadata->propertyForKey("another"_s).get()), "value");
 }
 
-TEST(LUMLogMetadata, TakesAComponentThatIsNoStringForNone) {
+TEST(LUMLogMetadata, IgnoresAComponentThatIsNotAString) {
   const rt::Ref<LUMLogMetadata> metadata = LUMLogMetadata::initWithProperties(
       rt::Dictionary::of({{"LUMLogMetadataComponent"_s, rt::Number::of(1)}}));
   EXPECT_TRUE(metadata->component().isNull());
   EXPECT_TRUE(metadata->propertyForKey(LUMLogMetadata::kComponentKey));
 }
 
-TEST(LUMLogMetadata, IsMadeOfWhatIsGiven) {
+TEST(LUMLogMetadata, HoldsTheGivenProperties) {
   const rt::Ref<rt::Object> id = "id"_s;
   const rt::Ref<rt::Object> cause = "cause"_s;
   const auto expect = [](const rt::Ref<LUMLogMetadata>& metadata,
@@ -82,7 +82,7 @@ TEST(LUMLogMetadata, IsMadeOfWhatIsGiven) {
          {{idKey, id}, {componentKey, "c"_s}, {causeKey, cause}});
   expect(LUMLogMetadata::metadataWithObfuscatedKiriID(id, "c"_s, "t"_s, cause),
          {{idKey, id}, {componentKey, "c"_s}, {categoryKey, "t"_s}, {causeKey, cause}});
-  // What is null is left out, and "" is not null.
+  // A null property is left out, but "" is not null.
   expect(LUMLogMetadata::metadataWithObfuscatedKiriID(nullptr, nullptr, nullptr, nullptr), {});
   expect(LUMLogMetadata::metadataWithComponent(nullptr), {});
   expect(LUMLogMetadata::metadataWithComponent(""_s), {{componentKey, ""_s}});
@@ -90,7 +90,7 @@ TEST(LUMLogMetadata, IsMadeOfWhatIsGiven) {
          {{categoryKey, "t"_s}});
 }
 
-TEST(LUMLogMetadata, IsNotChangedByAdding) {
+TEST(LUMLogMetadata, AddingLeavesTheOriginalUnchanged) {
   const rt::Ref<LUMLogMetadata> empty = LUMLogMetadata::init();
   const rt::Ref<LUMLogMetadata> added = empty->metadataByAddingComponent("c"_s);
   EXPECT_TRUE(empty->properties()->isEmpty());
@@ -115,7 +115,7 @@ TEST(LUMLogMetadata, ReplacesAndRemovesByKey) {
   EXPECT_TRUE(rt::isEqual(metadata->messageWithKey(nullptr, rt::Number::of(1)), metadata));
 }
 
-TEST(LUMLogMetadata, KeepsCopiesOfItsValues) {
+TEST(LUMLogMetadata, StoresCopiesOfItsValues) {
   const rt::Ref<Box> box = rt::make<Box>(1);
   const rt::Ref<LUMLogMetadata> given =
       LUMLogMetadata::initWithProperties(rt::Dictionary::of({{"box"_s, box}}));
@@ -128,7 +128,7 @@ TEST(LUMLogMetadata, KeepsCopiesOfItsValues) {
   EXPECT_EQ(valueOf(added->propertyForKey("another"_s)), 1);
 }
 
-TEST(LUMLogMetadata, IsEqualByItsProperties) {
+TEST(LUMLogMetadata, ComparesItsProperties) {
   const rt::Ref<LUMLogMetadata> metadata = LUMLogMetadata::metadataWithComponent("c"_s);
   EXPECT_TRUE(metadata->isEqual(metadata.get()));
   EXPECT_TRUE(rt::isEqual(metadata, LUMLogMetadata::metadataWithComponent(rt::String::fromUTF8("c"))));

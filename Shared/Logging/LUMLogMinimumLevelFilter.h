@@ -1,10 +1,10 @@
 #pragma once
 
-/// Lets messages of a level pass, and of all levels above it.
+/// Lets a message pass if its level is at least a given one.
 ///
 ///     multiplexer->addLogFilter(LUMLogMinimumLevelFilter::initWithMinimumLevel(LUMLogLevelError));
 ///
-/// Not for: what the environment is to decide; see LUMDefaultMinimumLogLevelFilter.
+/// Not for: a level that the environment chooses; see LUMDefaultMinimumLogLevelFilter.
 
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Class.h"

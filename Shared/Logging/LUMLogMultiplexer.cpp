@@ -1,3 +1,9 @@
+// Filters and loggers are one immutable object, which is replaced as a whole. A message takes a reference to
+// it without a lock. A change makes the next object without a lock, and makes it again if another thread was
+// quicker. So the `isEqual` of members, which is a host's code, never runs under a lock.
+//
+// If there are no asynchronous loggers, or all of them want the message at once, nothing is queued.
+
 #include "Shared/Logging/LUMLogMultiplexer.h"
 
 #include <algorithm>
@@ -41,11 +47,11 @@ struct LUMLogMultiplexer::Lists {
   std::vector<rt::Ref<LUMLogFilter>> filters;
   std::vector<rt::Ref<LUMSyncLogger>> syncLoggers;
   std::vector<rt::Ref<LUMAsyncLogger>> asyncLoggers;
-  // The one that the multiplexer was made with, until another takes its place.
+  // The system logger that the multiplexer was made with. Null after another has replaced it.
   rt::Ref<LUMSystemLogger> systemLogger;
 };
 
-/// The filters and loggers of a moment. One object for all, since each message counts a reference to it.
+// A snapshot of the filters and loggers. One object, because each message retains it.
 class LUMLogMultiplexer::Members final : public rt::Implements<Members, rt::Object> {
  public:
   static constexpr std::string_view kClassName = "LUMLogMultiplexerMembers";
@@ -116,7 +122,7 @@ std::vector<rt::Ref<LUMAsyncLogger>> LUMLogMultiplexer::deliverLater(
       if (const rt::Ref<rt::Queue> queue = logger->operationQueue()) {
         try {
           queue->async([logger, message] { deliver(*logger, message); });
-        } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): nobody could do better here
+        } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): there is no caller to tell
         }
       }
     }
@@ -124,7 +130,7 @@ std::vector<rt::Ref<LUMAsyncLogger>> LUMLogMultiplexer::deliverLater(
   return blockingLoggers;
 }
 
-/// Has `change` make the next members of those that there are, and again where somebody else was quicker.
+// Replaces the members by what `change` makes of a copy. Starts again if another thread was faster.
 template <class Change>
 void LUMLogMultiplexer::replaceMembers(Change change) {
   for (;;) {

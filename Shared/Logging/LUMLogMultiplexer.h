@@ -1,36 +1,40 @@
 #pragma once
 
-/// The switchboard of logging: takes every message and passes it on, through filters, to the loggers.
+/// The hub of logging. It takes every message and passes it through filters to the loggers.
 ///
 ///     const rt::Ref<LUMLogMultiplexer>& multiplexer = LUMLogMultiplexer::sharedInstance();
 ///     multiplexer->addAsyncLogger(rt::make<FileLogger>("/var/log/host.log"));
 ///     multiplexer->addLogFilter(LUMLogMinimumLevelFilter::initWithMinimumLevel(LUMLogLevelInfo));
 ///     LUMLogAt(LUMLogLevelInfo, "started"_s);
 ///
-/// A message that all filters let pass goes, in this order, to
+/// A message that all filters let pass goes to the loggers in this order:
 ///
-/// 1. the asynchronous loggers: each is called later, on its own queue, to which a queue of the multiplexer's
-///    sends the messages in the order in which they were logged;
-/// 2. the synchronous loggers, on the calling thread;
-/// 3. those asynchronous loggers that want this message at once, each on its own queue, which is waited for.
+/// 1. The asynchronous loggers, each called later on its own queue. The multiplexer's queue sends the
+///    messages to those queues in the order in which they were logged.
+/// 2. The synchronous loggers, on the calling thread.
+/// 3. The asynchronous loggers that want this message at once, each on its own queue. The caller waits for
+///    them.
 ///
-/// Among the loggers of a kind no order is promised. Loggers and filters may come and go at any time, also
-/// from within a logger: a message goes to those that were there when it came. At the start there is one
-/// synchronous logger, a LUMSystemLogger with a LUMDefaultMinimumLogLevelFilter.
+/// The order among loggers of one kind is unspecified. Filters and loggers may be added and removed at any
+/// time, also by a logger. A message goes to those that were present when it was logged. A new multiplexer
+/// has one synchronous logger: a LUMSystemLogger with a LUMDefaultMinimumLogLevelFilter.
 ///
-/// Any thread may use it. No lock is held while filters and loggers run. What one throws on the way of a
-/// message passes through, and those after it do not get the message. What an asynchronous logger throws
-/// later has no caller: it ends the program, or goes to the handler that rt::Queue has for that
-/// (LUMAsyncLogger.h). If then it was `operationQueue` that threw, the asynchronous loggers after it do not
-/// get the message either; later messages go their way. Without memory to queue a message, LUMLog throws
-/// std::bad_alloc before any logger has it; an asynchronous logger for whose own queue there is none does not
-/// get the message.
+/// Threads: any thread may use it. Filters and loggers run without a lock held.
 ///
-/// In the child of a fork it may be used at once, whatever other threads were doing, given that filters and
-/// loggers bear it. The messages that were queued are the
-/// parent's, as all tasks are (Runtime/Queues/Queue.h).
+/// Errors: the effect depends on the source of the exception.
 ///
-/// Not for: many of them in a program; LUMLog uses the shared one.
+/// - An exception from a filter or logger reaches the caller. The loggers after it do not get the message.
+/// - An exception from an asynchronous logger that is called later has no caller to reach. It ends the
+///   program, or goes to rt::Queue's handler (LUMAsyncLogger.h).
+/// - If `operationQueue` throws in such a later call, the asynchronous loggers after it do not get the
+///   message. They get later messages.
+/// - If there is no memory to queue a message, LUMLog throws std::bad_alloc before any logger gets it.
+/// - If there is no memory to queue it for one asynchronous logger, only that logger does not get it.
+///
+/// Fork: the child may use it at once, whatever other threads were doing, if its filters and loggers allow
+/// that. Queued messages stay with the parent, as all tasks do (Runtime/Queues/Queue.h).
+///
+/// Not for: several multiplexers in one program. LUMLog uses only the shared one.
 
 #include <atomic>
 #include <vector>
@@ -48,13 +52,14 @@
 class RT_VISIBLE LUMLogMultiplexer
     : public rt::Implements<LUMLogMultiplexer, rt::Object, LUMLogAppControl, LUMLogMultiplexing> {
  public:
-  /// The one that LUMLog uses; made when it is first asked for, and never destroyed.
+  /// Returns the multiplexer that LUMLog uses. It is made on the first call and never destroyed.
   static const rt::Ref<LUMLogMultiplexer>& sharedInstance();
 
-  /// With a system logger as at the start; see above.
+  /// Makes a multiplexer with the default system logger described above.
   static rt::Ref<LUMLogMultiplexer> init();
 
-  /// With `systemLogger` as the only logger, or with none where that is null. Capture is on, of addresses.
+  /// Makes a multiplexer whose only logger is `systemLogger`, or that has no logger if `systemLogger` is
+  /// null. The multiplexer captures call stacks, as addresses.
   static rt::Ref<LUMLogMultiplexer> initWithSystemLogger(rt::Ref<LUMSystemLogger> systemLogger);
 
   void logWithMessage(const rt::Ref<LUMLogMessage>& message) override;
@@ -62,18 +67,19 @@ class RT_VISIBLE LUMLogMultiplexer
   void addLogFilter(const rt::Ref<LUMLogFilter>& filter) override;
   void removeLogFilter(const rt::Ref<LUMLogFilter>& filter) override;
 
-  /// A LUMSystemLogger takes the place of the one that this multiplexer was made with. One that is added
-  /// later still stands beside it.
+  /// Adds `logger`. The first LUMSystemLogger that is added replaces the one that this multiplexer was made
+  /// with. Later ones replace nothing.
   void addSyncLogger(const rt::Ref<LUMSyncLogger>& logger) override;
   void removeSyncLogger(const rt::Ref<LUMSyncLogger>& logger) override;
   void addAsyncLogger(const rt::Ref<LUMAsyncLogger>& logger) override;
   void removeAsyncLogger(const rt::Ref<LUMAsyncLogger>& logger) override;
 
-  /// Returns when the asynchronous loggers' queues have all messages that were logged before; not when the
-  /// loggers have run. Must not be called on `loggingQueue`.
+  /// Waits until all messages logged before are in the queues of the asynchronous loggers. Does not wait for
+  /// those loggers to run. Must not be called on `loggingQueue`.
   void waitForLogging();
 
-  /// The queue that sends messages to the asynchronous loggers' queues; labelled "LUMLogMultiplexer".
+  /// Returns the queue that sends messages to the queues of the asynchronous loggers. Its label is
+  /// "LUMLogMultiplexer".
   const rt::Ref<rt::Queue>& loggingQueue() const noexcept { return loggingQueue_; }
 
   bool captureCallStack() const override { return captureCallStack_.load(std::memory_order_relaxed); }
@@ -95,12 +101,12 @@ class RT_VISIBLE LUMLogMultiplexer
 
   template <class Change>
   void replaceMembers(Change change);
-  /// Has those of `loggers` called later that do not want `message` at once, and returns those that do. A
-  /// function of its own, so that a message costs nothing for it where there are no such loggers.
+  // Queues `message` for those of `loggers` that do not want it at once, and returns those that do. A
+  // function of its own, so that a message costs nothing extra if there are no asynchronous loggers.
   [[gnu::noinline]] std::vector<rt::Ref<LUMAsyncLogger>> deliverLater(
       const std::vector<rt::Ref<LUMAsyncLogger>>& loggers, const rt::Ref<LUMLogMessage>& message);
 
-  // Replaced, never changed, so that a message goes on with those that it has found.
+  // Replaced as a whole, never changed, so that each message keeps the filters and loggers that it found.
   rt::AtomicRef<Members> members_;
 
   std::atomic<bool> captureCallStack_{true};

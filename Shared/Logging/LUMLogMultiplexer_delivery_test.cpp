@@ -1,4 +1,4 @@
-// What goes to whom, when, and in which order, one message at a time.
+// Tests what is delivered to which logger, when and in which order, one message at a time.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -22,9 +22,9 @@ using testing::ElementsAre;
 using testing::IsEmpty;
 using testing::UnorderedElementsAre;
 
-// Filters for all.
+// The multiplexer's filters.
 
-TEST_F(LUMLogMultiplexerTest, HandsOnTheMessageItself) {
+TEST_F(LUMLogMultiplexerTest, DeliversTheSameMessageObject) {
   const Ref<LUMLogMessage> message = messageWith(LUMLogLevelInfo, "x"_s);
   std::atomic<int> count = 0;
   const auto check = [&](const Ref<LUMLogMessage>& received) {
@@ -51,7 +51,7 @@ TEST_F(LUMLogMultiplexerTest, HandsOnTheMessageItself) {
   EXPECT_EQ(count, 3);
 }
 
-TEST_F(LUMLogMultiplexerTest, DeliversToNobodyWhatAFilterRefuses) {
+TEST_F(LUMLogMultiplexerTest, DropsWhatAFilterRefuses) {
   const auto refusing = filter("refusing", false);
   multiplexer_->addLogFilter(refusing);
   multiplexer_->addSyncLogger(sync("sync", filter("sync's filter", true)));
@@ -84,7 +84,7 @@ TEST_F(LUMLogMultiplexerTest, DeliversWhatAllFiltersLetPass) {
   EXPECT_EQ(events.back(), "sync");
 }
 
-TEST_F(LUMLogMultiplexerTest, AsksNoFilterAfterOneThatRefuses) {
+TEST_F(LUMLogMultiplexerTest, AsksNoFilterAfterARefusal) {
   for (const char* const name : {"a", "b", "c", "d"}) multiplexer_->addLogFilter(filter(name, false));
   multiplexer_->addSyncLogger(sync("sync"));
   EXPECT_EQ(logAndDrain().size(), 1U);
@@ -144,7 +144,7 @@ TEST_F(LUMLogMultiplexerTest, CallsAsyncLoggersOnTheirQueues) {
   EXPECT_TRUE(isOnOther);
 }
 
-TEST_F(LUMLogMultiplexerTest, AsksAsyncLoggersWhereTheirAnswersAreWanted) {
+TEST_F(LUMLogMultiplexerTest, AsksAsyncLoggersOnTheDocumentedThreads) {
   const auto logger = rt::make<TestAsyncLogger>(queue_, tracing("logged"));
   const auto here = std::this_thread::get_id();
   const auto whereAmI = [=, this] {
@@ -175,9 +175,9 @@ TEST_F(LUMLogMultiplexerTest, AsksAsyncLoggersWhereTheirAnswersAreWanted) {
               ElementsAre("filter here", "mode here", "queue here", "filter on its queue", "logged"));
 }
 
-// The filter's word counts when the logger is called; that it refused before means only that the mode was
-// not asked for.
-TEST_F(LUMLogMultiplexerTest, AsksTheFilterOfAnAsyncLoggerAgainWhenItsTurnComes) {
+// The second answer decides whether the logger runs. A refusal at the first question only skips the question
+// for the mode.
+TEST_F(LUMLogMultiplexerTest, AsksTheFilterOfAnAsyncLoggerAgainOnItsQueue) {
   std::vector<bool> answers;
   const auto asking = rt::make<TestFilter>([&](const LUMLogMessage&) {
     const bool answer = answers.back();
@@ -213,7 +213,7 @@ TEST_F(LUMLogMultiplexerTest, GivesNothingToAnAsyncLoggerWithoutAQueue) {
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("with a queue", "with a queue, blocking"));
 }
 
-TEST_F(LUMLogMultiplexerTest, TakesEveryModeButOneForAsynchronous) {
+TEST_F(LUMLogMultiplexerTest, TreatsEveryOtherModeAsAsynchronous) {
   EXPECT_EQ(LUMLogDispatchModeSynchronous, 2U);
   for (const LUMLogDispatchMode mode : {0U, 1U, 3U, 0x8000'0002U, 0xffff'ffffU}) {
     const auto logger = async("logged");
@@ -221,7 +221,7 @@ TEST_F(LUMLogMultiplexerTest, TakesEveryModeButOneForAsynchronous) {
     multiplexer_->addAsyncLogger(logger);
     std::latch mayGoOn(1);
     queue_->async([&] { mayGoOn.wait(); });
-    log();  // Would not return if it waited for the queue.
+    log();  // This would not return if it waited for the queue.
     EXPECT_THAT(trace_.events(), IsEmpty());
     mayGoOn.count_down();
     drain();
@@ -230,7 +230,7 @@ TEST_F(LUMLogMultiplexerTest, TakesEveryModeButOneForAsynchronous) {
   }
 }
 
-TEST_F(LUMLogMultiplexerTest, CallsABlockingLoggerBeforeItReturnsAndOnce) {
+TEST_F(LUMLogMultiplexerTest, CallsABlockingLoggerOnceBeforeItReturns) {
   bool isOnQueue = false;
   const auto logger = rt::make<TestAsyncLogger>(queue_, [&](const Ref<LUMLogMessage>&) {
     isOnQueue = queue_->isCurrent();
@@ -245,8 +245,8 @@ TEST_F(LUMLogMultiplexerTest, CallsABlockingLoggerBeforeItReturnsAndOnce) {
   EXPECT_THAT(trace_.events(), IsEmpty());
 }
 
-// A mode is for one message.
-TEST_F(LUMLogMultiplexerTest, AsksForTheModeOfEachMessage) {
+// A mode applies to one message.
+TEST_F(LUMLogMultiplexerTest, AsksForTheModeForEachMessage) {
   const auto logger = rt::make<TestAsyncLogger>(queue_, tracing("logged", true));
   logger->dispatchMode_ = [](const LUMLogMessage& message) {
     return message.level() == LUMLogLevelFault ? LUMLogDispatchModeSynchronous : LUMLogDispatchMode{0};
@@ -262,7 +262,7 @@ TEST_F(LUMLogMultiplexerTest, AsksForTheModeOfEachMessage) {
   EXPECT_THAT(trace_.events(), ElementsAre("logged later"));
 }
 
-TEST_F(LUMLogMultiplexerTest, GivesAnAsyncLoggerMessagesInTheirOrder) {
+TEST_F(LUMLogMultiplexerTest, DeliversMessagesToAnAsyncLoggerInOrder) {
   constexpr int kMessages = 1000;
   std::vector<std::string> expected;
   multiplexer_->addAsyncLogger(rt::make<TestAsyncLogger>(
@@ -275,11 +275,11 @@ TEST_F(LUMLogMultiplexerTest, GivesAnAsyncLoggerMessagesInTheirOrder) {
   EXPECT_EQ(trace_.events(), expected);
 }
 
-// The order of kinds.
+// The order of the kinds of loggers.
 
-// What is queued first has been delivered when a synchronous logger waits for it, and blocking loggers come
+// The message is queued first, so the synchronous logger can wait for its delivery. Blocking loggers come
 // last.
-TEST_F(LUMLogMultiplexerTest, QueuesThenCallsThenBlocks) {
+TEST_F(LUMLogMultiplexerTest, QueuesThenCallsSyncLoggersThenBlocks) {
   const auto other = rt::make<Queue>("other"_s);
   multiplexer_->addAsyncLogger(async("async"));
   multiplexer_->addSyncLogger(rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>&) {
@@ -310,7 +310,7 @@ TEST_F(LUMLogMultiplexerTest, CallsBlockingLoggersOneAfterAnother) {
               ElementsAre("begins", "ends", "begins", "ends", "begins", "ends", "begins", "ends"));
 }
 
-TEST_F(LUMLogMultiplexerTest, WaitsForNeitherQueueWhereNothingBlocks) {
+TEST_F(LUMLogMultiplexerTest, WaitsForNoQueueWithoutABlockingLogger) {
   multiplexer_->addAsyncLogger(async("async"));
   std::latch mayFanOut(1);
   std::latch mayLog(1);
@@ -319,7 +319,7 @@ TEST_F(LUMLogMultiplexerTest, WaitsForNeitherQueueWhereNothingBlocks) {
   log();
   EXPECT_THAT(trace_.events(), IsEmpty());
   mayFanOut.count_down();
-  multiplexer_->waitForLogging();  // Nor does this wait for the logger's queue.
+  multiplexer_->waitForLogging();  // This does not wait for the logger's queue either.
   EXPECT_THAT(trace_.events(), IsEmpty());
   mayLog.count_down();
   queue_->barrierSync();
@@ -350,7 +350,7 @@ TEST_F(LUMLogMultiplexerTest, WaitForLoggingReturnsWhenMessagesAreOnTheLoggersQu
   EXPECT_THAT(trace_.events(), ElementsAre("async", "async"));
 }
 
-TEST_F(LUMLogMultiplexerTest, WaitForLoggingReturnsWhereNothingWasLogged) {
+TEST_F(LUMLogMultiplexerTest, WaitForLoggingReturnsIfNothingWasLogged) {
   multiplexer_->waitForLogging();
   log();
   multiplexer_->waitForLogging();

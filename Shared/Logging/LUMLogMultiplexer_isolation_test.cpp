@@ -1,4 +1,4 @@
-// What filters and loggers may do while a message is delivered: come and go, log, wait, throw.
+// Tests what filters and loggers may do during a delivery: be added and removed, log, wait and throw.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -24,7 +24,7 @@ using testing::UnorderedElementsAre;
 
 // Snapshots.
 
-TEST_F(LUMLogMultiplexerTest, AMessageGoesToThoseThatWereThereWhenItCame) {
+TEST_F(LUMLogMultiplexerTest, DeliversToThosePresentWhenTheMessageWasLogged) {
   const auto first = filter("first", true);
   const auto added = sync("added");
   const auto addedAsync = async("added async");
@@ -39,7 +39,7 @@ TEST_F(LUMLogMultiplexerTest, AMessageGoesToThoseThatWereThereWhenItCame) {
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("added filter", "added", "added async"));
 }
 
-TEST_F(LUMLogMultiplexerTest, ThoseThatAreRemovedMeanwhileStillGetTheMessage) {
+TEST_F(LUMLogMultiplexerTest, DeliversToLoggersRemovedMeanwhile) {
   const auto asyncLogger = async("async");
   const auto blockingLogger = blocking("blocking");
   std::vector<Ref<LUMSyncLogger>> syncLoggers;
@@ -65,7 +65,7 @@ TEST_F(LUMLogMultiplexerTest, ThoseThatAreRemovedMeanwhileStillGetTheMessage) {
   EXPECT_THAT(logAndDrain(), IsEmpty());
 }
 
-TEST_F(LUMLogMultiplexerTest, FiltersThatRemoveEachOtherAreAllAsked) {
+TEST_F(LUMLogMultiplexerTest, AsksAllFiltersEvenIfTheyRemoveEachOther) {
   std::vector<Ref<LUMLogFilter>> filters;
   filters.reserve(3);
   for (int i = 0; i < 3; ++i) {
@@ -80,7 +80,7 @@ TEST_F(LUMLogMultiplexerTest, FiltersThatRemoveEachOtherAreAllAsked) {
   EXPECT_THAT(logAndDrain(), IsEmpty());
 }
 
-TEST_F(LUMLogMultiplexerTest, KeepsAliveWhomItDeliversToAndNobodyElse) {
+TEST_F(LUMLogMultiplexerTest, RetainsARemovedLoggerUntilItHasTheMessage) {
   rt::Weak<TestAsyncLogger> weak;
   std::latch mayFanOut(1);
   {
@@ -94,12 +94,12 @@ TEST_F(LUMLogMultiplexerTest, KeepsAliveWhomItDeliversToAndNobodyElse) {
   mayFanOut.count_down();
   drain();
   EXPECT_THAT(trace_.events(), ElementsAre("async"));
-  // The tasks that delivered are gone when the queues have run once more.
+  // The second run of the queues shows that the delivering tasks are gone.
   drain();
   EXPECT_EQ(weak.lock(), nullptr);
 }
 
-TEST_F(LUMLogMultiplexerTest, ALoggerMayLogFromWithin) {
+TEST_F(LUMLogMultiplexerTest, ASyncLoggerMayLog) {
   multiplexer_->addSyncLogger(rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) {
     trace_.add(text(*message));
     if (text(*message) == "x") log("from within"_s);
@@ -109,7 +109,7 @@ TEST_F(LUMLogMultiplexerTest, ALoggerMayLogFromWithin) {
   EXPECT_THAT(trace_.events(), ElementsAre("x", "from within", "end of from within", "end of x"));
 }
 
-TEST_F(LUMLogMultiplexerTest, AnAsyncLoggerMayLogFromWithin) {
+TEST_F(LUMLogMultiplexerTest, AnAsyncLoggerMayLog) {
   multiplexer_->addAsyncLogger(rt::make<TestAsyncLogger>(queue_, [&](const Ref<LUMLogMessage>& message) {
     trace_.add(text(*message));
     if (text(*message) == "x") log("from within"_s);
@@ -120,7 +120,7 @@ TEST_F(LUMLogMultiplexerTest, AnAsyncLoggerMayLogFromWithin) {
   EXPECT_THAT(trace_.events(), ElementsAre("x", "from within"));
 }
 
-// No lock is held while anything of the user's runs: another thread gets through meanwhile.
+// No lock is held while the user's code runs, so another thread can use the multiplexer meanwhile.
 
 TEST_F(LUMLogMultiplexerTest, HoldsNoLockWhileFiltersAndLoggersRun) {
   std::atomic<int> count = 0;
@@ -159,9 +159,9 @@ TEST_F(LUMLogMultiplexerTest, HoldsNoLockWhileFiltersAndLoggersRun) {
   EXPECT_EQ(count, 2 * (1 + 2 + 5));
 }
 
-// What is thrown.
+// Exceptions.
 
-TEST_F(LUMLogMultiplexerTest, PassesOnWhatAFilterThrowsAndDeliversToNobody) {
+TEST_F(LUMLogMultiplexerTest, ThrowsWhatAFilterThrowsAndDeliversNothing) {
   const auto throwing = rt::make<TestFilter>([](const LUMLogMessage&) -> bool { throw Thrown(); });
   multiplexer_->addLogFilter(throwing);
   multiplexer_->addSyncLogger(sync("sync"));
@@ -173,7 +173,7 @@ TEST_F(LUMLogMultiplexerTest, PassesOnWhatAFilterThrowsAndDeliversToNobody) {
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("sync", "async"));
 }
 
-TEST_F(LUMLogMultiplexerTest, PassesOnWhatAnAsyncLoggerThrowsWhenItIsAskedAndDeliversToNobody) {
+TEST_F(LUMLogMultiplexerTest, ThrowsWhatAnAsyncLoggerThrowsWhenAskedAndDeliversNothing) {
   multiplexer_->addSyncLogger(sync("sync"));
   multiplexer_->addAsyncLogger(async("async"));
   const auto throwing = async("throwing");
@@ -188,8 +188,8 @@ TEST_F(LUMLogMultiplexerTest, PassesOnWhatAnAsyncLoggerThrowsWhenItIsAskedAndDel
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("sync", "async"));
 }
 
-// What is queued by then is delivered, what would come later is not.
-TEST_F(LUMLogMultiplexerTest, PassesOnWhatASyncLoggerThrows) {
+// Messages queued before the exception are delivered. Later steps are not done.
+TEST_F(LUMLogMultiplexerTest, ThrowsWhatASyncLoggerThrows) {
   multiplexer_->addAsyncLogger(async("async"));
   multiplexer_->addAsyncLogger(blocking("blocking"));
   const auto throwing = rt::make<TestSyncLogger>([](const Ref<LUMLogMessage>&) { throw Thrown(); });
@@ -202,7 +202,7 @@ TEST_F(LUMLogMultiplexerTest, PassesOnWhatASyncLoggerThrows) {
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("async", "sync", "blocking"));
 }
 
-TEST_F(LUMLogMultiplexerTest, PassesOnWhatABlockingLoggerThrows) {
+TEST_F(LUMLogMultiplexerTest, ThrowsWhatABlockingLoggerThrows) {
   multiplexer_->addSyncLogger(sync("sync"));
   multiplexer_->addAsyncLogger(async("async"));
   const auto throwing = rt::make<TestAsyncLogger>(queue_, [](const Ref<LUMLogMessage>&) { throw Thrown(); });
@@ -215,9 +215,9 @@ TEST_F(LUMLogMultiplexerTest, PassesOnWhatABlockingLoggerThrows) {
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("sync", "async"));
 }
 
-// Later there is nobody to throw to.
+// An exception in a later call has no caller to reach.
 
-TEST_F(LUMLogMultiplexerDeathTest, EndsTheProgramByWhatAnAsyncLoggerThrowsLater) {
+TEST_F(LUMLogMultiplexerDeathTest, EndsTheProgramIfAnAsyncLoggerThrowsLater) {
   const auto logTo = [&](const Ref<TestAsyncLogger>& logger) {
     multiplexer_->addAsyncLogger(logger);
     log();
@@ -237,7 +237,7 @@ TEST_F(LUMLogMultiplexerDeathTest, EndsTheProgramByWhatAnAsyncLoggerThrowsLater)
   EXPECT_DEATH(logTo(withoutQueue), line + "\"LUMLogMultiplexer\": by its queue");
 }
 
-// The labels of the queues that had a task which threw.
+// The labels of the queues in which a task threw.
 Trace uncaught;
 
 class LUMLogMultiplexerUncaughtTest : public LUMLogMultiplexerTest {
@@ -249,8 +249,8 @@ class LUMLogMultiplexerUncaughtTest : public LUMLogMultiplexerTest {
   ~LUMLogMultiplexerUncaughtTest() override { rt::Queue::setUncaughtExceptionHandler(nullptr); }
 };
 
-TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereAnAsyncLoggerThrowsLater) {
-  bool throws = true;  // Touched by tasks of the queue only.
+TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnAfterAnAsyncLoggerThrowsLater) {
+  bool throws = true;  // Used by tasks of the queue only.
   multiplexer_->addAsyncLogger(rt::make<TestAsyncLogger>(queue_, [&](const Ref<LUMLogMessage>& message) {
     if (std::exchange(throws, false)) throw Thrown();
     trace_.add(text(*message));
@@ -263,8 +263,8 @@ TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereAnAsyncLoggerThrowsLater) {
   EXPECT_THAT(uncaught.events(), ElementsAre("logger"));
 }
 
-TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereTheFilterOfAnAsyncLoggerThrowsLater) {
-  bool throws = true;  // Touched by tasks of the queue only.
+TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnAfterTheFilterOfAnAsyncLoggerThrowsLater) {
+  bool throws = true;  // Used by tasks of the queue only.
   multiplexer_->addAsyncLogger(async("async", rt::make<TestFilter>([&](const LUMLogMessage&) {
                                        if (queue_->isCurrent() && std::exchange(throws, false)) {
                                          throw Thrown();
@@ -279,10 +279,10 @@ TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereTheFilterOfAnAsyncLoggerThrowsL
   EXPECT_THAT(uncaught.events(), IsEmpty());
 }
 
-// Those that come after it miss the message, whichever these are.
-TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereAnAsyncLoggerThrowsWhenItIsAskedForItsQueue) {
+// The loggers that come after it miss the message. Their order is unspecified.
+TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnAfterAnAsyncLoggerThrowsInOperationQueue) {
   Trace asked;
-  bool throws = true;  // Touched by tasks of the multiplexer's queue only.
+  bool throws = true;  // Used by tasks of the multiplexer's queue only.
   const auto add = [&](const std::string& name, bool isThrowing) {
     const Ref<TestAsyncLogger> logger = async(name);
     logger->operationQueue_ = [&, name, isThrowing] {
@@ -307,8 +307,8 @@ TEST_F(LUMLogMultiplexerUncaughtTest, GoesOnWhereAnAsyncLoggerThrowsWhenItIsAske
   EXPECT_THAT(uncaught.events(), IsEmpty());
 }
 
-// One that blocks holds up its own caller only.
-TEST_F(LUMLogMultiplexerTest, ALoggerThatBlocksHoldsNobodyElseUp) {
+// A logger that waits delays only the thread that called it.
+TEST_F(LUMLogMultiplexerTest, ALoggerThatWaitsDelaysOnlyItsOwnCaller) {
   std::latch isBlocked(1);
   std::latch mayGoOn(1);
   multiplexer_->addSyncLogger(rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) {
@@ -334,11 +334,11 @@ TEST_F(LUMLogMultiplexerTest, ALoggerThatBlocksHoldsNobodyElseUp) {
   EXPECT_THAT(trace_.events(), ElementsAre("unblocked"));
 }
 
-TEST_F(LUMLogMultiplexerTest, ALoggerThatRemovesItselfHearsNoMore) {
+TEST_F(LUMLogMultiplexerTest, ALoggerThatRemovesItselfGetsNoMoreMessages) {
   Ref<LUMSyncLogger> leaving;
   leaving = rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>&) {
     multiplexer_->removeSyncLogger(leaving);
-    leaving = nullptr;  // The last reference but the one that the delivery has.
+    leaving = nullptr;  // The last reference apart from the delivery's own.
     trace_.add("leaving");
   });
   multiplexer_->addSyncLogger(leaving);

@@ -1,4 +1,4 @@
-// Which system logger takes the place of which.
+// Tests which system logger replaces which.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -29,13 +29,13 @@ class LUMLogMultiplexerSystemLoggerTest : public LUMLogMultiplexerTest {
   const Ref<LUMLogMultiplexer> systemMultiplexer_ = LUMLogMultiplexer::initWithSystemLogger(first_);
 };
 
-TEST_F(LUMLogMultiplexerSystemLoggerTest, TheFirstThatIsAddedTakesThePlaceOfTheFirst) {
+TEST_F(LUMLogMultiplexerSystemLoggerTest, TheFirstAddedReplacesTheOriginal) {
   systemMultiplexer_->addSyncLogger(system("second"));
   EXPECT_THAT(heard(), ElementsAre("second"));
 }
 
-// On purpose: only the one from the start is replaced.
-TEST_F(LUMLogMultiplexerSystemLoggerTest, TheNextThatIsAddedJoinsTheOneBefore) {
+// Deliberate: only the original is replaced.
+TEST_F(LUMLogMultiplexerSystemLoggerTest, TheSecondAddedReplacesNothing) {
   systemMultiplexer_->addSyncLogger(system("second"));
   systemMultiplexer_->addSyncLogger(system("third"));
   EXPECT_THAT(heard(), UnorderedElementsAre("second", "third"));
@@ -43,21 +43,21 @@ TEST_F(LUMLogMultiplexerSystemLoggerTest, TheNextThatIsAddedJoinsTheOneBefore) {
   EXPECT_THAT(heard(), UnorderedElementsAre("second", "third", "fourth"));
 }
 
-TEST_F(LUMLogMultiplexerSystemLoggerTest, OtherLoggersReplaceNone) {
+TEST_F(LUMLogMultiplexerSystemLoggerTest, OtherLoggersReplaceNothing) {
   systemMultiplexer_->addSyncLogger(sync("sync"));
   EXPECT_THAT(heard(), UnorderedElementsAre("first", "sync"));
   systemMultiplexer_->addSyncLogger(system("second"));
   EXPECT_THAT(heard(), UnorderedElementsAre("second", "sync"));
 }
 
-TEST_F(LUMLogMultiplexerSystemLoggerTest, AddedAgainTheFirstStaysForGood) {
+TEST_F(LUMLogMultiplexerSystemLoggerTest, TheOriginalStaysForGoodIfAddedAgain) {
   systemMultiplexer_->addSyncLogger(first_);
   EXPECT_THAT(heard(), ElementsAre("first"));
   systemMultiplexer_->addSyncLogger(system("second"));
   EXPECT_THAT(heard(), UnorderedElementsAre("first", "second"));
 }
 
-TEST_F(LUMLogMultiplexerSystemLoggerTest, RemovedAndAddedTheFirstIsNotReplacedTwice) {
+TEST_F(LUMLogMultiplexerSystemLoggerTest, TheOriginalStaysIfAddedAfterItsReplacement) {
   systemMultiplexer_->removeSyncLogger(first_);
   EXPECT_THAT(heard(), IsEmpty());
   systemMultiplexer_->addSyncLogger(system("second"));
@@ -65,13 +65,13 @@ TEST_F(LUMLogMultiplexerSystemLoggerTest, RemovedAndAddedTheFirstIsNotReplacedTw
   EXPECT_THAT(heard(), UnorderedElementsAre("first", "second"));
 }
 
-TEST_F(LUMLogMultiplexerSystemLoggerTest, WithoutOneAtTheStartNoneIsReplaced) {
+TEST_F(LUMLogMultiplexerSystemLoggerTest, NothingIsReplacedWithoutAnOriginal) {
   multiplexer_->addSyncLogger(system("a"));
   multiplexer_->addSyncLogger(system("b"));
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("a", "b"));
 }
 
-TEST_F(LUMLogMultiplexerSystemLoggerTest, IsGivenUpWhenItIsReplaced) {
+TEST_F(LUMLogMultiplexerSystemLoggerTest, TheOriginalIsReleasedWhenReplaced) {
   Ref<LUMSystemLogger> kept = system("first");
   const rt::Weak<LUMSystemLogger> weak = kept;
   const auto multiplexer = LUMLogMultiplexer::initWithSystemLogger(std::move(kept));

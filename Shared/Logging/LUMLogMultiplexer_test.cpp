@@ -1,6 +1,9 @@
-// What a multiplexer is, and who belongs to it. How messages are delivered is in
-// LUMLogMultiplexer_delivery_test.cpp and LUMLogMultiplexer_isolation_test.cpp, system loggers are in
-// LUMLogMultiplexer_systemLogger_test.cpp, many threads at once in LUMLogMultiplexer_threads_test.cpp.
+// Tests the parts of a multiplexer, and how filters and loggers are added and removed. Other files test the
+// rest:
+//
+// - LUMLogMultiplexer_delivery_test.cpp and LUMLogMultiplexer_isolation_test.cpp test deliveries.
+// - LUMLogMultiplexer_systemLogger_test.cpp tests system loggers.
+// - LUMLogMultiplexer_threads_test.cpp tests many threads.
 
 #include "Shared/Logging/LUMLogMultiplexer.h"
 
@@ -29,7 +32,7 @@ using testing::ElementsAre;
 using testing::IsEmpty;
 using testing::UnorderedElementsAre;
 
-// What is equal to another where the names are equal, and does something when it is compared.
+// Compares equal to an object with the same name, and calls `whenCompared` at each comparison.
 class Name {
  public:
   explicit Name(rt::String name) : name_(std::move(name)) {}
@@ -110,9 +113,9 @@ class NamedAsyncLogger final : public rt::Implements<NamedAsyncLogger, rt::Objec
   const TestSyncLogger::Action action_;
 };
 
-// What it is made of.
+// The parts of a multiplexer.
 
-TEST_F(LUMLogMultiplexerTest, HasASerialQueueOfItsOwn) {
+TEST_F(LUMLogMultiplexerTest, HasItsOwnSerialQueue) {
   EXPECT_EQ(multiplexer_->loggingQueue()->label(), "LUMLogMultiplexer");
   EXPECT_EQ(multiplexer_->loggingQueue()->qualityOfService(), rt::QualityOfService::kUtility);
   EXPECT_EQ(multiplexer_->loggingQueue()->relativePriority(), 0);
@@ -120,7 +123,7 @@ TEST_F(LUMLogMultiplexerTest, HasASerialQueueOfItsOwn) {
   EXPECT_NE(multiplexer_->loggingQueue(), LUMLogMultiplexer::init()->loggingQueue());
 }
 
-TEST_F(LUMLogMultiplexerTest, CapturesAddressesUnlessToldOtherwise) {
+TEST_F(LUMLogMultiplexerTest, CapturesAddressesByDefault) {
   for (const Ref<LUMLogMultiplexer>& multiplexer : {multiplexer_, LUMLogMultiplexer::init()}) {
     auto& control = *rt::cast<LUMLogAppControl>(multiplexer.get());
     EXPECT_TRUE(control.captureCallStack());
@@ -144,18 +147,18 @@ TEST_F(LUMLogMultiplexerTest, CapturesAddressesUnlessToldOtherwise) {
   }
 }
 
-TEST_F(LUMLogMultiplexerTest, IsMultiplexingAndAppControl) {
+TEST_F(LUMLogMultiplexerTest, ConformsToMultiplexingAndAppControl) {
   rt::Object* const object = LUMLogMultiplexer::sharedInstance().get();
   EXPECT_NE(rt::cast<LUMLogMultiplexing>(object), nullptr);
   EXPECT_NE(rt::cast<LUMLogAppControl>(object), nullptr);
 }
 
-TEST_F(LUMLogMultiplexerTest, BeginsWithTheSystemLoggerThatItIsGiven) {
+TEST_F(LUMLogMultiplexerTest, StartsWithTheGivenSystemLogger) {
   LUMLogMultiplexer::initWithSystemLogger(system("system"))->logWithMessage(messageWith(1));
   EXPECT_THAT(trace_.events(), ElementsAre("system"));
 }
 
-TEST_F(LUMLogMultiplexerDeathTest, SharesOneInstanceThatAllThreadsMakeAtOnce) {
+TEST_F(LUMLogMultiplexerDeathTest, GivesAllThreadsTheSameSharedInstance) {
   const auto body = [] {
     constexpr int kThreads = 8;
     std::latch mayStart(kThreads);
@@ -177,8 +180,8 @@ TEST_F(LUMLogMultiplexerDeathTest, SharesOneInstanceThatAllThreadsMakeAtOnce) {
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "");
 }
 
-// Used at exit by whoever logs there, so it is not destroyed.
-TEST_F(LUMLogMultiplexerDeathTest, DeliversUntilTheProcessIsGone) {
+// Never destroyed, because code may log at exit.
+TEST_F(LUMLogMultiplexerDeathTest, DeliversUntilTheProcessEnds) {
   const auto body = [] {
     std::atexit([] {
       LUMLogMultiplexer::sharedInstance()->logWithMessage(messageWith(LUMLogLevelInfo, "at exit"_s));
@@ -192,7 +195,7 @@ TEST_F(LUMLogMultiplexerDeathTest, DeliversUntilTheProcessIsGone) {
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "heard at exit\\.");
 }
 
-TEST_F(LUMLogMultiplexerDeathTest, DeliversWhatIsQueuedWhenTheProcessExits) {
+TEST_F(LUMLogMultiplexerDeathTest, DeliversQueuedMessagesAtExit) {
   const auto body = [] {
     const auto queue = rt::make<Queue>("logger"_s);
     const auto multiplexer = LUMLogMultiplexer::initWithSystemLogger(nullptr);
@@ -207,7 +210,7 @@ TEST_F(LUMLogMultiplexerDeathTest, DeliversWhatIsQueuedWhenTheProcessExits) {
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "heard 18\\.heard 19\\.");
 }
 
-// Nothing.
+// Null, absent and duplicate objects.
 
 TEST_F(LUMLogMultiplexerTest, IgnoresNull) {
   multiplexer_->addLogFilter(nullptr);
@@ -233,7 +236,7 @@ TEST_F(LUMLogMultiplexerTest, IgnoresNull) {
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("filter", "sync", "async"));
 }
 
-TEST_F(LUMLogMultiplexerTest, RemovesWhatIsNotThere) {
+TEST_F(LUMLogMultiplexerTest, IgnoresRemovingWhatIsNotPresent) {
   multiplexer_->removeLogFilter(filter("filter", false));
   multiplexer_->removeSyncLogger(sync("sync"));
   multiplexer_->removeAsyncLogger(async("async"));
@@ -244,7 +247,7 @@ TEST_F(LUMLogMultiplexerTest, RemovesWhatIsNotThere) {
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("another sync", "another async"));
 }
 
-TEST_F(LUMLogMultiplexerTest, AddsOnceWhatIsThere) {
+TEST_F(LUMLogMultiplexerTest, IgnoresAddingWhatIsPresent) {
   const auto passing = filter("filter", true);
   const auto syncLogger = sync("sync");
   const auto asyncLogger = async("async");
@@ -260,7 +263,7 @@ TEST_F(LUMLogMultiplexerTest, AddsOnceWhatIsThere) {
   EXPECT_THAT(logAndDrain(), IsEmpty());
 }
 
-TEST_F(LUMLogMultiplexerTest, TakesEqualFiltersAndLoggersForOne) {
+TEST_F(LUMLogMultiplexerTest, TreatsEqualFiltersAndLoggersAsOne) {
   const auto filterCalled = [&](const char* name, const char* event) {
     return rt::make<NamedFilter>(rt::String::fromUTF8(name), [this, event](const LUMLogMessage&) {
       trace_.add(event);
@@ -290,7 +293,7 @@ TEST_F(LUMLogMultiplexerTest, TakesEqualFiltersAndLoggersForOne) {
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("other filter", "other sync", "other async"));
 }
 
-// What compares loggers is the loggers' code, which may use the multiplexer; no change is lost.
+// Comparing loggers runs their code, which may use the multiplexer. No change is lost.
 TEST_F(LUMLogMultiplexerTest, MayBeUsedWhileLoggersAreCompared) {
   multiplexer_->addSyncLogger(rt::make<NamedSyncLogger>("a"_s, tracing("a")));
   const auto logger = rt::make<NamedSyncLogger>("b"_s, tracing("b"));
@@ -305,7 +308,7 @@ TEST_F(LUMLogMultiplexerTest, MayBeUsedWhileLoggersAreCompared) {
   EXPECT_THAT(logAndDrain(), UnorderedElementsAre("a", "b", "c"));
 }
 
-TEST_F(LUMLogMultiplexerTest, HoldsNoLockWhenItGivesUpFiltersAndLoggers) {
+TEST_F(LUMLogMultiplexerTest, HoldsNoLockWhenItReleasesFiltersAndLoggers) {
   int count = 0;
   const auto ending = [&] {
     return AtEnd([&] {
@@ -313,7 +316,7 @@ TEST_F(LUMLogMultiplexerTest, HoldsNoLockWhenItGivesUpFiltersAndLoggers) {
       inAnotherThread([&] { multiplexer_->removeLogFilter(LUMLogNoFilter::init()); });
     });
   };
-  // Nobody but the multiplexer has these.
+  // Only the multiplexer retains these.
   multiplexer_->addLogFilter(
       rt::make<NamedFilter>("a"_s, [end = ending()](const LUMLogMessage&) { return true; }));
   multiplexer_->addSyncLogger(
@@ -328,7 +331,7 @@ TEST_F(LUMLogMultiplexerTest, HoldsNoLockWhenItGivesUpFiltersAndLoggers) {
   multiplexer_->removeAsyncLogger(rt::make<NamedAsyncLogger>("a"_s, queue_, nullptr));
   EXPECT_EQ(count, 3);
 
-  // The system logger that another takes the place of, too.
+  // The same holds for the system logger that another one replaces.
   const auto multiplexer = LUMLogMultiplexer::initWithSystemLogger(
       rt::make<TestSystemLogger>([end = AtEnd([&] {
                                     ++count;
@@ -338,7 +341,7 @@ TEST_F(LUMLogMultiplexerTest, HoldsNoLockWhenItGivesUpFiltersAndLoggers) {
   EXPECT_EQ(count, 4);
 }
 
-TEST_F(LUMLogMultiplexerTest, ChangesNothingWhereComparingThrows) {
+TEST_F(LUMLogMultiplexerTest, ChangesNothingIfComparingThrows) {
   const auto multiplexer = LUMLogMultiplexer::initWithSystemLogger(system("first system"));
   const auto hostile = rt::make<NamedSyncLogger>("hostile"_s, tracing("hostile"));
   multiplexer->addSyncLogger(hostile);
@@ -347,7 +350,7 @@ TEST_F(LUMLogMultiplexerTest, ChangesNothingWhereComparingThrows) {
   EXPECT_THROW(multiplexer->removeSyncLogger(rt::make<NamedSyncLogger>("hostile"_s, nullptr)), Thrown);
   multiplexer->logWithMessage(messageWith(LUMLogLevelInfo));
   EXPECT_THAT(trace_.events(), UnorderedElementsAre("first system", "hostile"));
-  // Which system logger is to be replaced is not forgotten.
+  // The multiplexer still knows which system logger to replace.
   hostile->name.whenCompared = nullptr;
   multiplexer->addSyncLogger(system("second system"));
   multiplexer->logWithMessage(messageWith(LUMLogLevelInfo));

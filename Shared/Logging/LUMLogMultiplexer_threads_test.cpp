@@ -1,7 +1,7 @@
-// The multiplexer used by many threads at once, while filters and loggers come and go.
+// Tests the multiplexer with many threads, while filters and loggers are added and removed.
 //
-// Invariants: a logger that is there all the time gets every message, once, and those of one thread in the
-// order in which it logged them; one that comes and goes gets some of them, once each and in the same order.
+// Invariants: a logger that is always present gets every message once, and those of one thread in the order
+// in which it logged them. A logger that is present at times gets some of them, also once each and in order.
 
 #include <gtest/gtest.h>
 #include <sys/wait.h>
@@ -30,7 +30,7 @@ using rt::Ref;
 
 constexpr std::size_t kThreads = 8;
 
-// A message that says whose it is and which one: the line is a number of the thread's own.
+// Makes a message that identifies its thread and its index. The index stands in the line.
 Ref<LUMLogMessage> numbered(LUMLogLevel level, std::size_t thread, std::uint64_t index) {
   return LUMLogMessage::initWithLevel(level, "numbered"_s, "numbered"_s,
                                       rt::String::fromUTF8(std::to_string(thread)), nullptr, index, nullptr,
@@ -41,7 +41,7 @@ std::size_t threadOf(const LUMLogMessage& message) {
   return static_cast<std::size_t>(message.file().integerValue());
 }
 
-// The indices of the messages that came, by the threads that logged them. Not locked.
+// The indices of the received messages, for each thread that logged. Not thread-safe.
 class Received {
  public:
   void add(const LUMLogMessage& message) { indices_.at(threadOf(message)).push_back(message.line()); }
@@ -67,7 +67,7 @@ class Received {
   std::array<std::vector<std::uint64_t>, kThreads> indices_;
 };
 
-// Runs `body(thread)` in kThreads threads and `other()` in one more, once and again until these are done.
+// Runs `body(thread)` in kThreads threads. Meanwhile repeats `other()` in one more thread.
 template <class Body, class Other>
 void inThreads(Body body, Other other) {
   std::atomic<bool> isDone = false;
@@ -99,10 +99,10 @@ class LUMLogMultiplexerThreadsTest : public testing::Test {
   const Ref<Queue> queue_ = rt::make<Queue>("logger"_s);
 };
 
-TEST_F(LUMLogMultiplexerThreadsTest, LosesNothingWhileFiltersAndLoggersComeAndGo) {
+TEST_F(LUMLogMultiplexerThreadsTest, LosesNoMessageWhileFiltersAndLoggersChange) {
   std::mutex mutex;
   Received bySync;
-  Received byAsync;  // Touched by tasks of the queue only.
+  Received byAsync;  // Used by tasks of the queue only.
   multiplexer_->addSyncLogger(rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) {
     const std::scoped_lock guard(mutex);
     bySync.add(*message);
@@ -120,7 +120,7 @@ TEST_F(LUMLogMultiplexerThreadsTest, LosesNothingWhileFiltersAndLoggersComeAndGo
       [&](std::size_t thread) {
         for (std::uint64_t i = 0; i < kMessages; ++i) {
           multiplexer_->logWithMessage(numbered(LUMLogLevelInfo, thread, i));
-          // Everybody adds and removes something now and then.
+          // Each thread adds and removes something now and then.
           if (i % 16 != 0) continue;
           const Ref<LUMLogFilter> own = LUMLogNoFilter::init();
           multiplexer_->addLogFilter(own);
@@ -155,10 +155,10 @@ TEST_F(LUMLogMultiplexerThreadsTest, LosesNothingWhileFiltersAndLoggersComeAndGo
   byPassingAsync.expectSomeInOrder();
 }
 
-// A logger that logs from within, about every tenth message, once more.
-TEST_F(LUMLogMultiplexerThreadsTest, LosesNothingOfWhatLoggersLogFromWithin) {
+// One logger logs another message for every tenth that it gets.
+TEST_F(LUMLogMultiplexerThreadsTest, LosesNoMessageThatLoggersLog) {
   std::atomic<std::uint64_t> bySync = 0;
-  std::uint64_t byAsync = 0;  // Touched by tasks of the queue only.
+  std::uint64_t byAsync = 0;  // Used by tasks of the queue only.
   std::uint64_t byAsyncFromWithin = 0;
   multiplexer_->addSyncLogger(rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) {
     ++bySync;
@@ -188,15 +188,15 @@ TEST_F(LUMLogMultiplexerThreadsTest, LosesNothingOfWhatLoggersLogFromWithin) {
         multiplexer_->removeSyncLogger(logger);
       });
   drain();
-  drain();  // What the queue's tasks logged.
+  drain();  // Delivers what the queue's tasks have logged.
   constexpr std::uint64_t kTenths = kThreads * kMessages / 10;
   EXPECT_EQ(bySync, kThreads * kMessages + 2 * kTenths);
   EXPECT_EQ(byAsync, kThreads * kMessages + kTenths);
   EXPECT_EQ(byAsyncFromWithin, kTenths);
 }
 
-// A logger that wants every seventh message at once gets each message once; those that it gets later are in
-// order, and so are those that it gets at once, which it has when the call returns.
+// A logger that wants every seventh message at once gets each message once. Deferred messages are in order.
+// Urgent ones are in order too, and have arrived when the call returns.
 TEST_F(LUMLogMultiplexerThreadsTest, GivesABlockingLoggerEachMessageOnce) {
   constexpr auto isUrgent = [](const LUMLogMessage& message) { return message.line() % 7 == 0; };
   Received later;
@@ -234,8 +234,8 @@ TEST_F(LUMLogMultiplexerThreadsTest, GivesABlockingLoggerEachMessageOnce) {
   EXPECT_EQ(later.count(), kThreads * (kMessages - urgent));
 }
 
-// Of the changes that threads make at once, none is lost.
-TEST_F(LUMLogMultiplexerThreadsTest, KeepsEveryChange) {
+// Changes that threads make at once are all kept.
+TEST_F(LUMLogMultiplexerThreadsTest, KeepsConcurrentChanges) {
   constexpr std::uint64_t kEach = 50;
   std::atomic<std::uint64_t> asked = 0;
   std::atomic<std::uint64_t> heard = 0;
@@ -264,11 +264,11 @@ TEST_F(LUMLogMultiplexerThreadsTest, KeepsEveryChange) {
   EXPECT_EQ(heardLater, kThreads * kEach);
 }
 
-// One logger throws, one leaves and comes back, one logs a fault from within, one takes its time: whoever is
-// there all the time misses nothing that was logged before something was thrown.
+// One logger throws, one removes and adds itself, one logs a fault, and one waits. A logger that is always
+// present misses no message that was logged before the exception.
 TEST_F(LUMLogMultiplexerThreadsTest, KeepsItsPromisesAmongHostileLoggers) {
   struct Thrown {};
-  std::uint64_t byAsync = 0;  // Touched by tasks of the queue only.
+  std::uint64_t byAsync = 0;  // Used by tasks of the queue only.
   std::atomic<std::uint64_t> thrown = 0;
   multiplexer_->addAsyncLogger(rt::make<TestAsyncLogger>(queue_, [&](const Ref<LUMLogMessage>& message) {
     if (message->level() == LUMLogLevelInfo) ++byAsync;
@@ -336,7 +336,7 @@ TEST_F(LUMLogMultiplexerThreadsTest, IsUsableInTheChildOfAFork) {
   for (int i = 0; i < kForks && status == 0; ++i) {
     const pid_t child = fork();
     if (child == 0) {
-      alarm(kPatienceInSeconds);  // Ends a child that waits for a thread which it does not have.
+      alarm(kPatienceInSeconds);  // Ends a child that waits for a thread that it does not have.
       const std::uint64_t heardBefore = heard;
       multiplexer_->logWithMessage(message);
       multiplexer_->addSyncLogger(rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>&) { ++heard; }));

@@ -1,10 +1,10 @@
 #pragma once
 
-/// Lets every message pass: for where a filter must be and nothing is to be held back.
+/// Lets every message pass, for code that requires a filter.
 ///
 ///     rt::Ref<LUMLogFilter> filter = LUMLogNoFilter::init();
 ///
-/// Not for: a logger's `filter`, which may be null.
+/// Not for: a logger's `filter`, which may be null instead.
 
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Class.h"

@@ -1,3 +1,7 @@
+// `LUMLog` gets files and functions as C strings, mostly the same few again. The table finds the string of
+// each by its address. It compares the text each time, since a library may have been unloaded and another may
+// have taken its place.
+
 #include "Shared/Logging/LUMLogSourceText.h"
 
 #include <array>
@@ -8,7 +12,7 @@
 
 namespace {
 
-/// One text that is known. Once written it stays.
+// A remembered text and its string. Each is written once.
 struct Slot {
   std::atomic<const char*> text{nullptr};
   std::atomic<rt::StringObject*> string{nullptr};
@@ -16,12 +20,12 @@ struct Slot {
 
 constexpr std::size_t kProbes = 8;
 
-// Twice as many as are remembered, so that most texts are found at the first look.
+// Twice as many slots as remembered texts, so that most texts are found at the first probe.
 constinit std::array<Slot, 2 * kLUMLogSourceTextCount> slots;
 constinit std::atomic<std::size_t> count{0};
 
 std::size_t firstSlotOf(const char* text) noexcept {
-  // Texts of one file lie side by side, at any address.
+  // The texts of one file are neighbours in memory, so the bits of the address are mixed.
   const std::uint64_t mixed = reinterpret_cast<std::uintptr_t>(text) * 0x9E3779B97F4A7C15U;
   return (mixed >> 40) % slots.size();
 }
@@ -30,8 +34,8 @@ bool isStill(const char* text, std::string_view string) noexcept {
   return std::strncmp(text, string.data(), string.size()) == 0 && text[string.size()] == '\0';
 }
 
-/// The string of a known text, which has not changed; or the slot for one that is to be known, which is
-/// nobody else's from now on; or neither.
+// The result of a look-up. A known text that has not changed has its string. A new text may get a free slot,
+// which the caller then owns.
 struct Found {
   rt::StringObject* string = nullptr;
   Slot* slot = nullptr;
@@ -55,7 +59,7 @@ Found find(const char* text) noexcept {
       return {string, nullptr};
     }
   }
-  // Other texts have all of its places, of which a half is free when the most are kept.
+  // Other texts occupy all the probed slots. That is rare, because at least half of all slots stay free.
   return {};
 }
 

@@ -1,15 +1,17 @@
 #pragma once
 
-/// The texts of call sites, which are the same few at every message, as strings that are made once.
+/// Turns the texts of call sites, which recur with every message, into strings that are made once.
 ///
 ///     rt::String file = LUMLogSourceText(__FILE__);
 ///
-/// A text that was seen before costs a look and a comparison; its string is shared and not even counted. So
-/// that memory is bounded whatever callers pass, about `kLUMLogSourceTextCount` texts are remembered at most,
-/// and none that is longer than `kLUMLogSourceTextLength`; of others the string is made each time. A text
-/// that has changed since, as that of a library may that took the place of another, is noticed.
+/// A known text costs a look-up and a comparison. Its string is shared, and its references are not counted.
 ///
-/// Not for: texts that are made at run time.
+/// Memory is bounded whatever callers pass. About `kLUMLogSourceTextCount` texts are remembered at most, and
+/// none longer than `kLUMLogSourceTextLength`. The string of any other text is made at each call. The
+/// comparison detects a text that has changed, as can happen when one library is loaded where another was
+/// unloaded.
+///
+/// Not for: texts made at run time.
 
 #include <cstddef>
 
@@ -18,6 +20,7 @@
 inline constexpr std::size_t kLUMLogSourceTextCount = 4096;
 inline constexpr std::size_t kLUMLogSourceTextLength = 1024;
 
-/// `text`, which ends with NUL, as a string; null where it is not UTF-8, and for null. Any thread may call
-/// it; it takes no lock. Throws std::bad_alloc.
+/// Returns the string of `text`, which ends with NUL. Null if `text` is null or not UTF-8. Throws
+/// std::bad_alloc.
+/// Threads: thread-safe and lock-free.
 rt::String LUMLogSourceText(const char* text);

@@ -13,7 +13,7 @@ namespace {
 
 constexpr const char* kInvalid = "a\xFF";
 
-TEST(LUMLogSourceText, IsTheTextAsAString) {
+TEST(LUMLogSourceText, ReturnsTheTextAsAString) {
   EXPECT_EQ(LUMLogSourceText("a/b.cpp"), "a/b.cpp");
   EXPECT_EQ(LUMLogSourceText(""), "");
   EXPECT_TRUE(LUMLogSourceText(nullptr).isNull());
@@ -21,7 +21,7 @@ TEST(LUMLogSourceText, IsTheTextAsAString) {
   EXPECT_TRUE(LUMLogSourceText(kInvalid).isNull());
 }
 
-TEST(LUMLogSourceText, MakesOneStringOfAText) {
+TEST(LUMLogSourceText, MakesOneStringPerText) {
   const char* text = "Shared/Logging/LUMLogSourceText";
   LUMLogSourceText(text);
   const rt::String string = LUMLogSourceText(text);
@@ -32,7 +32,7 @@ TEST(LUMLogSourceText, MakesOneStringOfAText) {
   EXPECT_EQ(count.allocations(), 0);
 }
 
-TEST(LUMLogSourceText, NoticesThatATextHasChanged) {
+TEST(LUMLogSourceText, DetectsThatATextHasChanged) {
   static char text[] = "first text";
   EXPECT_EQ(LUMLogSourceText(text), "first text");
   EXPECT_EQ(LUMLogSourceText(text), "first text");
@@ -44,15 +44,15 @@ TEST(LUMLogSourceText, NoticesThatATextHasChanged) {
   EXPECT_EQ(LUMLogSourceText(text), "first text");
 }
 
-// It was taken for the text that it begins with.
-TEST(LUMLogSourceText, NoticesThatATextHasGrown) {
+// Such a text used to be taken for its own beginning.
+TEST(LUMLogSourceText, DetectsThatATextHasGrown) {
   static char text[] = "first\0text";
   EXPECT_EQ(LUMLogSourceText(text), "first");
   text[5] = ' ';
   EXPECT_EQ(LUMLogSourceText(text), "first text");
 }
 
-TEST(LUMLogSourceText, RemembersNoLongTexts) {
+TEST(LUMLogSourceText, DoesNotRememberLongTexts) {
   const std::string longest(kLUMLogSourceTextLength, 'x');
   const std::string longer(kLUMLogSourceTextLength + 1, 'x');
   EXPECT_EQ(LUMLogSourceText(longest.c_str()), longest);
@@ -62,8 +62,8 @@ TEST(LUMLogSourceText, RemembersNoLongTexts) {
   EXPECT_NE(LUMLogSourceText(longer.c_str()).object(), first.object());
 }
 
-// However many texts there are, each comes out as it is, on all threads.
-TEST(LUMLogSourceText, IsRightBeyondWhatIsRemembered) {
+// However many texts there are, each comes out unchanged, on all threads.
+TEST(LUMLogSourceText, IsRightForTextsThatAreNotRemembered) {
   std::vector<std::string> texts;
   for (std::size_t i = 0; i < 2 * kLUMLogSourceTextCount; ++i) texts.push_back("text " + std::to_string(i));
   const auto readAll = [&] {

@@ -9,7 +9,7 @@
 
 rt::Ref<LUMLogSymbolCallstack> LUMLogSymbolCallstack::symbolCallstackIgnoringFrameCount(
     std::uint64_t count) try {
-  // The first address lies in this function.
+  // The first address is in this function.
   std::vector<std::uint64_t> addresses(128);
   std::size_t depth = rt::CallStack::capture(addresses);
   while (depth == addresses.size()) {
@@ -18,7 +18,7 @@ rt::Ref<LUMLogSymbolCallstack> LUMLogSymbolCallstack::symbolCallstackIgnoringFra
   }
   if (depth <= count) return nullptr;
 
-  // Each line tells its place in the whole stack.
+  // Each line states its index in the whole stack, so lines are made for the whole stack.
   const std::vector<rt::String> all = rt::CallStack::symbols(std::span(addresses).first(depth));
   std::vector<rt::Ref<rt::Object>> kept(all.begin() + static_cast<std::ptrdiff_t>(count) + 1, all.end());
   return initWithSymbols(rt::make<rt::Array>(std::move(kept)));

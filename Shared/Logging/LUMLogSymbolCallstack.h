@@ -1,13 +1,13 @@
 #pragma once
 
-/// A call stack as text: a line for each call, the innermost first.
+/// A call stack as text, with one line per call, innermost first.
 ///
 ///     rt::Ref<LUMLogSymbolCallstack> stack = LUMLogSymbolCallstack::symbolCallstackIgnoringFrameCount(0);
 ///     for (const rt::Ref<rt::Object>& line : *stack->symbols()) ...
 ///
-/// Immutable: any thread may use it.
+/// Threads: thread-safe, because it is immutable.
 ///
-/// Not for: every message, since looking up names takes long; see LUMLogAddressCallstack.
+/// Not for: every message, because looking up symbols is slow; see LUMLogAddressCallstack.
 
 #include <cstdint>
 #include <utility>
@@ -23,22 +23,23 @@
 class RT_VISIBLE LUMLogSymbolCallstack
     : public rt::Implements<LUMLogSymbolCallstack, rt::Object, LUMLogCallstack> {
  public:
-  /// Where the calling thread is, without its `count` innermost calls, of which the caller of this function
-  /// is the first. Null if the stack has no more than `count` calls, this one included, and without memory.
+  /// Captures the calling thread's stack without its `count` innermost calls, counted from the caller of this
+  /// function. Returns null if the stack has at most `count` calls, including that of this function. Returns
+  /// null if memory runs out.
   [[gnu::noinline]] static rt::Ref<LUMLogSymbolCallstack> symbolCallstackIgnoringFrameCount(
       std::uint64_t count);
 
-  /// With `symbols`, strings; may be null. Throws std::bad_alloc.
+  /// Makes a call stack of `symbols`, an array of strings that may be null. Throws std::bad_alloc.
   static rt::Ref<LUMLogSymbolCallstack> initWithSymbols(rt::Ref<rt::Array> symbols);
 
-  /// As given. The form of the lines is that of Runtime/Process/CallStack.h, where they are from there.
+  /// Returns the lines as given. Captured lines have the form that Runtime/Process/CallStack.h describes.
   const rt::Ref<rt::Array>& symbols() const noexcept { return symbols_; }
 
-  /// Whether `other` is such a call stack with equal lines.
+  /// Returns whether `other` is a LUMLogSymbolCallstack with equal lines.
   bool isEqual(const rt::Object* other) const override;
   std::uint64_t hash() const override;
 
-  /// That of the lines, as an array; null for null.
+  /// Returns the description of `symbols`; null if `symbols` is null.
   rt::String description() const override;
 
  protected:

@@ -34,7 +34,7 @@ using testing::HasSubstr;
 
 constexpr const char* kInvalid = "a\xFF";
 
-/// Keeps what it is told.
+// Stores the messages that it gets.
 class Recorder final : public rt::Implements<Recorder, rt::Object, LUMSyncLogger> {
  public:
   void logWithMessage(const rt::Ref<LUMLogMessage>& message) override { messages.push_back(message); }
@@ -43,7 +43,7 @@ class Recorder final : public rt::Implements<Recorder, rt::Object, LUMSyncLogger
   std::vector<rt::Ref<LUMLogMessage>> messages;
 };
 
-/// The shared multiplexer with a recorder only.
+// Uses the shared multiplexer with a recorder as its only logger.
 class LUMLogTest : public testing::Test {
  protected:
   LUMLogTest() {
@@ -59,7 +59,7 @@ class LUMLogTest : public testing::Test {
     multiplexer_->setCaptureSwiftCallStackOnErrorAndAbove(false);
   }
 
-  /// A message by the entry for programs, with `arguments` passed as they are.
+  // Makes a message by the entry for generated code. Passes `arguments` as they are.
   template <class... Arguments>
   rt::Ref<LUMLogMessage> log(const std::vector<LUMLogArgumentKind>& kinds, const rt::String& format,
                              Arguments... arguments) {
@@ -92,7 +92,7 @@ TEST_F(LUMLogTest, LogsTheMessageThatItReturns) {
   EXPECT_EQ(message->logMetadata(), metadata);
 }
 
-TEST_F(LUMLogTest, ReturnsTheMessageThatAFilterRefuses) {
+TEST_F(LUMLogTest, ReturnsAMessageThatAFilterRefuses) {
   const rt::Ref<LUMLogFilter> filter = LUMLogDropAllFilter::init();
   multiplexer_->addLogFilter(filter);
   const rt::Ref<LUMLogMessage> message = LUMLogAt(LUMLogLevelError, "%d entries", 3);
@@ -103,7 +103,7 @@ TEST_F(LUMLogTest, ReturnsTheMessageThatAFilterRefuses) {
   EXPECT_TRUE(recorder_->messages.empty());
 }
 
-TEST_F(LUMLogTest, TellsWhereItIsCalled) {
+TEST_F(LUMLogTest, RecordsItsCallSite) {
   const unsigned line = __LINE__ + 1;
   const rt::Ref<LUMLogMessage> message = LUMLogAt(LUMLogLevelInfo, "%@ has %d entries", "a"_s, 3);
   EXPECT_EQ(message->format(), "%@ has %d entries");
@@ -122,7 +122,7 @@ TEST_F(LUMLogTest, TakesMetadataBeforeTheFormat) {
   EXPECT_EQ(message->file(), __FILE__);
 }
 
-TEST_F(LUMLogTest, SaysWhoIsLogging) {
+TEST_F(LUMLogTest, RecordsThreadAndQueue) {
   std::thread([] {
     rt::Thread::setCurrentName("Importer"_s);
     EXPECT_EQ(LUMLogAt(LUMLogLevelInfo, "text")->threadName(), "Importer");
@@ -133,7 +133,7 @@ TEST_F(LUMLogTest, SaysWhoIsLogging) {
   });
 }
 
-TEST_F(LUMLogTest, KeepsSafeParametersByTheirPlaceAmongAllArguments) {
+TEST_F(LUMLogTest, StoresSafeParametersByTheirIndexAmongAllArguments) {
   const rt::Ref<rt::Object> safe = LUMSafeStringParameter::parameterWithString("a"_s, 1);
   const rt::Ref<LUMLogMessage> first = log({1, 0}, "%@ %d"_s, object(safe), 7);
   EXPECT_EQ(first->formattedString(), "a 7");
@@ -144,7 +144,7 @@ TEST_F(LUMLogTest, KeepsSafeParametersByTheirPlaceAmongAllArguments) {
   const rt::Ref<LUMLogMessage> second = log({0, 1}, "%d %@"_s, 7, object(safe));
   EXPECT_TRUE(rt::isEqual(second->safeParameters(), rt::Dictionary::of({{rt::Number::of(1), safe}})));
 
-  // By the call for people as well.
+  // The same holds for `LUMLogAt`.
   const rt::Ref<LUMSafeNumberParameter> number =
       LUMSafeNumberParameter::parameterWithNumber(rt::Number::of(5), 2);
   const rt::Ref<LUMLogMessage> both =
@@ -161,7 +161,7 @@ TEST_F(LUMLogTest, ReadsEachKindOfArgument) {
     return static_cast<int>(
         rt::cast<rt::Number>(message->safeParameters()->begin()->first.get())->integerValue());
   };
-  // More than go in registers, so that a kind that is read wrongly shows.
+  // More arguments than fit in registers, so that reading one as a wrong kind shows.
   EXPECT_EQ(place(log({0, 2, 3, 4, 0, 2, 3, 4, 1}, "%d %u %s %p %ld %lu %s %p %@"_s, 1, 2U, "three",
                       static_cast<const void*>(nullptr), 5L, 6UL, "seven", static_cast<const void*>(nullptr),
                       object(safe))),
@@ -171,11 +171,11 @@ TEST_F(LUMLogTest, ReadsEachKindOfArgument) {
             9);
   EXPECT_EQ(place(log({6, 1}, "%Lg %@"_s, 1.0L, object(safe))), 1);
   EXPECT_EQ(place(log({0, 0, 0, 0, 0, 0, 6, 0, 1}, "%d"_s, 1, 2, 3, 4, 5, 6, 7.0L, 8, object(safe))), 8);
-  // For any other kind nothing is read, and the place counts.
+  // For any other kind no argument is read, but its index counts.
   EXPECT_EQ(place(log({7, 0, 0xFFFFFFFF, 1}, "%d %@"_s, 1, object(safe))), 3);
 }
 
-TEST_F(LUMLogTest, LooksAtNoMoreArgumentsThanItIsTold) {
+TEST_F(LUMLogTest, ReadsNoMoreArgumentsThanTheCount) {
   const rt::Ref<rt::Object> safe = LUMSafeStringParameter::parameterWithString("a"_s, 1);
   const LUMLogArgumentKind kinds[] = {1};
   for (const std::int32_t count : {0, -1, -2147483647 - 1}) {
@@ -186,7 +186,7 @@ TEST_F(LUMLogTest, LooksAtNoMoreArgumentsThanItIsTold) {
   }
 }
 
-/// An object with the name of a class that is like that of a safe parameter.
+// An object whose class name resembles that of a safe parameter.
 template <rt::detail::StringLiteral name>
 class Named final : public rt::Implements<Named<name>, rt::Object> {
  public:
@@ -194,7 +194,7 @@ class Named final : public rt::Implements<Named<name>, rt::Object> {
   rt::String description() const override { return "named"_s; }
 };
 
-TEST_F(LUMLogTest, KnowsSafeParametersByTheBeginningOfTheirClassNames) {
+TEST_F(LUMLogTest, RecognisesSafeParametersByThePrefixOfTheirClassNames) {
   const auto keeps = [&](const rt::Ref<rt::Object>& argument) {
     const rt::Ref<LUMLogMessage> message = log({1}, "%@"_s, argument.get());
     if (!message->safeParameters()) return false;
@@ -220,7 +220,7 @@ TEST_F(LUMLogTest, LogsWithoutAFormat) {
   EXPECT_EQ(recorder_->messages.size(), 1U);
 }
 
-TEST_F(LUMLogTest, ReplacesPlacesThatAreNotText) {
+TEST_F(LUMLogTest, ReplacesFileAndFunctionThatAreNotUTF8) {
   const auto logAt = [](const char* file, const char* function) {
     return LUMLog(LUMLogLevelInfo, file, function, 1, nullptr, 0, nullptr, "text"_s);
   };
@@ -234,7 +234,7 @@ TEST_F(LUMLogTest, ReplacesPlacesThatAreNotText) {
   EXPECT_EQ(logAt("", "")->function(), "");
 }
 
-TEST_F(LUMLogTest, HasACallStackAtTwoLevels) {
+TEST_F(LUMLogTest, CapturesACallStackAtTwoLevels) {
   const auto stackAt = [](LUMLogLevel level) { return LUMLogAt(level, "text")->callstack(); };
   for (const LUMLogLevel level :
        {LUMLogLevel{0}, LUMLogLevelDebug, LUMLogLevelInfo, LUMLogLevel{5}, ~LUMLogLevel{0}}) {
@@ -245,7 +245,7 @@ TEST_F(LUMLogTest, HasACallStackAtTwoLevels) {
     multiplexer_->setCaptureCallStackAddresses(false);
     EXPECT_TRUE(rt::cast<LUMLogSymbolCallstack>(stackAt(level))) << level;
     multiplexer_->setCaptureCallStackAddresses(true);
-    // The third switch changes nothing.
+    // The third switch has no effect.
     multiplexer_->setCaptureSwiftCallStackOnErrorAndAbove(true);
     EXPECT_TRUE(rt::cast<LUMLogAddressCallstack>(stackAt(level))) << level;
     multiplexer_->setCaptureSwiftCallStackOnErrorAndAbove(false);
@@ -255,7 +255,7 @@ TEST_F(LUMLogTest, HasACallStackAtTwoLevels) {
   }
 }
 
-TEST_F(LUMLogTest, HasNoCallStackBecauseOfTheThirdSwitch) {
+TEST_F(LUMLogTest, TheThirdSwitchAddsNoCallStack) {
   const auto stackAt = [](LUMLogLevel level) { return LUMLogAt(level, "text")->callstack(); };
   multiplexer_->setCaptureSwiftCallStackOnErrorAndAbove(true);
   for (const LUMLogLevel level : {LUMLogLevel{0}, LUMLogLevelInfo, LUMLogLevel{5}, ~LUMLogLevel{0}}) {
@@ -265,7 +265,7 @@ TEST_F(LUMLogTest, HasNoCallStackBecauseOfTheThirdSwitch) {
   for (const LUMLogLevel level : {LUMLogLevelError, LUMLogLevelFault}) EXPECT_FALSE(stackAt(level)) << level;
 }
 
-// What these log is the last thing that they do.
+// Logging is the last thing that these functions do.
 [[gnu::noinline]] rt::Ref<LUMLogMessage> functionThatLogs(const rt::Ref<LUMLogMetadata>& metadata) {
   return LUMLogAt(LUMLogLevelError, metadata, "%d", 1);
 }
@@ -279,7 +279,7 @@ TEST_F(LUMLogTest, HasNoCallStackBecauseOfTheThirdSwitch) {
   return message;
 }
 
-TEST_F(LUMLogTest, HasTheCallingFunctionFirstInItsCallStack) {
+TEST_F(LUMLogTest, TheCallStackBeginsWithTheCallingFunction) {
   for (const bool captureAddresses : {true, false}) {
     multiplexer_->setCaptureCallStackAddresses(captureAddresses);
     EXPECT_THAT(firstSymbolOf(*functionThatLogs(nullptr)), HasSubstr("functionThatLogs("));
@@ -296,13 +296,13 @@ rt::Ref<LUMLogMessage> messageOfList(const rt::Ref<LUMLogCallstack>& callstack,
   va_start(arguments, format);
   rt::Ref<LUMLogMessage> message = LUMLogV(9, "file"_s, nullptr, 5, callstack, metadata, count, kinds,
                                            rt::String::fromUTF8(format), arguments);
-  // The list is still where it was.
+  // The list has not been advanced.
   EXPECT_EQ(rt::formatV(format, arguments), message->formattedString());
   va_end(arguments);
   return message;
 }
 
-TEST_F(LUMLogTest, MakesAMessageOfAListWithoutLoggingIt) {
+TEST_F(LUMLogTest, LUMLogVMakesAMessageWithoutLoggingIt) {
   const rt::Ref<LUMLogCallstack> callstack = LUMLogSymbolCallstack::initWithSymbols(nullptr);
   const rt::Ref<LUMLogMetadata> metadata = LUMLogMetadata::init();
   const rt::Ref<rt::Object> safe = LUMSafeStringParameter::parameterWithString("a"_s, 1);
@@ -326,7 +326,7 @@ class Thrower final : public rt::Implements<Thrower, rt::Object> {
   rt::String description() const override { throw std::runtime_error("no description"); }
 };
 
-TEST_F(LUMLogTest, LetsADescriptionThrow) {
+TEST_F(LUMLogTest, ThrowsWhatADescriptionThrows) {
   const rt::Ref<Thrower> thrower = rt::make<Thrower>();
   EXPECT_THROW(LUMLogAt(LUMLogLevelInfo, "%@", thrower), std::runtime_error);
   EXPECT_TRUE(recorder_->messages.empty());
@@ -334,7 +334,7 @@ TEST_F(LUMLogTest, LetsADescriptionThrow) {
   EXPECT_EQ(recorder_->messages.size(), 1U);
 }
 
-/// Looks at what it is told, and keeps nothing.
+// Reads each message and stores nothing.
 class Reader final : public rt::Implements<Reader, rt::Object, LUMSyncLogger> {
  public:
   void logWithMessage(const rt::Ref<LUMLogMessage>& message) override {
@@ -345,7 +345,7 @@ class Reader final : public rt::Implements<Reader, rt::Object, LUMSyncLogger> {
   std::size_t length = 0;
 };
 
-/// With a reader in the recorder's place.
+// Uses a reader in place of the recorder.
 class LUMLogAllocationTest : public LUMLogTest {
  protected:
   void SetUp() override {
@@ -355,7 +355,7 @@ class LUMLogAllocationTest : public LUMLogTest {
   }
   void TearDown() override { multiplexer_->removeSyncLogger(reader_); }
 
-  /// How often `log` allocates once the place is known.
+  // Counts the allocations of `log`, after a first call that makes the source location known.
   template <class Body>
   static std::int64_t allocationsOf(Body body) {
     body();
@@ -371,33 +371,33 @@ class LUMLogAllocationTest : public LUMLogTest {
   const rt::Ref<Reader> reader_ = rt::make<Reader>();
 };
 
-// The message and its text.
+// One for the message and one for its text.
 TEST_F(LUMLogAllocationTest, AllocatesTwicePerMessage) {
   EXPECT_EQ(allocationsOfOneMessage(), 2);
 }
 
-// The addresses, which fit into the first buffer, and the object that has them.
+// One for the addresses, which fit into the first buffer, and one for their object.
 TEST_F(LUMLogAllocationTest, AllocatesTwiceMoreForACallStackOfAddresses) {
   for (const LUMLogLevel level : {LUMLogLevelError, LUMLogLevelFault}) {
     EXPECT_EQ(allocationsOf([=] { LUMLogAt(level, "%s has %d entries"_s, "holiday.tar", 3); }), 4);
   }
 }
 
-// The table and the object that has it, and of each parameter its place and its entry.
+// Two for the table and its object. Each parameter adds two, for its index and its entry.
 TEST_F(LUMLogAllocationTest, AllocatesFourTimesMoreForASafeParameterAndTwiceForEachFurtherOne) {
   const auto name = LUMSafeStringParameter::parameterWithString("holiday.tar"_s, 1);
   EXPECT_EQ(allocationsOf([&] { LUMLogAt(LUMLogLevelInfo, "%@ has %d entries"_s, name, 3); }), 6);
   EXPECT_EQ(allocationsOf([&] { LUMLogAt(LUMLogLevelInfo, "%@ is in %@ %d times"_s, name, name, 3); }), 8);
 }
 
-// The list of the loggers and the task that goes through it, however many there are.
+// One for the list of loggers and one for the task that walks it, for any number of loggers.
 TEST_F(LUMLogAllocationTest, AllocatesTwiceMoreForAsyncLoggers) {
   const auto queue = rt::make<rt::Queue>("logger"_s);
   std::vector<rt::Ref<LUMAsyncLogger>> loggers;
   for (int i = 0; i < 5; ++i) {
     loggers.emplace_back(rt::make<TestAsyncLogger>(queue, [](const rt::Ref<LUMLogMessage>&) {}));
     multiplexer_->addAsyncLogger(loggers.back());
-    // The task runs elsewhere, or nobody could say whose allocations these are.
+    // The task runs elsewhere, so that its allocations are not counted.
     std::latch isRunning(1);
     std::latch mayFanOut(1);
     multiplexer_->loggingQueue()->async([&] {
@@ -413,8 +413,8 @@ TEST_F(LUMLogAllocationTest, AllocatesTwiceMoreForAsyncLoggers) {
   queue->barrierSync();
 }
 
-// The task by which a message comes to a logger is made after the logger is asked for its queue, and before
-// the next one is.
+// The task for a logger is made after that logger's `operationQueue` returns, and before the next logger's is
+// called.
 TEST_F(LUMLogAllocationTest, AllocatesOnceForEachAsyncLoggerOnTheMultiplexersQueue) {
   const auto queue = rt::make<rt::Queue>("logger"_s);
   std::optional<AllocationCount> count;
@@ -432,7 +432,7 @@ TEST_F(LUMLogAllocationTest, AllocatesOnceForEachAsyncLoggerOnTheMultiplexersQue
     };
     multiplexer_->addAsyncLogger(loggers.back());
   }
-  // A queue that runs needs no thread, which would have to be made.
+  // A queue that is running needs no new thread, which would allocate.
   std::latch isRunning(1);
   std::latch mayLog(1);
   queue->async([&] {
@@ -448,7 +448,7 @@ TEST_F(LUMLogAllocationTest, AllocatesOnceForEachAsyncLoggerOnTheMultiplexersQue
   EXPECT_THAT(counts, testing::ElementsAre(1));
 }
 
-// What is logged before `main` is logged, whatever the order in which a program is initialized.
+// A message logged before `main` is logged, whatever the order of initialisation.
 struct LoggedWhileLoading {
   LoggedWhileLoading() : message(LUMLogAt(LUMLogLevelInfo, "loading %d", 1)) {}
   rt::Ref<LUMLogMessage> message;

@@ -1,14 +1,14 @@
 #pragma once
 
-/// Where messages go. A logger is either a LUMSyncLogger, called by whoever logs, or a LUMAsyncLogger,
-/// called on a queue of its own.
+/// A destination of messages. A logger is either a LUMSyncLogger, which runs on the thread that logs, or a
+/// LUMAsyncLogger, which runs on its own queue.
 ///
 ///     bool wants(const LUMLogger& logger, const LUMLogMessage& message) {
 ///       const rt::Ref<LUMLogFilter> filter = logger.filter();
 ///       return !filter || filter->allowLogMessage(message);
 ///     }
 ///
-/// Not for: classes to conform to directly; name one of the two.
+/// Not for: conforming directly. Conform to LUMSyncLogger or LUMAsyncLogger.
 
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Class.h"
@@ -17,10 +17,11 @@
 #include "Shared/Logging/LUMLogMessage.h"
 
 struct RT_VISIBLE LUMLogger : rt::Protocol<LUMLogger> {
-  /// Takes `message`, which is not null. No lock is held: it may log, and add and remove loggers.
+  /// Logs `message`, which is not null. Runs without a lock held, so it may log, and add and remove loggers.
   virtual void logWithMessage(const rt::Ref<LUMLogMessage>& message) = 0;
 
-  /// What decides which messages the logger takes; null for all. Asked at every message, on any thread.
+  /// Returns the filter that decides which messages the logger takes; null means all. Called for every
+  /// message, on any thread.
   virtual rt::Ref<LUMLogFilter> filter() const = 0;
 
  protected:

@@ -1,12 +1,12 @@
 #pragma once
 
-/// A number that is safe to show and, if its type says so, to upload.
+/// A number that is safe to show and, if its type allows, to upload.
 ///
 ///     LUMSafeNumberParameter::parameterWithNumber(rt::Number::of(4), 1)->description();  // "4"
 ///
-/// Immutable: any thread may use it.
+/// Threads: thread-safe, because it is immutable.
 ///
-/// Not for: a number that tells who somebody is.
+/// Not for: a number that identifies a person.
 
 #include <cstdint>
 #include <utility>
@@ -22,7 +22,7 @@
 class RT_VISIBLE LUMSafeNumberParameter
     : public rt::Implements<LUMSafeNumberParameter, rt::Object, LUMSafeParameter> {
  public:
-  /// A parameter of `number`, which may be null. Throws std::bad_alloc.
+  /// Makes a parameter of `number`, which may be null. Throws std::bad_alloc.
   static rt::Ref<LUMSafeNumberParameter> parameterWithNumber(rt::Ref<rt::Number> number, std::uint64_t type) {
     return initWithNumber(std::move(number), type);
   }
@@ -31,14 +31,14 @@ class RT_VISIBLE LUMSafeNumberParameter
   std::uint64_t type() const override { return type_; }
   bool isUploadSafeType() const override { return isUploadSafe(type_); }
 
-  /// As given.
+  /// Returns the number as given.
   const rt::Ref<rt::Number>& numberValue() const noexcept { return numberValue_; }
 
-  /// Whether `other` is such a parameter with an equal type and an equal value.
+  /// Returns whether `other` is a LUMSafeNumberParameter with an equal type and number.
   bool isEqual(const rt::Object* other) const override;
   std::uint64_t hash() const override;
 
-  /// The value's; null for null.
+  /// Returns the number's description; null if the number is null.
   rt::String description() const override;
 
  protected:

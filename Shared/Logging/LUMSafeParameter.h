@@ -1,15 +1,15 @@
 #pragma once
 
-/// An argument of a log message that gives away nothing about anybody: a message keeps it by itself, beside
-/// the text that it is printed into.
+/// An argument of a log message that contains nothing private. The message keeps it by itself, besides
+/// printing it in the text.
 ///
 ///     const auto key = LUMSafeStringParameter::parameterWithString("greeting"_s, 1);
 ///     LUMLogAt(LUMLogLevelError, "%@ cannot be %@"_s, key, value);       // `value` is in the text only
 ///
-/// Two classes conform, LUMSafeStringParameter and LUMSafeNumberParameter. A message keeps what is of a class
-/// with a name that begins with one of theirs.
+/// Two classes conform: LUMSafeStringParameter and LUMSafeNumberParameter. A message recognises an argument
+/// by its class, whose name must begin with one of these two names.
 ///
-/// Not for: hiding the other arguments, which the text shows too.
+/// Not for: hiding the other arguments, which appear in the text too.
 
 #include <cstdint>
 
@@ -17,10 +17,10 @@
 #include "Runtime/Objects/Class.h"
 
 struct RT_VISIBLE LUMSafeParameter : rt::Protocol<LUMSafeParameter> {
-  /// What the value is, in the caller's own numbers.
+  /// Returns the kind of value, as a number that the caller defines.
   virtual std::uint64_t type() const = 0;
 
-  /// Whether the value may be uploaded: it may if its type is 1, 2, 3 or 4.
+  /// Returns whether the value may be uploaded, which types 1 to 4 allow.
   virtual bool isUploadSafeType() const = 0;
 
  protected:

@@ -1,4 +1,4 @@
-// The two safe parameters, side by side: what holds for one holds for the other.
+// Tests both safe parameters together, since the same rules hold for both.
 
 #include "Shared/Logging/LUMSafeParameter.h"
 
@@ -25,7 +25,7 @@ rt::Ref<LUMSafeNumberParameter> number(int value, std::uint64_t type) {
   return LUMSafeNumberParameter::parameterWithNumber(rt::Number::of(value), type);
 }
 
-TEST(LUMSafeParameter, IsSafeToUploadOfFourTypesOnly) {
+TEST(LUMSafeParameter, IsSafeToUploadForFourTypesOnly) {
   for (const std::uint64_t type : {std::uint64_t{0}, std::uint64_t{5}, std::uint64_t{6}, kLargestType}) {
     EXPECT_FALSE(text("a"_s, type)->isUploadSafeType()) << type;
     EXPECT_FALSE(number(1, type)->isUploadSafeType()) << type;
@@ -36,7 +36,7 @@ TEST(LUMSafeParameter, IsSafeToUploadOfFourTypesOnly) {
   }
 }
 
-TEST(LUMSafeParameter, HasWhatItWasGiven) {
+TEST(LUMSafeParameter, HoldsTheGivenTypeAndValue) {
   EXPECT_EQ(text("a"_s, 7)->stringValue(), "a");
   EXPECT_EQ(text("a"_s, kLargestType)->type(), kLargestType);
   EXPECT_EQ(LUMSafeStringParameter::initWithString("b"_s, 2)->stringValue(), "b");
@@ -45,7 +45,7 @@ TEST(LUMSafeParameter, HasWhatItWasGiven) {
   EXPECT_EQ(number(3, kLargestType)->type(), kLargestType);
 }
 
-TEST(LUMSafeParameter, DescribesItselfAsItsValueDoes) {
+TEST(LUMSafeParameter, HasTheDescriptionOfItsValue) {
   EXPECT_EQ(text("a b"_s, 1)->description(), "a b");
   EXPECT_EQ(number(-3, 1)->description(), "-3");
   EXPECT_TRUE(text(nullptr, 1)->description().isNull());
@@ -54,7 +54,7 @@ TEST(LUMSafeParameter, DescribesItselfAsItsValueDoes) {
   EXPECT_EQ(rt::format("%@", text(nullptr, 1)), "(null)");
 }
 
-TEST(LUMSafeParameter, IsFoundByItsProtocol) {
+TEST(LUMSafeParameter, CastsToItsProtocol) {
   const rt::Ref<rt::Object> object = text("a"_s, 3);
   const rt::Ref<LUMSafeParameter> parameter = rt::cast<LUMSafeParameter>(object);
   ASSERT_TRUE(parameter);
@@ -62,7 +62,7 @@ TEST(LUMSafeParameter, IsFoundByItsProtocol) {
   EXPECT_TRUE(rt::cast<LUMSafeParameter>(rt::Ref<rt::Object>(number(1, 1))));
 }
 
-TEST(LUMSafeParameter, IsEqualByTypeAndValue) {
+TEST(LUMSafeParameter, ComparesTypeAndValue) {
   EXPECT_TRUE(rt::isEqual(text("a"_s, 1), text(rt::String::fromUTF8("a"), 1)));
   EXPECT_FALSE(rt::isEqual(text("a"_s, 1), text("a"_s, 2)));
   EXPECT_FALSE(rt::isEqual(text("a"_s, 1), text("b"_s, 1)));
@@ -85,11 +85,11 @@ TEST(LUMSafeParameter, HashesTypeAndValue) {
   EXPECT_EQ(text(nullptr, 3)->hash(), 3U);
   EXPECT_EQ(number(5, 3)->hash(), 3 + rt::Number::of(5)->hash());
   EXPECT_EQ(LUMSafeNumberParameter::parameterWithNumber(nullptr, 3)->hash(), 3U);
-  // The sum goes round.
+  // The sum wraps around.
   EXPECT_EQ(text("a"_s, kLargestType)->hash(), "a"_s.hash() - 1);
 }
 
-TEST(LUMSafeParameter, IsItsOwnCopy) {
+TEST(LUMSafeParameter, CopyReturnsTheSameObject) {
   const rt::Ref<LUMSafeStringParameter> parameter = text("a"_s, 1);
   EXPECT_EQ(parameter->copy(), parameter);
   const rt::Ref<LUMSafeNumberParameter> other = number(1, 1);

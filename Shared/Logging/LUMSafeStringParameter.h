@@ -1,12 +1,12 @@
 #pragma once
 
-/// A text that is safe to show and, if its type says so, to upload.
+/// A text that is safe to show and, if its type allows, to upload.
 ///
 ///     LUMSafeStringParameter::parameterWithString("kTagsID"_s, 1)->description();       // "kTagsID"
 ///
-/// Immutable: any thread may use it.
+/// Threads: thread-safe, because it is immutable.
 ///
-/// Not for: a text with a name, an address or anything else of a person's.
+/// Not for: a text with a person's name, address or other private data.
 
 #include <cstdint>
 #include <utility>
@@ -21,7 +21,7 @@
 class RT_VISIBLE LUMSafeStringParameter
     : public rt::Implements<LUMSafeStringParameter, rt::Object, LUMSafeParameter> {
  public:
-  /// A parameter of `string`, which may be null. Throws std::bad_alloc.
+  /// Makes a parameter of `string`, which may be null. Throws std::bad_alloc.
   static rt::Ref<LUMSafeStringParameter> parameterWithString(rt::String string, std::uint64_t type) {
     return initWithString(std::move(string), type);
   }
@@ -30,14 +30,14 @@ class RT_VISIBLE LUMSafeStringParameter
   std::uint64_t type() const override { return type_; }
   bool isUploadSafeType() const override { return isUploadSafe(type_); }
 
-  /// As given.
+  /// Returns the text as given.
   const rt::String& stringValue() const noexcept { return stringValue_; }
 
-  /// Whether `other` is such a parameter with an equal type and an equal value.
+  /// Returns whether `other` is a LUMSafeStringParameter with an equal type and text.
   bool isEqual(const rt::Object* other) const override;
   std::uint64_t hash() const override;
 
-  /// The value's; null for null.
+  /// Returns the text; null if it is null.
   rt::String description() const override;
 
  protected:

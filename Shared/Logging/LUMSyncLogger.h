@@ -1,6 +1,6 @@
 #pragma once
 
-/// A logger that is called on the thread that logs, before `LUMLog` returns, by several threads at once.
+/// A logger that runs on the thread that logs, before `LUMLog` returns.
 ///
 ///     class Terminal : public rt::Implements<Terminal, rt::Object, LUMSyncLogger> {
 ///      public:
@@ -10,9 +10,10 @@
 ///
 ///     LUMLogMultiplexer::sharedInstance()->addSyncLogger(rt::make<Terminal>());
 ///
-/// What it throws, `LUMLog` throws.
+/// Threads: several threads may call it at once.
+/// Errors: `LUMLog` throws what the logger throws.
 ///
-/// Not for: what takes long; see LUMAsyncLogger.
+/// Not for: slow work; see LUMAsyncLogger.
 
 #include "Runtime/Base/Visibility.h"
 #include "Shared/Logging/LUMLogger.h"

@@ -34,11 +34,11 @@ rt::String textOf(const LUMLogMessage& message, const LUMLogFormatter& formatter
     return formatter.formattedLogMessage(message);
 #ifdef __GLIBCXX__
   } catch (const abi::__forced_unwind&) {
-    // The cancellation of a thread, which must not be held up.
+    // Cancellation of the thread, which must not be stopped.
     throw;
 #endif
   } catch (...) {
-    // A message that cannot be written is no reason to disturb whoever logged it.
+    // A message that cannot be formatted must not disturb the code that logged it.
     return nullptr;
   }
 }

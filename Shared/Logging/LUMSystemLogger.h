@@ -4,11 +4,12 @@
 ///
 ///     | $ journalctl SUBSYSTEM=com.example.host.Importer CATEGORY=network
 ///
-/// An entry's subsystem is the main bundle's identifier and, after a dot, the component in the message's
-/// metadata; a component that is "" is the subsystem itself. Its category is the one in the metadata. Levels
-/// 1 to 4 are entries of type debug, info, error and fault; messages of other levels are not written.
+/// The subsystem of an entry is the main bundle's identifier, then a dot and the component from the message's
+/// metadata. Without a component it is the identifier alone. An empty component makes the subsystem empty.
+/// The category of an entry is the one in the metadata. Levels 1 to 4 become entries of type debug, info,
+/// error and fault. Messages of other levels are not written.
 ///
-/// Not for: text that must stay on the machine's disk only as long as the host says.
+/// Not for: text whose lifetime on disk the host must control.
 
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Class.h"
@@ -21,13 +22,14 @@
 
 class RT_VISIBLE LUMSystemLogger : public rt::Implements<LUMSystemLogger, rt::Object, LUMSyncLogger> {
  public:
-  /// With `filter`, which may be null, and with `formatter`, or a LUMSystemLoggerFormatter where that is
-  /// null. Keeps the identifier that the main bundle has now.
+  /// Makes a logger with `filter`, which may be null, and `formatter`. A null `formatter` stands for a
+  /// LUMSystemLoggerFormatter. Stores the main bundle's identifier at the time of the call.
   static rt::Ref<LUMSystemLogger> initWithFilter(rt::Ref<LUMLogFilter> filter,
                                                  rt::Ref<LUMLogFormatter> formatter = nullptr);
 
-  /// Writes one entry, whatever the filter says: whoever passes messages on asks it. Nothing where the
-  /// formatter throws or gives no text. Any thread may call it.
+  /// Writes one entry without asking the filter: that is the caller's task. Writes nothing if the formatter
+  /// throws or returns null or an empty text.
+  /// Threads: thread-safe.
   void logWithMessage(const rt::Ref<LUMLogMessage>& message) override;
 
   rt::Ref<LUMLogFilter> filter() const override { return filter_; }

@@ -1,11 +1,10 @@
 #pragma once
 
-/// The text of an entry in the system's log: "function: text", or only the text where the function is not
-/// known.
+/// Formats an entry of the system's log as "function: text", or as the text alone if the function is unknown.
 ///
 ///     LUMSystemLoggerFormatter::init()->formattedLogMessage(*message);        // "int main(): started"
 ///
-/// Not for: lines in files, which want the time too.
+/// Not for: lines in files, which also need the time.
 
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Class.h"

@@ -1,5 +1,5 @@
-// What is in the journal when messages have gone through the system logger: the machine's own journald, run
-// in a private root, is asked. The suite runs as root and as an ordinary user.
+// Reads back from the journal what the system logger has written. The machine's own journald runs in a
+// private root. The suite runs as root and as an ordinary user.
 
 #include "Shared/Logging/LUMSystemLogger.h"
 
@@ -44,7 +44,7 @@ using rt::Ref;
 using testing::ElementsAre;
 using testing::IsEmpty;
 
-// Why there is no private journal; empty when there is one.
+// The reason why there is no private journal; empty if there is one.
 std::string refusal;
 
 Ref<LUMLogMessage> messageIn(const rt::String& function, const rt::String& text) {
@@ -82,11 +82,11 @@ class LUMSystemLoggerTest : public testing::Test {
     return LUMSystemLogger::initWithFilter(nullptr, rt::make<TestFormatter>(std::move(making)));
   }
 
-  // Everything that this program has written and its children have.
+  // Returns all entries of this program and its children.
   std::vector<PrivateJournal::Entry> entries() const {
     return journal_->entries("SYSLOG_IDENTIFIER=LUMSystemLogger_test");
   }
-  // One field of each of these.
+  // Returns one field of each of these entries.
   std::vector<std::string> fields(const char* name) const {
     std::vector<std::string> values;
     for (PrivateJournal::Entry& entry : entries()) values.push_back(entry[name]);
@@ -94,7 +94,7 @@ class LUMSystemLoggerTest : public testing::Test {
   }
   std::vector<std::string> messages() const { return fields("MESSAGE"); }
 
-  // Runs `body` in a child, in which nobody has asked for the environment or the shared multiplexer.
+  // Runs `body` in a child process that has not yet used the environment or the shared multiplexer.
   static void inChild(const std::function<void()>& body) {
     const pid_t child = fork();
     if (child == 0) {
@@ -120,7 +120,7 @@ TEST_F(LUMSystemLoggerTest, WritesEachLevelWithItsPriority) {
   EXPECT_THAT(fields("PRIORITY"), ElementsAre("7", "6", "3", "2"));
 }
 
-TEST_F(LUMSystemLoggerTest, WritesUnderTheBundleAndTheComponent) {
+TEST_F(LUMSystemLoggerTest, UsesBundleAndComponentAsSubsystem) {
   const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
   const auto write = [&](Ref<LUMLogMetadata> metadata) {
     logger->logWithMessage(messageWith(LUMLogLevelError, "x"_s, std::move(metadata)));
@@ -128,7 +128,7 @@ TEST_F(LUMSystemLoggerTest, WritesUnderTheBundleAndTheComponent) {
   write(nullptr);
   write(LUMLogMetadata::init());
   write(LUMLogMetadata::metadataWithComponent("Importer"_s));
-  // Not the bundle: what is empty stands alone.
+  // An empty component makes an empty subsystem, without the bundle.
   write(LUMLogMetadata::metadataWithComponent(""_s));
   write(LUMLogMetadata::metadataWithCause("a cause"_s));
   write(LUMLogMetadata::init()->messageWithKey(LUMLogMetadata::kComponentKey, rt::Number::of(1)));
@@ -138,7 +138,7 @@ TEST_F(LUMSystemLoggerTest, WritesUnderTheBundleAndTheComponent) {
   EXPECT_EQ(journal_->entries("SUBSYSTEM=com.example.host.Importer").size(), 1U);
 }
 
-TEST_F(LUMSystemLoggerTest, WritesUnderADotAndTheComponentWithoutABundle) {
+TEST_F(LUMSystemLoggerTest, UsesADotAndTheComponentWithoutABundle) {
   rt::Bundle::setMainIdentifier(nullptr);
   ASSERT_EQ(rt::Bundle::mainIdentifier(), "");
   const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
@@ -149,7 +149,7 @@ TEST_F(LUMSystemLoggerTest, WritesUnderADotAndTheComponentWithoutABundle) {
   EXPECT_THAT(fields("SUBSYSTEM"), ElementsAre("", ".Importer", ""));
 }
 
-TEST_F(LUMSystemLoggerTest, KeepsTheBundleThatItWasMadeIn) {
+TEST_F(LUMSystemLoggerTest, KeepsTheBundleIdentifierFromItsCreation) {
   const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
   rt::Bundle::setMainIdentifier("com.example.later"_s);
   logger->logWithMessage(messageWith(LUMLogLevelError, "x"_s));
@@ -168,7 +168,7 @@ TEST_F(LUMSystemLoggerTest, WritesTheCategory) {
   EXPECT_THAT(fields("CATEGORY"), ElementsAre("", "", "network", "", "file"));
 }
 
-TEST_F(LUMSystemLoggerTest, WritesFunctionAndText) {
+TEST_F(LUMSystemLoggerTest, WritesTheFunctionAndTheText) {
   const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
   logger->logWithMessage(messageIn("int main()"_s, "started"_s));
   logger->logWithMessage(messageIn(nullptr, "started"_s));
@@ -187,7 +187,7 @@ TEST_F(LUMSystemLoggerTest, WritesNothingWithoutText) {
   EXPECT_THAT(entries(), IsEmpty());
 }
 
-TEST_F(LUMSystemLoggerTest, WritesWhatItsFormatterMakes) {
+TEST_F(LUMSystemLoggerTest, WritesTheTextOfItsFormatter) {
   const Ref<LUMLogMessage> message = messageIn("f"_s, "x"_s);
   int count = 0;
   const Ref<LUMSystemLogger> logger = loggerWith([&](const LUMLogMessage& asked) {
@@ -200,8 +200,8 @@ TEST_F(LUMSystemLoggerTest, WritesWhatItsFormatterMakes) {
   EXPECT_THAT(messages(), ElementsAre("by its formatter"));
 }
 
-// The formatter is asked before the level is looked at.
-TEST_F(LUMSystemLoggerTest, AsksItsFormatterAboutLevelsThatAreNotWrittenToo) {
+// The formatter is called before the level is examined.
+TEST_F(LUMSystemLoggerTest, AsksItsFormatterEvenForLevelsThatAreNotWritten) {
   std::vector<LUMLogLevel> asked;
   const Ref<LUMSystemLogger> logger = loggerWith([&](const LUMLogMessage& message) {
     asked.push_back(message.level());
@@ -213,7 +213,7 @@ TEST_F(LUMSystemLoggerTest, AsksItsFormatterAboutLevelsThatAreNotWrittenToo) {
   EXPECT_THAT(entries(), IsEmpty());
 }
 
-TEST_F(LUMSystemLoggerTest, WritesNothingWhereItsFormatterThrows) {
+TEST_F(LUMSystemLoggerTest, WritesNothingIfItsFormatterThrows) {
   const Ref<LUMLogMessage> message = messageWith(LUMLogLevelFault, "x"_s);
   EXPECT_NO_THROW(loggerWith([](const LUMLogMessage&) -> rt::String {
                     throw std::runtime_error("no text");
@@ -229,7 +229,7 @@ TEST_F(LUMSystemLoggerTest, WritesNothingWhereItsFormatterThrows) {
   EXPECT_THAT(messages(), ElementsAre("the next one"));
 }
 
-// Whoever holds up a cancellation ends the program.
+// A program ends if it stops the cancellation of a thread.
 TEST_F(LUMSystemLoggerTest, LetsAThreadBeCancelledInItsFormatter) {
   bool cancels = true;
   const Ref<LUMSystemLogger> logger = loggerWith([&](const LUMLogMessage&) {
@@ -255,8 +255,8 @@ TEST_F(LUMSystemLoggerTest, LetsAThreadBeCancelledInItsFormatter) {
   EXPECT_THAT(messages(), ElementsAre("the next one"));
 }
 
-// The multiplexer asks the filter; the logger has been asked already when it is called.
-TEST_F(LUMSystemLoggerTest, HasAFilterAndDoesNotAskIt) {
+// The multiplexer asks the filter. The logger itself does not ask it again.
+TEST_F(LUMSystemLoggerTest, DoesNotAskItsFilterItself) {
   const Ref<LUMLogFilter> filter = LUMLogDropAllFilter::init();
   const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(filter);
   EXPECT_EQ(logger->filter(), filter);
@@ -285,7 +285,7 @@ TEST_F(LUMSystemLoggerTest, WritesEveryByte) {
   for (const std::string& priority : fields("PRIORITY")) EXPECT_EQ(priority, "3");
 }
 
-TEST_F(LUMSystemLoggerTest, TakesForeignTextInItsFieldsAsItIs) {
+TEST_F(LUMSystemLoggerTest, WritesForeignTextInItsFieldsUnchanged) {
   const auto metadata = LUMLogMetadata::metadataWithComponent("a\nPRIORITY=0"_s)
                             ->metadataByAddingCategory("b\nMESSAGE=forged"_s);
   LUMSystemLogger::initWithFilter(nullptr)->logWithMessage(messageWith(LUMLogLevelInfo, "x"_s, metadata));
@@ -295,9 +295,9 @@ TEST_F(LUMSystemLoggerTest, TakesForeignTextInItsFieldsAsItIs) {
   EXPECT_THAT(messages(), ElementsAre("x"));
 }
 
-// Invariant: every message is written, once, but for those that a machine too busy to run the journal drops
-// and counts.
-TEST_F(LUMSystemLoggerTest, IsUsedByAllThreadsAtOnce) {
+// Invariant: every message is written once, except those that are dropped and counted because the machine is
+// too busy to run the journal.
+TEST_F(LUMSystemLoggerTest, WritesEachMessageOnceFromManyThreads) {
   const std::uint64_t droppedBefore = rt::SystemLog::droppedCount();
   const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
   std::set<std::string> sent;
@@ -315,19 +315,19 @@ TEST_F(LUMSystemLoggerTest, IsUsedByAllThreadsAtOnce) {
   }
   for (std::thread& thread : threads) thread.join();
   for (PrivateJournal::Entry& entry : entries()) {
-    if (entry["SUBSYSTEM"] == "rt") continue;  // The count.
+    if (entry["SUBSYSTEM"] == "rt") continue;  // The count of dropped entries.
     EXPECT_EQ(sent.erase(entry["MESSAGE"]), 1U) << entry["MESSAGE"];
     EXPECT_EQ("com.example.host." + entry["MESSAGE"].substr(0, 9), entry["SUBSYSTEM"]);
   }
   EXPECT_EQ(sent.size(), rt::SystemLog::droppedCount() - droppedBefore);
 }
 
-// By way of the shared multiplexer, as a program begins.
+// Through the shared multiplexer, as it is when a program starts.
 
 class LUMSystemLoggerAtTheStartTest : public LUMSystemLoggerTest {
  protected:
-  // What is written of a message of each level from 0 to 5, in a program that begins in the mode, and has a
-  // logger without a filter besides, which hears all of them.
+  // Returns what is written for messages of the levels 0 to 5 in a program that starts in `mode`. A second
+  // logger, without a filter, gets all of them.
   std::vector<std::string> writtenInMode(const char* mode) {
     inChild([mode] {
       if (mode != nullptr) {
@@ -376,7 +376,7 @@ TEST_F(LUMSystemLoggerAtTheStartTest, WritesWhatIsLogged) {
   EXPECT_EQ(entry["CATEGORY"], "archive");
 }
 
-TEST_F(LUMSystemLoggerAtTheStartTest, GivesWayToTheFirstThatIsAddedOnly) {
+TEST_F(LUMSystemLoggerAtTheStartTest, IsReplacedByTheFirstAddedOnly) {
   inChild([] {
     const auto& multiplexer = LUMLogMultiplexer::sharedInstance();
     const auto adding = [&](const rt::String& text) {
@@ -405,7 +405,7 @@ void becomeOrdinaryUser() {
   if (geteuid() != 0)
     throw std::runtime_error("an ordinary user already; the other run of this suite was its");
   require(setgroups(0, nullptr) == 0 && setgid(kGroup) == 0 && setuid(kUser) == 0, "another user");
-  // Who changes identity loses the say over its own /proc entries, in which namespaces are set up.
+  // A process that changes its identity may no longer use its own /proc entries, which namespaces need.
   require(prctl(PR_SET_DUMPABLE, 1) == 0, "PR_SET_DUMPABLE");
 }
 

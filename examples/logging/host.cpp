@@ -1,7 +1,7 @@
-// A host program that logs: to a file of its own, on the file's own queue, the messages of one component, and
-// that hears of every misuse of the libraries. Its log file is standard output here.
+// A host program that logs. One logger writes the messages of one component to a file, on its own queue; the
+// file is standard output here. An error callback receives every misuse of the libraries.
 //
-// Its entries are in the system's log too: journalctl SUBSYSTEM=com.example.Importer
+// The entries are also in the system's log: journalctl SUBSYSTEM=com.example.Importer
 
 #include <utility>
 
@@ -31,7 +31,7 @@ class FileLogger final : public rt::Implements<FileLogger, rt::Object, LUMAsyncL
   rt::Ref<LUMLogFilter> filter() const override { return filter_; }
   rt::Ref<rt::Queue> operationQueue() const override { return queue_; }
 
-  // A fault is in the file before the program goes on.
+  // A fault is written before the program goes on.
   LUMLogDispatchMode dispatchModeForMessage(const LUMLogMessage& message) const override {
     return message.level() == LUMLogLevelFault ? LUMLogDispatchModeSynchronous : 0;
   }
@@ -58,18 +58,18 @@ int main() {
   LUMLogAt(LUMLogLevelInfo, importer, "%@ has %d entries"_s, name, 3);
   LUMLogAt(LUMLogLevelInfo, "of no component"_s);
 
-  // A parameter that is safe to upload is kept in the message by itself, too.
+  // The message also keeps a safe parameter by itself, so that it can be uploaded.
   const rt::Ref<LUMLogMessage> message =
       LUMLogAt(LUMLogLevelError, importer->metadataByAddingCategory("archive"_s), "entry %@ is damaged"_s,
                LUMSafeNumberParameter::parameterWithNumber(rt::Number::of(2), 1));
 
-  // What was logged is in the file when the queues have run.
+  // The messages are in the file after both queues have run.
   multiplexer->waitForLogging();
   logger->operationQueue()->barrierSync();
   rt::FileHandle::standardOutput()->writeLine(
       rt::format("%zu safe parameter"_s, message->safeParameters()->count()));
 
-  // A second callback is a mistake, of which the first is told.
+  // Setting a second callback is a mistake, which the first callback receives.
   PECErrorHandler::sharedInstance()->registerErrorHandlerBlock([](const rt::Ref<PECErrorDescription>&) {});
   return 0;
 }

@@ -1,6 +1,6 @@
 #!/usr/bin/env bash
-# A directory's life, from the shell: made, looked at, and removed, with what the command answers when
-# there is nothing to do. Works in /Volumes; script/run runs it in a private one.
+# Shows the life of a directory from the shell: it is made, looked at and removed. Also shows what the command
+# answers if there is nothing to do. Works in /Volumes; script/run runs it with a private one.
 #
 # usage: demonstration.sh MOUNT_POINT
 set -uo pipefail

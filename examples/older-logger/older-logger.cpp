@@ -1,6 +1,5 @@
-// Code that logs as it always has: through the shared logger, one line a call. Which lines are written,
-// where, and what they look like is the host's choice, made once in `main`; with the argument "rerouted" it
-// is structured logging's.
+// Code that logs through the shared logger, one line per call. The host chooses once, in `main`, which lines
+// are written, where and in which form. With the argument "rerouted" it sends them to structured logging.
 
 #include <string_view>
 
@@ -22,14 +21,14 @@ void importFile(const rt::String& file, int entries) {
   ZEBLogInfo("%d entries", entries);
 }
 
-/// Counts the lines that come by.
+// Counts lines.
 class LineCount final : public rt::Implements<LineCount, rt::Object, ZEBLogWriter> {
  public:
   void logMessage(const rt::String& /*message*/, ZEBLogLevel /*level*/) override { ++count; }
   int count = 0;
 };
 
-/// Prints the messages of structured logging.
+// Prints the messages of structured logging.
 class Printer final : public rt::Implements<Printer, rt::Object, LUMSyncLogger> {
  public:
   void logWithMessage(const rt::Ref<LUMLogMessage>& message) override {
@@ -52,7 +51,7 @@ int main(int count, char** arguments) {
   importFile("first.txt"_s, 2);
   importFile("empty.txt"_s, 0);
 
-  // To another place, and everything: to standard output and to a writer of one's own.
+  // Another logger, without a filter: it writes to standard output and to a writer of the host's own.
   const rt::Ref<LineCount> lines = rt::make<LineCount>();
   const rt::Ref<ZEBLogger> logger = ZEBLogger::loggerWithWriter(
       ZEBArrayCompositeLogWriter::of(rt::FileHandle::standardOutput(), lines), nullptr, nullptr);

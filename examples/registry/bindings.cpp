@@ -1,5 +1,5 @@
-// The bindings, as a generator writes them: constant records, a factory for each implementation, an injector
-// for each service, and a class method through which the registry finds them when the program is loaded.
+// The bindings, in the form that a generator writes: constant records, a factory for each implementation and
+// an injector for each service. The registry finds them by a class method when the program is loaded.
 
 #include "bindings.h"
 
@@ -14,7 +14,7 @@ using namespace rt::literals;
 
 namespace {
 
-// The dimensions of scopes: a bit for each. Tags are given in the order of the bits.
+// The dimensions of scopes, one bit each. Tags are given in the order of the bits.
 constexpr SRLScopeType kAccount = 0b01;
 constexpr SRLScopeType kWindow = 0b10;
 
@@ -43,7 +43,7 @@ class Greeting final : public rt::Implements<Greeting, rt::Object, WindowTask> {
   rt::String label() const override { return "greet"_s; }
 };
 
-// Factories are given the tags of their implementation's scope, and ask for what they need.
+// A factory receives the tags of its implementation's scope, and asks the injectors for what it needs.
 rt::Ref<rt::Object> makeAccountStore(SRLScopeTagSet tags) {
   return rt::make<AccountStore>(rt::String::from(tags.tags[0]));
 }

@@ -1,17 +1,17 @@
 #pragma once
 
-// The injectors, one for each service, as a generator writes them: what the program calls.
+// The injectors, in the form that a generator writes, one for each service. The program calls them.
 
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Values/Array.h"
 #include "services.h"
 
-// The service for an account.
+// Returns the store of an account.
 rt::Ref<MessageStore> injectMessageStore(const rt::Ref<rt::Object>& account);
 
-// The service for a window of an account.
+// Returns the list for a window of an account.
 rt::Ref<MessageList> injectMessageList(const rt::Ref<rt::Object>& account, const rt::Ref<rt::Object>& window);
 
-// All that there are, new each time.
+// Returns all tasks. Each call makes new ones.
 rt::Ref<rt::Array> injectWindowTasks(const rt::Ref<rt::Object>& account);

@@ -1,5 +1,5 @@
-// A mail program: services that live as long as an account, and others as long as an account and a window. It
-// finds them by the injectors, and ends them all when an account is logged out.
+// A mail program. Some services live as long as an account, others as long as one window of an account. The
+// program gets them from the injectors, and ends all services of an account when its user logs out.
 
 #include <cstdio>
 #include <string>
@@ -19,7 +19,7 @@ void print(const rt::String& line) {
   std::printf("%s\n", std::string(line).c_str());
 }
 
-// Tells of services that somebody keeps although their scope has ended.
+// Reports services that are still referenced after their scope has ended.
 class LeakWatch final : public rt::Implements<LeakWatch, rt::Object, SRLScopeLifecycleDelegate> {
  public:
   void didRemoveScopesWithTag(const rt::Ref<rt::Object>& tag,
@@ -40,7 +40,7 @@ int main() {
   const rt::Ref<LeakWatch> leakWatch = rt::make<LeakWatch>();
   registry->setScopeLifecycleDelegate(leakWatch);
 
-  // Any objects that are equal when they stand for the same may be tags.
+  // Any object may be a tag. Tags that stand for the same thing must be equal.
   const rt::Ref<rt::Object> ann = "Ann"_s.object();
   const rt::Ref<rt::Object> left = "the left window"_s.object();
   const rt::Ref<rt::Object> right = "the right window"_s.object();
@@ -51,7 +51,7 @@ int main() {
   const rt::Ref<rt::Array> tasks = injectWindowTasks(ann);
   for (const rt::Ref<rt::Object>& task : *tasks) print(rt::cast<WindowTask>(task.get())->label());
 
-  // The lists end with the account, and so would the store.
+  // The lists end with the account. The store would too, but `kept` retains it.
   const rt::Ref<MessageStore> kept = injectMessageStore(ann);
   registry->removeScopesWithTag(ann);
   print(injectMessageStore(ann) == kept ? "the same store"_s : "another store"_s);

@@ -1,6 +1,6 @@
 #pragma once
 
-// The program's services, as its author writes them.
+// The program's services, as the program's author writes them.
 
 #include <utility>
 
@@ -8,7 +8,7 @@
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
 
-// Where an account's messages are.
+// Holds the messages of an account.
 struct MessageStore : rt::Protocol<MessageStore> {
   virtual rt::String name() const = 0;
 
@@ -16,7 +16,7 @@ struct MessageStore : rt::Protocol<MessageStore> {
   ~MessageStore() = default;
 };
 
-// What a window shows of them: one for each window of each account.
+// Shows the messages of an account in a window. There is one for each window of each account.
 struct MessageList : rt::Protocol<MessageList> {
   virtual rt::String title() const = 0;
 
@@ -24,7 +24,7 @@ struct MessageList : rt::Protocol<MessageList> {
   ~MessageList() = default;
 };
 
-// What may be done when a window opens.
+// A task to run when a window opens.
 struct WindowTask : rt::Protocol<WindowTask> {
   virtual rt::String label() const = 0;
 

@@ -1,4 +1,4 @@
-// A logger with a delegate that it does not keep alive: it tells the delegate as long as there is one.
+// A logger with a weak reference to its delegate. It calls the delegate while the delegate exists.
 
 #include <cstdio>
 
@@ -21,9 +21,9 @@ class Logger final : public rt::Implements<Logger, rt::Object> {
  public:
   void setDelegate(const rt::Ref<LoggerDelegate>& delegate) { delegate_ = delegate; }
 
-  // Whether somebody was told.
+  // Returns whether there was a delegate to call.
   bool log(const rt::String& message) {
-    // The reference keeps the delegate whole until it has been told.
+    // The strong reference keeps the delegate alive during the call.
     const rt::Ref<LoggerDelegate> delegate = delegate_.lock();
     if (!delegate) return false;
     delegate->didLog(message);

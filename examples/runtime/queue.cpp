@@ -1,5 +1,5 @@
-// A queue that guards an account: what only its tasks touch needs no lock, and what a task throws reaches
-// whoever waits for it.
+// An account guarded by a queue. Data that only the queue's tasks use needs no lock. An exception from a task
+// reaches the caller that waits for the task.
 
 #include "Runtime/Queues/Queue.h"
 
@@ -17,7 +17,7 @@ class Account {
     queue_->async([this, amount] { balance_ += amount; });
   }
 
-  // What is left. Throws std::runtime_error when there is not enough.
+  // Returns the new balance. Throws std::runtime_error if the balance is too low.
   int withdraw(int amount) {
     return queue_->sync([&] {
       if (amount > balance_) throw std::runtime_error("not enough");

@@ -1,5 +1,5 @@
-// A service that conforms to two protocols: found by its class's name, used through either protocol, and
-// asked what it can do.
+// A service that conforms to two protocols. The program finds it by its class name, uses it through either
+// protocol, and asks which protocols it conforms to.
 
 #include <cstdio>
 
@@ -44,7 +44,7 @@ int main() {
     std::printf("%.*s\n", static_cast<int>(greeting.length()), greeting.view().data());
   }
 
-  // The same object, through its other protocol.
+  // The same object, through its second protocol.
   if (const rt::Ref<Counter> counter = rt::cast<Counter>(greeter)) {
     std::printf("%d greetings\n", counter->count());
   }

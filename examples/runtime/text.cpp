@@ -1,4 +1,4 @@
-// Text: literals that cost nothing, formats that are checked while compiling, and collections that
+// Text: literals that allocate nothing, formats that are checked at compile time, and collections that
 // describe themselves.
 
 #include <cstdio>
@@ -23,7 +23,7 @@ int main() {
   const rt::String name = rt::String::fromUTF8("  Ann \n").trimmed();
   print(rt::format("%@ is %d years old (%.1f %%)."_s, name, 41, 99.5));
 
-  // Bytes that are not UTF-8 are no text.
+  // Bytes that are not UTF-8 give a null string.
   if (rt::String::fromUTF8("\xff").isNull()) print("not UTF-8"_s);
 
   const rt::Ref<rt::Dictionary> person =

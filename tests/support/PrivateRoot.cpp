@@ -1,3 +1,7 @@
+// The private root is a tmpfs. Every top-level directory but /Volumes is bound into it. Then follows
+// `pivot_root`. Root needs a mount namespace for it, an ordinary user also a user namespace. `chroot` would
+// not do, because no further user namespace can be made inside of it.
+
 #include "tests/support/PrivateRoot.h"
 
 #include <fcntl.h>

@@ -2,8 +2,8 @@
 
 #include <unistd.h>
 
-// The system has no right to write anywhere that a program could keep while it becomes its caller. So root
-// stays the saved user, which `CallersDirectory.cpp` makes the effective one for as long as it works.
+// On macOS a process cannot keep the right to write anywhere while it becomes its caller. So root stays the
+// saved user. `CallersDirectory.cpp` makes root the effective user while it works.
 void takeOnCallersIdentity() {
   if (geteuid() != 0) return;
   setegid(getgid());

@@ -1,3 +1,8 @@
+// macOS cannot keep one of root's rights without the others, and a caller cannot write in /Volumes. So root
+// makes the directory under a new name, renames it to `path` only if nothing is there, and hands it over by
+// its descriptor. Nothing else can be handed over that way. Until then the directory and its blocks belong to
+// root.
+
 #include "tool/CallersDirectory.h"
 
 #include <fcntl.h>
@@ -10,8 +15,8 @@
 
 namespace {
 
-// Root's rights for as long as it lives, where the process took its caller's identity on and root is still
-// the saved user. Keeps `errno` at its end.
+// Takes root's rights during its lifetime, if the process has taken on its caller's identity and root is
+// still the saved user. The destructor keeps `errno`.
 class AsRoot {
  public:
   AsRoot() : isRoot_(geteuid() == getuid() && seteuid(0) == 0) {}
@@ -35,8 +40,8 @@ Making makeAndHandOver(const std::string& path) {
   return Making::done;
 }
 
-// Makes the directory under a new name, opens it, and renames it to `path` if nothing is there. Between
-// `mkdir` at `path` and `open`, another directory could take its place. Returns the descriptor, or -1.
+// Makes the directory under a temporary name, opens it, and renames it to `path` if nothing is there. With
+// `mkdir` at `path`, another directory could take its place before `open`. Returns the descriptor, or -1.
 int makeOpened(const std::string& path) {
   struct stat status{};
   if (lstat(path.c_str(), &status) == 0) errno = EEXIST;
@@ -56,10 +61,10 @@ int makeOpened(const std::string& path) {
 
 }  // namespace
 
-// Root hands over what it has made by a descriptor: `path` may be something else by then.
+// Root hands over the directory by its descriptor, because `path` may name another file by then.
 Making makeCallersDirectory(const std::string& path) {
   const AsRoot root;
-  if (!root) return makeAndHandOver(path);  // nobody but root can give away what is another's
+  if (!root) return makeAndHandOver(path);  // only root can give away the files of others
   const int directory = makeOpened(path);
   if (directory < 0) return Making::notMade;
   const bool handedOver = fchown(directory, getuid(), getgid()) == 0;

@@ -1,13 +1,13 @@
 #pragma once
 
-/// What an error callback is told of an error: where it was reported, and in which words.
+/// Describes an error to an error callback: the origin of the report and its text.
 ///
 ///     PECErrorHandler::sharedInstance()->registerErrorHandlerBlock(
 ///         [](const rt::Ref<PECErrorDescription>& error) { show(error->errorMessage()); });
 ///
-/// A plain record: as safe as a variable, for one thread at a time.
+/// Threads: like a plain variable, for one thread at a time.
 ///
-/// Not for: errors that a correct program can meet.
+/// Not for: errors that can occur in a correct program.
 
 #include <cstdint>
 #include <utility>
@@ -21,24 +21,24 @@ class RT_VISIBLE PECErrorDescription : public rt::Implements<PECErrorDescription
  public:
   PECErrorDescription() = default;
 
-  /// The source file, as the report names it.
+  /// Return and set the source file, as given in the report.
   const rt::String& filePath() const noexcept { return filePath_; }
   void setFilePath(rt::String filePath) noexcept { filePath_ = std::move(filePath); }
 
-  /// The function or operation that reported.
+  /// Return and set the function or operation that made the report.
   const rt::String& functionName() const noexcept { return functionName_; }
   void setFunctionName(rt::String functionName) noexcept { functionName_ = std::move(functionName); }
 
   std::uint64_t lineNumber() const noexcept { return lineNumber_; }
   void setLineNumber(std::uint64_t lineNumber) noexcept { lineNumber_ = lineNumber; }
 
-  /// The text before anything was substituted: the same for all reports from one place.
+  /// Return and set the format, without arguments. It is the same for all reports from one place.
   const rt::String& rawFormatString() const noexcept { return rawFormatString_; }
   void setRawFormatString(rt::String rawFormatString) noexcept {
     rawFormatString_ = std::move(rawFormatString);
   }
 
-  /// The whole text.
+  /// Return and set the formatted text.
   const rt::String& errorMessage() const noexcept { return errorMessage_; }
   void setErrorMessage(rt::String errorMessage) noexcept { errorMessage_ = std::move(errorMessage); }
 

@@ -1,3 +1,6 @@
+// The handler has two locks. The callback runs under a recursive one, because it may log an error itself. The
+// callback is read and set under the other one, so that tests that set it directly wait for nobody.
+
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
 
 #include <string_view>
@@ -20,7 +23,7 @@ constexpr const char* kFile = "Libraries/Util/ErrorHandler/PECErrorHandler";
 constexpr const char* kRegisterErrorHandlerBlock = "-[PECErrorHandler registerErrorHandlerBlock:]";
 
 void failAssertion(const rt::Ref<PECErrorDescription>& error) {
-  // The format and not the message: the first line of a crash report is the same for all of a kind.
+  // Shows the format and not the message, so that all crash reports of one kind have the same first line.
   const rt::String description = rt::format(
       "\n\n\n   <<< ERROR!    <(\u2022\u0300_\u2022\u0301)>    ERROR! >>>\n\n   in %@\n   in %@\n"
       "   Line %tu says:\n\n   %@\n\n\n",
@@ -31,7 +34,7 @@ void failAssertion(const rt::Ref<PECErrorDescription>& error) {
       description);
 }
 
-/// An error callback that runs on this thread. They may nest.
+// Marks that an error callback runs on this thread. Scopes may nest.
 class CallbackScope {
  public:
   CallbackScope() noexcept { ++depth_; }
@@ -81,7 +84,7 @@ void PECErrorHandler::logWithMessage(const rt::Ref<LUMLogMessage>& message) {
   error->setRawFormatString(message->format());
   error->setErrorMessage(message->formattedString());
 
-  // Given up after the lock, if nobody else has it any more by then: it may have captured anything.
+  // Released after the lock if it is the last reference: the callback may have captured anything.
   PECErrorHandlerBlock block;
   const rt::LockGuard guard(lock_);
   block = errorHandlerBlock();
@@ -119,7 +122,7 @@ PECErrorHandlerBlock PECErrorHandler::errorHandlerBlock() const {
 }
 
 void PECErrorHandler::setErrorHandlerBlock(PECErrorHandlerBlock block) {
-  // What is replaced goes after the lock: it may have captured anything.
+  // The old callback is released after the lock, because it may have captured anything.
   PECErrorHandlerBlock replaced;
   const rt::LockGuard guard(blockLock_);
   replaced = std::exchange(errorHandlerBlock_, std::move(block));
@@ -137,7 +140,7 @@ std::int32_t PECErrorHandler::errorCountInBlock(const rt::Block<void()>& block) 
   handler.setErrorHandlerBlock([](const rt::Ref<PECErrorDescription>&) {});
   block();
   handler.setErrorHandlerBlock(std::move(kept));
-  // Modulo 2^32, as the count itself goes on.
+  // Computed modulo 2^32, because the count may wrap around.
   return static_cast<std::int32_t>(static_cast<std::uint32_t>(handler.errorCount()) -
                                    static_cast<std::uint32_t>(before));
 }

@@ -1,27 +1,29 @@
 #pragma once
 
-/// Where every misuse of the libraries ends: messages of LUMLogLevelFault go to one callback of the host's,
-/// on the thread that logged them, and are counted.
+/// Receives every report of misuse of the libraries. It passes each message of LUMLogLevelFault or above to
+/// one callback of the host, on the thread that logged it, and counts it.
 ///
 ///     PECErrorHandler::sharedInstance()->registerErrorHandlerBlock(
 ///         [](const rt::Ref<PECErrorDescription>& error) {
 ///           std::fprintf(stderr, "%s\n", std::string(error->errorMessage().view()).c_str());
 ///         });
 ///
-/// Without a callback an assertion fails: the report is on standard error and, unless somebody catches the
-/// rt::InternalInconsistencyException, the program ends.
+/// Without a callback a report fails an assertion. The assertion prints the report on standard error and
+/// throws an rt::InternalInconsistencyException, which ends the program unless it is caught.
 ///
-/// The handler is a synchronous logger of the shared LUMLogMultiplexer from the first report on
-/// (Libraries/Util/ErrorHandler/PECReport.h), or from a call of `register_`.
+/// The handler is a synchronous logger of the shared LUMLogMultiplexer. The first report
+/// (Libraries/Util/ErrorHandler/PECReport.h) or a call of `register_` adds it there.
 ///
-/// A fork does not wait for the handler, whose lock is held while the callback runs. In the child the lock is
-/// free, also where another thread was in the callback: it never returns there, and its error is not counted.
+/// Fork: a fork does not wait for the handler, although the handler holds its lock while the callback runs.
+/// In the child the lock is free. If another thread was in the callback, that call never returns in the
+/// child, and its error is not counted there.
 ///
-/// A test asks what is reported by some code:
+/// A test can check what some code reports:
 ///
 ///     PECErrorHandler::assertBlockReportsError([&] { registry->removeScopesWithTag(nullptr); });
 ///
-/// Not for: errors that a correct program can meet: those are results, or messages of LUMLogLevelError.
+/// Not for: errors that can occur in a correct program. Return those as results, or log them at
+/// LUMLogLevelError.
 
 #include <atomic>
 #include <cstdint>
@@ -39,61 +41,66 @@
 #include "Shared/Logging/LUMLogMessage.h"
 #include "Shared/Logging/LUMSyncLogger.h"
 
-/// What is told of an error, which is not null. Never run by two threads at once.
+/// Receives an error, which is not null. Never runs on two threads at once.
 using PECErrorHandlerBlock = rt::Block<void(const rt::Ref<PECErrorDescription>& error)>;
 
 class RT_VISIBLE PECErrorHandler : public rt::Implements<PECErrorHandler, rt::Object, LUMSyncLogger> {
  public:
-  /// The process's handler; never destroyed. Any thread may ask for it.
+  /// Returns the process's handler, which is never destroyed. Thread-safe.
   static const rt::Ref<PECErrorHandler>& sharedInstance();
 
-  /// Has the shared instance hear what the shared multiplexer passes on; once, further calls do nothing. Any
-  /// thread may call it.
+  /// Adds the shared instance to the shared multiplexer. Only the first call has an effect. Thread-safe.
   static void register_();
 
-  /// One that nothing is told yet, without a callback.
+  /// Makes a handler that is not registered and has no callback.
   static rt::Ref<PECErrorHandler> init();
 
-  /// Tells the callback of `message`, not null, and then, unless it threw, counts the error. The handler's
-  /// lock is held meanwhile, so that the callback is told of one error after another; it may itself log, also
-  /// an error. Throws what the callback throws.
+  /// Passes `message`, which is not null, to the callback. Counts the error unless the callback throws.
+  ///
+  /// Threads: holds the handler's lock while the callback runs, so that errors reach it one after another.
+  /// The callback may log, even another error.
+  /// Errors: throws what the callback throws.
   void logWithMessage(const rt::Ref<LUMLogMessage>& message) override;
 
-  /// Admits LUMLogLevelFault and what is above.
+  /// Returns a filter that admits LUMLogLevelFault and higher levels.
   rt::Ref<LUMLogFilter> filter() const override { return filter_; }
 
-  /// Makes `block` the callback. It cannot be null and there can be no callback yet: both are errors that are
-  /// reported, and the callback stays as it is. Throws what the callback throws that is told of them; that is
-  /// an rt::InternalInconsistencyException where `block` is null and there is no callback. Waits for a
-  /// callback that runs on another thread. Any thread may call it.
+  /// Sets the callback. If `block` is null, or if a callback is set already, reports an error and changes
+  /// nothing.
+  ///
+  /// Threads: thread-safe. Waits while a callback runs on another thread.
+  /// Errors: throws what the callback throws when it receives such a report. If `block` is null and no
+  /// callback is set, that is an rt::InternalInconsistencyException.
   void registerErrorHandlerBlock(PECErrorHandlerBlock block);
 
-  /// Whether the calling thread is running an error callback of any handler. For locks of which an error
-  /// callback must not wait, since errors are reported while they are held.
+  /// Returns whether the calling thread is running an error callback of any handler. For code with a lock
+  /// that is held while errors are reported: an error callback must not wait for that lock.
   static bool isCallingBack() noexcept;
 
-  /// The callback that stands in where none is set: it fails an assertion, by the thread's
-  /// rt::AssertionHandler. The same at every call.
+  /// Returns the callback that runs if none is set. It fails an assertion through the thread's
+  /// rt::AssertionHandler. Every call returns the same callback.
   static PECErrorHandlerBlock defaultErrorHandlerBlock();
 
-  /// The callback, null where none is set, and the number of errors that were handled: one whose callback
-  /// threw is not counted. Setting them asks nothing and waits for nobody; any thread may do it.
+  /// Return and set the callback, which may be null, and the number of handled errors. An error whose
+  /// callback threw is not counted. The setters check nothing.
+  ///
+  /// Threads: thread-safe. None of these functions waits for a running callback.
   PECErrorHandlerBlock errorHandlerBlock() const;
   void setErrorHandlerBlock(PECErrorHandlerBlock block);
   std::int32_t errorCount() const noexcept { return errorCount_.load(std::memory_order_relaxed); }
   void setErrorCount(std::int32_t count) noexcept { errorCount_.store(count, std::memory_order_relaxed); }
 
-  // For tests. All of these are about the shared instance, and for one thread at a time.
+  // For tests. The functions below use the shared instance, and only one thread may call them at a time.
 
-  /// Takes the callback away and counts from 0 again.
+  /// Removes the callback and sets the count to 0.
   static void resetAfterTest();
 
-  /// How many errors `block`, which is not null, reports; the callback is told of none of them. If `block`
-  /// throws, a callback that does nothing stays in its place, until `setErrorHandlerBlock` sets another or
-  /// `resetAfterTest` brings the default back.
+  /// Runs `block`, which is not null, and returns the number of errors that it reports. The callback does not
+  /// receive them. If `block` throws, a callback that does nothing stays set. Call `setErrorHandlerBlock` to
+  /// set another, or `resetAfterTest` to restore the default.
   static std::int32_t errorCountInBlock(const rt::Block<void()>& block);
 
-  /// Throws an rt::Exception of the name "Assertion Failed!" unless `block` reports an error, or if it does.
+  /// Throw an rt::Exception named "Assertion Failed!" if `block` reports no error, or if it reports one.
   static void assertBlockReportsError(const rt::Block<void()>& block);
   static void assertBlockDoesNotReportError(const rt::Block<void()>& block);
 
@@ -102,7 +109,7 @@ class RT_VISIBLE PECErrorHandler : public rt::Implements<PECErrorHandler, rt::Ob
 
  private:
   const rt::Ref<LUMLogFilter> filter_;
-  // Held while the callback runs: what it takes long for, the next error waits for.
+  // Held while the callback runs. So the next error waits for a slow callback.
   rt::RecursiveLock lock_;
   mutable rt::UnfairLock blockLock_;
   PECErrorHandlerBlock errorHandlerBlock_ RT_GUARDED_BY(blockLock_);

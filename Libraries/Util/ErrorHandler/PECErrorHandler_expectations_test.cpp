@@ -1,4 +1,4 @@
-// What tests of a host's use to see whether errors are reported: counts and expectations.
+// Tests how a host's tests check whether errors are reported: by counts and expectations.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
@@ -22,13 +22,13 @@ using namespace rt::literals;
 using rt::Ref;
 using testing::IsEmpty;
 
-TEST_F(PECErrorHandlerTest, ForgetsCallbackAndCountAfterATest) {
+TEST_F(PECErrorHandlerTest, ResetsCallbackAndCountAfterATest) {
   handler_->setErrorHandlerBlock(tracing());
   logError();
   PECErrorHandler::resetAfterTest();
   EXPECT_FALSE(handler_->errorHandlerBlock());
   EXPECT_EQ(handler_->errorCount(), 0);
-  handler_->registerErrorHandlerBlock(tracing());  // As the first.
+  handler_->registerErrorHandlerBlock(tracing());  // Accepted as the first callback.
   EXPECT_EQ(handler_->errorCount(), 0);
 }
 
@@ -48,7 +48,7 @@ TEST_F(PECErrorHandlerTest, CountsTheErrorsOfABlock) {
   EXPECT_THAT(trace_.events(), IsEmpty());
 }
 
-TEST_F(PECErrorHandlerTest, RaisesNothingWhileItCountsAndRaisesAgainAfterwards) {
+TEST_F(PECErrorHandlerTest, FailsNoAssertionWhileItCounts) {
   EXPECT_EQ(PECErrorHandler::errorCountInBlock([&] {
               EXPECT_TRUE(handler_->errorHandlerBlock());
               logError();
@@ -60,7 +60,7 @@ TEST_F(PECErrorHandlerTest, RaisesNothingWhileItCountsAndRaisesAgainAfterwards) 
   testing::internal::GetCapturedStderr();
 }
 
-TEST_F(PECErrorHandlerTest, CountsWithinWhatIsCounted) {
+TEST_F(PECErrorHandlerTest, CountsMayNest) {
   EXPECT_EQ(PECErrorHandler::errorCountInBlock([] {
               logError();
               EXPECT_EQ(PECErrorHandler::errorCountInBlock([] { logError(); }), 1);
@@ -69,7 +69,7 @@ TEST_F(PECErrorHandlerTest, CountsWithinWhatIsCounted) {
             3);
 }
 
-TEST_F(PECErrorHandlerTest, CountsOverTheEndOfTheNumbers) {
+TEST_F(PECErrorHandlerTest, CountsAcrossIntegerOverflow) {
   handler_->setErrorCount(std::numeric_limits<std::int32_t>::max());
   EXPECT_EQ(PECErrorHandler::errorCountInBlock([] {
               logError();
@@ -80,8 +80,8 @@ TEST_F(PECErrorHandlerTest, CountsOverTheEndOfTheNumbers) {
             std::numeric_limits<std::int32_t>::max());
 }
 
-// On purpose: what a block throws leaves the callback that does nothing behind.
-TEST_F(PECErrorHandlerTest, PutsNothingBackWhereABlockThrows) {
+// Deliberate: if a block throws, the callback that does nothing stays set.
+TEST_F(PECErrorHandlerTest, KeepsTheEmptyCallbackIfABlockThrows) {
   struct Thrown {};
   handler_->setErrorHandlerBlock(tracing());
   EXPECT_THROW(PECErrorHandler::errorCountInBlock([] {
@@ -95,7 +95,7 @@ TEST_F(PECErrorHandlerTest, PutsNothingBackWhereABlockThrows) {
   EXPECT_TRUE(handler_->errorHandlerBlock());
 }
 
-// Counting waits for nobody: a callback that is running holds up only those that report.
+// Counting does not wait. A running callback delays only the threads that report.
 TEST_F(PECErrorHandlerTest, CountsWhileACallbackRuns) {
   std::latch isRunning(1);
   std::latch mayReturn(1);
@@ -110,7 +110,7 @@ TEST_F(PECErrorHandlerTest, CountsWhileACallbackRuns) {
   reporter.join();
 }
 
-// The name and the reason of what `body` throws.
+// Returns the name and the reason of the exception that `body` throws.
 template <class Body>
 std::pair<std::string, std::string> thrownBy(Body body) {
   try {
@@ -143,8 +143,8 @@ TEST_F(PECErrorHandlerTest, AssertsThatABlockReportsNoError) {
   EXPECT_FALSE(handler_->errorHandlerBlock());
 }
 
-// A count that has gone down is neither no error nor some.
-TEST_F(PECErrorHandlerTest, AssertsNothingWhereABlockCountsDown) {
+// A count that has decreased meets both expectations.
+TEST_F(PECErrorHandlerTest, AssertsNothingIfTheCountDecreases) {
   EXPECT_NO_THROW(PECErrorHandler::assertBlockReportsError([&] { handler_->setErrorCount(-1); }));
   EXPECT_NO_THROW(PECErrorHandler::assertBlockDoesNotReportError([&] { handler_->setErrorCount(-2); }));
 }

@@ -1,5 +1,5 @@
-// What the handler is told, whom it tells, and what it counts. What needs a process in which nothing was
-// reported yet is a death test, which is started anew.
+// Tests what the handler receives, passes on and counts. Tests that need a process without any report so far
+// are death tests, which start a new process.
 
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
 
@@ -42,7 +42,7 @@ Ref<LUMLogMessage> errorMessage(const rt::String& file = "a/b/c.m"_s) {
                                       17, nullptr, nullptr, nullptr, nullptr, nullptr);
 }
 
-// Keeps the assertions that fail, and returns.
+// Records failed assertions and returns.
 class Recorder final : public rt::Implements<Recorder, rt::AssertionHandler> {
  public:
   struct Failure {
@@ -60,7 +60,7 @@ class Recorder final : public rt::Implements<Recorder, rt::AssertionHandler> {
   std::vector<Failure> failures;
 };
 
-TEST(PECErrorDescription, HasWhatIsSet) {
+TEST(PECErrorDescription, HoldsWhatIsSet) {
   const auto error = rt::make<PECErrorDescription>();
   EXPECT_EQ(error->filePath(), nullptr);
   EXPECT_EQ(error->functionName(), nullptr);
@@ -79,16 +79,16 @@ TEST(PECErrorDescription, HasWhatIsSet) {
   EXPECT_EQ(error->errorMessage(), "d");
 }
 
-// A handler.
+// A handler by itself.
 
-TEST_F(PECErrorHandlerTest, BeginsWithoutCallbackAndErrors) {
+TEST_F(PECErrorHandlerTest, StartsWithoutCallbackAndErrors) {
   const Ref<PECErrorHandler> handler = PECErrorHandler::init();
   EXPECT_FALSE(handler->errorHandlerBlock());
   EXPECT_EQ(handler->errorCount(), 0);
   EXPECT_NE(handler, PECErrorHandler::sharedInstance());
 }
 
-TEST_F(PECErrorHandlerTest, IsASyncLoggerForFaultsAndWhatIsAbove) {
+TEST_F(PECErrorHandlerTest, IsASyncLoggerForFaultsAndHigherLevels) {
   const Ref<PECErrorHandler> handler = PECErrorHandler::init();
   EXPECT_NE(rt::cast<LUMSyncLogger>(handler.get()), nullptr);
   const Ref<LUMLogFilter> filter = handler->filter();
@@ -116,8 +116,8 @@ TEST_F(PECErrorHandlerTest, DescribesTheMessage) {
   EXPECT_NE(told, first);
 }
 
-// Callbacks nest, and may throw; others' threads do not count.
-TEST_F(PECErrorHandlerTest, KnowsWhetherTheThreadRunsACallback) {
+// Callbacks may nest and throw. The callbacks of other threads do not count.
+TEST_F(PECErrorHandlerTest, TellsWhetherTheThreadRunsACallback) {
   struct Thrown {};
   std::vector<bool> during;
   bool ofAnother = true;
@@ -137,7 +137,7 @@ TEST_F(PECErrorHandlerTest, KnowsWhetherTheThreadRunsACallback) {
   EXPECT_FALSE(PECErrorHandler::isCallingBack());
 }
 
-TEST_F(PECErrorHandlerTest, CountsWhenTheCallbackHasReturned) {
+TEST_F(PECErrorHandlerTest, CountsAfterTheCallbackHasReturned) {
   std::vector<std::int32_t> during;
   handler_->setErrorHandlerBlock(
       [&](const Ref<PECErrorDescription>&) { during.push_back(handler_->errorCount()); });
@@ -149,7 +149,7 @@ TEST_F(PECErrorHandlerTest, CountsWhenTheCallbackHasReturned) {
   EXPECT_THAT(during, ElementsAre(0, 1, 2));
 }
 
-TEST_F(PECErrorHandlerTest, HearsNothingBelowFault) {
+TEST_F(PECErrorHandlerTest, IgnoresLevelsBelowFault) {
   handler_->setErrorHandlerBlock(tracing());
   for (LUMLogLevel level = 0; level < LUMLogLevelFault; ++level) {
     LUMLogMultiplexer::sharedInstance()->logWithMessage(messageWith(level, "harmless"_s));
@@ -161,7 +161,7 @@ TEST_F(PECErrorHandlerTest, HearsNothingBelowFault) {
   EXPECT_EQ(handler_->errorCount(), 1);
 }
 
-TEST_F(PECErrorHandlerTest, IsToldOnTheThreadThatLogs) {
+TEST_F(PECErrorHandlerTest, CallsBackOnTheThreadThatLogs) {
   std::thread::id teller;
   handler_->setErrorHandlerBlock(
       [&](const Ref<PECErrorDescription>&) { teller = std::this_thread::get_id(); });
@@ -169,20 +169,20 @@ TEST_F(PECErrorHandlerTest, IsToldOnTheThreadThatLogs) {
   EXPECT_EQ(teller, std::this_thread::get_id());
 }
 
-TEST_F(PECErrorHandlerTest, PassesOnWhatTheCallbackThrowsAndDoesNotCountIt) {
+TEST_F(PECErrorHandlerTest, ThrowsWhatTheCallbackThrowsAndDoesNotCountIt) {
   struct Thrown {};
   handler_->setErrorHandlerBlock([](const Ref<PECErrorDescription>&) { throw Thrown(); });
   EXPECT_THROW(logError(), Thrown);
   EXPECT_THROW(LUMLogAt(LUMLogLevelFault, "wrong"_s), Thrown);
   EXPECT_EQ(handler_->errorCount(), 0);
-  // Nobody is locked out by it.
+  // The exception has released the lock.
   handler_->setErrorHandlerBlock(tracing());
   std::thread([] { logError("in another thread"_s); }).join();
   EXPECT_THAT(trace_.events(), ElementsAre("in another thread"));
   EXPECT_EQ(handler_->errorCount(), 1);
 }
 
-TEST_F(PECErrorHandlerTest, ACallbackMayLogErrorsItself) {
+TEST_F(PECErrorHandlerTest, ACallbackMayLogErrors) {
   int depth = 0;
   handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>& error) {
     trace_.add("begin " + string(error->errorMessage()));
@@ -195,11 +195,11 @@ TEST_F(PECErrorHandlerTest, ACallbackMayLogErrorsItself) {
   EXPECT_EQ(handler_->errorCount(), 4);
 }
 
-// Invariant: the callback is never run by two threads at once, and every error is counted.
-TEST_F(PECErrorHandlerTest, TellsOfOneErrorAfterAnother) {
+// Invariant: the callback never runs on two threads at once, and every error is counted.
+TEST_F(PECErrorHandlerTest, CallsBackForOneErrorAfterAnother) {
   constexpr int kThreads = 8;
   constexpr int kErrors = 500;
-  int running = 0;  // Not atomic: what the handler promises is all that keeps it whole.
+  int running = 0;  // Deliberately not atomic: only the handler's promise protects it.
   int highest = 0;
   int told = 0;
   handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>& error) {
@@ -217,13 +217,13 @@ TEST_F(PECErrorHandlerTest, TellsOfOneErrorAfterAnother) {
     });
   }
   for (std::thread& thread : threads) thread.join();
-  EXPECT_EQ(highest, 2);  // Only within itself.
+  EXPECT_EQ(highest, 2);  // The callback was only nested in itself.
   EXPECT_EQ(told, kThreads * kErrors * 11 / 10);
   EXPECT_EQ(handler_->errorCount(), told);
 }
 
-// Whoever installs a callback waits for the one that runs, also where that has taken itself away.
-TEST_F(PECErrorHandlerTest, InstallsACallbackWhileNoneRuns) {
+// Installing a callback waits for a running one, even if that one has removed itself.
+TEST_F(PECErrorHandlerTest, WaitsForARunningCallbackBeforeItInstallsAnother) {
   std::latch isTold(1);
   handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>&) {
     handler_->setErrorHandlerBlock(nullptr);
@@ -250,11 +250,11 @@ TEST_F(PECErrorHandlerTest, FailsAnAssertionWithoutACallback) {
   EXPECT_EQ(failure.function, "-[PECErrorHandler defaultErrorHandlerBlock]_block_invoke");
   EXPECT_EQ(failure.file, "Libraries/Util/ErrorHandler/PECErrorHandler");
   EXPECT_EQ(failure.lineNumber, 64U);
-  // The format, not what was made of it.
+  // The format, not the formatted text.
   EXPECT_EQ(string(failure.description), std::string("\n\n\n   <<< ERROR!    ") + kFace +
                                              "    ERROR! >>>\n\n   in c.m\n   in -[A b]\n"
                                              "   Line 17 says:\n\n   %@ is wrong\n\n\n");
-  // A handler of one's own may return: then the error was handled.
+  // A host's assertion handler may return. The error then counts as handled.
   EXPECT_EQ(handler_->errorCount(), 1);
 }
 
@@ -272,7 +272,7 @@ TEST_F(PECErrorHandlerTest, ShowsTheLastElementOfTheFilePath) {
   }
 }
 
-TEST_F(PECErrorHandlerTest, ShowsWhatIsUnknown) {
+TEST_F(PECErrorHandlerTest, ShowsUnknownFieldsAsNull) {
   const auto recorder = rt::make<Recorder>();
   rt::AssertionHandler::setCurrentHandler(recorder);
   handler_->logWithMessage(LUMLogMessage::initWithLevel(LUMLogLevelFault, nullptr, nullptr, nullptr, nullptr,
@@ -284,7 +284,7 @@ TEST_F(PECErrorHandlerTest, ShowsWhatIsUnknown) {
                                 "   (null)\n\n\n"));
 }
 
-TEST_F(PECErrorHandlerTest, RaisesWithoutACallbackAndCountsNothing) {
+TEST_F(PECErrorHandlerTest, ThrowsWithoutACallbackAndCountsNothing) {
   testing::internal::CaptureStderr();
   bool isRaised = false;
   try {
@@ -300,13 +300,13 @@ TEST_F(PECErrorHandlerTest, RaisesWithoutACallbackAndCountsNothing) {
   EXPECT_THAT(testing::internal::GetCapturedStderr(), testing::HasSubstr(kFace));
   EXPECT_TRUE(isRaised);
   EXPECT_EQ(handler_->errorCount(), 0);
-  // Nobody is locked out by it.
+  // The exception has released the lock.
   handler_->setErrorHandlerBlock(tracing());
   std::thread([] { logError(); }).join();
   EXPECT_EQ(handler_->errorCount(), 1);
 }
 
-TEST_F(PECErrorHandlerTest, HasOneCallbackForWhereThereIsNone) {
+TEST_F(PECErrorHandlerTest, AlwaysReturnsTheSameDefaultCallback) {
   const PECErrorHandlerBlock block = handler_->defaultErrorHandlerBlock();
   ASSERT_TRUE(block);
   EXPECT_EQ(block, handler_->defaultErrorHandlerBlock());
@@ -318,7 +318,7 @@ TEST_F(PECErrorHandlerTest, HasOneCallbackForWhereThereIsNone) {
   EXPECT_EQ(handler_->errorCount(), 0);
 }
 
-// Installing a callback.
+// Registering a callback.
 
 TEST_F(PECErrorHandlerTest, InstallsACallback) {
   const PECErrorHandlerBlock block = tracing();
@@ -329,7 +329,7 @@ TEST_F(PECErrorHandlerTest, InstallsACallback) {
   EXPECT_EQ(handler_->errorCount(), 1);
 }
 
-TEST_F(PECErrorHandlerTest, KeepsTheFirstCallbackAndTellsItOfTheSecond) {
+TEST_F(PECErrorHandlerTest, KeepsTheFirstCallbackAndReportsTheSecondToIt) {
   std::vector<Ref<PECErrorDescription>> errors;
   const PECErrorHandlerBlock first = [&](const Ref<PECErrorDescription>& error) { errors.push_back(error); };
   handler_->registerErrorHandlerBlock(first);
@@ -342,7 +342,7 @@ TEST_F(PECErrorHandlerTest, KeepsTheFirstCallbackAndTellsItOfTheSecond) {
   EXPECT_EQ(errors[0]->rawFormatString(), "An ErrorHandlerBlock was already set!.");
   EXPECT_EQ(errors[0]->errorMessage(), "An ErrorHandlerBlock was already set!.");
   EXPECT_EQ(handler_->errorCount(), 1);
-  handler_->registerErrorHandlerBlock(first);  // The same one again is a second one, too.
+  handler_->registerErrorHandlerBlock(first);  // Registering the same callback again is an error too.
   EXPECT_EQ(errors.size(), 2U);
   EXPECT_THAT(trace_.events(), IsEmpty());
 }
@@ -361,7 +361,7 @@ TEST_F(PECErrorHandlerTest, ReportsANullCallback) {
   EXPECT_EQ(errors[0]->errorMessage(), "|errorHandlerBlock| cannot be nil!.");
 }
 
-TEST_F(PECErrorHandlerTest, RaisesForANullCallbackWhereThereIsNone) {
+TEST_F(PECErrorHandlerTest, ThrowsForANullCallbackIfNoneIsSet) {
   testing::internal::CaptureStderr();
   EXPECT_THROW(handler_->registerErrorHandlerBlock(nullptr), rt::InternalInconsistencyException);
   EXPECT_THAT(
@@ -374,7 +374,7 @@ TEST_F(PECErrorHandlerTest, RaisesForANullCallbackWhereThereIsNone) {
   EXPECT_EQ(handler_->errorCount(), 0);
 }
 
-TEST_F(PECErrorHandlerTest, MessagesWithoutMetadataAndArgumentsTellOfABadCallback) {
+TEST_F(PECErrorHandlerTest, ReportsABadCallbackWithoutMetadataAndArguments) {
   std::vector<Ref<LUMLogMessage>> messages;
   const auto logger =
       rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) { messages.push_back(message); });
@@ -391,7 +391,7 @@ TEST_F(PECErrorHandlerTest, MessagesWithoutMetadataAndArgumentsTellOfABadCallbac
   }
 }
 
-// A hostile callback: it installs another, from within, which is an error to tell it of.
+// A hostile callback registers another one while it runs, and is then told of that error.
 TEST_F(PECErrorHandlerTest, ACallbackMayInstallACallback) {
   bool isFirst = true;
   handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>& error) {
@@ -403,8 +403,8 @@ TEST_F(PECErrorHandlerTest, ACallbackMayInstallACallback) {
   EXPECT_EQ(handler_->errorCount(), 2);
 }
 
-// Installing of all threads at once: one callback is installed, and is told of all others.
-TEST_F(PECErrorHandlerTest, InstallsOneOfTheCallbacksThatThreadsInstallAtOnce) {
+// All threads register at once. One callback is accepted, and receives an error for each of the others.
+TEST_F(PECErrorHandlerTest, InstallsOneOfManyConcurrentCallbacks) {
   constexpr std::int32_t kThreads = 8;
   std::latch mayStart(kThreads);
   std::atomic<std::int32_t> told = 0;
@@ -423,7 +423,7 @@ TEST_F(PECErrorHandlerTest, InstallsOneOfTheCallbacksThatThreadsInstallAtOnce) {
 
 // Setting a callback and a count.
 
-TEST_F(PECErrorHandlerTest, SetsACallbackWhateverThereIs) {
+TEST_F(PECErrorHandlerTest, SetsACallbackWithoutChecks) {
   handler_->registerErrorHandlerBlock(tracing("first "));
   handler_->setErrorHandlerBlock(tracing("second "));
   logError();
@@ -435,21 +435,21 @@ TEST_F(PECErrorHandlerTest, SetsACallbackWhateverThereIs) {
   EXPECT_FALSE(handler_->errorHandlerBlock());
 }
 
-TEST_F(PECErrorHandlerTest, CountsOnFromWhatIsSet) {
+TEST_F(PECErrorHandlerTest, CountsOnFromTheCountThatIsSet) {
   handler_->setErrorHandlerBlock(tracing());
   handler_->setErrorCount(-3);
   EXPECT_EQ(handler_->errorCount(), -3);
   logError();
   EXPECT_EQ(handler_->errorCount(), -2);
-  // It has 32 bits and a sign.
+  // The count is a signed 32-bit number.
   handler_->setErrorCount(std::numeric_limits<std::int32_t>::max());
   logError();
   EXPECT_EQ(handler_->errorCount(), std::numeric_limits<std::int32_t>::min());
 }
 
-// A callback that takes itself away lives until it returns. What it captured used to be destroyed with the
-// handler's lock held.
-TEST_F(PECErrorHandlerTest, GivesUpACallbackWithoutALock) {
+// A callback that removes itself lives until it returns. Its captures used to be destroyed with the handler's
+// lock held.
+TEST_F(PECErrorHandlerTest, ReleasesACallbackWithoutALock) {
   bool hasReturned = false;
   int ended = 0;
   handler_->setErrorHandlerBlock([&, end = AtEnd([&] {
@@ -482,7 +482,7 @@ TEST_F(PECErrorHandlerTest, ReplacesACallbackWithoutALock) {
 
 // Hostile loggers beside the handler.
 
-TEST_F(PECErrorHandlerTest, SurvivesLoggersThatThrowLogAndLeave) {
+TEST_F(PECErrorHandlerTest, SurvivesLoggersThatThrowLogAndRemoveThemselves) {
   struct Thrown {};
   const auto& multiplexer = LUMLogMultiplexer::sharedInstance();
   handler_->setErrorHandlerBlock([&](const Ref<PECErrorDescription>& error) {
@@ -510,17 +510,17 @@ TEST_F(PECErrorHandlerTest, SurvivesLoggersThatThrowLogAndLeave) {
   EXPECT_THAT(trace_.events(), ElementsAre("afterwards"));
 }
 
-// A process in which nothing was reported yet.
+// A process without any report so far.
 
 class PECErrorHandlerAtTheStartDeathTest : public testing::Test {
  protected:
   PECErrorHandlerAtTheStartDeathTest() { GTEST_FLAG_SET(death_test_style, "threadsafe"); }
 
-  // Ends the process, with what `isTrue` says as its status.
+  // Ends the process with status 0 if `isTrue`, else 1.
   [[noreturn]] static void conclude(bool isTrue) { std::exit(isTrue ? 0 : 1); }
 };
 
-TEST_F(PECErrorHandlerAtTheStartDeathTest, HearsNothingUntilSomethingIsReported) {
+TEST_F(PECErrorHandlerAtTheStartDeathTest, IsNotRegisteredBeforeTheFirstReport) {
   const auto body = [] {
     silenceSystemLog();
     int told = 0;
@@ -536,7 +536,7 @@ TEST_F(PECErrorHandlerAtTheStartDeathTest, HearsNothingUntilSomethingIsReported)
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "");
 }
 
-// Who takes the handler away has taken it away for good.
+// A handler that was removed from the multiplexer is not added again.
 TEST_F(PECErrorHandlerAtTheStartDeathTest, IsRegisteredOnce) {
   const auto body = [] {
     silenceSystemLog();
@@ -554,7 +554,7 @@ TEST_F(PECErrorHandlerAtTheStartDeathTest, IsRegisteredOnce) {
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "");
 }
 
-TEST_F(PECErrorHandlerAtTheStartDeathTest, IsMadeAndRegisteredByAllThreadsAtOnce) {
+TEST_F(PECErrorHandlerAtTheStartDeathTest, IsMadeAndRegisteredOnceByManyThreads) {
   const auto body = [] {
     silenceSystemLog();
     constexpr std::int32_t kThreads = 8;
@@ -571,7 +571,7 @@ TEST_F(PECErrorHandlerAtTheStartDeathTest, IsMadeAndRegisteredByAllThreadsAtOnce
         if (!first.compare_exchange_strong(none, own) && none != own) isTheSame = false;
         own->setErrorHandlerBlock([](const Ref<PECErrorDescription>&) {});
         PECErrorHandler::register_();
-        logError();  // Heard, since the handler is registered when `register_` returns.
+        logError();  // Received, because the handler is registered when `register_` returns.
       });
     }
     for (std::thread& thread : threads) thread.join();
@@ -580,8 +580,8 @@ TEST_F(PECErrorHandlerAtTheStartDeathTest, IsMadeAndRegisteredByAllThreadsAtOnce
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "");
 }
 
-// Both mistakes with callbacks are heard although nothing was registered before.
-TEST_F(PECErrorHandlerAtTheStartDeathTest, RegistersItselfToTellOfASecondCallback) {
+// Mistakes with callbacks are reported even if no report has registered the handler before.
+TEST_F(PECErrorHandlerAtTheStartDeathTest, RegistersItselfToReportASecondCallback) {
   const auto body = [] {
     silenceSystemLog();
     int told = 0;
@@ -593,7 +593,7 @@ TEST_F(PECErrorHandlerAtTheStartDeathTest, RegistersItselfToTellOfASecondCallbac
   EXPECT_EXIT(body(), testing::ExitedWithCode(0), "");
 }
 
-TEST_F(PECErrorHandlerAtTheStartDeathTest, EndsTheProgramWhereNobodyCatchesIt) {
+TEST_F(PECErrorHandlerAtTheStartDeathTest, AnUncaughtReportEndsTheProgram) {
   const auto body = []() noexcept {
     silenceSystemLog();
     PECErrorHandler::sharedInstance()->registerErrorHandlerBlock(nullptr);
@@ -603,7 +603,7 @@ TEST_F(PECErrorHandlerAtTheStartDeathTest, EndsTheProgramWhereNobodyCatchesIt) {
               "Libraries/Util/ErrorHandler/PECErrorHandler:64: ");
 }
 
-TEST_F(PECErrorHandlerAtTheStartDeathTest, IsToldUntilTheProcessIsGone) {
+TEST_F(PECErrorHandlerAtTheStartDeathTest, CallsBackUntilTheProcessEnds) {
   const auto body = [] {
     silenceSystemLog();
     std::atexit([] { PECReport({"a", "b"}, "at exit"_s); });

@@ -1,6 +1,6 @@
 #pragma once
 
-/// How the libraries report misuse: the one line at the place where it is found.
+/// Reports a misuse of a library, in one line at the place that detects it.
 ///
 ///     using namespace rt::literals;
 ///
@@ -12,14 +12,15 @@
 ///       return nullptr;
 ///     }
 ///
-/// It makes sure that the error handler is told, and logs a message of LUMLogLevelFault of which the caller's
-/// own function is first in the call stack. Every parameter is printed by "%@" and kept by itself in the
-/// message too, as a LUMSafeStringParameter or LUMSafeNumberParameter of type 1: give none that tells of a
-/// person.
+/// A report registers the error handler and logs a message of LUMLogLevelFault. The first frame of the
+/// message's call stack is the function that reports.
 ///
-/// It returns where the error callback returns, and throws what that throws; see PECErrorHandler.
+/// "%@" prints each parameter. The message also keeps each parameter by itself, as a LUMSafeStringParameter
+/// or LUMSafeNumberParameter of type 1. So no parameter may contain private data.
 ///
-/// Not for: hosts, whose errors are messages like any others (LUMLog).
+/// Errors: returns when the error callback returns, and throws what the callback throws; see PECErrorHandler.
+///
+/// Not for: hosts. They log their errors like any other message (LUMLog).
 
 #include <concepts>
 #include <cstdint>
@@ -37,7 +38,7 @@
 #include "Shared/Logging/LUMSafeNumberParameter.h"
 #include "Shared/Logging/LUMSafeStringParameter.h"
 
-/// Where a report is from: the source file, relative and without extension, the operation, and the line.
+/// The origin of a report: the source file (a relative path without extension), the operation, and the line.
 struct PECReportSite {
   constexpr PECReportSite(const char* filePath, const char* functionName,
                           std::uint64_t lineNumber = std::source_location::current().line())
@@ -48,7 +49,7 @@ struct PECReportSite {
   std::uint64_t line;
 };
 
-/// `value` as a parameter of a report.
+/// Returns `value` as a parameter of a report.
 inline rt::Ref<rt::Object> PECReportParameter(const rt::String& value) {
   return LUMSafeStringParameter::parameterWithString(value, 1);
 }
@@ -61,9 +62,9 @@ template <class>
 using Object = rt::Ref<rt::Object>;
 }
 
-/// Reports an error at `site`: the literal `format` with `parameters`, strings and integers, in the place of
-/// each "%@".
-// Compiled into its caller, so that the caller is first in the call stack.
+/// Reports an error at `site`, with the text of the literal `format`. Each "%@" stands for one of
+/// `parameters`, which are strings and integers. Always inlined, so that the caller is the first frame of the
+/// call stack.
 template <class... Parameters>
 [[gnu::always_inline]] inline void PECReport(
     const PECReportSite& site,

@@ -1,4 +1,4 @@
-// What a report makes of its line: the message that is logged, and what the error handler is told.
+// Tests the message that a report logs, and what the error handler receives.
 
 #include "Libraries/Util/ErrorHandler/PECReport.h"
 
@@ -36,7 +36,7 @@ constexpr const char* kFile = "Libraries/Util/ErrorHandler/PECReport_test";
 class PECReportTest : public testing::Test {
  protected:
   static void SetUpTestSuite() {
-    // The system's log would only repeat what is reported here.
+    // The system's log would only repeat the reports.
     LUMLogMultiplexer::sharedInstance()->addSyncLogger(
         LUMSystemLogger::initWithFilter(LUMLogDropAllFilter::init()));
   }
@@ -54,7 +54,7 @@ class PECReportTest : public testing::Test {
 
   const LUMLogMessage& message() const { return *messages_.at(0); }
 
-  // The safe parameter at a place, as what it is.
+  // Returns the safe parameter at an index, cast to its class.
   template <class Parameter>
   const Parameter* parameterAt(std::int32_t place) const {
     return rt::cast<Parameter>(message().safeParameters()->objectForKey(rt::Number::of(place).get()));
@@ -79,7 +79,7 @@ TEST_F(PECReportTest, LogsAFaultFromItsSite) {
   EXPECT_EQ(message().safeParameters(), nullptr);
 }
 
-TEST_F(PECReportTest, TellsTheErrorHandler) {
+TEST_F(PECReportTest, ReachesTheErrorHandler) {
   PECReport({kFile, "-[Registry add:]", 70}, "%@ is bound %@ times."_s, "API"_s, 2);
   ASSERT_EQ(errors_.size(), 1U);
   EXPECT_EQ(errors_[0]->filePath(), kFile);
@@ -90,7 +90,7 @@ TEST_F(PECReportTest, TellsTheErrorHandler) {
   EXPECT_EQ(PECErrorHandler::sharedInstance()->errorCount(), 1);
 }
 
-TEST_F(PECReportTest, KnowsItsLine) {
+TEST_F(PECReportTest, RecordsItsLine) {
   PECReport({kFile, "f"}, "first"_s);
   const std::uint64_t line = __LINE__ - 1;
   PECReport({kFile, "f"}, "second"_s);
@@ -99,7 +99,7 @@ TEST_F(PECReportTest, KnowsItsLine) {
   EXPECT_EQ(messages_[1]->line(), line + 2);
 }
 
-TEST_F(PECReportTest, KeepsEveryParameterAsASafeOneOfTypeOne) {
+TEST_F(PECReportTest, KeepsEveryParameterAsASafeParameterOfTypeOne) {
   const rt::String name = rt::String::fromUTF8("Clock");
   PECReport({kFile, "f"}, "%@ of %@ and %@"_s, name, 4, "literal"_s);
   EXPECT_EQ(message().formattedString(), "Clock of 4 and literal");
@@ -114,26 +114,26 @@ TEST_F(PECReportTest, KeepsEveryParameterAsASafeOneOfTypeOne) {
   EXPECT_EQ(parameterAt<LUMSafeStringParameter>(2)->stringValue(), "literal");
 }
 
-TEST_F(PECReportTest, PrintsIntegersWhole) {
+TEST_F(PECReportTest, PrintsAnyIntegerInFull) {
   PECReport({kFile, "f"}, "%@ %@ %@ %@ %@"_s, std::numeric_limits<std::uint64_t>::max(),
             std::numeric_limits<std::int64_t>::min(), -1, std::uint8_t{200}, std::size_t{7});
   EXPECT_EQ(message().formattedString(), "18446744073709551615 -9223372036854775808 -1 200 7");
 }
 
-TEST_F(PECReportTest, PrintsNoTextAsNone) {
+TEST_F(PECReportTest, PrintsNullText) {
   PECReport({kFile, "f"}, "no %@, and %@"_s, rt::String(), ""_s);
   EXPECT_EQ(message().formattedString(), "no (null), and ");
   EXPECT_EQ(message().safeParameters()->count(), 2U);
 }
 
-// A text with directives in it is printed as it is.
-TEST_F(PECReportTest, PrintsForeignTextAsItIs) {
+// Directives in a parameter are printed unchanged.
+TEST_F(PECReportTest, PrintsDirectivesInParametersUnchanged) {
   PECReport({kFile, "f"}, "100 %% of %@"_s, "%@%s%n"_s);
   EXPECT_EQ(message().formattedString(), "100 % of %@%s%n");
   EXPECT_EQ(message().format(), "100 %% of %@");
 }
 
-// What these report is the last thing that they do.
+// Reporting is the last thing that these functions do.
 [[gnu::noinline]] void functionThatReports() {
   PECReport({kFile, "f"}, "wrong"_s);
 }
@@ -154,7 +154,7 @@ std::string firstSymbolOf(const LUMLogMessage& message) {
   return line;
 }
 
-TEST_F(PECReportTest, HasTheReportingFunctionFirstInItsCallStack) {
+TEST_F(PECReportTest, CallStackBeginsWithTheReportingFunction) {
   for (const bool captureAddresses : {true, false}) {
     LUMLogMultiplexer::sharedInstance()->setCaptureCallStackAddresses(captureAddresses);
     messages_.clear();
@@ -166,7 +166,7 @@ TEST_F(PECReportTest, HasTheReportingFunctionFirstInItsCallStack) {
   }
 }
 
-TEST_F(PECReportTest, ReturnsWhereTheCallbackReturnsAndThrowsWhatItThrows) {
+TEST_F(PECReportTest, ReturnsOrThrowsAsTheCallbackDoes) {
   struct Thrown {};
   EXPECT_NO_THROW(functionThatReports());
   PECErrorHandler::sharedInstance()->setErrorHandlerBlock(
@@ -179,7 +179,7 @@ TEST_F(PECReportTest, ReturnsWhereTheCallbackReturnsAndThrowsWhatItThrows) {
   EXPECT_THAT(testing::internal::GetCapturedStderr(), HasSubstr("in PECReport_test\n   in f\n"));
 }
 
-TEST_F(PECReportTest, IsWhatABlockReports) {
+TEST_F(PECReportTest, IsCountedInABlock) {
   EXPECT_EQ(PECErrorHandler::errorCountInBlock([] {
               functionThatReports();
               functionThatReportsParameters("text"_s);

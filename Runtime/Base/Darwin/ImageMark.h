@@ -4,8 +4,9 @@
 
 namespace rt::detail {
 
-/// The mark. The system calls an image's functions source file by source file, by priority only within
-/// each, so that every source file has a mark of its own and says for itself that it is done.
+// The mark and its state in one. The system calls the functions of an image source file by source file.
+// Priorities only order those of one source file. So every source file has a mark of its own and notes for
+// itself that it is done.
 struct ImageState {
   bool isAnnounced = false;
 };
@@ -17,7 +18,7 @@ struct ImageState {
   runLoadHooksWhenComplete();
 }
 
-/// Emitted where it is mentioned: announces `entry` in the first round.
+// Emitted where it is mentioned. Announces `entry` in the first round, at priority 101.
 template <auto& entry>
 struct AnnouncedOnLoading {
   [[gnu::constructor(101)]] static void run() { announce(entry); }

@@ -17,7 +17,7 @@ void keepImage(const ImageState& state) noexcept {
   if (dladdr(&state, &image) == 0) return;
   const auto* header = static_cast<const mach_header_64*>(image.dli_fbase);
   if (header->filetype == MH_EXECUTE) return;
-  // Once for an image, which has a state for each source file.
+  // An image has a state for each source file. Only the first of them keeps the image.
   unsigned long size = 0;
   const std::uint8_t* section = getsectiondata(header, "__DATA", "__rt_image", &size);
   if (section != reinterpret_cast<const std::uint8_t*>(&state)) return;

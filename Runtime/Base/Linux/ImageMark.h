@@ -2,33 +2,39 @@
 
 // Included by Runtime/Base/LoadedImages.h only.
 
+// An image has one initialiser for all its announcements, whatever the number of classes. Each source file
+// names the classes that it mentions, in a section of distances that need no relocation. `announceImage`
+// walks that section. One call for each class in each source file would make hundreds of initialisers.
+
 #include <cstdint>
 
 namespace rt::detail {
 
-/// What the mark of an image leads to. Hidden, so that each image has its own.
+// The state that the mark of an image leads to. It is hidden, so that each image has its own.
 struct ImageState {
   bool isAnnounced = false;
 };
 [[gnu::visibility("hidden")]] inline constinit ImageState imageState;
 
-/// Calls the functions of the image whose state this is, notes that it has announced what it has, and runs
-/// the load hooks where it was the last. Does nothing when it is called again.
+// Calls the functions of the image that has `state`, and notes that the image has announced what it has. Runs
+// the load hooks if the image was the last one. A second call does nothing. `begin` and `end` are the image's
+// list of functions, below.
 void announce(ImageState& state, const std::int32_t* begin, const std::int32_t* end) noexcept;
 
 inline constexpr char kImageMarkName[] = "rt-image";
 inline constexpr unsigned kImageMarkType = 1;
 
-// What an image announces: for each function to call, its distance from where the distance is written, so
-// that nothing has to be written when the image is loaded. The linker puts them together and names both ends.
+// The list of functions that announce what an image has. Each entry is the distance from the entry to a
+// function, so that loading the image needs no relocation. The linker joins the entries and names both ends
+// of the list.
 [[gnu::weak,
   gnu::visibility("hidden")]] extern const std::int32_t announcementsBegin[] asm("__start_rt_announcements");
 [[gnu::weak,
   gnu::visibility("hidden")]] extern const std::int32_t announcementsEnd[] asm("__stop_rt_announcements");
 
-// clang runs initialisers of static objects while it compiles, so it must know what goes before them: the
-// attribute tells, and leaves one call for each source file. g++ takes it from the section that the function
-// puts itself in, once for the image.
+// clang may run initialisers of static objects at compile time, so it must know what runs before them. The
+// attribute tells it that, and makes one call for each source file. With g++, the function puts itself into a
+// section, which makes one call for the image.
 #if defined(__clang__)
 #define RT_CALLED_ON_LOADING gnu::constructor(102)
 #define RT_CALL_ON_LOADING
@@ -41,9 +47,9 @@ inline constexpr unsigned kImageMarkType = 1;
   ".popsection\n"
 #endif
 
-/// Emitted into each image that refers to it, together with the mark: an ELF note, which no linker discards
-/// unless it is in a group, and which is found from the image's program headers. The note holds the distance
-/// from itself to the image's state. Called when the image is loaded.
+// Emitted into each image that refers to it, together with the mark. The mark is an ELF note, which is found
+// from the image's program headers. No linker discards a note, unless it is in a group. The note holds the
+// distance from itself to the image's state. The system calls this function when it loads the image.
 [[RT_CALLED_ON_LOADING, gnu::visibility("hidden")]] inline void announceImage() {
   asm volatile(
       ".pushsection .note.rt-image, \"a\", %%note\n"
@@ -61,8 +67,8 @@ inline constexpr unsigned kImageMarkType = 1;
 #undef RT_CALLED_ON_LOADING
 #undef RT_CALL_ON_LOADING
 
-/// Emitted where it is mentioned, in each source file: announces `entry` when the image is loaded. Hidden,
-/// since only such a function has an address that the operand may be.
+// Emitted where it is mentioned, in each source file. Announces `entry` when the image is loaded. It is
+// hidden, since the operand can only be the address of a hidden function.
 template <auto& entry>
 struct AnnouncedOnLoading {
   [[gnu::used, gnu::visibility("hidden")]] static void run() {

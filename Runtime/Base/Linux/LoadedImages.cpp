@@ -1,3 +1,7 @@
+// An image with classes is never unloaded, because its objects, literals and class methods may be anywhere in
+// the program. `announce` has the loader keep the image. A linker option would not do: it would not reach a
+// plug-in that takes the runtime from its host.
+
 #include "Runtime/Base/LoadedImages.h"
 
 #include <dlfcn.h>
@@ -10,21 +14,21 @@
 #include <cstdio>
 #include <cstring>
 
-// A program that was linked statically need have none. Neither is `dlopen` named below: the linker warns of
-// that in such a program.
+// `dlsym` is weak, since a statically linked program need not have it. `dlopen` is found through `dlsym`,
+// since the linker of such a program warns of a direct call.
 #pragma weak dlsym
 
 namespace rt::detail {
 
 namespace {
 
-/// An image by an address that is in it. Its name stays where it is as long as the image is loaded.
+// An image, found by an address in it. Its name stays valid as long as the image is loaded.
 struct NamedImage {
   std::uintptr_t address;
   const char* name = nullptr;
 };
 
-/// 0 to go on with the next image, another value to end.
+// A callback. Returns 0 to go on with the next image, another value to stop.
 int findImage(dl_phdr_info* image, std::size_t /*size*/, void* context) {
   NamedImage& wanted = *static_cast<NamedImage*>(context);
   for (std::size_t i = 0; i < image->dlpi_phnum; ++i) {
@@ -41,8 +45,8 @@ constexpr std::size_t aligned(std::size_t size, std::size_t alignment) {
   return (size + alignment - 1) / alignment * alignment;
 }
 
-/// What the first mark among the notes from `note` to `end` leads to, or null. All marks of an image lead to
-/// the same.
+// Returns the state that the first mark among the notes from `note` to `end` leads to, or null. All marks of
+// an image lead to the same state.
 const ImageState* stateIn(const std::byte* note, const std::byte* end, std::size_t alignment) noexcept {
   auto left = static_cast<std::size_t>(end - note);
   while (left >= sizeof(ElfW(Nhdr))) {
@@ -50,7 +54,7 @@ const ImageState* stateIn(const std::byte* note, const std::byte* end, std::size
     std::memcpy(&header, note, sizeof header);
     const std::size_t descriptionAt = aligned(sizeof header + header.n_namesz, alignment);
     const std::size_t size = descriptionAt + header.n_descsz;
-    // What other tools have written may be cut off.
+    // Notes that other tools have written may be cut off.
     if (size > left) break;
     std::int64_t distance = 0;
     if (header.n_type == kImageMarkType && header.n_namesz == sizeof kImageMarkName &&
@@ -60,7 +64,7 @@ const ImageState* stateIn(const std::byte* note, const std::byte* end, std::size
       std::memcpy(&distance, description, sizeof distance);
       return reinterpret_cast<const ImageState*>(description + distance);
     }
-    // The last need not be padded.
+    // The last note need not be padded.
     const std::size_t paddedSize = std::min(aligned(size, alignment), left);
     note += paddedSize;
     left -= paddedSize;
@@ -68,7 +72,7 @@ const ImageState* stateIn(const std::byte* note, const std::byte* end, std::size
   return nullptr;
 }
 
-/// 0 to go on with the next image, another value to end.
+// A callback. Returns 0 to go on with the next image, another value to stop.
 int inspect(dl_phdr_info* image, std::size_t /*size*/, void* /*context*/) {
   for (std::size_t i = 0; i < image->dlpi_phnum; ++i) {
     const ElfW(Phdr)& segment = image->dlpi_phdr[i];
@@ -99,13 +103,13 @@ void keepImage(const ImageState& state) noexcept {
   if (dlsym == nullptr) return;
   NamedImage image{.address = std::bit_cast<std::uintptr_t>(&state)};
   dl_iterate_phdr(&findImage, &image);
-  // The program itself has no name.
+  // The name of the program itself is empty.
   if (image.name == nullptr || *image.name == '\0') return;
   using Open = void*(const char*, int);
   auto* const open = reinterpret_cast<Open*>(dlsym(RTLD_DEFAULT, "dlopen"));
-  // The handle is kept, so that nobody's is the last one.
+  // The handle is never closed, so that no other handle is the last one.
   if (open != nullptr && open(image.name, RTLD_LAZY | RTLD_NOLOAD | RTLD_NODELETE) != nullptr) return;
-  // The image is loaded, so that the loader refuses nothing but what has no memory.
+  // The image is loaded already, so the loader refuses only if it has no memory.
   std::fprintf(stderr, "rt: \"%s\" cannot be kept from being unloaded; it must not be closed\n", image.name);
 }
 

@@ -10,8 +10,8 @@
 
 namespace rt::detail {
 
-/// Sleeps while `word` is `expected`, until it is woken or, where that is not null, `timeout` is over.
-/// May return for no reason: look at the word again. Leaves `errno` alone.
+// Sleeps while `word` is `expected`, until the thread is woken. If `timeout` is not null, sleeps for no
+// longer than that. May return for no reason, so read the word again. Preserves `errno`.
 inline void waitAtAddress(const std::atomic<std::uint32_t>& word, std::uint32_t expected,
                           const std::chrono::nanoseconds* timeout = nullptr) noexcept {
   const int error = errno;
@@ -26,8 +26,8 @@ inline void waitAtAddress(const std::atomic<std::uint32_t>& word, std::uint32_t 
   errno = error;
 }
 
-/// Wakes one thread that sleeps at `word`, if any. The word is not looked at and may be gone: then
-/// whoever uses its place now is at worst woken for no reason.
+// Wakes one thread that sleeps at `word`, if any. Does not read the word, which may be gone. Then at worst a
+// thread that sleeps at the same address now is woken for no reason.
 inline void wakeAtAddress(const std::atomic<std::uint32_t>* word) noexcept {
   const int error = errno;
   os_sync_wake_by_address_any(const_cast<std::atomic<std::uint32_t>*>(word), sizeof(*word),
@@ -35,7 +35,7 @@ inline void wakeAtAddress(const std::atomic<std::uint32_t>* word) noexcept {
   errno = error;
 }
 
-/// Wakes all threads that sleep at `word`.
+// Wakes all threads that sleep at `word`.
 inline void wakeAllAtAddress(const std::atomic<std::uint32_t>* word) noexcept {
   const int error = errno;
   os_sync_wake_by_address_all(const_cast<std::atomic<std::uint32_t>*>(word), sizeof(*word),

@@ -1,7 +1,7 @@
 #pragma once
 
-// What `rt::UnfairLock` is on macOS: the system's own, which ends the program on misuse and says why in
-// the crash report.
+// On macOS, `rt::UnfairLock` is the system's own lock. It ends the program on misuse, and the crash report
+// gives the reason.
 
 #include <os/lock.h>
 
@@ -9,7 +9,7 @@ namespace rt::detail {
 
 class SystemLock {
  public:
-  /// Whether one that another thread held can be had in the child of a fork.
+  // Whether the child of a fork can take a lock that another thread held.
   static constexpr bool kIsTakenOver = false;
 
   constexpr SystemLock() noexcept = default;

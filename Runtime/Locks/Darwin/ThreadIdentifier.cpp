@@ -8,8 +8,8 @@ ThreadIdentifier systemThreadIdentifier() noexcept {
   return pthread_mach_thread_np(pthread_self());
 }
 
-// The identifier is the name of a port: its place in the task's table, and eight bits by which a place that
-// is used again differs.
+// The identifier is the name of a port. It has the port's place in the task's table, and eight bits that
+// change when the place is reused.
 std::uint32_t systemThreadNumber() noexcept {
   return systemThreadIdentifier() >> 8U & 0x3FFFFFU;
 }

@@ -13,8 +13,8 @@
 
 namespace rt::detail {
 
-/// Sleeps while `word` is `expected`, until it is woken or, where that is not null, `timeout` is over.
-/// May return for no reason: look at the word again. Leaves `errno` alone.
+// Sleeps while `word` is `expected`, until the thread is woken. If `timeout` is not null, sleeps for no
+// longer than that. May return for no reason, so read the word again. Preserves `errno`.
 inline void waitAtAddress(const std::atomic<std::uint32_t>& word, std::uint32_t expected,
                           const std::chrono::nanoseconds* timeout = nullptr) noexcept {
   const int error = errno;
@@ -28,13 +28,13 @@ inline void waitAtAddress(const std::atomic<std::uint32_t>& word, std::uint32_t 
   errno = error;
 }
 
-/// Wakes one thread that sleeps at `word`, if any. The word is not looked at and may be gone: then
-/// whoever uses its place now is at worst woken for no reason.
+// Wakes one thread that sleeps at `word`, if any. Does not read the word, which may be gone. Then at worst a
+// thread that sleeps at the same address now is woken for no reason.
 inline void wakeAtAddress(const std::atomic<std::uint32_t>* word) noexcept {
   syscall(SYS_futex, word, FUTEX_WAKE_PRIVATE, 1, nullptr, nullptr, 0);
 }
 
-/// Wakes all threads that sleep at `word`.
+// Wakes all threads that sleep at `word`.
 inline void wakeAllAtAddress(const std::atomic<std::uint32_t>* word) noexcept {
   syscall(SYS_futex, word, FUTEX_WAKE_PRIVATE, INT_MAX, nullptr, nullptr, 0);
 }

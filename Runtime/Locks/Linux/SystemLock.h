@@ -1,6 +1,6 @@
 #pragma once
 
-// What `rt::UnfairLock` is on Linux.
+// On Linux, `rt::UnfairLock` is an `OwnerLock` that is counted for forks.
 
 #include "Runtime/Locks/OwnerLock.h"
 
@@ -8,7 +8,7 @@ namespace rt::detail {
 
 class SystemLock : public OwnerLock {
  public:
-  /// Whether one that another thread held can be had in the child of a fork.
+  // Whether the child of a fork can take a lock that another thread held.
   static constexpr bool kIsTakenOver = true;
 
   [[gnu::always_inline]] void lock() noexcept { OwnerLock::lock(true); }

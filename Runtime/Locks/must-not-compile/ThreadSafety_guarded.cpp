@@ -1,4 +1,5 @@
-// A field that a lock guards is touched only under it, by whichever way the lock can be missing.
+// A field that a lock guards may be touched only under the lock. Each mistake touches it without the lock in
+// another way.
 
 #include "Runtime/Locks/RecursiveLock.h"
 #include "Runtime/Locks/UnfairLock.h"

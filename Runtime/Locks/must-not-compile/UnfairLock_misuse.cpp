@@ -1,4 +1,4 @@
-// What the analysis sees of a lock's misuse within one function; the rest ends the program at run time.
+// Misuse of a lock that the analysis sees within one function. Other misuse ends the program at run time.
 
 #include "Runtime/Locks/UnfairLock.h"
 

@@ -1,4 +1,4 @@
-// Classes and protocols name themselves, and a class names a protocol once.
+// Classes and protocols must name themselves, and a class must name a protocol only once.
 #include <string_view>
 
 #include "Runtime/Objects/Block.h"

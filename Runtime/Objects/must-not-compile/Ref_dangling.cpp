@@ -1,4 +1,4 @@
-// A reference into what a temporary `Ref` alone keeps alive is refused where the compiler sees it.
+// clang refuses a reference into an object that only a temporary `Ref` keeps alive.
 
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Values/Array.h"

@@ -1,4 +1,4 @@
-// A reference converts to a base and to a protocol that the class conforms to, and to nothing else.
+// A reference converts to a base class and to a protocol of its class, and to nothing else.
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"

@@ -2,7 +2,7 @@
 
 namespace rt::detail {
 
-// The system's own function finds what an image does not export, too.
+// On this system `dladdr` also finds functions that an image does not export.
 std::optional<SymbolTables::Symbol> SymbolTables::find(std::uint64_t) {
   return std::nullopt;
 }

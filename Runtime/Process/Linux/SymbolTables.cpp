@@ -18,11 +18,11 @@
 
 namespace rt::detail {
 
-// One that was loaded into this process.
+// An image that is loaded into this process.
 struct SymbolTables::Image {
   std::uint64_t address;
   std::string path;
-  // What is to be added to an address in the file.
+  // The difference between an address in memory and the address in the file.
   std::uint64_t bias = 0;
   std::uint64_t start = 0;
   std::vector<Elf64_Phdr> headers;
@@ -30,11 +30,11 @@ struct SymbolTables::Image {
 
 namespace {
 
-// What a table may take; larger ones count as none.
+// The largest size of a table. Larger tables are ignored.
 constexpr std::uint64_t kLargestTable = std::uint64_t{256} << 20U;
 
-// A file of which every part is checked to be there. Read rather than mapped: another process may make it
-// shorter at any time.
+// A file that checks each read against its size. It is read and not mapped, since another process may shorten
+// the file at any time.
 class ElfFile {
  public:
   explicit ElfFile(const char* path) : file_(open(path, O_RDONLY | O_CLOEXEC | O_NONBLOCK)) {
@@ -44,7 +44,7 @@ class ElfFile {
     }
   }
 
-  // Fills `bytes` with what is at `offset`; returns whether that much is there.
+  // Fills `bytes` from `offset`. Returns false if the file does not have that many bytes there.
   bool read(std::span<std::byte> bytes, std::uint64_t offset) const {
     if (!has(offset, bytes.size())) return false;
     while (!bytes.empty()) {
@@ -57,7 +57,7 @@ class ElfFile {
     return true;
   }
 
-  // The `count` values at `offset`; none where they are not there.
+  // Returns the `count` values at `offset`, or no values if the file is too short for them.
   template <class Value>
   std::vector<Value> values(std::uint64_t offset, std::uint64_t count) const {
     static_assert(std::is_trivially_copyable_v<Value>);
@@ -89,7 +89,7 @@ std::optional<SymbolTables::Symbol> SymbolTables::find(std::uint64_t address) {
     std::uint64_t lowest = ~std::uint64_t{0};
     bool contains = false;
     for (const Elf64_Phdr& header : headers) {
-      // A program that was linked statically may be said to lie where its file says.
+      // `dlpi_addr` may be wrong for a statically linked program. The address of its headers gives the bias.
       if (header.p_type == PT_PHDR)
         found.bias = std::bit_cast<std::uint64_t>(info->dlpi_phdr) - header.p_vaddr;
     }
@@ -100,8 +100,8 @@ std::optional<SymbolTables::Symbol> SymbolTables::find(std::uint64_t address) {
     }
     if (!contains) return 0;
     found.start = found.bias + lowest;
-    // Copied while the image cannot be unloaded. Nothing is thrown through the C library, which loads what it
-    // needs for that when it is first thrown through, and ends a program that has no memory then.
+    // Copies here, while the image cannot be unloaded. No exception may pass through the C library: it loads
+    // what it needs for that at the first exception, and ends the program if it has no memory.
     try {
       found.path = info->dlpi_name;
       found.headers.assign(headers.begin(), headers.end());
@@ -120,7 +120,7 @@ std::optional<SymbolTables::Symbol> SymbolTables::find(std::uint64_t address) {
   Symbol symbol{.image = image.path, .imageStart = image.start, .function = {}, .functionStart = 0};
   for (const Function& function : table.functions) {
     if (address - image.bias - function.start >= function.size) continue;
-    // Up to the end of what may be without one.
+    // The last name in a damaged table may lack its NUL.
     symbol.function = std::string_view(table.names).substr(function.name);
     symbol.function.resize(std::min(symbol.function.find('\0'), symbol.function.size()));
     symbol.functionStart = image.bias + function.start;
@@ -139,7 +139,7 @@ SymbolTables::Table SymbolTables::read(const Image& image) {
       header.e_shentsize != sizeof(Elf64_Shdr)) {
     return {};
   }
-  // Another file may have taken the place of the one that was loaded.
+  // Another file may have replaced the one that was loaded.
   const auto programHeaders = file.values<Elf64_Phdr>(header.e_phoff, header.e_phnum);
   if (programHeaders.size() != image.headers.size() ||
       std::memcmp(programHeaders.data(), image.headers.data(), programHeaders.size() * sizeof(Elf64_Phdr)) !=

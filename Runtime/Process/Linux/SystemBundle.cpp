@@ -1,12 +1,12 @@
 #include "Runtime/Process/SystemBundle.h"
 
-// Defined by a host that has an identifier.
+// A host with an identifier defines this symbol.
 extern "C" [[gnu::weak]] const char kMainBundleIdentifier[];
 
 namespace rt::detail {
 
 String systemBundleIdentifier() {
-  // Through a volatile, so that no compiler takes the address of an array for never null.
+  // The volatile keeps compilers from assuming that the address of an array is never null.
   const char* volatile const identifier = kMainBundleIdentifier;
   return String::fromUTF8(identifier);
 }

@@ -18,23 +18,24 @@ namespace {
 constexpr std::size_t kCapacity = 16;
 using Text = std::array<char, kCapacity>;
 
-// The name of the main thread, which new threads inherit until they are given another: the process's own.
+// Returns the name of the main thread, which is also the name of the process.
 Text processName() noexcept {
   Text text{};
   const int file = open("/proc/self/comm", O_RDONLY | O_CLOEXEC);
   if (file < 0) {
-    // What the kernel named the process by, as good as always.
+    // The kernel nearly always takes the process's name from this one.
     std::string_view(program_invocation_short_name).copy(text.data(), kCapacity - 1);
     return text;
   }
   const ssize_t length = read(file, text.data(), text.size());
   close(file);
-  // The kernel ends the line.
+  // The kernel ends the name with a line feed.
   text[length > 0 ? static_cast<std::size_t>(length) - 1 : 0] = '\0';
   return text;
 }
 
-// What the process was called before its main thread was given a name, which is then the process's, too.
+// Returns the name that the process had before any thread was named here. Naming the main thread renames the
+// process.
 const Text& firstProcessName() noexcept {
   static constinit Lazy<Text> name;
   return name.get(processName);
@@ -42,8 +43,8 @@ const Text& firstProcessName() noexcept {
 
 }  // namespace
 
-// A thread bears its creator's name until it is given one, and the main thread the process's. What the system
-// knows it by does not tell whether it was.
+// A new thread has its creator's name in the system, and the main thread has the process's. So the system's
+// name does not tell whether anybody gave it to this thread.
 String systemThreadName() {
   return nullptr;
 }
@@ -52,7 +53,7 @@ void setSystemThreadName(const String& name) noexcept {
   const Text& unnamed = firstProcessName();
   const std::string_view text = name.isNull() ? std::string_view(unnamed.data()) : name.view();
   std::size_t length = text.size() < kCapacity ? text.size() : kCapacity - 1;
-  // A byte of the form 10xxxxxx goes on with a character that must not be cut in two.
+  // A byte of the form 10xxxxxx continues a character, which must not be cut in two.
   while (length > 0 && length < text.size() && (static_cast<unsigned char>(text[length]) & 0xC0U) == 0x80U)
     --length;
   Text shortened{};

@@ -8,7 +8,7 @@ namespace rt {
 
 namespace {
 
-// The system keeps one object for each subsystem and category, so that nothing is gained by keeping it.
+// The system caches one object for each subsystem and category, so there is no need to keep it here.
 os_log_t logOf(const String& subsystem, const String& category) {
   return os_log_create(std::string(subsystem.view()).c_str(), std::string(category.view()).c_str());
 }
@@ -34,7 +34,7 @@ bool SystemLog::isEnabled(Type type) const noexcept {
 }
 
 void SystemLog::write(Type type, std::string_view text) const noexcept {
-  // The system's log takes text that ends with NUL, and cuts what is long.
+  // The unified log takes text that ends with NUL, and cuts long text.
   os_log_with_type(logOf(subsystem_, category_), typeOf(type), "%{public}s", std::string(text).c_str());
 }
 

@@ -20,18 +20,19 @@ namespace {
 
 constinit LogSocket journal("/run/systemd/journal/socket");
 
-/// The fields of an entry as the journal takes them: "NAME=value" and a line feed or, for a value with a
-/// line feed in it, NAME, a line feed, the value's length in 8 bytes, the value, and a line feed.
-///
-/// What is short is copied together, so that most entries are one piece; what is long stays where it is
-/// and must outlive this.
+// The fields of an entry in the journal's format. A field is "NAME=value" and a line feed. If the value
+// contains a line feed, the field is NAME, a line feed, the value's length in 8 bytes, the value, and a line
+// feed.
+//
+// Short values are copied into one buffer, so that most entries are one piece. Long values are not copied:
+// they must outlive this object.
 class Fields {
  public:
   Fields() noexcept = default;
   Fields(const Fields&) = delete;
   Fields& operator=(const Fields&) = delete;
 
-  /// Adds a field, up to `kMostFields`.
+  // Adds a field. Precondition: there are fewer than `kMostFields` fields.
   void add(std::string_view name, std::string_view value) noexcept {
     copy(name);
     if (value.find('\n') == std::string_view::npos) {
@@ -62,7 +63,7 @@ class Fields {
  private:
   static constexpr std::size_t kMostFields = 7;
   static constexpr std::size_t kCapacity = 2048;
-  // What values leave free, so that all that surrounds them, and numbers, can be copied.
+  // Values leave this much of the buffer free, so that names, lengths and numbers can always be copied.
   static constexpr std::size_t kReserve = kMostFields * 48;
 
   void copyLength(std::uint64_t length) noexcept {
@@ -88,7 +89,7 @@ class Fields {
     pieces_[count_++] = {place, bytes.size()};
   }
 
-  // Neither is initialised: that would take longer than to fill what is needed.
+  // Left uninitialised: clearing both would take longer than filling the part that is used.
   std::array<char, kCapacity> buffer_;
   std::array<iovec, 2 * kMostFields> pieces_;
   std::size_t used_ = 0;
@@ -105,7 +106,7 @@ bool writeAll(int file, std::span<iovec> pieces) noexcept {
       written -= pieces.front().iov_len;
       pieces = pieces.subspan(1);
     }
-    // A file in memory takes all of it, or is out of memory in the middle of a page.
+    // A file in memory takes all of it, unless memory runs out in the middle of a page.
     if (!pieces.empty()) {
       pieces.front().iov_base = static_cast<char*>(pieces.front().iov_base) + written;
       pieces.front().iov_len -= written;
@@ -114,7 +115,7 @@ bool writeAll(int file, std::span<iovec> pieces) noexcept {
   return true;
 }
 
-/// Sends what does not fit a datagram as a file in memory that nobody can change any more.
+// Sends an entry that is too large for a datagram, as a sealed file in memory.
 LogSocket::Outcome sendAsFile(std::span<iovec> pieces, const Patience& patience) noexcept {
   const int file = memfd_create("journal-entry", MFD_CLOEXEC | MFD_ALLOW_SEALING);
   if (file < 0) return LogSocket::Outcome::busy;

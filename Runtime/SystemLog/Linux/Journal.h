@@ -1,6 +1,6 @@
 #pragma once
 
-// The journal, spoken to in its native protocol. Inside of the system log.
+// Writes to the journal in its native protocol. Internal to the system log.
 
 #include "Runtime/SystemLog/Linux/LogEntry.h"
 #include "Runtime/SystemLog/Linux/Patience.h"

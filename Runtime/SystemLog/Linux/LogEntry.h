@@ -1,6 +1,6 @@
 #pragma once
 
-// What is handed to the daemons, and what becomes of it. Inside of the system log.
+// An entry on its way to a daemon, and the result of delivering it. Internal to the system log.
 
 #include <cstdint>
 #include <string_view>
@@ -14,19 +14,19 @@ struct LogEntry {
   std::string_view subsystem;
   std::string_view category;
   std::string_view text;
-  /// For the entry that tells how many others were dropped; 0 in all others.
+  /// The number of dropped entries that this entry reports. 0 if the entry is not such a report.
   std::uint64_t dropped = 0;
 };
 
 enum class Delivery : std::uint8_t {
   done,
-  /// The destination is there but would not take it.
+  /// The destination exists but did not take the entry.
   refused,
-  /// There is no such destination.
+  /// The destination does not exist.
   absent,
 };
 
-/// The severity as the journal and the classic daemons number it.
+/// Returns the number that the journal and classic daemons use for this severity.
 constexpr int severityOf(SystemLog::Type type) noexcept {
   switch (type) {
     case SystemLog::Type::debug:

@@ -18,8 +18,7 @@ namespace {
 
 constinit LogSocket syslogSocket("/dev/log");
 
-/// Appends `text` with its control characters, which could end the line or command a terminal, written
-/// out.
+// Appends `text` with its control characters escaped. They could end the line or control a terminal.
 void appendReadable(std::string& line, std::string_view text) {
   constexpr std::string_view kDigits = "0123456789abcdef";
   for (const char character : text) {
@@ -36,7 +35,7 @@ void appendReadable(std::string& line, std::string_view text) {
   }
 }
 
-/// "[subsystem:category] text", as one line.
+// Appends "[subsystem:category] text" as one line.
 void appendBody(std::string& line, const LogEntry& entry) {
   if (!entry.subsystem.empty() || !entry.category.empty()) {
     line += '[';
@@ -48,7 +47,7 @@ void appendBody(std::string& line, const LogEntry& entry) {
   appendReadable(line, entry.text);
 }
 
-/// "name[pid]", the name cut to what the classic daemons take.
+// Returns "name[pid]". The name is cut to the length that classic daemons accept.
 std::string sender() {
   constexpr std::size_t kLongestName = 32;
   std::string text;
@@ -56,7 +55,7 @@ std::string sender() {
   return text + '[' + std::to_string(getpid()) + ']';
 }
 
-/// How many bytes of `text` make a packet of at most `room`, with no character cut in two.
+// Returns how many bytes of `text` fit into `room` bytes, without cutting a character in two.
 std::size_t packetLength(std::string_view text, std::size_t room) noexcept {
   if (text.size() <= room) return text.size();
   std::size_t length = room;
@@ -74,13 +73,14 @@ Delivery writeToSyslog(const LogEntry& entry, const Patience& patience) {
   const std::time_t now = std::time(nullptr);
   std::tm local{};
   {
-    // The system's function has a lock that would stay locked in the child of a fork.
+    // `localtime_r` has a lock of its own. A fork waits for our lock, so that its child never gets the other
+    // one locked.
     static constinit UnfairLock lock;
     const LockGuard guard(lock);
     localtime_r(&now, &local);
   }
   std::array<char, 32> time{};
-  // The names of months are English whatever the program's locale.
+  // Daemons expect English names of months. `strftime` would write them in the program's locale.
   const std::size_t timeLength = std::strftime(time.data(), time.size(), " %e %H:%M:%S ", &local);
   std::string packet = '<' + std::to_string(kUserFacility | severityOf(entry.type)) + '>';
   packet += kMonths.at(static_cast<std::size_t>(local.tm_mon));

@@ -14,11 +14,12 @@ namespace rt::detail {
 
 namespace {
 
-// A new socket that lets a send wait for as long as Patience says; negative where there is none to be had.
+// Returns a new socket whose sends wait for `Patience::kWait` at most. Negative if the system refuses a
+// socket.
 int makeSocket() noexcept {
   int descriptor = socket(AF_UNIX, SOCK_DGRAM | SOCK_CLOEXEC, 0);
   if (descriptor >= 0 && descriptor <= STDERR_FILENO) {
-    // The program runs without some of its standard streams; what it writes there is not for the daemon.
+    // The program has closed a standard stream. What it writes to that descriptor must not reach the daemon.
     const int higher = fcntl(descriptor, F_DUPFD_CLOEXEC, STDERR_FILENO + 1);
     close(descriptor);
     descriptor = higher;
@@ -31,14 +32,14 @@ int makeSocket() noexcept {
 
 }  // namespace
 
-/// The handle of `descriptor`; `kNone` where it is no socket.
+// Returns the handle of `descriptor`, or `kNone` if it is not a socket.
 LogSocket::Handle LogSocket::handleOf(int descriptor) noexcept {
   struct stat status{};
   if (fstat(descriptor, &status) != 0 || !S_ISSOCK(status.st_mode)) return kNone;
   return Handle{status.st_ino} << 32U | static_cast<unsigned>(descriptor);
 }
 
-/// The socket, made where there is none; `kNone` where there is none to be had.
+// Returns the socket, and creates it if necessary. Returns `kNone` if the system refuses a socket.
 LogSocket::Handle LogSocket::open() noexcept {
   Handle known = handle_.load(std::memory_order_acquire);
   if (known != kNone) return known;
@@ -55,8 +56,9 @@ bool LogSocket::connect(int descriptor) const noexcept {
   sockaddr_un address{};
   address.sun_family = AF_UNIX;
   std::strncpy(address.sun_path, path_, sizeof address.sun_path - 1);
-  // Other threads may be sending at the same time, which the kernel keeps apart. The thread sanitizer takes
-  // `connect` for the making of a descriptor that nobody may use yet; it does not look at the call itself.
+  // Other threads may be sending at the same time, which the kernel allows. The thread sanitizer treats the
+  // function `connect` as the creation of a descriptor that nobody uses yet. It does not see a raw system
+  // call.
   long result = -1;
   do {
     result = syscall(SYS_connect, descriptor, &address, sizeof address);
@@ -65,13 +67,14 @@ bool LogSocket::connect(int descriptor) const noexcept {
 }
 
 LogSocket::Outcome LogSocket::send(const msghdr& message, const Patience& patience) noexcept {
-  // A daemon that was started anew takes one attempt more, and so does a descriptor that the program has
-  // closed. Daemons that go as fast as they come are not waited for.
+  // A restarted daemon costs one more attempt, and so does a descriptor that the program has closed. The
+  // limit holds for daemons that keep restarting.
   constexpr int kAttempts = 4;
   for (int attempt = 0; attempt < kAttempts;) {
     Handle handle = open();
     if (handle == kNone) return Outcome::absent;
-    // What has taken the number of a socket that the program closed may be connected to somebody else.
+    // The program may have closed our socket. Its number may now belong to a socket that is connected
+    // elsewhere.
     if (handleOf(descriptorOf(handle)) != handle) {
       handle_.compare_exchange_strong(handle, kNone);
       ++attempt;

@@ -1,6 +1,6 @@
 #pragma once
 
-// A datagram socket to the daemon that listens at a path. Inside of the system log.
+// A datagram socket to the daemon that listens at a path. Internal to the system log.
 
 #include <sys/socket.h>
 
@@ -11,23 +11,26 @@
 
 namespace rt::detail {
 
-/// The socket is made by the first send and kept until the process ends, whatever becomes of the daemon:
-/// connecting it anew is one call that exchanges nothing which another thread may be using. So nothing is
-/// locked, and threads may send at once.
+/// The first send creates the socket, and the process keeps it. If the daemon restarts, one system call
+/// connects the same descriptor again, while other threads may be using it.
 ///
-/// A program may close descriptors that it did not open, as daemons do when they start, and use the number
-/// for something else. That is seen before each send, and what is there is left alone.
+/// A program may close descriptors that it did not open, as daemons do when they start. The number may then
+/// belong to another file. Each send checks that first, and leaves such a file alone.
+///
+/// Threads: thread-safe and lock-free.
 class LogSocket {
  public:
   enum class Outcome : std::uint8_t { sent, busy, tooLarge, absent };
 
   explicit constexpr LogSocket(const char* path) noexcept : path_(path) {}
 
-  /// Sends `message`, which names no address, to the daemon, connecting to it where need be.
+  /// Sends `message` to the daemon, and connects to it first if necessary. Precondition: `message` has no
+  /// address.
   Outcome send(const msghdr& message, const Patience& patience) noexcept;
 
  private:
-  /// A descriptor and, above it, the inode number by which to know whether it is still the socket.
+  // A descriptor, and in the upper half the inode number, which tells whether the descriptor still is the
+  // socket.
   using Handle = std::uint64_t;
   static constexpr Handle kNone = ~Handle{0};
 

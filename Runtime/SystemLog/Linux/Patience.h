@@ -1,6 +1,6 @@
 #pragma once
 
-// How much longer one entry may hold up its caller. Inside of the system log.
+// The time for which one entry may block its caller. Internal to the system log.
 
 #include <chrono>
 #include <cstdint>
@@ -10,23 +10,23 @@ namespace rt::detail {
 
 class Patience {
  public:
-  /// What one system call may wait for; a datagram may wait twice, for room of its own socket and of the
-  /// daemon's. Nothing begins to wait once this much has passed since the entry was begun, so that an entry
-  /// takes less than three times this.
+  /// The longest single wait. A send of a datagram may wait twice: for room in its own socket, and in the
+  /// daemon's. No send waits once `kWait` has passed since the entry was begun. So an entry takes less than
+  /// three times `kWait`.
   static constexpr std::chrono::milliseconds kWait{50};
 
-  /// Never waits.
+  /// Makes an object whose time is over already, so that no send waits.
   constexpr Patience() noexcept = default;
 
   static Patience fromNow() noexcept { return Patience(now() + kWait); }
 
-  /// Whether nothing should wait any more.
+  /// Returns whether no send may wait any more.
   bool isOver() const noexcept { return now() >= end_; }
 
  private:
   explicit constexpr Patience(std::chrono::nanoseconds end) noexcept : end_(end) {}
 
-  // The coarse clock is some milliseconds off, and several times as fast to read.
+  // The coarse clock is some milliseconds late, but several times as fast to read.
   static std::chrono::nanoseconds now() noexcept {
     timespec time{};
     clock_gettime(CLOCK_MONOTONIC_COARSE, &time);

@@ -21,18 +21,18 @@ using detail::LogEntry;
 using detail::Patience;
 
 constinit std::atomic<std::uint64_t> dropped = 0;
-// Of them, those that no entry tells of yet.
+// The number of dropped entries that no report has mentioned yet.
 constinit std::atomic<std::uint64_t> unreported = 0;
-// How many entries were taken, to see that others get through.
+// How many entries were taken. A changed count tells that other callers' entries are taken.
 constinit std::atomic<std::uint64_t> taken = 0;
-// Whether a caller has waited in vain and no entry was taken meanwhile or since; then nobody waits.
+// Whether a caller has waited in vain, and no entry was taken meanwhile or since. Callers do not wait then.
 constinit std::atomic<bool> isStuck = false;
 
 Patience patienceNow() noexcept {
   return isStuck.load(std::memory_order_relaxed) ? Patience() : Patience::fromNow();
 }
 
-/// Writes `entry` to the first destination that is there; returns whether it was taken.
+// Writes `entry` to the first destination that exists. Returns whether the destination took it.
 bool deliver(const LogEntry& entry, const Patience& patience) noexcept {
   const std::uint64_t takenBefore = taken.load(std::memory_order_relaxed);
   Delivery delivery = Delivery::refused;
@@ -58,14 +58,14 @@ LogEntry makeReport(std::uint64_t count, std::string& text) {
   return {SystemLog::Type::error, "rt", "SystemLog", text, count};
 }
 
-/// Tells how many entries were dropped, if any were; returns whether nothing is left to tell.
+// Reports how many entries were dropped, if any were. Returns whether nothing is left to report.
 bool report(const Patience& patience) noexcept {
   const std::uint64_t count = unreported.exchange(0);
   if (count == 0) return true;
   try {
     std::string text;
     if (deliver(makeReport(count, text), patience)) return true;
-  } catch (...) {  // NOLINT(bugprone-empty-catch): no memory for the text; it is told later.
+  } catch (...) {  // NOLINT(bugprone-empty-catch): no memory for the text; a later call reports it.
   }
   unreported += count;
   return false;
@@ -73,14 +73,14 @@ bool report(const Patience& patience) noexcept {
 
 void reportAtExit() {
   if (report(patienceNow())) return;
-  // Threads that still run may have told of it since.
+  // A thread that still runs may have reported the number since.
   const std::uint64_t count = unreported.exchange(0);
   if (count == 0) return;
   std::string text;
   detail::writeToStandardError(makeReport(count, text), Patience());
 }
 
-// The parent tells of its own.
+// The parent reports its own dropped entries.
 void forgetAfterFork() {
   dropped = 0;
   unreported = 0;
@@ -99,7 +99,7 @@ void forgetAfterFork() {
 
 }  // namespace
 
-// Elsewhere it is the handle's to say.
+// Not static: on macOS the result depends on the log.
 // NOLINTNEXTLINE(readability-convert-member-functions-to-static)
 bool SystemLog::isEnabled(Type type) const noexcept {
   return type <= Type::fault;
@@ -108,7 +108,7 @@ bool SystemLog::isEnabled(Type type) const noexcept {
 void SystemLog::write(Type type, std::string_view text) const noexcept {
   const int error = errno;
   const Patience patience = patienceNow();
-  // The count goes first, in the place of what is missing.
+  // The report goes first, since the dropped entries are missing before this entry.
   const bool isReported = unreported.load(std::memory_order_relaxed) == 0 || report(patience);
   if (!isReported || !deliver({type, subsystem_, category_, text}, patience)) drop();
   errno = error;

@@ -1,5 +1,5 @@
-// Literal formats that their arguments do not fit, in each way there is. Several a group, for compiling takes
-// its time; no two of a group for the same reason, so that each is seen to be refused.
+// Literal formats that do not fit their arguments, one for each kind of mistake. Each macro selects several
+// mistakes, since each compilation is slow. Within a group all mistakes differ, so each refusal is seen.
 #include <string>
 
 #include "Runtime/Text/Format.h"

@@ -1,4 +1,4 @@
-// Messages that their arguments do not fit.
+// Messages whose arguments do not fit their formats.
 #include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLog.h"
 

@@ -1,3 +1,9 @@
+// The set of implementations of an API never changes; a new set replaces it. So a request for many takes one
+// reference under the lock, and no copy.
+//
+// Weak functions are where a program can intervene (`SRLStartUpHook`, `SRLPProfilingSwitch`). They are called
+// while the program is loaded, before any of its code could register something else.
+
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 
 #include <algorithm>

@@ -1,4 +1,27 @@
 // How a registry hands out instances, and the scopes that they live in.
+//
+// A request first looks for an instance that is there: the binding, its scope and the instance, all under the
+// registry's lock. It counts no reference but the instance's. `SRLScopedFactory::make` makes an instance that
+// is not there. A factory block wraps the same `SRLScopedFactory`, so there is one way to an instance. The
+// request passes on the scope that it has found or opened. If it has none, `make` opens one in the shared
+// registry. That happens in a registry that is not the shared one, since all scopes are in the shared one. It
+// also happens when the tags do not fit; then `make` reports them.
+//
+// A request calls a host's own factory block without counting it (`Block::callKept`), because the
+// implementation that owns the block is retained.
+//
+// For an API with many implementations, the instances that are found under the lock count until the first
+// factory runs. That factory may end scopes or replace the shared registry.
+//
+// SRLRegistry_ways_test runs random programs by requests and by blocks, and compares their traces.
+//
+// Requests remember what the modules do not know, and which API an identifier names. Modules never change
+// once they are registered, so the registry looks once. These notes make no API known. A copy of a registry
+// does not have them. Without memory they are not made. A request with the same tags as the one before tries
+// that request's scope first. The tags are compared with the scope's, which needs no hash.
+//
+// When scopes end, their entries leave the table as whole nodes. Tags and instances are released after the
+// lock has been released, so that destructors may ask the registry.
 
 #include <utility>
 #include <variant>

@@ -1,3 +1,10 @@
+// Reports are made under the registry's lock, and the error handler's lock is held while a callback runs. A
+// callback that waited for the registry, or for an instance whose factory is about to report, could deadlock.
+// Both end the program instead.
+//
+// A thread counts the locks that it holds, for forks. So a test can show that none is held while factories,
+// destructors and the delegate run. Tags are hashed and compared under the registry's lock.
+
 #include "Shared/ServiceRegistry/Source/SRLUnfairLock.h"
 
 #include <cstdio>

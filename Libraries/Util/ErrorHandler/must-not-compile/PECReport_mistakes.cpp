@@ -1,4 +1,4 @@
-// Reports that their parameters do not fit.
+// Reports whose parameters do not fit their formats.
 #include "Libraries/Util/ErrorHandler/PECReport.h"
 
 using namespace rt::literals;

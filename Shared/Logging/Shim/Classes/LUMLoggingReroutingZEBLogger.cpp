@@ -16,7 +16,7 @@ namespace {
 
 using namespace rt::literals;
 
-// The frames that a call stack leaves out: `logInternalFunc` and the base class's function that calls it.
+// The innermost frames that a call stack leaves out: `logInternalFunc` and its caller in the base class.
 constexpr std::uint64_t kOwnFrameCount = 2;
 
 LUMLogLevel messageLevelOf(ZEBLogLevel level) {

@@ -1,22 +1,23 @@
 #pragma once
 
-/// An older logger that feeds the structured framework: each call becomes one message for a multiplexer.
+/// An older logger that turns each call into one message for a multiplexer of the structured framework.
 ///
 ///     ZEBLogger::setSharedLogger(LUMLoggingReroutingZEBLogger::initWithLogMultiplexer(
 ///         LUMLogMultiplexer::sharedInstance()));
 ///     ZEBLogError("%@ has no entries", name);          // in the system's log, at LUMLogLevelError
 ///
 /// The levels debug, info, error and assert become LUMLogLevelDebug, LUMLogLevelInfo, LUMLogLevelError and
-/// LUMLogLevelFault, so that an assert reaches the error handler. Any other level becomes LUMLogLevelFault
-/// too, rather than being lost. A message has the function where one was given, and neither file nor line.
+/// LUMLogLevelFault. So an assert reaches the error handler. Any other level also becomes LUMLogLevelFault,
+/// so that it is not lost. A message has the function if one was given, and neither file nor line.
 ///
-/// The writer, formatter and filter of an older logger have nothing to do here: there are none, and giving it
-/// one is a mistake.
+/// This logger has no writer, formatter or filter. Setting one fails an assertion.
 ///
-/// Immutable: any thread may use it. Unlike the older logger itself, it lets through what the stack-trace
-/// filter and the multiplexer's filters and loggers throw.
+/// Threads: thread-safe, because it is immutable.
 ///
-/// Not for: new code, which calls LUMLogAt.
+/// Errors: throws what the stack-trace filter and the multiplexer's filters and loggers throw. The older
+/// logger drops such exceptions.
+///
+/// Not for: new code. Call LUMLogAt.
 
 #include <cstdarg>
 #include <utility>
@@ -35,28 +36,30 @@
 class RT_VISIBLE LUMLoggingReroutingZEBLogger
     : public rt::Implements<LUMLoggingReroutingZEBLogger, ZEBLogger> {
  public:
-  /// With messages for `logMultiplexer`; null where that is null. `stackTraceFilter`, which may be null, is
-  /// asked with text and level which messages have a call stack, as far as the multiplexer wants any; without
-  /// it none has.
+  /// Makes a logger for `logMultiplexer`. Returns null if `logMultiplexer` is null.
+  ///
+  /// `stackTraceFilter` decides by text and level which messages carry a call stack. If it is null, none
+  /// does. No message carries one unless `logMultiplexer` is a LUMLogAppControl that captures call stacks.
   static rt::Ref<LUMLoggingReroutingZEBLogger> initWithLogMultiplexer(
       rt::Ref<LUMLogMultiplexing> logMultiplexer, rt::Ref<ZEBLogFilter> stackTraceFilter);
 
-  /// The same with call stacks from the level error on.
+  /// Same as above, with call stacks from the level error on.
   static rt::Ref<LUMLoggingReroutingZEBLogger> initWithLogMultiplexer(
       rt::Ref<LUMLogMultiplexing> logMultiplexer);
 
-  /// Always null.
+  /// Return null.
   rt::Ref<ZEBLogWriter> writer() const override { return nullptr; }
   rt::Ref<ZEBLogFormatter> formatter() const override { return nullptr; }
   rt::Ref<ZEBLogFilter> filter() const override { return nullptr; }
 
-  /// Do nothing with null, and otherwise fail an assertion (Runtime/Process/AssertionHandler.h).
+  /// Do nothing for null. Otherwise they fail an assertion (Runtime/Process/AssertionHandler.h) and set
+  /// nothing.
   void setWriter(rt::Ref<ZEBLogWriter> writer) override;
   void setFormatter(rt::Ref<ZEBLogFormatter> formatter) override;
   void setFilter(rt::Ref<ZEBLogFilter> filter) override;
 
-  /// Makes the message and hands it to the multiplexer, unless making the text throws: then nothing is
-  /// logged.
+  /// Makes the message and hands it to the multiplexer. If formatting the text throws, drops the exception
+  /// and logs nothing.
   [[gnu::noinline]] void logInternalFunc(const char* func, const rt::String& format, std::va_list valist,
                                          ZEBLogLevel level) override;
 

@@ -36,7 +36,7 @@ class Recorder final : public rt::Implements<Recorder, rt::Object, LUMSyncLogger
   std::vector<rt::Ref<LUMLogMessage>> messages;
 };
 
-/// Notes what it is asked.
+// Records the questions that it is asked.
 class StackFilter final : public rt::Implements<StackFilter, rt::Object, ZEBLogFilter> {
  public:
   bool filterAllowsMessage(const rt::String& message, ZEBLogLevel level) override {
@@ -107,19 +107,19 @@ TEST_F(ReroutingTest, MapsLevels) {
   EXPECT_THAT(levels, testing::ElementsAre(1, 2, 3, 4, 1, 2, 3, 4, 1, 2, 3, 4));
 }
 
-TEST_F(ReroutingTest, LosesNoUnknownLevel) {
+TEST_F(ReroutingTest, PromotesUnknownLevelsToFault) {
   for (const ZEBLogLevel level : {0, 5, 7, -1, 1000}) {
     logAt(level);
     EXPECT_EQ(last().level(), LUMLogLevelFault) << level;
   }
-  // The base class has dropped these before.
+  // The base class drops these before they get here.
   const std::size_t count = recorder_->messages.size();
   logger_->logMessage("text"_s, 0);
   logger_->logMessage("text"_s, 5);
   EXPECT_EQ(recorder_->messages.size(), count);
 }
 
-TEST_F(ReroutingTest, TellsTheFunctionAndNoOtherPlace) {
+TEST_F(ReroutingTest, RecordsTheFunctionButNeitherFileNorLine) {
   logger_->logFuncError("-[A b]", "%d", 1);
   EXPECT_EQ(last().function(), "-[A b]");
   EXPECT_TRUE(last().file().isNull());
@@ -130,7 +130,7 @@ TEST_F(ReroutingTest, TellsTheFunctionAndNoOtherPlace) {
   EXPECT_TRUE(last().function().isNull());
 }
 
-TEST_F(ReroutingTest, SaysWhoIsLogging) {
+TEST_F(ReroutingTest, RecordsThreadAndQueue) {
   std::thread([&] {
     rt::Thread::setCurrentName("Importer"_s);
     logger_->logInfo("text");
@@ -147,7 +147,7 @@ TEST_F(ReroutingTest, KeepsNoSafeParameters) {
   EXPECT_FALSE(last().safeParameters());
 }
 
-TEST_F(ReroutingTest, TakesCallStacksFromTheLevelErrorOn) {
+TEST_F(ReroutingTest, CapturesCallStacksFromTheLevelErrorOn) {
   logger_->logDebug("text");
   EXPECT_FALSE(last().callstack());
   logger_->logInfo("text");
@@ -156,14 +156,14 @@ TEST_F(ReroutingTest, TakesCallStacksFromTheLevelErrorOn) {
   EXPECT_TRUE(rt::cast<LUMLogAddressCallstack>(last().callstack()));
   logger_->logAssert("text");
   EXPECT_TRUE(rt::cast<LUMLogAddressCallstack>(last().callstack()));
-  // The filter is asked with the level as it was given: 0 is not promoted for it, and 7 is no level of its.
+  // The filter gets the level as given: 0 is not promoted for it, and 7 is not one of its levels.
   logAt(0);
   EXPECT_FALSE(last().callstack());
   logAt(7);
   EXPECT_FALSE(last().callstack());
 }
 
-TEST_F(ReroutingTest, TakesCallStacksAsTheMultiplexerWants) {
+TEST_F(ReroutingTest, CapturesCallStacksAsTheMultiplexerIsSet) {
   multiplexer_->setCaptureCallStackAddresses(false);
   logger_->logError("text");
   EXPECT_TRUE(rt::cast<LUMLogSymbolCallstack>(last().callstack()));
@@ -186,7 +186,7 @@ TEST_F(ReroutingTest, AsksItsFilterForCallStacks) {
   EXPECT_FALSE(last().callstack());
 }
 
-/// Takes messages and has no switches.
+// A multiplexer without switches for call stacks.
 class PlainMultiplexer final : public rt::Implements<PlainMultiplexer, rt::Object, LUMLogMultiplexing> {
  public:
   void logWithMessage(const rt::Ref<LUMLogMessage>& message) override { messages.push_back(message); }
@@ -200,7 +200,7 @@ class PlainMultiplexer final : public rt::Implements<PlainMultiplexer, rt::Objec
   std::vector<rt::Ref<LUMLogMessage>> messages;
 };
 
-TEST_F(ReroutingTest, TakesNoCallStackForAMultiplexerThatCannotSay) {
+TEST_F(ReroutingTest, CapturesNoCallStackForAMultiplexerWithoutSwitches) {
   const rt::Ref<PlainMultiplexer> plain = rt::make<PlainMultiplexer>();
   LUMLoggingReroutingZEBLogger::initWithLogMultiplexer(plain)->logError("text");
   ASSERT_EQ(plain->messages.size(), 1U);
@@ -211,7 +211,7 @@ TEST_F(ReroutingTest, TakesNoCallStackForAMultiplexerThatCannotSay) {
   logger.logError("%d", 1);
 }
 
-TEST_F(ReroutingTest, HasTheCallingFunctionFirstInItsCallStacks) {
+TEST_F(ReroutingTest, CallStacksBeginWithTheCallingFunction) {
   functionThatLogs(*logger_);
   EXPECT_THAT(firstSymbolOf(last()), HasSubstr("functionThatLogs("));
   multiplexer_->setCaptureCallStackAddresses(false);
@@ -231,7 +231,7 @@ TEST_F(ReroutingTest, HasNoPieces) {
   EXPECT_FALSE(logger_->filter());
 }
 
-/// Notes a failure, and lets the program go on.
+// Records a failure and lets the program go on.
 class Notes final : public rt::Implements<Notes, rt::AssertionHandler> {
  public:
   void handleFailureInFunction(const rt::String& function, const rt::String& file, std::uint64_t lineNumber,
@@ -243,7 +243,7 @@ class Notes final : public rt::Implements<Notes, rt::AssertionHandler> {
   std::vector<std::string> lines;
 };
 
-TEST_F(ReroutingTest, FailsAnAssertionWhereAPieceIsSet) {
+TEST_F(ReroutingTest, FailsAnAssertionIfAPieceIsSet) {
   const rt::Ref<Notes> notes = rt::make<Notes>();
   rt::AssertionHandler::setCurrentHandler(notes);
   logger_->setWriter(ZEBLogger::logger());
@@ -261,7 +261,7 @@ TEST_F(ReroutingTest, FailsAnAssertionWhereAPieceIsSet) {
   EXPECT_FALSE(logger_->writer());
   EXPECT_FALSE(logger_->formatter());
   EXPECT_FALSE(logger_->filter());
-  // By default it raises.
+  // The default handler throws.
   EXPECT_THROW(logger_->setWriter(ZEBLogger::logger()), rt::InternalInconsistencyException);
 }
 
@@ -270,7 +270,7 @@ class Thrower final : public rt::Implements<Thrower, rt::Object> {
   rt::String description() const override { throw std::runtime_error("no description"); }
 };
 
-TEST_F(ReroutingTest, LogsNothingWhereTheTextCannotBeMade) {
+TEST_F(ReroutingTest, LogsNothingIfTheTextCannotBeMade) {
   EXPECT_NO_THROW(logger_->logError("%@", rt::make<Thrower>()));
   EXPECT_TRUE(recorder_->messages.empty());
   logger_->logError("the next");
@@ -285,12 +285,12 @@ class ThrowingLogger final : public rt::Implements<ThrowingLogger, rt::Object, L
   rt::Ref<LUMLogFilter> filter() const override { return nullptr; }
 };
 
-TEST_F(ReroutingTest, LetsLoggersThrow) {
+TEST_F(ReroutingTest, ThrowsWhatALoggerThrows) {
   multiplexer_->addSyncLogger(rt::make<ThrowingLogger>());
   EXPECT_THROW(logger_->logInfo("text"), std::runtime_error);
 }
 
-TEST_F(ReroutingTest, BringsAssertsToTheErrorHandler) {
+TEST_F(ReroutingTest, SendsAssertsToTheErrorHandler) {
   PECErrorHandler::register_();
   std::vector<std::string> errors;
   PECErrorHandler::sharedInstance()->registerErrorHandlerBlock(

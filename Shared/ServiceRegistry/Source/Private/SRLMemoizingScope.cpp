@@ -1,3 +1,21 @@
+// A look-up that finds its instance allocates nothing. A factory is passed as a reference to a callable
+// object, because a block would be allocated for each request. The rest is in `makeOrAwaitInstance`, so that
+// a hit needs no stack frame for it.
+//
+// A creation is reused for the next one in its scope, unless a thread has waited for it. That thread may not
+// have woken up yet, and would then wait for the next creation too.
+//
+// A creation's lock is a `LongLock`, so a fork does not wait for a factory. In the child of a fork, an
+// instance that another thread was making counts as not begun. The first thread that asks for it makes it. A
+// factory that asks for its own instance ends the program with a line that says so. Otherwise it would wait
+// for itself.
+//
+// A factory that throws leaves its creation pending, because nobody can tell whether it may be called again.
+// Its lock is released, so that nobody waits: those who ask get a report and null.
+//
+// Memory for an instance is allocated when its creation begins, before its factory runs. So nothing can fail
+// between making an instance and keeping it. Such an instance could neither be handed out nor be made again.
+
 #include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope.h"
 
 #include <cstdio>

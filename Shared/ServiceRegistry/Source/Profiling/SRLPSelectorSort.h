@@ -25,6 +25,9 @@
 ///
 /// Not for: sorting by an order (std::stable_sort).
 
+// The comparison of measured events answers with a start time, which is not an order. With such a comparison
+// `std::sort` has undefined behaviour. This merge sort is defined for every answer.
+
 #include <algorithm>
 #include <concepts>
 #include <cstddef>

@@ -1,3 +1,6 @@
+// A class hashes as its address, a protocol (SRLProtocolType) as its name. Both stay the same while the
+// process lives, and so do instance types.
+
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 
 #include <functional>

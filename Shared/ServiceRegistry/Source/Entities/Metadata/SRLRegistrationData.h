@@ -28,6 +28,10 @@
 ///
 /// Not for: handwritten code. A generator writes these records.
 
+// The records are one binary format, so they are in one header. Their bits are plain bit-fields, so that
+// generated code can name what it sets. The offsets are checked while compiling. No compiler tells where the
+// bits are in their bytes, so a test looks.
+
 #include <cstddef>
 #include <cstdint>
 

@@ -1,3 +1,7 @@
+// Masking counts no bits. A set has one tag for each bit of the API's scope, in the same order, so the two
+// are walked together. Without a special instruction, counting the bits would be a function call for every
+// tag.
+
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSet.h"
 
 #include <algorithm>

@@ -1,3 +1,6 @@
+// The host decides which classes its tags have, long after this file was compiled. So the tags of an archive
+// may be of any class that conforms to `SecureCoding`.
+
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSetCodableWrapper.h"
 
 #include <string_view>

@@ -1,8 +1,8 @@
-// The set of implementations of an API never changes; a new set replaces it. So a request for many takes one
-// reference under the lock, and no copy.
+// An API's set of implementations never changes: a new set replaces it. So a request for a multi-bound API
+// retains the set under the lock, and copies nothing.
 //
-// Weak functions are where a program can intervene (`SRLStartUpHook`, `SRLPProfilingSwitch`). They are called
-// while the program is loaded, before any of its code could register something else.
+// A program can intervene by defining two weak functions: `SRLStartUpHook` and `SRLPProfilingSwitch`. They
+// may run while the program is loaded, when none of its code could have registered a callback yet.
 
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 
@@ -39,10 +39,10 @@ constexpr std::string_view kBindingsPrefix = "srl_bindings";
 
 constinit rt::UnfairLock sharedInstanceLock;
 constinit bool isSharedInstanceMade RT_GUARDED_BY(sharedInstanceLock) = false;
-// Retained, and never released at exit, when other threads may still ask for services.
+// Retained, and not released at exit, when other threads may still request services.
 constinit SRLRegistry* sharedRegistry RT_GUARDED_BY(sharedInstanceLock) = nullptr;
 
-// A module's binding of the API with this identifier; null where it has none.
+// Returns a module's binding of the API with this identifier. Null if there is none.
 const _SRLBindingRegistrationData* bindingOf(const SRLBindingsModuleData& module,
                                              std::string_view identifier) {
   const auto identifierOf = [](const auto& binding) { return SRLIdentifierBytes(*binding.api); };
@@ -51,8 +51,8 @@ const _SRLBindingRegistrationData* bindingOf(const SRLBindingsModuleData& module
   return found != bindings.end() && identifierOf(*found) == identifier ? &*found : nullptr;
 }
 
-// Whether a class has the names that an API is given by, as most are. Spares an instance type, which may say
-// yes where this says no.
+// Returns whether a class fits an API that is given by names, as most are. This is quicker than making the
+// API's instance type, which decides if this returns false.
 bool hasNamesOf(const SRLAPIRegistrationData& api, const rt::ClassInfo& aClass) {
   if (api.instanceTypeKind != SRLInstanceTypeKindNames) return false;
   const auto& [protocolName, className] = api.instanceType.names;
@@ -114,7 +114,7 @@ rt::Ref<SRLRegistry> SRLRegistry::setSharedInstance(const rt::Ref<SRLRegistry>& 
 }
 
 rt::Ref<SRLRegistry> SRLRegistry::initPrivate() {
-  // Its members initialise themselves; there is nothing to clear before that.
+  // The members initialise themselves, so their memory need not be cleared first.
   return rt::Ref<SRLRegistry>::adopt(new SRLRegistry(std::make_unique_for_overwrite<SRLRegistryIvars>()));
 }
 
@@ -125,8 +125,8 @@ SRLRegistry::~SRLRegistry() {
   if (rt::isMainThread()) return;
   try {
     rt::Queue::main()->async([ivars = std::move(ivars_)] {});
-  } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): what is to be done then happens anyway
-    // There is no memory for a task: then they are released here and now, with the task that there was to be.
+  } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): nothing is left to do
+    // Without memory for the task, the lambda has released the ivars here and now.
   }
 }
 
@@ -183,10 +183,10 @@ bool SRLRegistry::multipleBindingsModulesAllowed() const {
   });
 }
 
-// Does not ask `registrationDatasForAPI`, whose list would cost a first request a seventh.
+// Does not call `registrationDatasForAPI`: making its list would cost a seventh of a first request's time.
 bool SRLRegistry::lazilyRegisterBindingsForAPI(const SRLAPIRegistrationData* api) {
   const bool isNew = !ivars_->isKnown(api);
-  // What becomes known beside `api`: other records with its identifier.
+  // Other records with the identifier of `api`, which become known together with it.
   std::vector<const SRLAPIRegistrationData*> others;
   bool hasBindings = false;
   try {
@@ -198,7 +198,7 @@ bool SRLRegistry::lazilyRegisterBindingsForAPI(const SRLAPIRegistrationData* api
       registerBindings(*binding);
     }
   } catch (const std::bad_alloc&) {
-    // The next request begins anew, rather than find that some are missing.
+    // Makes these APIs unknown, so that the next request registers all their bindings anew.
     const auto forget = [this](const SRLAPIRegistrationData* each) RT_NO_THREAD_SAFETY_ANALYSIS {
       ivars_->singleBindings.erase(each);
       ivars_->multiBindings.erase(each);
@@ -272,7 +272,7 @@ void SRLRegistry::internalRegisterServiceAPI(const SRLAPIRegistrationData* api,
     }
   }
   if ((implementation->scopeType() & api->scopeType) != implementation->scopeType()) {
-    // The grammar is that of a message that people search for.
+    // The grammar stays as it is, since people search for this message.
     PECReport({kFile, kFunction},
               "Cannot bind a implementation to APIs that require a superset of scopes:\n"
               "Implementation: %@,\nService API: %@"_s,
@@ -313,7 +313,7 @@ void SRLRegistry::internalRegisterImplementation(const rt::Ref<SRLImplementation
     PECReport({kFile, kFunction}, "Incorrect binding type for %@"_s, SRLAPIIdentifier(forMultiboundAPI));
     return;
   }
-  // The set is complete before the API is known: a type of the host's own may throw when it is hashed.
+  // Completes the set before the API becomes known, since hashing a host's own type may throw.
   const auto* known = ivars_->multiBindings.find(forMultiboundAPI);
   const bool isBound = known != nullptr && known->second;
   rt::Set::Builder builder = isBound ? rt::Set::Builder(*known->second) : rt::Set::Builder();

@@ -1,27 +1,29 @@
 // How a registry hands out instances, and the scopes that they live in.
 //
-// A request first looks for an instance that is there: the binding, its scope and the instance, all under the
-// registry's lock. It counts no reference but the instance's. `SRLScopedFactory::make` makes an instance that
-// is not there. A factory block wraps the same `SRLScopedFactory`, so there is one way to an instance. The
-// request passes on the scope that it has found or opened. If it has none, `make` opens one in the shared
-// registry. That happens in a registry that is not the shared one, since all scopes are in the shared one. It
-// also happens when the tags do not fit; then `make` reports them.
+// A request first looks for an existing instance: the binding, its scope and the instance, all under the
+// registry's lock. It changes no reference count but the instance's. If there is no instance,
+// `SRLScopedFactory::make` makes one. A factory block wraps the same `SRLScopedFactory`, so there is one way
+// to an instance. The request passes on the scope that it has found or opened. If it has none, `make` opens
+// one in the shared registry. This happens in a registry that is not the shared one, since all scoped
+// instances live in the shared one. It also happens if the tags do not fit. Then `make` reports them.
 //
-// A request calls a host's own factory block without counting it (`Block::callKept`), because the
-// implementation that owns the block is retained.
+// A request calls a host's own factory block without retaining it (`Block::callKept`), because it retains the
+// implementation that owns the block.
 //
-// For an API with many implementations, the instances that are found under the lock count until the first
-// factory runs. That factory may end scopes or replace the shared registry.
+// A request for a multi-bound API uses the instances that it finds under the lock until the first factory
+// runs. That factory may end scopes or replace the shared registry.
 //
 // SRLRegistry_ways_test runs random programs by requests and by blocks, and compares their traces.
 //
-// Requests remember what the modules do not know, and which API an identifier names. Modules never change
-// once they are registered, so the registry looks once. These notes make no API known. A copy of a registry
-// does not have them. Without memory they are not made. A request with the same tags as the one before tries
-// that request's scope first. The tags are compared with the scope's, which needs no hash.
+// A registry remembers which APIs no module knows, and which API an identifier names. Modules never change
+// once they are registered, so one search suffices. Remembering an API does not make it known. A copy of a
+// registry remembers nothing. Without memory, nothing is remembered.
+//
+// A request with the same tags as the previous one tries that request's scope first. It compares the tags
+// with those of the scope, which needs no hash.
 //
 // When scopes end, their entries leave the table as whole nodes. Tags and instances are released after the
-// lock has been released, so that destructors may ask the registry.
+// lock, so that destructors may call the registry.
 
 #include <utility>
 #include <variant>
@@ -48,7 +50,7 @@ constexpr const char* kFile = "Shared/ServiceRegistry/Source/SRLRegistry";
 
 using ScopeKey = SRLRegistryIvars::ScopeKey;
 
-// Asks an implementation for an instance while it is measured. A factory that throws leaves no mark.
+// Gets an instance from the factory block, and measures that. Nothing is recorded if the factory throws.
 [[gnu::noinline]] rt::Ref<rt::Object> measuredInstance(const rt::Ref<SRLImplementation>& implementation,
                                                        const SRLAPIRegistrationData* api,
                                                        const SRLScopeTagSet& tags) {
@@ -74,7 +76,7 @@ rt::String instanceTypeOf(const SRLImplementation& implementation) {
   return type ? type->asObject()->description() : rt::String();
 }
 
-// Reports are functions of their own so that requests, which are flat, stay small.
+// Reports are functions of their own, so that the flattened requests stay small.
 
 [[gnu::cold, gnu::noinline]] void reportNoBinding(const char* function, const SRLAPIRegistrationData* api) {
   PECReport({kFile, function}, "No binding was found for required, single-bound service: %@"_s,
@@ -124,7 +126,7 @@ rt::Ref<rt::Object> SRLRegistry::keptInstanceOf(const SRLImplementation& impleme
   return instance;
 }
 
-// The caller keeps the implementation.
+// Precondition: the caller retains the implementation.
 rt::Ref<rt::Object> SRLRegistry::instanceOf(SRLImplementation& implementation,
                                             const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags,
                                             rt::Ref<SRLMemoizingScope> scope) {
@@ -153,7 +155,7 @@ SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SR
   return found;
 }
 
-// Flat, since most requests are for an instance that is there.
+// Flattened for speed, since most requests are for an existing instance.
 [[gnu::flatten]] rt::Ref<rt::Object> SRLRegistry::internalService(const SRLAPIRegistrationData* api,
                                                                   const SRLScopeTagSet& scopeTags) {
   constexpr const char* kFunction = "-[SRLRegistry internalService:scopeTags:]";
@@ -208,12 +210,11 @@ const rt::Ref<SRLImplementation>* SRLRegistry::boundTo(const SRLAPIRegistrationD
     return nullptr;
   }
   if (!registersBindingsFor(api)) return nullptr;
-  // Made known even where registration has refused what there was.
+  // Makes the API known even if registration has refused its implementation.
   return &ivars_->singleBindings[api];
 }
 
-// Modules never change once they are registered, so one that none of them knows is looked for among them
-// once.
+// Remembers an API that no module knows. Registered modules never change, so one search suffices.
 bool SRLRegistry::registersBindingsFor(const SRLAPIRegistrationData* api) {
   if (lazilyRegisterBindingsForAPI(api)) return true;
   if (ivars_->bindingsState == SRLBindingsState::kRegistered)
@@ -246,8 +247,8 @@ bool SRLRegistry::registersBindingsFor(const SRLAPIRegistrationData* api) {
       return nullptr;
     }
     instances.reserve(implementations->count());
-    // Those that are there, up to the first that is to be made: its factory may do anything, such as end a
-    // scope.
+    // Takes the existing instances up to the first missing one. The factory of that one may do anything, for
+    // example end a scope.
     for (next = implementations->begin(); next != implementations->end(); ++next) {
       rt::Ref<rt::Object> kept =
           keptInstanceOf(static_cast<const SRLImplementation&>(**next), scopeTags, scope);
@@ -350,13 +351,12 @@ void SRLRegistry::removeScopesWithTag(const rt::Ref<rt::Object>& tag) {
     PECReport({kFile, "-[SRLRegistry removeScopesWithTag:]"}, "tag cannot be nil!"_s);
     return;
   }
-  // What the caller's reference is a part of may end with a scope.
+  // The caller's reference may be a part of an object that is destroyed with a scope.
   const rt::Ref<rt::Object> keptTag = tag;  // NOLINT(performance-unnecessary-copy-initialization)
   const bool isDelegateSet = scopeLifecycleDelegate() != nullptr;
   std::vector<rt::Weak<rt::Object>> instances;
   {
-    // Entries that are taken out keep their scopes, and the tags that their keys have retained, until the
-    // lock is let go.
+    // Removed entries retain their scopes, and the tags of their keys, until the lock is released.
     struct Removed {
       ~Removed() {
         for (const auto& entry : entries) SRLScopeTagSetRelease(entry.key().tags);
@@ -394,7 +394,7 @@ void SRLRegistry::setScopeLifecycleDelegate(const rt::Ref<SRLScopeLifecycleDeleg
   ivars.scopeLifecycleDelegate = std::move(weak);
 }
 
-// Asked of a registry, whichever registry the instances are to live in.
+// Not static, since callers call it on a registry. Scoped instances live in the shared registry in any case.
 // NOLINTNEXTLINE(readability-convert-member-functions-to-static)
 SRLFactoryBlock SRLRegistry::scopedBlockForFactory(
     rt::Ref<rt::Object> (*factory)(SRLScopeTagSet tags),

@@ -6,15 +6,15 @@
 // have woken up yet, and would then wait for the next creation too.
 //
 // A creation's lock is a `LongLock`, so a fork does not wait for a factory. In the child of a fork, an
-// instance that another thread was making counts as not begun. The first thread that asks for it makes it. A
-// factory that asks for its own instance ends the program with a line that says so. Otherwise it would wait
+// instance that another thread was making counts as not begun. The first thread that requests it makes it. A
+// factory that requests its own instance ends the program with a line that says so. Otherwise it would wait
 // for itself.
 //
-// A factory that throws leaves its creation pending, because nobody can tell whether it may be called again.
-// Its lock is released, so that nobody waits: those who ask get a report and null.
+// A factory that throws leaves its creation pending, because nothing says whether it can be called again. Its
+// lock is released, so that no thread waits: requests report this and return null.
 //
 // Memory for an instance is allocated when its creation begins, before its factory runs. So nothing can fail
-// between making an instance and keeping it. Such an instance could neither be handed out nor be made again.
+// between making an instance and storing it. Such an instance could neither be returned nor be made again.
 
 #include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope.h"
 

@@ -20,11 +20,12 @@
 ///
 /// Not for: tables with few look-ups.
 
-// The index only grows, and keeps the arrays that it has replaced. So instances of a scope, and APIs by
-// identifier, are found without a lock, and a request takes one lock: the registry's. A scope's lock may be
-// taken inside the registry's when scopes end. Inside a scope's lock only the lock of a creation that begins
-// is taken, which nobody else has. The table of scopes is the only one that loses entries. Its index is then
-// made anew.
+// An index keeps the one that it has replaced. So instances of a scope, and APIs by identifier, are found
+// without a lock, and a request takes one lock: the registry's. When scopes end, a scope's lock may be taken
+// inside the registry's. Inside a scope's lock, only the lock of a creation that begins is taken. No other
+// thread holds that one.
+//
+// Only the tables of scopes and of bindings lose entries. Look-ups in these hold the registry's lock.
 
 #include <algorithm>
 #include <atomic>

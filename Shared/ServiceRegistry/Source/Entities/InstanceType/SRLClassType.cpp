@@ -1,5 +1,5 @@
-// A class hashes as its address, a protocol (SRLProtocolType) as its name. Both stay the same while the
-// process lives, and so do instance types.
+// The hash of a class is that of its address. The hash of a protocol (SRLProtocolType) is that of its name.
+// Neither changes during the life of the process.
 
 #include "Shared/ServiceRegistry/Source/Entities/InstanceType/SRLClassType.h"
 

@@ -29,8 +29,8 @@
 /// Not for: handwritten code. A generator writes these records.
 
 // The records are one binary format, so they are in one header. Their bits are plain bit-fields, so that
-// generated code can name what it sets. The offsets are checked while compiling. No compiler tells where the
-// bits are in their bytes, so a test looks.
+// generated code can name what it sets. The offsets are checked while compiling. The positions of the bits
+// cannot be, so a test checks them.
 
 #include <cstddef>
 #include <cstdint>
@@ -123,7 +123,7 @@ struct _SRLBindingRegistrationData {
 
 // NOLINTEND(bugprone-reserved-identifier,cert-dcl37-c,cert-dcl51-cpp)
 
-// Generated code relies on this layout. A test checks the positions of the bit-fields.
+// Generated code relies on this layout.
 static_assert(sizeof(void*) == 8);
 
 static_assert(sizeof(SRLAPIInstanceType) == 16);

@@ -1,6 +1,6 @@
-// Masking counts no bits. A set has one tag for each bit of the API's scope, in the same order, so the two
-// are walked together. Without a special instruction, counting the bits would be a function call for every
-// tag.
+// Masking does not count bits. A set has one tag for each bit of the API's scope, in the same order, so
+// masking walks through both together. On a processor without a special instruction, counting the bits would
+// be a function call for every tag.
 
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSet.h"
 

@@ -237,24 +237,30 @@ class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
     rt::Ref<SRLImplementation> implementation;
     rt::Ref<SRLMemoizingScope> scope;
   };
-  Found find(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) RT_REQUIRES(ivars_->lock);
+  // `ivars` are the registry's, here and below: read once, before the lock is taken.
+  Found find(SRLRegistryIvars& ivars, const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags)
+      RT_REQUIRES(ivars.lock);
 
   // What is bound to an API for one, which may be null; null where no module knows it. A null API is
   // reported.
-  const rt::Ref<SRLImplementation>* boundTo(const SRLAPIRegistrationData* api) RT_REQUIRES(ivars_->lock);
+  const rt::Ref<SRLImplementation>* boundTo(SRLRegistryIvars& ivars, const SRLAPIRegistrationData* api)
+      RT_REQUIRES(ivars.lock);
   // The same for one that is not in the table yet.
-  const rt::Ref<SRLImplementation>* newlyBound(const SRLAPIRegistrationData* api) RT_REQUIRES(ivars_->lock);
+  const rt::Ref<SRLImplementation>* newlyBound(const SRLAPIRegistrationData* api);
 
   // `lazilyRegisterBindingsForAPI`, after which it is known where no module knows the API.
   bool registersBindingsFor(const SRLAPIRegistrationData* api) RT_REQUIRES(ivars_->lock);
 
-  SRLMemoizingScope& openScope(const SRLScopeTagSet& tags) RT_REQUIRES(ivars_->lock);
-  SRLMemoizingScope& newScope(const SRLScopeTagSet& tags) RT_REQUIRES(ivars_->lock);
+  static SRLMemoizingScope& openScope(SRLRegistryIvars& ivars, const SRLScopeTagSet& tags)
+      RT_REQUIRES(ivars.lock);
+  static SRLMemoizingScope& newScope(SRLRegistryIvars& ivars, const SRLScopeTagSet& tags)
+      RT_REQUIRES(ivars.lock);
 
   // The instance that a scope of this registry has already; null where there is none, or no telling. In the
   // first case `scope` becomes the one that it is to be kept in, if there is one.
-  rt::Ref<rt::Object> keptInstanceOf(const SRLImplementation& implementation, const SRLScopeTagSet& tags,
-                                     rt::Ref<SRLMemoizingScope>& scope) RT_REQUIRES(ivars_->lock);
+  rt::Ref<rt::Object> keptInstanceOf(SRLRegistryIvars& ivars, const SRLImplementation& implementation,
+                                     const SRLScopeTagSet& tags, rt::Ref<SRLMemoizingScope>& scope)
+      RT_REQUIRES(ivars.lock);
 
   // An instance of what the caller keeps, new or kept; null where its factory gives none. Where `scope` is
   // given, that is where it is kept.

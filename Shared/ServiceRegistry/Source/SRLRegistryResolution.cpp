@@ -80,7 +80,8 @@ rt::String instanceTypeOf(const SRLImplementation& implementation) {
 
 }  // namespace
 
-rt::Ref<rt::Object> SRLRegistry::keptInstanceOf(const SRLImplementation& implementation,
+rt::Ref<rt::Object> SRLRegistry::keptInstanceOf(SRLRegistryIvars& ivars,
+                                                const SRLImplementation& implementation,
                                                 const SRLScopeTagSet& tags,
                                                 rt::Ref<SRLMemoizingScope>& scope) {
   rt::Ref<rt::Object> instance;
@@ -88,7 +89,7 @@ rt::Ref<rt::Object> SRLRegistry::keptInstanceOf(const SRLImplementation& impleme
   if (scoped == nullptr || !isShared_.load(std::memory_order_relaxed)) return instance;
   SRLScopeTagSet masked;
   if (const SRLScopeTagSet* scopeTags = scoped->scopeTags(tags, masked)) {
-    SRLMemoizingScope& open = openScope(*scopeTags);
+    SRLMemoizingScope& open = openScope(ivars, *scopeTags);
     open.findInstance(scoped->identifier, instance);
     if (!instance) scope = &open;
   }
@@ -107,12 +108,15 @@ rt::Ref<rt::Object> SRLRegistry::instanceOf(SRLImplementation& implementation,
   return implementation.factoryBlock().callKept(tags, &instanceCreated);
 }
 
-SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) {
+SRLRegistry::Found SRLRegistry::find(SRLRegistryIvars& ivars, const SRLAPIRegistrationData* api,
+                                     const SRLScopeTagSet& tags) {
   Found found;
-  const rt::Ref<SRLImplementation>* bound = boundTo(api);
-  if (bound == nullptr || !*bound || !(*bound)->factoryBlock()) return found;
-  found.instance = keptInstanceOf(**bound, tags, found.scope);
-  if (!found.instance) found.implementation = *bound;
+  const rt::Ref<SRLImplementation>* bound = boundTo(ivars, api);
+  // Read once, so that it stays in a register.
+  SRLImplementation* const implementation = bound != nullptr ? bound->get() : nullptr;
+  if (implementation == nullptr || !implementation->factoryBlock()) return found;
+  found.instance = keptInstanceOf(ivars, *implementation, tags, found.scope);
+  if (!found.instance) found.implementation = implementation;
   return found;
 }
 
@@ -120,11 +124,11 @@ SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SR
 [[gnu::flatten]] rt::Ref<rt::Object> SRLRegistry::internalService(const SRLAPIRegistrationData* api,
                                                                   const SRLScopeTagSet& scopeTags) {
   constexpr const char* kFunction = "-[SRLRegistry internalService:scopeTags:]";
-  Found found = [&] {
-    const rt::LockGuard guard(ivars_->lock);
-    Found all = find(api, scopeTags);
+  Found found = [&, &ivars = *ivars_] {
+    const rt::LockGuard guard(ivars.lock);
+    Found all = find(ivars, api, scopeTags);
     if (!all.instance && !all.implementation) [[unlikely]] {
-      if (ivars_->bindingsState == SRLBindingsState::kRegistered) {
+      if (ivars.bindingsState == SRLBindingsState::kRegistered) {
         reportNoBinding(kFunction, api);
       } else {
         reportEarlyRequest(kFunction, api);
@@ -141,10 +145,10 @@ SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SR
 
 [[gnu::flatten]] rt::Ref<rt::Object> SRLRegistry::internalOptionalService(const SRLAPIRegistrationData* api,
                                                                           const SRLScopeTagSet& scopeTags) {
-  Found found = [&] {
-    const rt::LockGuard guard(ivars_->lock);
-    Found all = find(api, scopeTags);
-    if (!all.instance && !all.implementation && ivars_->bindingsState == SRLBindingsState::kInProgress)
+  Found found = [&, &ivars = *ivars_] {
+    const rt::LockGuard guard(ivars.lock);
+    Found all = find(ivars, api, scopeTags);
+    if (!all.instance && !all.implementation && ivars.bindingsState == SRLBindingsState::kInProgress)
       reportEarlyRequest("-[SRLRegistry internalOptionalService:scopeTags:]", api);
     return all;
   }();
@@ -154,17 +158,19 @@ SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SR
 
 rt::Ref<SRLImplementation> SRLRegistry::implementationForSingleBoundService(
     const SRLAPIRegistrationData* api) {
-  const rt::Ref<SRLImplementation>* bound = boundTo(api);
+  const rt::Ref<SRLImplementation>* bound = boundTo(*ivars_, api);
   return bound != nullptr ? *bound : nullptr;
 }
 
-const rt::Ref<SRLImplementation>* SRLRegistry::boundTo(const SRLAPIRegistrationData* api) {
-  if (const auto* known = ivars_->singleBindings.find(api)) return &known->second;
-  return ivars_->isUnknown(api) ? nullptr : newlyBound(api);
+const rt::Ref<SRLImplementation>* SRLRegistry::boundTo(SRLRegistryIvars& ivars,
+                                                       const SRLAPIRegistrationData* api) {
+  if (const auto* known = ivars.singleBindings.find(api)) return &known->second;
+  return ivars.isUnknown(api) ? nullptr : newlyBound(api);
 }
 
 [[gnu::noinline]] const rt::Ref<SRLImplementation>* SRLRegistry::newlyBound(
     const SRLAPIRegistrationData* api) {
+  ivars_->lock.assertOwner();
   if (api == nullptr) [[unlikely]] {
     PECReport({kFile, "-[SRLRegistry implementationForSingleBoundService:]"},
               "|apiIdentifier| cannot be nil!"_s);
@@ -213,7 +219,7 @@ bool SRLRegistry::registersBindingsFor(const SRLAPIRegistrationData* api) {
     // scope.
     for (next = implementations->begin(); next != implementations->end(); ++next) {
       rt::Ref<rt::Object> kept =
-          keptInstanceOf(static_cast<const SRLImplementation&>(**next), scopeTags, scope);
+          keptInstanceOf(*ivars_, static_cast<const SRLImplementation&>(**next), scopeTags, scope);
       if (!kept) break;
       instances.push_back(std::move(kept));
     }
@@ -294,16 +300,17 @@ bool SRLRegistry::eg_internalHasImplementationForService(const rt::String& ident
 
 rt::Ref<SRLMemoizingScope> SRLRegistry::scopeWithTags(const SRLScopeTagSet& tags) {
   const rt::LockGuard guard(ivars_->lock);
-  return &openScope(tags);
+  return &openScope(*ivars_, tags);
 }
 
-SRLMemoizingScope& SRLRegistry::openScope(const SRLScopeTagSet& tags) {
-  if (SRLMemoizingScope* open = ivars_->findScope(tags)) return *open;
-  return newScope(tags);
+SRLMemoizingScope& SRLRegistry::openScope(SRLRegistryIvars& ivars, const SRLScopeTagSet& tags) {
+  if (SRLMemoizingScope* open = ivars.findScope(tags)) return *open;
+  return newScope(ivars, tags);
 }
 
-[[gnu::noinline]] SRLMemoizingScope& SRLRegistry::newScope(const SRLScopeTagSet& tags) {
-  const auto& opened = ivars_->scopes.insert(ScopeKey(tags), SRLMemoizingScope::init());
+[[gnu::noinline]] SRLMemoizingScope& SRLRegistry::newScope(SRLRegistryIvars& ivars,
+                                                           const SRLScopeTagSet& tags) {
+  const auto& opened = ivars.scopes.insert(ScopeKey(tags), SRLMemoizingScope::init());
   SRLScopeTagSetRetain(tags);
   return *opened.second;
 }

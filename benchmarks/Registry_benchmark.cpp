@@ -23,6 +23,7 @@
 #include "Runtime/Values/Set.h"
 #include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLAPIIdentifier.h"
+#include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLTable.h"
 
 namespace {
@@ -87,30 +88,51 @@ struct Floor {
   std::unordered_map<SRLScopeTagSet, Ref<rt::Object>, TagSetHash, TagSetEqual> scopes;
 };
 
-// The least that a request can do: one lock, the same tables and reference counts, and no checks.
+// The least that a request can do: one lock, the same tables and reference counts, and no check but that the
+// tags fit. The lock is of the kind that every request needs: a fork waits for its holder, so that the child
+// finds whole tables. Each step uses the result of the step before it: the implementation of an API knows the
+// identifier of the instance in its scope. An API that is not bound is looked for among those known to have
+// no binding.
 struct Least {
+  struct Implementation final : rt::Implements<Implementation, rt::Object> {
+    explicit Implementation(const SRLImplementationRegistrationData& theRecord) : record(theRecord) {}
+    const SRLImplementationRegistrationData& record;
+  };
+
   Least() {
-    for (const SRLAPIRegistrationData& api : module().apis) {
-      implementations.insert(&api, rt::make<Service>());
-      instances.insert(&api, rt::make<Service>());
+    for (std::size_t i = 0; i < kAPIs; ++i) {
+      const SRLImplementationRegistrationData& record = module().implementations.at(i);
+      implementations.insert(&module().apis.at(i), rt::make<Implementation>(record));
+      scope->instanceForIdentifier(&record, nullptr, [] { return rt::make<Service>(); });
     }
+    unknown.insert(&kUnknown, true);
   }
 
   [[gnu::noinline]] Ref<rt::Object> keptInstance(const SRLAPIRegistrationData* api,
                                                  const SRLScopeTagSet& tags) {
     const rt::LockGuard guard(lock);
-    if (implementations.find(api) == nullptr || !SRLScopeTagSetEqual(scopeTags, tags)) return nullptr;
-    const auto* found = instances.find(api);
-    return found != nullptr ? found->second : nullptr;
+    if (const auto* bound = implementations.find(api)) return keptInstance(bound->second->record, tags);
+    benchmark::DoNotOptimize(unknown.find(api));
+    return nullptr;
+  }
+  [[gnu::always_inline]] inline Ref<rt::Object> keptInstance(const SRLImplementationRegistrationData& record,
+                                                             const SRLScopeTagSet& tags) {
+    Ref<rt::Object> instance;
+    if (SRLScopeTagSetDetail::hasOneTagForEachBit(tags, record.scopeType) &&
+        SRLScopeTagSetEqual(scopeTags, tags))
+      scope->findInstance(&record, instance);
+    return instance;
   }
   [[gnu::noinline]] Ref<rt::Object> newInstance(const SRLAPIRegistrationData* api,
                                                 const SRLScopeTagSet& tags) {
-    const Ref<rt::Object> implementation = [&]() -> Ref<rt::Object> {
+    const Ref<Implementation> implementation = [&]() -> Ref<Implementation> {
       const rt::LockGuard guard(lock);
       const auto* found = implementations.find(api);
       return found != nullptr ? found->second : nullptr;
     }();
-    return implementation ? module().implementations.at(2).factory(tags) : nullptr;
+    if (!implementation) return nullptr;
+    const SRLImplementationRegistrationData& record = implementation->record;
+    return record.factory(SRLScopeTagSetMaskingWithScopes(tags, record.scopeType, record.scopeType));
   }
   [[gnu::noinline]] Ref<rt::Array> keptInstances(const SRLAPIRegistrationData* api,
                                                  const SRLScopeTagSet& tags) {
@@ -120,12 +142,8 @@ struct Least {
       const rt::LockGuard guard(lock);
       if (implementations.find(api) == nullptr) return nullptr;
       const Ref<rt::Set> bound = eight;
-      std::size_t i = 0;
-      for (const Ref<rt::Object>& implementation : *bound) {
-        benchmark::DoNotOptimize(implementation.get());
-        if (!SRLScopeTagSetEqual(scopeTags, tags)) return nullptr;
-        services.push_back(instances.find(&module().apis.at(3 * i++))->second);
-      }
+      for (const Ref<rt::Object>& implementation : *bound)
+        services.push_back(keptInstance(static_cast<const Implementation&>(*implementation).record, tags));
     }
     return rt::make<rt::Array>(std::move(services));
   }
@@ -133,11 +151,13 @@ struct Least {
   rt::UnfairLock lock;
   const Ref<rt::Object> scopeTag = rt::String::fromUTF8("account").object();
   const SRLScopeTagSet scopeTags{{scopeTag.get()}};
-  SRLTable<const void*, Ref<rt::Object>> implementations;
-  SRLTable<const void*, Ref<rt::Object>> instances;
+  SRLTable<const void*, Ref<Implementation>> implementations;
+  SRLTable<const void*, bool> unknown;
+  const Ref<SRLMemoizingScope> scope = SRLMemoizingScope::init();
   const Ref<rt::Set> eight = [] {
     rt::Set::Builder builder;
-    for (int i = 0; i < 8; ++i) builder.add(rt::make<Service>());
+    for (std::size_t i = 0; i < 8; ++i)
+      builder.add(rt::make<Implementation>(module().implementations.at(3 * i)));
     return std::move(builder).set();
   }();
 };
@@ -482,11 +502,13 @@ void discoverNone(benchmark::State& state) {
   SRLRegistry::setSharedInstance(before);
 }
 
+// A request does more than the least. It may be for a new instance, for a part of the tags or for a block of
+// the host's, it may be measured, and it makes what is not there. The bounds leave room for that.
 BENCHMARK(findScoped)->Name("Registry/scoped/ours");
 BENCHMARK(findScopedBare)->Name("Registry/scoped/bare");
 BENCHMARK(findScopedAtLeast)->Name("Registry/scoped/least");
 BENCHMARK(findScopedInContainer)->Name("Registry/scoped/container");
-const Bound scopedLeast{"Registry/scoped", "least", 1.2};
+const Bound scopedLeast{"Registry/scoped", "least", 2.0};
 const Bound scopedBare{"Registry/scoped", "bare", 1.2};
 const Bound scopedContainer{"Registry/scoped", "container", 1.0};
 BENCHMARK(findByTurns)->Name("Registry/scoped, of two by turns/ours");
@@ -498,14 +520,14 @@ BENCHMARK(findFresh)->Name("Registry/fresh/ours");
 BENCHMARK(findFreshBare)->Name("Registry/fresh/bare");
 BENCHMARK(findFreshAtLeast)->Name("Registry/fresh/least");
 BENCHMARK(findFreshInContainer)->Name("Registry/fresh/container");
-const Bound freshLeast{"Registry/fresh", "least", 1.2};
+const Bound freshLeast{"Registry/fresh", "least", 1.4};
 const Bound freshBare{"Registry/fresh", "bare", 1.2};
 const Bound freshContainer{"Registry/fresh", "container", 1.0};
 BENCHMARK(missOptional)->Name("Registry/miss/ours");
 BENCHMARK(missBare)->Name("Registry/miss/bare");
 BENCHMARK(missAtLeast)->Name("Registry/miss/least");
 BENCHMARK(missInContainer)->Name("Registry/miss/container");
-const Bound missLeast{"Registry/miss", "least", 1.2};
+const Bound missLeast{"Registry/miss", "least", 1.8};
 const Bound missBound{"Registry/miss", "bare", 1.2};
 const Bound missContainer{"Registry/miss", "container", 1.0};
 BENCHMARK(findMany)->Name("Registry/eight/ours");

@@ -149,9 +149,11 @@ struct SRLRegistry::Found {
 SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) {
   Found found;
   const rt::Ref<SRLImplementation>* bound = boundTo(api);
-  if (bound == nullptr || !*bound || !(*bound)->factoryBlock()) return found;
-  found.instance = keptInstanceOf(**bound, tags, found.scope);
-  if (!found.instance) found.implementation = *bound;
+  // Read once, so that it stays in a register.
+  SRLImplementation* const implementation = bound != nullptr ? bound->get() : nullptr;
+  if (implementation == nullptr || !implementation->factoryBlock()) return found;
+  found.instance = keptInstanceOf(*implementation, tags, found.scope);
+  if (!found.instance) found.implementation = implementation;
   return found;
 }
 

@@ -1,14 +1,14 @@
 #pragma once
 
-/// How an implementation's instance is had for the tags of a request: from its factory each time, or from the
-/// scope that keeps it. Requests and factory blocks have it by the same function, `make`.
+/// Gets an implementation's instance for the tags of a request: from its factory each time, or from the scope
+/// that keeps it. Requests and factory blocks both call `make`.
 ///
 ///     const SRLScopedFactory factory{systemClock.factory, &systemClock, clockAPI.scopeType,
 ///                                    systemClock.scopeType, systemClock.lifetime};
 ///     rt::Ref<rt::Object> instance = factory.make(tags, /*instanceCreated=*/nullptr, /*scope=*/nullptr);
 ///     SRLFactoryBlock block = factory;
 ///
-/// Immutable: any thread may use it.
+/// Threads: immutable; any thread may use it.
 ///
 /// Not for: anything but the registry.
 
@@ -25,19 +25,19 @@
 struct SRLScopedFactory {
   /// Makes an instance for the tags that belong to `implScope`.
   rt::Ref<rt::Object> (*factory)(SRLScopeTagSet tags);
-  /// What a scope knows the instance by.
+  /// The identifier of the instance in its scope.
   const SRLImplementationRegistrationData* identifier;
-  /// What the tags of a request are for, and the part of it that the implementation wants.
+  /// The scope type of the tags of a request, and the subset of it that the implementation uses.
   SRLScopeType apiScope;
   SRLScopeType implScope;
-  /// 1 for a new instance each time, anything else for one in a scope.
+  /// 1 for a new instance each time, any other value for one instance per scope.
   std::uint64_t lifetime;
 
-  /// An instance, new or kept; null where the factory gives none, and where one is to be kept and there is no
-  /// shared registry. Where `scope` is not null, it is the one that keeps the instance; otherwise that is the
-  /// shared registry's with the tags, opened if there is none. `instanceCreated` may be null; otherwise it
-  /// points to true afterwards if the instance is new. Tags that do not fit `apiScope` are reported, and
-  /// count as none. Throws what the factory and the error callback throw, and std::bad_alloc.
+  /// Returns an instance, new or kept. Null if the factory returns null, or if a scope is needed and there is
+  /// no shared registry. `scope` is the scope that keeps the instance. If it is null, the shared registry's
+  /// scope with the tags is used, and opened if there is none. Sets `*instanceCreated` to true if the
+  /// instance is new; `instanceCreated` may be null. Errors: tags that do not fit `apiScope` are reported,
+  /// and count as no tags. Throws what the factory and the error callback throw, and std::bad_alloc.
   rt::Ref<rt::Object> make(const SRLScopeTagSet& tags, bool* instanceCreated,
                            rt::Ref<SRLMemoizingScope> scope) const {
     if (lifetime == 1) {
@@ -50,13 +50,14 @@ struct SRLScopedFactory {
     return scope->instanceForIdentifier(identifier, instanceCreated, [&] { return factory(masked); });
   }
 
-  /// What a factory block does.
+  /// Makes this a factory block. Calls `make` without a scope.
   rt::Ref<rt::Object> operator()(const SRLScopeTagSet& tags, bool* instanceCreated) const {
     return make(tags, instanceCreated, nullptr);
   }
 
-  /// The tags of the scope that keeps the instance for a request with `tags`: these, or `masked`, which has
-  /// become a part of them. Null where no scope keeps it, and where `make` would report the tags.
+  /// Returns the tags of the scope that keeps the instance for a request with `tags`. That is `&tags`, or
+  /// `&masked` after it has been set to a subset. Null if no scope keeps the instance, and if `make` would
+  /// report the tags.
   const SRLScopeTagSet* scopeTags(const SRLScopeTagSet& tags, SRLScopeTagSet& masked) const {
     if (lifetime == 1 || !SRLScopeTagSetDetail::hasOneTagForEachBit(tags, apiScope)) return nullptr;
     if (implScope == apiScope) [[likely]]
@@ -67,6 +68,6 @@ struct SRLScopedFactory {
   }
 
  private:
-  // Null where there is no shared registry.
+  // Returns null if there is no shared registry.
   static rt::Ref<SRLMemoizingScope> openSharedScope(const SRLScopeTagSet& tags);
 };

@@ -81,7 +81,7 @@ TEST(WithoutMemory, Formats) {
     const rt::String text = rt::format("%@ %s %lu %5.2f %p %@"_s, "short"_s, kLong, 42UL, 0.125,
                                        static_cast<const void*>(nullptr), list);
     EXPECT_TRUE(text.view().starts_with("short a text that is too long"));
-    EXPECT_NE(text.view().find("7"), std::string_view::npos);
+    EXPECT_NE(text.view().find('7'), std::string_view::npos);
     EXPECT_TRUE(text.uppercased().view().starts_with("SHORT"));
     EXPECT_EQ(rt::String::fromUTF8Repaired("\xFFx").view(), "\uFFFDx");
   });

@@ -31,7 +31,8 @@ class FunctionView<Result(Arguments...)> {
              std::is_object_v<std::remove_reference_t<Function>> &&
              std::is_invocable_r_v<Result, Function&, Arguments...>)
   FunctionView(Function&& function) noexcept
-      : function_(std::addressof(function)), call_([](const void* called, Arguments... arguments) {
+      : function_(static_cast<const void*>(std::addressof(function))),
+        call_([](const void* called, Arguments... arguments) {
           auto& typed = *static_cast<std::remove_reference_t<Function>*>(const_cast<void*>(called));
           return static_cast<Result>(typed(std::forward<Arguments>(arguments)...));
         }) {}

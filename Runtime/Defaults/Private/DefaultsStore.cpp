@@ -263,15 +263,18 @@ DefaultsStore::Observers DefaultsStore::claim(std::string& problem) {
 
 std::exception_ptr DefaultsStore::call(const Observers& observers) noexcept {
   std::exception_ptr first;
+  const auto callOnce = [&](DefaultsObserver& observer) {
+    bool wasDue = false;
+    try {
+      wasDue = isDue(observer);
+      if (wasDue) observer.block();
+    } catch (...) {
+      if (first == nullptr) first = std::current_exception();
+    }
+    return wasDue;
+  };
   for (const auto& observer : observers) {
-    for (bool goesOn = true; goesOn;) {
-      goesOn = false;
-      try {
-        goesOn = isDue(*observer);
-        if (goesOn) observer->block();
-      } catch (...) {
-        if (first == nullptr) first = std::current_exception();
-      }
+    while (callOnce(*observer)) {
     }
   }
   return first;

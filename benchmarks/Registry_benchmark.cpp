@@ -502,8 +502,8 @@ void discoverNone(benchmark::State& state) {
   SRLRegistry::setSharedInstance(before);
 }
 
-// A request does more than the least. It may be for a new instance, for a part of the tags or for a block of
-// the host's, it may be measured, and it makes what is not there. The bounds leave room for that.
+// A request does more than the least. A request may be for a new instance, for a subset of the tags or for a
+// host's block. It may be measured, and it makes missing instances. The bounds leave room for that.
 BENCHMARK(findScoped)->Name("Registry/scoped/ours");
 BENCHMARK(findScopedBare)->Name("Registry/scoped/bare");
 BENCHMARK(findScopedAtLeast)->Name("Registry/scoped/least");

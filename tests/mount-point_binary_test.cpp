@@ -1,5 +1,5 @@
-// Tests the executable of the mount-point command, which may be installed with raised privileges: what it
-// links, how it is hardened, and what it does besides its work.
+// Tests the executable of the mount-point command, which may be installed with raised privileges. The tests
+// show what it links, how it is hardened, and what it does besides its work.
 
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>

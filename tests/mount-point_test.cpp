@@ -330,7 +330,7 @@ TEST_F(MountPointTest, ReportsEveryErrorOfRmdir) {
   EXPECT_EQ(volumes(), std::vector<std::string>{"a"});
 }
 
-// The lines of commands that run at the same time do not mix: the command writes each line of up to 8 KiB in
+// The lines of commands that run at the same time do not mix. The command writes each line of up to 8 KiB in
 // one call.
 TEST_F(MountPointTest, WritesEachLineInOneCall) {
   if (kInstrumentation == "coverage")

@@ -68,9 +68,9 @@ class KeyedUnarchiver final {
   /// does. Calls the `initWithCoder` of the object and of its parts, once for each object.
   ///
   /// Errors: returns null without an error if null was archived. Returns null with an error if there is
-  /// nothing under the key, the object has another class, its `initWithCoder` returns null, or the archive
-  /// is inconsistent or refers to objects too often. An exception of `initWithCoder` passes to the caller
-  /// and is no error.
+  /// nothing under the key, the object has another class, or its `initWithCoder` returns null. It also does
+  /// so if the archive is inconsistent or refers to objects too often. An exception of `initWithCoder` passes
+  /// to the caller and is no error.
   Ref<Object> decodeObjectOfClasses(std::span<const ClassInfo* const> classes, std::string_view key);
   Ref<Object> decodeObjectOfClasses(std::initializer_list<const ClassInfo*> classes, std::string_view key) {
     return decodeObjectOfClasses(std::span(classes.begin(), classes.size()), key);

@@ -46,9 +46,9 @@ class MainQueue final : public Queue {
   /// not running, its next call returns at once. Threads: any thread and any task may call it.
   static void stop() noexcept;
 
-  /// Runs the tasks that are queued now, without those that they queue in turn. Returns how many it has
-  /// run, which is 0 if a task of the main queue calls it, as an event loop inside a task would. Ends the
-  /// program if another thread than the main thread calls it.
+  /// Runs the tasks that are queued now, without those that they queue in turn. Returns how many it has run.
+  /// A call from a task of the main queue, such as an event loop inside a task, runs none and returns 0. Ends
+  /// the program if another thread than the main thread calls it.
   static std::size_t drain();
 
   /// Returns a descriptor for poll, select or epoll, which is readable while there are tasks to `drain`.

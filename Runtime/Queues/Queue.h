@@ -94,7 +94,7 @@ class RT_VISIBLE RT_CAPABILITY("queue") Queue : public Implements<Queue, Object>
   /// `task`. The main queue's tasks run on the main thread only, so any other thread waits for that thread.
   ///
   /// Ends the program if a task of this queue is running on the calling thread, directly or further up the
-  /// call stack: the call would wait for itself.
+  /// call stack. The call would wait for itself.
   template <std::invocable Task>
   std::invoke_result_t<Task> sync(Task&& task) RT_EXCLUDES(this) {
     using Result = std::invoke_result_t<Task>;

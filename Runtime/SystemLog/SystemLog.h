@@ -22,7 +22,7 @@
 /// other entry was taken during such a wait, later calls do not wait any more. They drop their entries at
 /// once, until the daemon takes one again.
 ///
-/// Dropped entries are counted. The next entry that can be written is preceded by a report: an error entry of
+/// Dropped entries are counted. A report precedes the next entry that can be written. It is an error entry of
 /// the subsystem "rt" with the number in the field DROPPED. `exit` tries once more to report a number that is
 /// left. If that fails, it writes the report to standard error.
 ///

@@ -143,8 +143,8 @@ class ServicesTest : public testing::Test {
   }
   ~ServicesTest() override { SRLRegistry::setSharedInstance(before_); }
 
-  /// Returns the texts that were reported since the last call. Expects that each is a fault of this operation
-  /// of the registry, and that its text is the format with the parameters filled in, in order.
+  /// Returns the texts that were reported since the last call. Expects each to be a fault of this operation
+  /// of the registry, with the text of the format and its parameters in order.
   std::vector<std::string> reportsOf(const std::string& function) {
     std::vector<std::string> texts;
     for (const rt::Ref<LUMLogMessage>& message : reports.messages()) {

@@ -88,9 +88,9 @@ class PropertyList {
   /// is no such key, or if the value at `dictionary` is not a dictionary.
   std::optional<Index> find(Index dictionary, std::string_view key) const noexcept;
 
-  /// Reads `bytes`. Throws MalformedPropertyList if they are not a whole property list, if a collection
-  /// contains itself, is nested deeper than `kMaximumDepth` or has a key twice, and if there is a null,
-  /// which no writer puts in a property list.
+  /// Reads `bytes`. Throws MalformedPropertyList if they are not a whole property list. It also does so if a
+  /// collection contains itself, is nested deeper than `kMaximumDepth` or has a key twice. It refuses a null
+  /// as well, which no writer puts in a property list.
   static PropertyList decoded(std::span<const std::byte> bytes);
 
   /// Returns the property list as bytes. The same values in the same order give the same bytes. Throws

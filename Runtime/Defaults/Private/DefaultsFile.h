@@ -38,9 +38,9 @@ class DefaultsFile {
 
   const std::string& path() const noexcept { return path_; }
 
-  /// Returns the present version. If the last change is so recent that the next one might get the same time
-  /// from the file system's clock, the version differs from all others. The same holds if the system does
-  /// not tell the version.
+  /// Returns the present version. A change soon after the last one might get the same time from the file
+  /// system's clock. So a version of a recent change differs from all others. The same holds if the system
+  /// does not tell the version.
   Version version() const noexcept;
 
   /// Returns whether the file still has `version`, as far as the system shows.

@@ -10,8 +10,8 @@
 
 namespace rt::detail {
 
-/// Watches one path from its construction on: the file at the path, a file that appears there, and the file
-/// that a symbolic link there leads to. On Linux a write counts when the writer closes the file. Folders
+/// Watches one path from its construction on. It sees the file at the path, a file that appears there, and
+/// the target of a symbolic link. On Linux a write counts when the writer closes the file. Folders
 /// above the file's own are watched only while the file's own folder cannot be watched.
 class SystemFileWatch {
  public:

@@ -43,8 +43,8 @@ namespace rt::CallStack {
 ///     | 0   mount-point                         0x000055d0c0de1234 main + 52
 ///
 /// C++ names are demangled. Functions that an image does not export are looked up in the symbol table of its
-/// file, if the file still is the one that was loaded. "???" stands for an unknown image. If the function is
-/// unknown, as in a stripped image, the line has the image's start and the distance from it. Throws
+/// file. The file must still be the one that was loaded. "???" stands for an unknown image. If the function
+/// is unknown, as in a stripped image, the line has the image's start and the distance from it. Throws
 /// std::bad_alloc.
 std::vector<String> symbols(std::span<const std::uint64_t> addresses);
 

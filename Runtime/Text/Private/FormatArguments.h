@@ -1,7 +1,7 @@
 #pragma once
 
-/// Says how each C++ type is passed as an argument of a format to a C function with variable arguments, and
-/// which kind of argument it is there.
+/// Says how each C++ type is passed to a C function with variable arguments, and which kind of argument it is
+/// there.
 ///
 ///     template <class... Arguments>
 ///     void record(const char* format, const Arguments&... arguments) {

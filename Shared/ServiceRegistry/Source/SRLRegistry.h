@@ -200,9 +200,9 @@ class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
   /// removes the implementation of a single-bound API. Ends the program if the caller does not hold the lock.
   void registerBindings(const _SRLBindingRegistrationData& binding) RT_REQUIRES(lock_);
 
-  /// Binds `implementation` to `api`. Errors: does nothing but report if either is null, if the
-  /// implementation's class is not of the API's type, if the implementation has a scope that the API does not
-  /// have, and what the two operations below report.
+  /// Binds `implementation` to `api`. Errors: only reports if either is null, if the implementation's class
+  /// is not of the API's type, or if the implementation has a scope that the API lacks. The two operations
+  /// below report more.
   void internalRegisterServiceAPI(const SRLAPIRegistrationData* api,
                                   const rt::Ref<SRLImplementation>& implementation) RT_REQUIRES(lock_);
 

@@ -138,8 +138,8 @@ rt::Ref<rt::Object> SRLRegistry::instanceOf(SRLImplementation& implementation,
   return implementation.factoryBlock().callKept(tags, &instanceCreated);
 }
 
-// For a request: an instance that is there already; or else the implementation, and the scope that is to keep
-// its instance, if that is a scope of this registry.
+// The result of a search: an existing instance, or else the implementation. `scope` is the scope of this
+// registry that is to keep the instance, if any.
 struct SRLRegistry::Found {
   rt::Ref<rt::Object> instance;
   rt::Ref<SRLImplementation> implementation;

@@ -100,8 +100,8 @@ std::optional<SymbolTables::Symbol> SymbolTables::find(std::uint64_t address) {
     }
     if (!contains) return 0;
     found.start = found.bias + lowest;
-    // Copies here, while the image cannot be unloaded. No exception may pass through the C library: it loads
-    // what it needs for that at the first exception, and ends the program if it has no memory.
+    // Copies here, while the image cannot be unloaded. No exception may pass through the C library. At the
+    // first one it loads the unwinder, and without memory it ends the program.
     try {
       found.path = info->dlpi_name;
       found.headers.assign(headers.begin(), headers.end());

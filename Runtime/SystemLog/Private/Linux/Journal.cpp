@@ -20,9 +20,8 @@ namespace {
 
 constinit LogSocket journal("/run/systemd/journal/socket");
 
-// The fields of an entry in the journal's format. A field is "NAME=value" and a line feed. If the value
-// contains a line feed, the field is NAME, a line feed, the value's length in 8 bytes, the value, and a line
-// feed.
+// The fields of an entry in the journal's format. A field is "NAME=value" and a line feed. A value with a
+// line feed is written as NAME, a line feed, its length in 8 bytes, the value, and a line feed.
 //
 // Short values are copied into one buffer, so that most entries are one piece. Long values are not copied:
 // they must outlive this object.

@@ -1,6 +1,6 @@
 #pragma once
 
-/// The front door of the older logger: lines of text by a formatter, through a filter, to a writer.
+/// The front door of the older logger. A formatter makes a line, a filter decides on it, a writer writes it.
 ///
 ///     #include "Foundation/OlderLogger.h"
 ///
@@ -8,9 +8,10 @@
 ///
 ///     ZEBLogger::sharedLogger()->logError("%d files left"_s, 3);
 ///
-/// It includes every public header of the library. To parse less, include single headers instead.
+/// It includes every public header of the library, and those of the runtime that its interface needs. To
+/// parse less, include single headers instead.
 ///
-/// Not for: new code, which logs by Shared/Logging/Logging.h.
+/// Not for: new code, which includes Shared/Logging/Logging.h.
 
 // IWYU pragma: begin_exports
 #include "Foundation/ZEBArrayCompositeLogWriter.h"

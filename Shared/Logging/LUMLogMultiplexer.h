@@ -19,7 +19,8 @@
 /// time, also by a logger. A message goes to those that were present when it was logged. A new multiplexer
 /// has one synchronous logger: a LUMSystemLogger with a LUMDefaultMinimumLogLevelFilter.
 ///
-/// Threads: any thread may use it. Filters and loggers run without a lock held.
+/// Threads: any thread may use it. It holds no lock while filters and loggers run. The code that logs may
+/// hold one: a service registry logs some reports with its lock held.
 ///
 /// Errors: the effect depends on the source of the exception.
 ///

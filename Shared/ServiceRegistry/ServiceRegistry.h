@@ -4,11 +4,11 @@
 ///
 ///     #include "Shared/ServiceRegistry/ServiceRegistry.h"
 ///
-///     rt::Ref<rt::Object> clock = SRLRegistry::sharedInstance()->internalService(&clockAPI,
-///     SRLScopeTagSet{});
+///     const SRLScopeTagSet noTags{};
+///     rt::Ref<rt::Object> clock = SRLRegistry::sharedInstance()->internalService(&clockAPI, noTags);
 ///
-/// It includes every public header of the library, and those of the runtime and of archives that its
-/// interface needs. To parse less, include single headers instead.
+/// It includes every public header of the library, and those of the runtime that its interface needs. To
+/// parse less, include single headers instead.
 ///
 /// Not for: the headers of this project, which include what they use.
 

@@ -25,8 +25,8 @@
 ///     | while an implementation that was bound by hand is replaced,
 ///     | and during some reports.
 ///
-/// Code that runs then must not call the registry: that ends the program. Error callbacks, log filters and
-/// loggers must never call a registry.
+/// Code that the registry calls while it holds the lock must not call the registry: that ends the program.
+/// Error callbacks, log filters and loggers must never call a registry.
 ///
 /// Errors: misuse is reported (PECErrorHandler.h), and the operation returns null, false or nothing.
 /// Exceptions from error callbacks, factories, generated functions, the delegate, tags and instance types
@@ -34,8 +34,8 @@
 ///
 ///     | Some bindings of an API that was being registered may be missing. After std::bad_alloc, the next
 ///     | request registers all of them again.
-///     | If the factory of an instance in a scope has thrown, that instance stays pending until the scope
-///     ends. | Threads that wait for it, and later requests for it, get a report and null.
+///     | If a factory has thrown, its instance stays pending until the scope ends. Threads that
+///     | wait for the instance, and later requests for it, get a report and null.
 ///
 /// Not for: dependencies that a constructor argument can carry.
 
@@ -105,12 +105,14 @@ class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
   /// @{
 
   /// Returns an instance of the implementation that is bound to `api`, for the scope given by `scopeTags`.
-  /// Precondition: `api` is not null. Errors: reports an API without a binding, and a factory that returns
-  /// null; both return null.
+  /// Precondition: `api` is not null. Errors: reports an API without a binding, a request made before modules
+  /// are registered, a factory that returns null, and an instance whose factory has thrown. All return null.
+  /// Reports a wrong number of tags; the factory then gets none.
   rt::Ref<rt::Object> internalService(const SRLAPIRegistrationData* api, const SRLScopeTagSet& scopeTags);
 
-  /// Like `internalService`, but the API may have no implementation, and its factory may return null. Errors:
-  /// reports only a request made while modules are being registered.
+  /// Like `internalService`, but the API may have no implementation, and its factory may return null. Neither
+  /// is reported. Errors: reports a request made while modules are being registered. Also reports a wrong
+  /// number of tags, and an instance whose factory has thrown.
   rt::Ref<rt::Object> internalOptionalService(const SRLAPIRegistrationData* api,
                                               const SRLScopeTagSet& scopeTags);
 
@@ -224,9 +226,9 @@ class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
 
   /// @}
 
-  /// Releases bindings and scopes on the main thread: at once there, and by the main queue from other
-  /// threads. Without memory for a task they are released on the calling thread. Configurations are released
-  /// at once, on the calling thread.
+  /// Releases bindings and scopes on the main thread. On another thread, it queues a task of the main queue
+  /// for that. Without memory for the task, it releases them on the calling thread. It releases
+  /// configurations at once, on the calling thread.
   ~SRLRegistry() override;
 
  protected:

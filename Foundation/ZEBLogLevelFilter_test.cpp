@@ -113,12 +113,13 @@ TEST_F(ZEBLogLevelFilterTest, FollowsTheUserDefaultFromAttachmentToDetachment) {
   EXPECT_TRUE(filter->verboseLoggingEnabled());
   privateDefaults.change(kSetting, "NO");
   EXPECT_FALSE(filter->verboseLoggingEnabled());
-  privateDefaults.change("another key", "YES");
+  // The file has both settings then. Another key does not matter.
+  privateDefaults.change("another key", "YES", {{kSetting, "NO"}});
   EXPECT_FALSE(filter->verboseLoggingEnabled());
   privateDefaults.change(kSetting, "YES");
   EXPECT_TRUE(filter->verboseLoggingEnabled());
   filter->willDetachFromLogger();
-  // Nobody tells it any more.
+  // The filter no longer hears of changes.
   privateDefaults.change(kSetting, "NO");
   EXPECT_TRUE(filter->verboseLoggingEnabled());
   filter->didAttachToLogger();

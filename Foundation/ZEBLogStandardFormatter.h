@@ -8,8 +8,8 @@
 ///
 ///     | 2026-11-21 08:04:20.123 importer[4711/0x7f3a5c0e2740] [lvl=3] main() 3 left
 ///
-/// The time is local time (Runtime/Text/Private/LocalTimeFormatter.h), and the thread is given by its handle.
-/// The process is the one that made the formatter, even in the child of a fork.
+/// The time is local time, and the thread is given by its handle. The process is the one that made the
+/// formatter, even in the child of a fork.
 ///
 /// Threads: thread-safe.
 

@@ -27,8 +27,8 @@
 ///
 /// Threads: one thread at a time may use an unarchiver.
 ///
-/// Not for: archives of other programs, whose classes this program does not know.
-/// Runtime/Archive/Private/PropertyList.h reads those.
+/// Not for: archives of other programs, whose classes this program does not know. An archive with dates, data
+/// or short real numbers is malformed, since KeyedArchiver writes none.
 
 #include <cstddef>
 #include <cstdint>

@@ -10,8 +10,7 @@
 ///         "ZEBVerboseLogging", rt::UserDefaults::Notify::kAlsoNow,
 ///         [weak = rt::Weak<Account>(account)] { if (auto account = weak.lock()) account->readAgain(); });
 ///
-/// The settings are in a text file with one `key = value` a line (Runtime/Defaults/Private/DefaultsText.h).
-/// People may edit it at any time:
+/// The settings are in a text file. People may edit it at any time:
 ///
 ///     | $XDG_CONFIG_HOME/APPLICATION/defaults.conf, or ~/.config/... if that variable is not set
 ///     | ~/Library/Application Support/APPLICATION/defaults.conf on macOS
@@ -19,6 +18,21 @@
 /// APPLICATION is the main bundle's identifier, or the process's name if there is no identifier. To change
 /// a setting from a program, write a file beside `defaults.conf` and rename it. No reader sees half a file
 /// then.
+///
+/// The file has one setting a line:
+///
+///     | # Written by the operator on call.
+///     | ZEBVerboseLogging = YES
+///     | greeting = "  two blanks before, one line\n after"   # a remark
+///
+/// A line is blank, a remark that begins with `#`, or `key = value`. A value ends before a `#` or at the
+/// end of the line. Blanks around keys and values do not count. A value may be empty.
+///
+/// Keys and values may be in double quotes. Between these, \" \\ \n \r \t and \uXXXX (four hexadecimal
+/// digits) stand for a character. Quotes are needed for a `#`, for a `=` in a key, and for blanks at an
+/// end.
+///
+/// The text is UTF-8 of at most 1 MiB. Lines end with LF or CR LF. No key comes twice.
 ///
 /// Each read returns what is in the file at that moment. It asks the system whether the file has changed,
 /// which takes about a microsecond, and reads the file only if it has. If there is no file, there are no

@@ -9,8 +9,8 @@
 ///     }
 ///
 /// The lock is free again after as many calls of `unlock` as of `lock`. Unlocking a lock that the caller does
-/// not hold ends the program with a line on standard error. Otherwise it behaves like a `LongLock`
-/// (Runtime/Locks/Private/LongLock.h), also when the process forks.
+/// not hold ends the program with a line on standard error. It may be held while callbacks run or a system
+/// call waits, also when the process forks.
 ///
 /// Not for: code that can take its lock once. clang's annotations check one function at a time. So a function
 /// that itself takes the lock twice does not compile with clang.

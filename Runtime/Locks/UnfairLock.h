@@ -33,10 +33,9 @@
 /// A fork waits for about a second at most. A lock that is still held then is free in the child. Its data is
 /// as the holder left it. (On macOS the lock stays held.)
 ///
-/// Not for: sections that take long, such as blocking system calls and callbacks
-/// (Runtime/Locks/Private/LongLock.h); locks that a thread takes again while it holds them
-/// (Runtime/Locks/RecursiveLock.h); waiting for a condition, for which a queue is better
-/// (Runtime/Queues/Queue.h).
+/// Not for: sections that take long, such as blocking system calls and callbacks; locks that a thread takes
+/// again while it holds them. Use Runtime/Locks/RecursiveLock.h for both. To wait for a condition, use a
+/// queue (Runtime/Queues/Queue.h).
 
 #include "Runtime/Base/ThreadSafety.h"
 #include "Runtime/Locks/Private/ForkGate.h"

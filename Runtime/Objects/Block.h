@@ -26,7 +26,6 @@
 #include <cstddef>
 #include <string_view>
 #include <type_traits>
-#include <typeinfo>
 #include <utility>
 
 #include "Runtime/Base/Visibility.h"
@@ -52,11 +51,17 @@ template <class Result, class... Arguments>
 class BlockBody : public BlockObject {
  public:
   virtual Result call(Arguments... arguments) const = 0;
+  // Identifies the type of a captured function object. Not typeid: hosts may be compiled without it.
+  virtual const void* functionType() const noexcept { return nullptr; }
 
  protected:
   using BlockObject::BlockObject;
   constexpr BlockBody() noexcept = default;
 };
+
+// Has one address for each type of function object.
+template <class Function>
+inline constexpr char kFunctionType = 0;
 
 // A block with a function object of its own.
 template <class Function, class Result, class... Arguments>
@@ -69,6 +74,7 @@ class CapturingBlock final : public BlockBody<Result, Arguments...> {
     return static_cast<Result>(function_(std::forward<Arguments>(arguments)...));
   }
 
+  const void* functionType() const noexcept override { return &kFunctionType<Function>; }
   const Function& function() const noexcept { return function_; }
 
  private:
@@ -146,12 +152,13 @@ class Block<Result(Arguments...)> {
     return body_->call(std::forward<Arguments>(arguments)...);
   }
 
-  /// The callable object that the block was made from, if it is a `Function` with state; null otherwise, and
-  /// for null. The block owns it.
+  /// Returns the callable object that the block was made from, if it is a `Function` with state. Null
+  /// otherwise, for a null block, and if another shared library that hides its symbols made the block.
+  /// Ownership: the block's.
   template <class Function>
   const Function* target() const noexcept {
     using Made = detail::CapturingBlock<Function, Result, Arguments...>;
-    if (!body_ || typeid(*body_) != typeid(Made)) return nullptr;
+    if (!body_ || body_->functionType() != &detail::kFunctionType<Function>) return nullptr;
     return &static_cast<const Made&>(*body_).function();
   }
 

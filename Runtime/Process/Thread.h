@@ -6,8 +6,7 @@
 ///     rt::Thread::currentName();        // "Importer"
 ///     rt::Thread::currentHandle();      // as "%p" prints it
 ///
-/// Not for: starting threads (std::thread); telling threads apart quickly
-/// (Runtime/Locks/Private/ThreadIdentifier.h).
+/// Not for: starting threads (std::thread); telling threads apart quickly (std::this_thread::get_id).
 
 #include "Runtime/Objects/String.h"
 

@@ -12,7 +12,7 @@
 ///
 /// A key is a string, a number, or any object whose `isEqual` and `hash` never change. No key and no value is
 /// null. Two dictionaries are equal if they have equal values for equal keys. The order of iteration is
-/// unspecified. Runtime/Values/Private/CollectionDescription.h defines the description.
+/// unspecified. Runtime/Values/Array.h has the layout of the description.
 ///
 /// Ownership: a dictionary retains its keys and values.
 /// Threads: thread-safe if the keys and values are.

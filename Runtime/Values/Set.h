@@ -11,7 +11,7 @@
 ///
 /// No two elements are equal, and no element is null. Their `isEqual` and `hash` must never change. Two sets
 /// are equal if they have equal elements. The order of iteration is unspecified.
-/// Runtime/Values/Private/CollectionDescription.h defines the description.
+/// Runtime/Values/Array.h has the layout of the description.
 ///
 /// Ownership: a set retains its elements.
 /// Threads: thread-safe if the elements are.

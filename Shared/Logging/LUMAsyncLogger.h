@@ -27,11 +27,8 @@
 
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Ref.h"
+#include "Runtime/Queues/Queue.h"
 #include "Shared/Logging/LUMLogger.h"
-
-namespace rt {
-class Queue;
-}
 
 /// How a LUMAsyncLogger wants to be called with a message.
 using LUMLogDispatchMode = std::uint32_t;

@@ -7,7 +7,7 @@
 ///       send(addresses->frameCount());
 ///     }
 ///
-/// Not for: a call stack without a message (Runtime/Process/Private/CallStack.h).
+/// Not for: a call stack without a message.
 
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Class.h"

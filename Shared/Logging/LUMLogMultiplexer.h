@@ -45,13 +45,10 @@
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Private/AtomicRef.h"
 #include "Runtime/Objects/Ref.h"
+#include "Runtime/Queues/Queue.h"
 #include "Shared/Logging/LUMLogAppControl.h"
 #include "Shared/Logging/LUMLogMultiplexing.h"
 #include "Shared/Logging/LUMSystemLogger.h"
-
-namespace rt {
-class Queue;
-}
 
 class RT_VISIBLE LUMLogMultiplexer
     : public rt::Implements<LUMLogMultiplexer, rt::Object, LUMLogAppControl, LUMLogMultiplexing> {

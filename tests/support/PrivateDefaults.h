@@ -5,6 +5,7 @@
 #include <cstdlib>
 #include <filesystem>
 #include <fstream>
+#include <map>
 #include <semaphore>
 #include <stdexcept>
 #include <string>
@@ -47,14 +48,17 @@ class PrivateDefaults {
     return folder_ / std::filesystem::read_symlink("/proc/self/exe").filename() / "defaults.conf";
   }
 
-  /// Has the file say `value` for `key`, which it does not yet, and nothing else. Returns when all that
-  /// observe the key have been told.
-  void change(const std::string& key, const std::string& value) const {
-    // Observers are called in their order: when this one is, all others have been.
+  /// Gives the file the setting `key` with `value`, which it does not have yet, and `others`. No other
+  /// settings are left. Returns when all observers of the key have been called.
+  void change(const std::string& key, const std::string& value,
+              const std::map<std::string, std::string>& others = {}) const {
+    // Observers are called in order. When this one is called, all others have been.
     std::counting_semaphore<> told{0};
     const auto observation = rt::UserDefaults::standardUserDefaults()->observe(
         key, rt::UserDefaults::Notify::kOnChange, [&] { told.release(); });
-    SettingsFile(file()).set(key, value);
+    SettingsFile settings(file());
+    for (const auto& [otherKey, otherValue] : others) settings.set(otherKey, otherValue);
+    settings.set(key, value);
     told.acquire();
   }
 

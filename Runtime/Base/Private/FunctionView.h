@@ -7,8 +7,9 @@
 ///     std::vector<std::string_view> lines;
 ///     forEachLine("one\ntwo", [&](std::string_view line) { lines.push_back(line); });
 ///
-/// What it refers to must outlive it. It is as safe to copy as a pointer, and calls from several threads are
-/// as safe as those of what it refers to.
+/// The function must outlive the view. Copying a view is like copying a pointer.
+///
+/// Threads: several threads may call a view at the same time if they may call its function at the same time.
 ///
 /// Not for: functions that are kept beyond a call (Runtime/Objects/Block.h).
 

@@ -9,14 +9,7 @@
 ///     rt::DefaultsText text = rt::DefaultsText::parsed(content);      // throws MalformedDefaults
 ///     text.find("ZEBVerboseLogging");                                 // "YES"
 ///
-/// A line is blank, a remark that begins with `#`, or `key = value`. A value ends before a `#` or at the
-/// end of the line. Blanks around keys and values do not count. A value may be empty.
-///
-/// Keys and values may be in double quotes. Between these, \" \\ \n \r \t and \uXXXX (four hexadecimal
-/// digits) stand for a character. Quotes are needed for a `#`, for a `=` in a key, and for blanks at an
-/// end.
-///
-/// The text is UTF-8 of at most 1 MiB. Lines end with LF or CR LF. No key comes twice.
+/// Runtime/Defaults/UserDefaults.h has the rules.
 ///
 /// Threads: as safe as a std::map.
 ///

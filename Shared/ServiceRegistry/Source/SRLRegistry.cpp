@@ -97,7 +97,7 @@ rt::Ref<SRLRegistry> SRLRegistry::sharedInstance() {
   if (!isSharedInstanceMade) [[unlikely]] {
     const rt::Ref<SRLRegistry> made = initPrivate();
     made->retain();
-    made->unguarded().isShared.store(true, std::memory_order_relaxed);
+    made->isShared_.store(true, std::memory_order_relaxed);
     sharedRegistry = made.get();
     isSharedInstanceMade = true;
   }
@@ -108,8 +108,8 @@ rt::Ref<SRLRegistry> SRLRegistry::setSharedInstance(const rt::Ref<SRLRegistry>& 
   if (registry) registry->retain();
   const rt::LockGuard guard(sharedInstanceLock);
   isSharedInstanceMade = true;
-  if (sharedRegistry != nullptr) sharedRegistry->unguarded().isShared.store(false, std::memory_order_relaxed);
-  if (registry) registry->unguarded().isShared.store(true, std::memory_order_relaxed);
+  if (sharedRegistry != nullptr) sharedRegistry->isShared_.store(false, std::memory_order_relaxed);
+  if (registry) registry->isShared_.store(true, std::memory_order_relaxed);
   return rt::Ref<SRLRegistry>::adopt(std::exchange(sharedRegistry, registry.get()));
 }
 
@@ -118,10 +118,15 @@ rt::Ref<SRLRegistry> SRLRegistry::initPrivate() {
   return rt::Ref<SRLRegistry>::adopt(new SRLRegistry(std::make_unique_for_overwrite<SRLRegistryIvars>()));
 }
 
-SRLRegistry::SRLRegistry(std::unique_ptr<SRLRegistryIvars> ivars) : ivars_(std::move(ivars)) {}
+SRLRegistry::SRLRegistry(std::unique_ptr<SRLRegistryIvars> ivars)
+    : ivars_(std::move(ivars)), lock_(&unguarded().lock), configScope_(SRLMemoizingScope::init()) {}
+
+// The only way to the state around the analysis.
+SRLRegistryUnguardedIvars& SRLRegistry::unguarded() const noexcept RT_NO_THREAD_SAFETY_ANALYSIS {
+  return *ivars_;
+}
 
 SRLRegistry::~SRLRegistry() {
-  unguarded().configScope = nullptr;
   if (rt::isMainThread()) return;
   try {
     rt::Queue::main()->async([ivars = std::move(ivars_)] {});
@@ -130,12 +135,8 @@ SRLRegistry::~SRLRegistry() {
   }
 }
 
-const rt::Ref<SRLMemoizingScope>& SRLRegistry::configScope() const noexcept {
-  return unguarded().configScope;
-}
-
 rt::Ref<SRLRegistry> SRLRegistry::mutableCopy() const {
-  const rt::LockGuard guard(lock_);
+  const rt::LockGuard guard(*lock_);
   return rt::Ref<SRLRegistry>::adopt(new SRLRegistry(std::make_unique<SRLRegistryIvars>(*ivars_)));
 }
 
@@ -143,7 +144,7 @@ rt::String SRLRegistry::description() const {
   rt::Dictionary::Builder singles;
   rt::Dictionary::Builder multis;
   {
-    const rt::LockGuard guard(lock_);
+    const rt::LockGuard guard(*lock_);
     for (const auto& [api, implementation] : ivars_->singleBindings.entries()) {
       singles.set(SRLAPIIdentifier(api), implementation);
     }
@@ -157,7 +158,7 @@ rt::String SRLRegistry::description() const {
 }
 
 void SRLRegistry::internalRegisterBindings(std::span<const SRLBindingsModuleData* const> modules) {
-  SRLRegistryIvars& ivars = unguarded();
+  SRLRegistryUnguardedIvars& ivars = unguarded();
   if (ivars.bindingsState != SRLBindingsState::kNone) {
     SRLReportFatal({kFile, "-[SRLRegistry internalRegisterBindings:]"},
                    "Trying to register bindings module data twice. This is likely caused by loading multiple "
@@ -221,7 +222,7 @@ std::vector<const _SRLBindingRegistrationData*> SRLRegistry::registrationDatasFo
 }
 
 void SRLRegistry::registerBindings(const _SRLBindingRegistrationData& binding) {
-  lock_.assertOwner();
+  lock_->assertOwner();
   const SRLAPIRegistrationData* api = binding.api;
   if (*binding.implementations == nullptr) {
     if (api->isMultibound == 0) {
@@ -329,7 +330,7 @@ rt::Ref<rt::Object> SRLRegistry::internalImplementationConfigForIdentifier(const
 }
 
 const SRLAPIRegistrationData* SRLRegistry::apiIdentifierForProtocol(const rt::ProtocolInfo* protocol) const {
-  lock_.assertOwner();
+  lock_->assertOwner();
   if (protocol == nullptr) return nullptr;
   for (const SRLBindingsModuleData* module : ivars_->bindingsModules) {
     for (const _SRLBindingRegistrationData& binding : module->bindings()) {
@@ -353,7 +354,7 @@ const SRLAPIRegistrationData* SRLRegistry::apiIdentifierFromString(
   const std::string_view identifier = apiIdentifierString.view();
   const auto& apisByIdentifier = unguarded().apisByIdentifier;
   if (const auto* known = apisByIdentifier.find(identifier)) return known->second;
-  const rt::LockGuard guard(lock_);
+  const rt::LockGuard guard(*lock_);
   for (const SRLBindingsModuleData* module : ivars_->bindingsModules) {
     for (const _SRLBindingRegistrationData& binding : module->bindings()) {
       const std::string_view bytes = SRLIdentifierBytes(*binding.api);
@@ -367,7 +368,7 @@ const SRLAPIRegistrationData* SRLRegistry::apiIdentifierFromString(
 
 rt::Ref<rt::Set> SRLRegistry::registeredAPIIdentifiers() const {
   rt::Set::Builder identifiers;
-  const rt::LockGuard guard(lock_);
+  const rt::LockGuard guard(*lock_);
   for (const SRLBindingsModuleData* module : ivars_->bindingsModules) {
     for (const _SRLBindingRegistrationData& binding : module->bindings()) {
       identifiers.add(SRLAPIIdentifier(binding.api).object());

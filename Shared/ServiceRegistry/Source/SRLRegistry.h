@@ -39,32 +39,34 @@
 ///
 /// Not for: dependencies that a constructor argument can carry.
 
+#include <atomic>
 #include <cstdint>
 #include <memory>
 #include <span>
 #include <vector>
 
 #include "Runtime/Base/Visibility.h"
+#include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
+#include "Runtime/Objects/Weak.h"
+#include "Runtime/Values/Array.h"
+#include "Runtime/Values/Set.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLFactoryBlock.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLRegistrationData.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSet.h"
+#include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSetCodableWrapper.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeType.h"
+#include "Shared/ServiceRegistry/Source/SRLScopeLifecycleDelegate.h"
 #include "Shared/ServiceRegistry/Source/SRLUnfairLock.h"
-
-namespace rt {
-class Set;
-}
 
 class SRLImplementation;
 class SRLMemoizingScope;
-class SRLScopeTagSetCodableWrapper;
 struct SRLBindingsModuleData;
 struct SRLRegistryIvars;
-struct SRLScopeLifecycleDelegate;
+struct SRLRegistryUnguardedIvars;
 
 class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
  public:
@@ -141,12 +143,19 @@ class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
   /// factory for it.
   rt::Ref<rt::Object> internalImplementationConfigForIdentifier(const void* identifier);
 
+  /// Returns whether every module allows other modules beside it. The first answer, of any registry, is kept
+  /// for the process.
+  bool multipleBindingsModulesAllowed() const;
+
+  /// Returns the lock. It lives as long as the registry. The operations of the last group need it.
+  SRLUnfairLock* lock() const noexcept RT_RETURN_CAPABILITY(*lock_) { return lock_; }
+
   /// Returns the scope with these tags, and opens it if there is none. A set without tags is a scope, too.
-  /// What a scope can do is declared in Private/SRLMemoizingScope.h.
+  /// To use the result, include ServiceRegistry.h, which declares SRLMemoizingScope.
   rt::Ref<SRLMemoizingScope> scopeWithTags(const SRLScopeTagSet& tags);
 
   /// Returns the scope of the registry's configurations. It never ends.
-  const rt::Ref<SRLMemoizingScope>& configScope() const noexcept;
+  const rt::Ref<SRLMemoizingScope>& configScope() const noexcept { return configScope_; }
 
   /// Returns a block that makes instances with `factory`. The block passes on those tags of a request that
   /// belong to `implScope`, a subset of `apiScope`. With a `lifetime` of 1, it calls `factory` each time.
@@ -157,7 +166,7 @@ class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
                                         std::uint64_t lifetime);
 
   /// @}
-  /// @name For tools and tests, which may hold the lock
+  /// @name For tools and tests that hold the lock, and for the start of the program
   /// @{
 
   /// The load hook. It calls `initialize`.
@@ -173,56 +182,49 @@ class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
   /// program is loaded, before it has a second thread.
   void internalRegisterBindings(std::span<const SRLBindingsModuleData* const> modules);
 
-  /// Returns whether every module allows other modules beside it. The first answer, of any registry, is kept
-  /// for the process.
-  bool multipleBindingsModulesAllowed() const;
-
   /// Returns the API whose record has this identifier. Null if no module has one. Errors: reports null. The
   /// first search for an identifier looks at one binding after another and takes the lock: the program ends
   /// if the caller holds it.
   const SRLAPIRegistrationData* apiIdentifierFromString(const rt::String& apiIdentifierString) const;
 
-  /// Returns the lock. It lives as long as the registry. The caller must hold it for all operations below.
-  SRLUnfairLock* lock() const noexcept RT_RETURN_CAPABILITY(lock_) { return &lock_; }
-
   /// Returns the implementation that is bound to `api`, a single-bound API. Null if there is none. Errors:
   /// reports a null `api`.
   rt::Ref<SRLImplementation> implementationForSingleBoundService(const SRLAPIRegistrationData* api)
-      RT_REQUIRES(lock_);
+      RT_REQUIRES(*lock_);
 
   /// Registers all bindings of `api` in the modules. Returns whether a module has the API. Precondition:
   /// `api` is not null.
-  bool lazilyRegisterBindingsForAPI(const SRLAPIRegistrationData* api) RT_REQUIRES(lock_);
+  bool lazilyRegisterBindingsForAPI(const SRLAPIRegistrationData* api) RT_REQUIRES(*lock_);
 
   /// Returns each module's binding whose API has the identifier of `api`. Precondition: `api` is not null.
   std::vector<const _SRLBindingRegistrationData*> registrationDatasForAPI(
-      const SRLAPIRegistrationData* api) const RT_REQUIRES(lock_);
+      const SRLAPIRegistrationData* api) const RT_REQUIRES(*lock_);
 
   /// Registers the implementations of `binding`. A binding without implementations makes the API known, and
   /// removes the implementation of a single-bound API. Ends the program if the caller does not hold the lock.
-  void registerBindings(const _SRLBindingRegistrationData& binding) RT_REQUIRES(lock_);
+  void registerBindings(const _SRLBindingRegistrationData& binding) RT_REQUIRES(*lock_);
 
   /// Binds `implementation` to `api`. Errors: only reports if either is null, if the implementation's class
   /// is not of the API's type, or if the implementation has a scope that the API lacks. The two operations
   /// below report more.
   void internalRegisterServiceAPI(const SRLAPIRegistrationData* api,
-                                  const rt::Ref<SRLImplementation>& implementation) RT_REQUIRES(lock_);
+                                  const rt::Ref<SRLImplementation>& implementation) RT_REQUIRES(*lock_);
 
   /// Binds `implementation`, not null, to a single-bound API. Errors: does nothing but report if the API is
   /// multi-bound, or if it has an implementation and `allowOverridingExistingBinding` is false.
   void internalRegisterImplementation(const rt::Ref<SRLImplementation>& implementation,
                                       const SRLAPIRegistrationData* forSingleboundAPI,
-                                      bool allowOverridingExistingBinding) RT_REQUIRES(lock_);
+                                      bool allowOverridingExistingBinding) RT_REQUIRES(*lock_);
 
   /// Adds `implementation`, not null, to a multi-bound API, unless that has an equal one. Errors: does
   /// nothing but report if the API is single-bound.
   void internalRegisterImplementation(const rt::Ref<SRLImplementation>& implementation,
-                                      const SRLAPIRegistrationData* forMultiboundAPI) RT_REQUIRES(lock_);
+                                      const SRLAPIRegistrationData* forMultiboundAPI) RT_REQUIRES(*lock_);
 
   /// Returns the API whose type is the name of `protocol` and no class. Null if no module has one. Looks at
   /// one binding after another. Ends the program if the caller does not hold the lock.
   const SRLAPIRegistrationData* apiIdentifierForProtocol(const rt::ProtocolInfo* protocol) const
-      RT_REQUIRES(lock_);
+      RT_REQUIRES(*lock_);
 
   /// @}
 
@@ -238,34 +240,39 @@ class RT_VISIBLE SRLRegistry : public rt::Implements<SRLRegistry, rt::Object> {
   struct Found;
 
   // Searches for an instance that a scope keeps already, and else for the implementation that makes it.
-  Found find(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) RT_REQUIRES(lock_);
+  Found find(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) RT_REQUIRES(*lock_);
 
   // Returns the table's entry for a single-bound API, whose implementation may be null. Null if no module has
   // the API. Reports a null API.
-  const rt::Ref<SRLImplementation>* boundTo(const SRLAPIRegistrationData* api) RT_REQUIRES(lock_);
+  const rt::Ref<SRLImplementation>* boundTo(const SRLAPIRegistrationData* api) RT_REQUIRES(*lock_);
   // Does this for an API that is not in the table yet.
-  const rt::Ref<SRLImplementation>* newlyBound(const SRLAPIRegistrationData* api) RT_REQUIRES(lock_);
+  const rt::Ref<SRLImplementation>* newlyBound(const SRLAPIRegistrationData* api) RT_REQUIRES(*lock_);
 
   // Calls `lazilyRegisterBindingsForAPI`, and remembers an API that no module has.
-  bool registersBindingsFor(const SRLAPIRegistrationData* api) RT_REQUIRES(lock_);
+  bool registersBindingsFor(const SRLAPIRegistrationData* api) RT_REQUIRES(*lock_);
 
-  SRLMemoizingScope& openScope(const SRLScopeTagSet& tags) RT_REQUIRES(lock_);
-  SRLMemoizingScope& newScope(const SRLScopeTagSet& tags) RT_REQUIRES(lock_);
+  SRLMemoizingScope& openScope(const SRLScopeTagSet& tags) RT_REQUIRES(*lock_);
+  SRLMemoizingScope& newScope(const SRLScopeTagSet& tags) RT_REQUIRES(*lock_);
 
   // Returns the instance that a scope of this registry keeps. If there is none, returns null and sets `scope`
   // to the scope that is to keep it, if any.
   rt::Ref<rt::Object> keptInstanceOf(const SRLImplementation& implementation, const SRLScopeTagSet& tags,
-                                     rt::Ref<SRLMemoizingScope>& scope) RT_REQUIRES(lock_);
+                                     rt::Ref<SRLMemoizingScope>& scope) RT_REQUIRES(*lock_);
 
   // Returns an instance, new or kept. Null if the factory returns null. The caller retains `implementation`.
   // `scope` is the scope that keeps the instance, if the caller knows it.
   static rt::Ref<rt::Object> instanceOf(SRLImplementation& implementation, const SRLAPIRegistrationData* api,
                                         const SRLScopeTagSet& tags, rt::Ref<SRLMemoizingScope> scope);
 
-  // The state that needs no lock: members that are written before the program has a second thread, and those
-  // with a lock of their own.
-  SRLRegistryIvars& unguarded() const noexcept RT_NO_THREAD_SAFETY_ANALYSIS { return *ivars_; }
+  // The state that may be used without the lock.
+  SRLRegistryUnguardedIvars& unguarded() const noexcept;
 
-  std::unique_ptr<SRLRegistryIvars> ivars_ RT_POINTER_GUARDED_BY(lock_);
-  mutable SRLUnfairLock lock_;
+  std::unique_ptr<SRLRegistryIvars> ivars_ RT_POINTER_GUARDED_BY(*lock_);
+  // In the ivars.
+  SRLUnfairLock* const lock_;
+  const rt::Ref<SRLMemoizingScope> configScope_;
+  // Written together with the shared registry itself.
+  std::atomic<bool> isShared_{false};
+  mutable rt::UnfairLock delegateLock_;
+  rt::Weak<SRLScopeLifecycleDelegate> scopeLifecycleDelegate_ RT_GUARDED_BY(delegateLock_);
 };

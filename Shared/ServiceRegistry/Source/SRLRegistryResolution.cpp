@@ -116,7 +116,7 @@ rt::Ref<rt::Object> SRLRegistry::keptInstanceOf(const SRLImplementation& impleme
                                                 rt::Ref<SRLMemoizingScope>& scope) {
   rt::Ref<rt::Object> instance;
   const SRLScopedFactory* scoped = implementation.scopedFactory();
-  if (scoped == nullptr || !ivars_->isShared.load(std::memory_order_relaxed)) return instance;
+  if (scoped == nullptr || !isShared_.load(std::memory_order_relaxed)) return instance;
   SRLScopeTagSet masked;
   if (const SRLScopeTagSet* scopeTags = scoped->scopeTags(tags, masked)) {
     SRLMemoizingScope& open = openScope(*scopeTags);
@@ -162,7 +162,7 @@ SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SR
                                                                   const SRLScopeTagSet& scopeTags) {
   constexpr const char* kFunction = "-[SRLRegistry internalService:scopeTags:]";
   Found found = [&] {
-    const rt::LockGuard guard(lock_);
+    const rt::LockGuard guard(*lock_);
     Found all = find(api, scopeTags);
     if (!all.instance && !all.implementation) [[unlikely]] {
       if (ivars_->bindingsState == SRLBindingsState::kRegistered) {
@@ -183,7 +183,7 @@ SRLRegistry::Found SRLRegistry::find(const SRLAPIRegistrationData* api, const SR
 [[gnu::flatten]] rt::Ref<rt::Object> SRLRegistry::internalOptionalService(const SRLAPIRegistrationData* api,
                                                                           const SRLScopeTagSet& scopeTags) {
   Found found = [&] {
-    const rt::LockGuard guard(lock_);
+    const rt::LockGuard guard(*lock_);
     Found all = find(api, scopeTags);
     if (!all.instance && !all.implementation && ivars_->bindingsState == SRLBindingsState::kInProgress)
       reportEarlyRequest("-[SRLRegistry internalOptionalService:scopeTags:]", api);
@@ -236,7 +236,7 @@ bool SRLRegistry::registersBindingsFor(const SRLAPIRegistrationData* api) {
   rt::Ref<SRLMemoizingScope> scope;
   decltype(implementations->begin()) next;
   {
-    const rt::LockGuard guard(lock_);
+    const rt::LockGuard guard(*lock_);
     if (const auto* known = ivars_->multiBindings.find(api)) {
       implementations = known->second;
     } else if (!ivars_->isUnknown(api) && registersBindingsFor(api)) {
@@ -276,7 +276,7 @@ bool SRLRegistry::internalHasImplementationForService(const SRLAPIRegistrationDa
               "|apiIdentifier| cannot be nil!"_s);
     return false;
   }
-  const rt::LockGuard guard(lock_);
+  const rt::LockGuard guard(*lock_);
   return implementationForSingleBoundService(api) != nullptr;
 }
 
@@ -333,7 +333,7 @@ bool SRLRegistry::eg_internalHasImplementationForService(const rt::String& ident
 }
 
 rt::Ref<SRLMemoizingScope> SRLRegistry::scopeWithTags(const SRLScopeTagSet& tags) {
-  const rt::LockGuard guard(lock_);
+  const rt::LockGuard guard(*lock_);
   return &openScope(tags);
 }
 
@@ -366,7 +366,7 @@ void SRLRegistry::removeScopesWithTag(const rt::Ref<rt::Object>& tag) {
       std::vector<SRLRegistryIvars::Scopes::Entries::node_type> entries;
     } removed;
     std::vector<SRLRegistryIvars::Scopes::Entries::const_iterator> entries;
-    const rt::LockGuard guard(lock_);
+    const rt::LockGuard guard(*lock_);
     const auto& scopes = ivars_->scopes.entries();
     for (auto entry = scopes.begin(); entry != scopes.end(); ++entry) {
       if (!SRLScopeTagSetContainsTag(entry->first.tags, keptTag.get())) continue;
@@ -384,16 +384,14 @@ void SRLRegistry::removeScopesWithTag(const rt::Ref<rt::Object>& tag) {
 }
 
 rt::Ref<SRLScopeLifecycleDelegate> SRLRegistry::scopeLifecycleDelegate() const {
-  SRLRegistryIvars& ivars = unguarded();
-  const rt::LockGuard guard(ivars.delegateLock);
-  return ivars.scopeLifecycleDelegate.lock();
+  const rt::LockGuard guard(delegateLock_);
+  return scopeLifecycleDelegate_.lock();
 }
 
 void SRLRegistry::setScopeLifecycleDelegate(const rt::Ref<SRLScopeLifecycleDelegate>& delegate) {
   rt::Weak<SRLScopeLifecycleDelegate> weak = delegate;
-  SRLRegistryIvars& ivars = unguarded();
-  const rt::LockGuard guard(ivars.delegateLock);
-  ivars.scopeLifecycleDelegate = std::move(weak);
+  const rt::LockGuard guard(delegateLock_);
+  scopeLifecycleDelegate_ = std::move(weak);
 }
 
 // Not static, since callers call it on a registry. Scoped instances live in the shared registry in any case.

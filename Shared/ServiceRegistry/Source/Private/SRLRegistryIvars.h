@@ -2,16 +2,13 @@
 
 // The state of an SRLRegistry. The registry owns it, and guards most of it with its lock.
 
-#include <atomic>
 #include <cstddef>
 #include <cstdint>
 #include <string_view>
 #include <variant>
 #include <vector>
 
-#include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Objects/Ref.h"
-#include "Runtime/Objects/Weak.h"
 #include "Runtime/Values/Set.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLBindingsModuleData.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLImplementation.h"
@@ -20,12 +17,26 @@
 #include "Shared/ServiceRegistry/Source/Private/SRLAPIIdentifier.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLMemoizingScope.h"
 #include "Shared/ServiceRegistry/Source/Private/SRLTable.h"
-#include "Shared/ServiceRegistry/Source/SRLScopeLifecycleDelegate.h"
+#include "Shared/ServiceRegistry/Source/SRLUnfairLock.h"
 
 /// The progress of the registration of bindings modules.
 enum class SRLBindingsState : std::uint8_t { kNone = 0, kInProgress = 1, kRegistered = 2 };
 
-struct SRLRegistryIvars {
+/// The part of the state that may be used without the lock.
+struct SRLRegistryUnguardedIvars {
+  // Written when the program is loaded, before it has a second thread.
+  std::vector<const SRLBindingsModuleData*> bindingsModules;
+  SRLConfigurationFactories configFactories;
+  SRLBindingsState bindingsState = SRLBindingsState::kNone;
+
+  /// The APIs found so far by identifier. Keys are the identifiers in their records. Written under the lock.
+  SRLTable<std::string_view, const SRLAPIRegistrationData*, SRLIdentifierHash> apisByIdentifier;
+
+  SRLUnfairLock lock;
+};
+
+/// All of the state. The registry reaches it only with the lock held.
+struct SRLRegistryIvars : SRLRegistryUnguardedIvars {
   /// The key of a scope: its tags, and their hash, which is computed once.
   struct ScopeKey {
     explicit ScopeKey(const SRLScopeTagSet& set) : tags(set), hash(SRLScopeTagSetHash(set)) {}
@@ -44,7 +55,7 @@ struct SRLRegistryIvars {
   using Scopes = SRLTable<ScopeKey, rt::Ref<SRLMemoizingScope>, ScopeKeyHash, ScopeKeyEqual>;
 
   SRLRegistryIvars() = default;
-  /// Copies bindings and modules, but no scopes and no delegate.
+  /// Copies bindings and modules, but no scopes.
   SRLRegistryIvars(const SRLRegistryIvars& other);
   SRLRegistryIvars& operator=(const SRLRegistryIvars&) = delete;
   ~SRLRegistryIvars();
@@ -68,8 +79,6 @@ struct SRLRegistryIvars {
   /// Returns whether an earlier search has found that no module has the API.
   bool isUnknown(const SRLAPIRegistrationData* api) const { return unknownAPIs.find(api) != nullptr; }
 
-  // Guarded by the registry's lock.
-
   /// The implementation of each single-bound API that is known. Null if it has none.
   SRLTable<const SRLAPIRegistrationData*, rt::Ref<SRLImplementation>> singleBindings;
   /// The implementations of each multi-bound API that is known. Null if no set has been made yet. A set is
@@ -85,23 +94,6 @@ struct SRLRegistryIvars {
   decltype(SRLScopeTagSet::tags) lastTags{};
   /// The APIs that no module has. Filled only after all modules are registered, which then never change.
   SRLTable<const SRLAPIRegistrationData*, std::monostate> unknownAPIs;
-
-  // Written when the program is loaded, before it has a second thread. Read without the lock.
-
-  std::vector<const SRLBindingsModuleData*> bindingsModules;
-  SRLConfigurationFactories configFactories;
-  SRLBindingsState bindingsState = SRLBindingsState::kNone;
-
-  // Read without the lock.
-
-  /// The APIs found so far by identifier. Keys are the identifiers in their records. Written under the lock.
-  SRLTable<std::string_view, const SRLAPIRegistrationData*, SRLIdentifierHash> apisByIdentifier;
-  /// Null once the registry is being destroyed.
-  rt::Ref<SRLMemoizingScope> configScope = SRLMemoizingScope::init();
-  /// Written together with the shared registry itself.
-  std::atomic<bool> isShared = false;
-  rt::UnfairLock delegateLock;
-  rt::Weak<SRLScopeLifecycleDelegate> scopeLifecycleDelegate RT_GUARDED_BY(delegateLock);
 
  private:
   // Returns whether these are the tags of the latest request, by address. Not with `==`, which is a call.

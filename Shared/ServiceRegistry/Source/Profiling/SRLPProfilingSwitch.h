@@ -7,7 +7,7 @@
 /// The library's own definition returns the value of the CMake option MOUNT_POINT_PROFILING, which is off by
 /// default. A program can define the function itself and so replace that definition.
 ///
-/// Not for: asking whether profiling is on (SRLPProfilingEnabled.h). The registry calls this function once
-/// per process, on the first thread that needs the answer.
+/// Not for: asking whether profiling is on. The registry calls this function once per process, on the first
+/// thread that needs the answer.
 
 bool SRLPProfilingSwitch();

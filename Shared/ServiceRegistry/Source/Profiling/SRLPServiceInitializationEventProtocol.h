@@ -24,7 +24,7 @@ struct RT_VISIBLE SRLPServiceInitializationEventProtocol
   virtual const rt::String& apiDescription() const = 0;
   /// The implementation's `description`.
   virtual const rt::String& implDescription() const = 0;
-  /// When the making began, in nanoseconds by the clock of Runtime/Base/Private/MonotonicClock.h.
+  /// When the making began, in nanoseconds of CLOCK_MONOTONIC_RAW.
   virtual std::uint64_t monotonicRawClockStartTime() const = 0;
   /// How long the making took, including other instances that were made for it.
   virtual std::uint64_t durationNs() const = 0;

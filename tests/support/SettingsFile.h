@@ -8,12 +8,12 @@
 #include <string>
 #include <utility>
 
-/// A file of user defaults as another program changes it: whole, by a new file that takes its name.
+/// Changes a file of user defaults as another program does: it writes a new file and renames it.
 ///
 ///     SettingsFile settings(path);
 ///     settings.set("key", "value");
 ///
-/// Knows only what it has set itself. Any thread may use it. What has been written does not reach the disk.
+/// The file has only the settings that this object has set. Threads: any thread may use it.
 class SettingsFile {
  public:
   explicit SettingsFile(std::filesystem::path path) : path_(std::move(path)) {}
@@ -32,7 +32,7 @@ class SettingsFile {
  private:
   void write() const {
     const std::filesystem::path fresh = path_.string() + ".new";
-    // Not a std::ofstream, which a program that another thread starts meanwhile would inherit.
+    // Not a std::ofstream, whose descriptor a program inherits that another thread starts meanwhile.
     std::FILE* const file = std::fopen(fresh.c_str(), "we");
     if (file == nullptr) std::abort();
     for (const auto& [key, value] : settings_) std::fprintf(file, "%s = %s\n", key.c_str(), value.c_str());

@@ -72,8 +72,8 @@ class UserDefaults : public testing::Test {
   void set(const std::string& key, const std::string& value) { settings_.set(key, value); }
   void remove(const std::string& key) { settings_.remove(key); }
 
-  // Observes "key" for `await`. What was observed before it has been called when `await` returns, if there
-  // was one change.
+  // Observes "key" for `await`. If there was one change, earlier observers have been called when `await`
+  // returns.
   rt::UserDefaults::Observation observe(const rt::Ref<rt::UserDefaults>& defaults) {
     return defaults->observe("key", rt::UserDefaults::Notify::kAlsoNow, [this, raw = defaults.get()] {
       {

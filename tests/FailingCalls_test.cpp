@@ -289,7 +289,10 @@ class FailingCalls : public testing::Test {
       } else if (marks == 1) {
         // This wakes a thread through an eventfd. Adding 1 to its counter cannot fail.
         const bool wakes = name == "write" && line.find("[eventfd]") != std::string::npos;
-        calls.push_back({name, number, !wakes});
+        // The thread that watches defaults closes its watch, or the main thread does if it is the last to
+        // have it.
+        const bool isOfEither = name == "close" && line.find("anon_inode:") != std::string::npos;
+        if (!isOfEither) calls.push_back({name, number, !wakes});
       }
     }
     EXPECT_EQ(marks, 2);

@@ -6,13 +6,14 @@ find_package(GTest REQUIRED)
 include(GoogleTest)
 
 # Two things make tests slow to compile: GoogleTest's headers, which are therefore precompiled once for all tests, and
-# the many temporaries. So tests get few debug symbols, except in the preset `development`. With clang and in
-# instrumented builds, they are not optimised either. This does not change the options of the libraries.
+# the many temporaries. So tests get few debug symbols, except in the preset `development`, and are optimised little.
+# With clang and in instrumented builds, they are not optimised at all. This does not change the options of the
+# libraries.
 add_library(test-options INTERFACE)
 if(MOUNT_POINT_INSTRUMENTATION OR CMAKE_CXX_COMPILER_ID STREQUAL "Clang")
   target_compile_options(test-options INTERFACE -g1 -O0)
 else()
-  target_compile_options(test-options INTERFACE $<$<NOT:$<CONFIG:Debug>>:-g1>)
+  target_compile_options(test-options INTERFACE "$<$<NOT:$<CONFIG:Debug>>:-g1;-O1>")
 endif()
 target_link_libraries(test-options INTERFACE MountPoint::Options GTest::gmock GTest::gtest_main)
 if(MOUNT_POINT_INSTRUMENTATION STREQUAL "coverage")
@@ -34,6 +35,9 @@ function(mount_point_test name)
   target_link_libraries(${name} PRIVATE test-options ${test_LIBRARIES})
   target_precompile_headers(${name} REUSE_FROM test-headers)
   target_compile_definitions(${name} PRIVATE ${test_DEFINITIONS})
+  if(NOT MOUNT_POINT_UNIT_TESTS)
+    set_target_properties(${name} PROPERTIES EXCLUDE_FROM_ALL ON)
+  endif()
   mount_point_test_entries(${name} ${name})
 endfunction()
 
@@ -43,6 +47,9 @@ endfunction()
 # the given arguments. In an instrumented build, starting a process takes longer than running a case. So there, a
 # single entry ENTRY runs all cases in one process.
 function(mount_point_test_entries name entry)
+  if(NOT MOUNT_POINT_UNIT_TESTS)
+    return()
+  endif()
   if(MOUNT_POINT_INSTRUMENTATION)
     add_test(NAME ${entry} COMMAND ${name} ${ARGN})
   else()

@@ -61,7 +61,7 @@ class RT_VISIBLE StringObject final : public Implements<StringObject, Object> {
 
   // The bytes of a copy follow the object, so the allocated size is not that of the class. The function is
   // constexpr only because g++ has the destructor of a constant mention it.
-  static constexpr void operator delete(void* memory) noexcept {
+  static constexpr void operator delete(void* memory) noexcept {  // NOLINT: the other one takes a length
     if (!std::is_constant_evaluated()) ::operator delete(memory);
   }
 

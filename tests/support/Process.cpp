@@ -93,7 +93,7 @@ RunningProcess::~RunningProcess() {
   reap(status, 0);
 }
 
-bool RunningProcess::reap(int& status, int options) {
+bool RunningProcess::reap(int& status, int options) const {
   while (waitpid(child_, &status, options) < 0) {
     if (errno != EINTR) return false;
   }

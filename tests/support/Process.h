@@ -44,7 +44,7 @@ class RunningProcess {
 
  private:
   friend class StoppedProcess;
-  bool reap(int& status, int options);
+  bool reap(int& status, int options) const;
 
   pid_t child_ = -1;
   int output_ = -1;

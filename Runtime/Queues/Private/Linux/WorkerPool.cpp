@@ -5,6 +5,7 @@
 #include <sys/resource.h>
 #include <unistd.h>
 
+#include <array>
 #include <csignal>
 #include <new>
 
@@ -174,15 +175,17 @@ class Level {
   std::atomic<bool> isShort_ = false;
 };
 
-constinit Level urgent;
-constinit Level utility;
+// The level of utility work, and the level of all other work before it. They are elements of an array because
+// clang may read both of two variables and then choose between the values. The thread sanitizer reports the
+// read that is not needed, which happens without the lock.
+constinit std::array<Level, 2> levels;
 constexpr int kNicenessOfUtility = 5;
 
 // The calling worker's level. Null on all other threads.
 constinit thread_local Level* levelOfCaller = nullptr;
 
 Level& level(QualityOfService qualityOfService) noexcept {
-  return qualityOfService == QualityOfService::kUtility ? utility : urgent;
+  return levels[qualityOfService == QualityOfService::kUtility ? 1 : 0];
 }
 
 void* runWorker(void* argument) {
@@ -191,7 +194,7 @@ void* runWorker(void* argument) {
   // the system does not let the worker become less nice, it does the work that waits and does not stay for
   // more.
   const int ofProcess = getpriority(PRIO_PROCESS, static_cast<id_t>(getpid()));
-  const int added = levelOfCaller == &utility ? kNicenessOfUtility : 0;
+  const int added = levelOfCaller == &level(QualityOfService::kUtility) ? kNicenessOfUtility : 0;
   const bool isAsNiceAsWanted = setpriority(PRIO_PROCESS, 0, ofProcess + added) == 0;
   // A thread inherits its creator's name.
   setSystemThreadName(nullptr);
@@ -235,7 +238,7 @@ bool WorkerPool::isShort(QualityOfService qualityOfService) noexcept {
 }
 
 void WorkerPool::resetAfterFork() noexcept {
-  for (Level* each : {&urgent, &utility}) new (each) Level;
+  for (Level& each : levels) new (&each) Level;
   if (levelOfCaller != nullptr) levelOfCaller->countCaller();
 }
 

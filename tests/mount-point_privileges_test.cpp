@@ -28,6 +28,7 @@
 #include <sstream>
 
 #include "tests/support/MountPointTest.h"
+#include "tests/support/StoppedProcess.h"
 
 namespace {
 

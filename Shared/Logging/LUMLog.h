@@ -43,6 +43,7 @@
 #include "Shared/Logging/LUMLogLevel.h"
 #include "Shared/Logging/LUMLogMessage.h"
 #include "Shared/Logging/LUMLogMetadata.h"
+#include "Shared/Logging/Private/LUMLogWanted.h"
 
 /// The kind of a variadic argument, with the values of rt::ArgumentKind.
 using LUMLogArgumentKind = std::uint32_t;
@@ -88,12 +89,16 @@ struct LUMLogFormat {
   std::source_location location;
 };
 
-/// Logs `arguments`, formatted by the literal `format`, and returns the message. Always inlined, so that the
-/// caller is the first frame of the call stack.
+/// Logs `arguments`, formatted by the literal `format`, and returns the message. If all filters and loggers
+/// that may want the message say in advance that they do not (Shared/Logging/LUMLogInterest.h), makes no
+/// message and returns null. The descriptions of the arguments are then not asked for.
+///
+/// Always inlined, so that the caller is the first frame of the call stack.
 template <class... Arguments>
 [[gnu::always_inline]] inline rt::Ref<LUMLogMessage> LUMLogAt(
     LUMLogLevel level, const rt::Ref<LUMLogMetadata>& metadata,
     const LUMLogFormat<std::type_identity_t<Arguments>...>& format, const Arguments&... arguments) {
+  if (!LUMLogWanted::isWanted(level, metadata)) return nullptr;
   rt::Ref<LUMLogMessage> message =
       LUMLog(level, format.location.file_name(), format.location.function_name(), format.location.line(),
              metadata, static_cast<std::int32_t>(sizeof...(Arguments)),

@@ -12,6 +12,7 @@
 ///
 /// Not for: arguments of the text (Shared/Logging/LUMSafeParameter.h).
 
+#include <atomic>
 #include <cstdint>
 #include <utility>
 
@@ -102,6 +103,10 @@ class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Obje
 
  private:
   static rt::Ref<LUMLogMetadata> metadataWith(rt::Dictionary::Builder&& properties);
+
+  // What the shared multiplexer wants of the component, with its generation (Private/LUMLogWanted.h).
+  friend class LUMLogWanted;
+  mutable std::atomic<std::uint64_t> wanted_ = 0;
 
   const rt::Ref<rt::Dictionary> properties_;
 };

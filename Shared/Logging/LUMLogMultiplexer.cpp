@@ -16,6 +16,8 @@
 #include "Runtime/Queues/QualityOfService.h"
 #include "Runtime/Queues/Queue.h"
 #include "Shared/Logging/LUMDefaultMinimumLogLevelFilter.h"
+#include "Shared/Logging/LUMLogInterest.h"
+#include "Shared/Logging/Private/LUMLogWanted.h"
 
 namespace {
 
@@ -64,7 +66,11 @@ class LUMLogMultiplexer::Members final : public rt::Implements<Members, rt::Obje
 
 const rt::Ref<LUMLogMultiplexer>& LUMLogMultiplexer::sharedInstance() {
   static constinit rt::Lazy<rt::Ref<LUMLogMultiplexer>> instance;
-  return instance.get(init);
+  return instance.get([] {
+    rt::Ref<LUMLogMultiplexer> shared = init();
+    LUMLogWanted::attach(*shared);
+    return shared;
+  });
 }
 
 rt::Ref<LUMLogMultiplexer> LUMLogMultiplexer::init() {
@@ -131,6 +137,24 @@ std::vector<rt::Ref<LUMAsyncLogger>> LUMLogMultiplexer::deliverLater(
   return blockingLoggers;
 }
 
+LUMLogLevel LUMLogMultiplexer::lowestLevel(const rt::String* component) const noexcept {
+  const rt::Ref<Members> current = members_.load();
+  const Lists& lists = current->lists;
+  LUMLogLevel ofLoggers = LUMLogLevelNone;
+  const auto ask = [&](const auto& loggers) {
+    for (const auto& logger : loggers) {
+      const auto* interest = rt::cast<LUMLogInterest>(logger.get());
+      ofLoggers = std::min(ofLoggers, interest != nullptr ? interest->lowestLevel(component) : 0);
+    }
+  };
+  ask(lists.syncLoggers);
+  ask(lists.asyncLoggers);
+  LUMLogLevel ofFilters = 0;
+  for (const rt::Ref<LUMLogFilter>& filter : lists.filters)
+    ofFilters = std::max(ofFilters, LUMLogLowestLevel(filter.get(), component));
+  return std::max(ofFilters, ofLoggers);
+}
+
 // Replaces the members by what `change` makes of a copy. Starts again if another thread was faster.
 template <class Change>
 void LUMLogMultiplexer::replaceMembers(Change change) {
@@ -138,8 +162,9 @@ void LUMLogMultiplexer::replaceMembers(Change change) {
     const rt::Ref<Members> known = members_.load();
     Lists lists = known->lists;
     change(lists);
-    if (members_.compareExchange(known, rt::make<Members>(std::move(lists)))) return;
+    if (members_.compareExchange(known, rt::make<Members>(std::move(lists)))) break;
   }
+  LUMLogWanted::refresh();
 }
 
 void LUMLogMultiplexer::addLogFilter(const rt::Ref<LUMLogFilter>& filter) {

@@ -83,6 +83,11 @@ class RT_VISIBLE LUMLogMultiplexer
   /// "LUMLogMultiplexer".
   const rt::Ref<rt::Queue>& loggingQueue() const noexcept { return loggingQueue_; }
 
+  /// Returns the lowest level that passes the filters and that some logger wants, as far as they say so
+  /// (LUMLogInterest.h). `LUMLogAt` does not make messages below that level. `component` is that of
+  /// LUMLogInterest.
+  LUMLogLevel lowestLevel(const rt::String* component) const noexcept;
+
   bool captureCallStack() const override { return captureCallStack_.load(std::memory_order_relaxed); }
   void setCaptureCallStack(bool capture) override;
   bool captureCallStackAddresses() const override {

@@ -29,6 +29,7 @@
 #include "Shared/Logging/LUMLogDropAllFilter.h"
 #include "Shared/Logging/LUMLogFilter.h"
 #include "Shared/Logging/LUMLogFormatter.h"
+#include "Shared/Logging/LUMLogInterest.h"
 #include "Shared/Logging/LUMLogLevel.h"
 #include "Shared/Logging/LUMLogLogicalAndFilter.h"
 #include "Shared/Logging/LUMLogLogicalOrFilter.h"

@@ -31,6 +31,7 @@
 #include "Shared/Logging/LUMLogFormatter.h"
 #include "Shared/Logging/LUMLogInterest.h"
 #include "Shared/Logging/LUMLogLevel.h"
+#include "Shared/Logging/LUMLogLevels.h"
 #include "Shared/Logging/LUMLogLogicalAndFilter.h"
 #include "Shared/Logging/LUMLogLogicalOrFilter.h"
 #include "Shared/Logging/LUMLogMessage.h"

@@ -32,6 +32,7 @@
 #include "Shared/Logging/LUMLogInterest.h"
 #include "Shared/Logging/LUMLogLevel.h"
 #include "Shared/Logging/LUMLogLevels.h"
+#include "Shared/Logging/LUMLogLimit.h"
 #include "Shared/Logging/LUMLogLogicalAndFilter.h"
 #include "Shared/Logging/LUMLogLogicalOrFilter.h"
 #include "Shared/Logging/LUMLogMessage.h"

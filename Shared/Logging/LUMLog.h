@@ -99,10 +99,10 @@ template <class... Arguments>
     LUMLogLevel level, const rt::Ref<LUMLogMetadata>& metadata,
     const LUMLogFormat<std::type_identity_t<Arguments>...>& format, const Arguments&... arguments) {
   if (!LUMLogWanted::isWanted(level, metadata)) return nullptr;
-  rt::Ref<LUMLogMessage> message =
-      LUMLog(level, format.location.file_name(), format.location.function_name(), format.location.line(),
-             metadata, static_cast<std::int32_t>(sizeof...(Arguments)),
-             rt::kArgumentKinds<Arguments...>.data(), format.text.string(), rt::toVariadic(arguments)...);
+  rt::Ref<LUMLogMessage> message = LUMLog(
+      level, format.location.file_name(), format.location.function_name(), format.location.line(), metadata,
+      static_cast<std::int32_t>(sizeof...(Arguments)), rt::kArgumentKinds<Arguments...>.data(),
+      format.text.string(), rt::toVariadic(rt::toArgument(arguments))...);
   rt::CallStack::keepFrame();
   return message;
 }

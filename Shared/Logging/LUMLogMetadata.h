@@ -14,6 +14,7 @@
 
 #include <atomic>
 #include <cstdint>
+#include <initializer_list>
 #include <utility>
 
 #include "Runtime/Base/Visibility.h"
@@ -65,6 +66,12 @@ class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Obje
   /// Returns a copy of this metadata in which `key` has a copy of `value`. A null `value` removes the key. A
   /// null `key` changes nothing. Despite its name, this function returns metadata and not a message.
   rt::Ref<LUMLogMetadata> messageWithKey(const rt::String& key, const rt::Ref<rt::Object>& value) const;
+
+  /// Returns metadata with the properties of `metadata`, which may be null, and `added`. A null value removes
+  /// the property of its key. No key is null.
+  static rt::Ref<LUMLogMetadata> metadataByAddingProperties(
+      const rt::Ref<LUMLogMetadata>& metadata,
+      std::initializer_list<std::pair<rt::String, rt::Ref<rt::Object>>> added);
 
   /// Same as `messageWithKey`, for the predefined keys.
   rt::Ref<LUMLogMetadata> metadataByAddingObfuscatedKiriID(

@@ -27,6 +27,7 @@
 #include "Shared/Logging/LUMLogCallstack.h"
 #include "Shared/Logging/LUMLogComponentFilter.h"
 #include "Shared/Logging/LUMLogDropAllFilter.h"
+#include "Shared/Logging/LUMLogField.h"
 #include "Shared/Logging/LUMLogFilter.h"
 #include "Shared/Logging/LUMLogFormatter.h"
 #include "Shared/Logging/LUMLogInterest.h"

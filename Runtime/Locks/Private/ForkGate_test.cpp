@@ -207,7 +207,7 @@ TEST(ForkGate, IgnoresEndedThreadsWhoseFirstLockCameLate) {
   const auto end = [](void* value) {
     const auto rounds = reinterpret_cast<std::intptr_t>(value);
     if (rounds > 1) {
-      pthread_setspecific(key, reinterpret_cast<void*>(rounds - 1));  // NOLINT(performance-no-int-to-ptr)
+      pthread_setspecific(key, reinterpret_cast<void*>(rounds - 1));
     } else {
       const LockGuard guard(lock);
     }
@@ -216,7 +216,6 @@ TEST(ForkGate, IgnoresEndedThreadsWhoseFirstLockCameLate) {
   EXPECT_EQ(statusOfChild([] {
               for (std::intptr_t rounds = 1; rounds <= PTHREAD_DESTRUCTOR_ITERATIONS; ++rounds) {
                 for (int i = 0; i < 3; ++i) {
-                  // NOLINTNEXTLINE(performance-no-int-to-ptr)
                   std::thread([&] { pthread_setspecific(key, reinterpret_cast<void*>(rounds)); }).join();
                 }
               }

@@ -34,7 +34,7 @@ namespace rt::CallStack {
 /// Keeps the frame of a function that would otherwise end in a tail call. Call it after the function's last
 /// call.
 [[gnu::always_inline]] inline void keepFrame() noexcept {
-  asm volatile("" ::: "memory");  // NOLINT(hicpp-no-assembler): does nothing, and the compiler must keep it
+  asm volatile("" ::: "memory");  // does nothing, and the compiler must keep it
 }
 
 /// Returns a line for each of `addresses`. It has a number, from 0, the image, the address, and the function

@@ -1,7 +1,7 @@
 #pragma once
 
-// Keeps a function's frame on the call stack. Public headers need this and nothing else of
-// Runtime/Process/Private/CallStack.h, which <vector> makes slow to parse.
+// Keeps a function's frame on the call stack. Public headers need this and nothing else of what captures call
+// stacks, which <vector> makes slow to parse.
 
 namespace rt::CallStack {
 

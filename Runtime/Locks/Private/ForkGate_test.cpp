@@ -64,6 +64,7 @@ TEST(ForkGate, FreesAllLocksInTheChildAndKeepsTheirDataWhole) {
   Nest nest;
   std::atomic<bool> isEnding = false;
   std::vector<std::thread> threads;
+  threads.reserve(4);
   for (int i = 0; i < 4; ++i) {
     threads.emplace_back([&, i] {
       while (!isEnding) {

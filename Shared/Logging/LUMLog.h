@@ -37,7 +37,7 @@
 
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
-#include "Runtime/Process/Private/CallStack.h"
+#include "Runtime/Process/Private/KeepFrame.h"
 #include "Runtime/Text/FormatString.h"
 #include "Runtime/Text/Private/FormatArguments.h"
 #include "Shared/Logging/LUMLogCallstack.h"

@@ -44,6 +44,34 @@ void deliver(LUMLogger& logger, const rt::Ref<LUMLogMessage>& message) {
   if (admits(logger, *message)) logger.logWithMessage(message);
 }
 
+// Queues `message` for those of `loggers` that do not want it at once, and returns those that do. A function
+// of its own, so that a message costs nothing extra if there are no asynchronous loggers.
+[[gnu::noinline]] std::vector<rt::Ref<LUMAsyncLogger>> deliverLater(
+    const std::vector<rt::Ref<LUMAsyncLogger>>& loggers, const rt::Ref<LUMLogMessage>& message,
+    rt::Queue& loggingQueue) {
+  std::vector<rt::Ref<LUMAsyncLogger>> laterLoggers;
+  std::vector<rt::Ref<LUMAsyncLogger>> blockingLoggers;
+  for (const rt::Ref<LUMAsyncLogger>& logger : loggers) {
+    const bool isBlocking = admits(*logger, *message) &&
+                            logger->dispatchModeForMessage(*message) == LUMLogDispatchModeSynchronous;
+    std::vector<rt::Ref<LUMAsyncLogger>>& list = isBlocking ? blockingLoggers : laterLoggers;
+    list.reserve(loggers.size());
+    list.push_back(logger);
+  }
+  if (laterLoggers.empty()) return blockingLoggers;
+  loggingQueue.async([loggers = std::move(laterLoggers), message] {
+    for (const rt::Ref<LUMAsyncLogger>& logger : loggers) {
+      if (const rt::Ref<rt::Queue> queue = logger->operationQueue()) {
+        try {
+          queue->async([logger, message] { deliver(*logger, message); });
+        } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): there is no caller to tell
+        }
+      }
+    }
+  });
+  return blockingLoggers;
+}
+
 }  // namespace
 
 struct LUMLogMultiplexer::Lists {
@@ -101,7 +129,8 @@ LUMLogMultiplexer::~LUMLogMultiplexer() = default;
   }
 
   std::vector<rt::Ref<LUMAsyncLogger>> blockingLoggers;
-  if (!lists.asyncLoggers.empty()) blockingLoggers = deliverLater(lists.asyncLoggers, message);
+  if (!lists.asyncLoggers.empty())
+    blockingLoggers = deliverLater(lists.asyncLoggers, message, *loggingQueue_);
 
   for (const rt::Ref<LUMSyncLogger>& logger : lists.syncLoggers) deliver(*logger, message);
 
@@ -110,31 +139,6 @@ LUMLogMultiplexer::~LUMLogMultiplexer() = default;
       queue->sync([&] { deliver(*logger, message); });
     }
   }
-}
-
-std::vector<rt::Ref<LUMAsyncLogger>> LUMLogMultiplexer::deliverLater(
-    const std::vector<rt::Ref<LUMAsyncLogger>>& loggers, const rt::Ref<LUMLogMessage>& message) {
-  std::vector<rt::Ref<LUMAsyncLogger>> laterLoggers;
-  std::vector<rt::Ref<LUMAsyncLogger>> blockingLoggers;
-  for (const rt::Ref<LUMAsyncLogger>& logger : loggers) {
-    const bool isBlocking = admits(*logger, *message) &&
-                            logger->dispatchModeForMessage(*message) == LUMLogDispatchModeSynchronous;
-    std::vector<rt::Ref<LUMAsyncLogger>>& list = isBlocking ? blockingLoggers : laterLoggers;
-    list.reserve(loggers.size());
-    list.push_back(logger);
-  }
-  if (laterLoggers.empty()) return blockingLoggers;
-  loggingQueue_->async([loggers = std::move(laterLoggers), message] {
-    for (const rt::Ref<LUMAsyncLogger>& logger : loggers) {
-      if (const rt::Ref<rt::Queue> queue = logger->operationQueue()) {
-        try {
-          queue->async([logger, message] { deliver(*logger, message); });
-        } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): there is no caller to tell
-        }
-      }
-    }
-  });
-  return blockingLoggers;
 }
 
 LUMLogLevel LUMLogMultiplexer::lowestLevel(const rt::String* component) const noexcept {

@@ -49,7 +49,8 @@ class ThreadReference {
       if (pthread_key_create(&made, giveUp) != 0) throw std::bad_alloc();
       return made;
     });
-    if (pthread_getspecific(key) == nullptr && pthread_setspecific(key, &object_) != 0)
+    // Any value that is not null will do.
+    if (pthread_getspecific(key) == nullptr && pthread_setspecific(key, &hasEnded_) != 0)
       throw std::bad_alloc();
   }
 

@@ -15,6 +15,7 @@
 #include <vector>
 
 #include "tests/support/MountPointTest.h"
+#include "tests/support/StoppedProcess.h"
 
 /// The identifiers of a user.
 struct User {

@@ -5,7 +5,9 @@
 namespace rt {
 
 std::int64_t WallClock::nanoseconds() noexcept {
-  return static_cast<std::int64_t>(clock_gettime_nsec_np(CLOCK_REALTIME));
+  timespec now{};
+  clock_gettime(CLOCK_REALTIME, &now);
+  return std::int64_t{now.tv_sec} * 1'000'000'000 + now.tv_nsec;
 }
 
 }  // namespace rt

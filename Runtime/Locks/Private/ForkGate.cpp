@@ -7,6 +7,7 @@
 #include <sched.h>
 #include <sys/mman.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <chrono>
@@ -62,9 +63,7 @@ struct ForkGate::Places {
   template <class Visit>
   static void forEach(Visit visit) {
     for (Places* each = &places_; each != nullptr; each = each->next.load(std::memory_order_acquire)) {
-      for (Place& place : each->all) {
-        if (visit(place)) return;
-      }
+      if (std::ranges::any_of(each->all, visit)) return;
     }
   }
 };

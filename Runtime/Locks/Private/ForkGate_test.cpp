@@ -238,6 +238,21 @@ TEST(ForkGate, ReusesThePlaceOfAThreadThatHasEnded) {
   EXPECT_EQ(places.size(), 1U);
 }
 
+// Regression: macOS frees a thread's variables before the last destructors of the thread, which may lock. The
+// thread then took another place, and the first one was lost. The test frees the variable itself.
+TEST(ForkGate, KeepsThePlaceOfAThreadWhoseVariablesAreGone) {
+  std::thread([] {
+    UnfairLock lock;
+    const auto placeAfterLocking = [&lock] {
+      const LockGuard guard(lock);
+      return rt::detail::currentThread.lockCount.load();
+    };
+    const auto* const place = placeAfterLocking();
+    rt::detail::currentThread.lockCount = nullptr;
+    EXPECT_EQ(placeAfterLocking(), place);
+  }).join();
+}
+
 // Starts more threads than there are places in the first page.
 TEST(ForkGate, WaitsForTheLocksOfManyThreads) {
   std::vector<Pair> pairs(200);

@@ -176,7 +176,7 @@ void LUMLogLevels::setOuterText(const rt::String& text) {
   }
 }
 
-void LUMLogLevels::setTable(rt::Ref<Table> LUMLogLevels::*place, rt::Ref<Table> table) {
+void LUMLogLevels::setTable(rt::Ref<Table> LUMLogLevels::* place, rt::Ref<Table> table) {
   {
     const rt::LockGuard guard(lock_);
     this->*place = std::move(table);

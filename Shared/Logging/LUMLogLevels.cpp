@@ -74,10 +74,10 @@ class LUMLogLevels::Table final : public rt::Implements<Table, rt::Object> {
       start = end + 1;
     }
     // The first part that fits a component counts: the longest, and the later one of two that are equal.
-    std::ranges::reverse(parts_);
-    std::ranges::stable_sort(parts_, [](const Part& first, const Part& second) {
+    std::ranges::sort(parts_, [](const Part& first, const Part& second) {
       if (first.isBeginning != second.isBeginning) return second.isBeginning;
-      return first.name.size() > second.name.size();
+      if (first.name.size() != second.name.size()) return first.name.size() > second.name.size();
+      return first.name.data() > second.name.data();
     });
   }
 

@@ -32,7 +32,9 @@ target_compile_options(compiler-options INTERFACE
   -fstack-protector-strong
   $<$<PLATFORM_ID:Linux>:-fstack-clash-protection>
   $<$<PLATFORM_ID:Linux>:-fcf-protection=full>)
-target_compile_definitions(compiler-options INTERFACE _GLIBCXX_ASSERTIONS)
+target_compile_definitions(compiler-options INTERFACE
+  $<$<PLATFORM_ID:Linux>:_GLIBCXX_ASSERTIONS>
+  $<$<PLATFORM_ID:Darwin>:_LIBCPP_HARDENING_MODE=_LIBCPP_HARDENING_MODE_FAST>)
 if(NOT MOUNT_POINT_INSTRUMENTATION)
   target_compile_options(compiler-options INTERFACE
     $<$<CONFIG:Release,RelWithDebInfo,MinSizeRel>:-U_FORTIFY_SOURCE>

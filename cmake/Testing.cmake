@@ -47,7 +47,7 @@ endfunction()
 # the given arguments. In an instrumented build, starting a process takes longer than running a case. So there, a
 # single entry ENTRY runs all cases in one process.
 function(mount_point_test_entries name entry)
-  if(NOT MOUNT_POINT_UNIT_TESTS)
+  if(NOT MOUNT_POINT_UNIT_TESTS OR (CMAKE_CROSSCOMPILING AND NOT CMAKE_CROSSCOMPILING_EMULATOR))
     return()
   endif()
   if(MOUNT_POINT_INSTRUMENTATION)

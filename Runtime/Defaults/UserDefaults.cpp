@@ -1,12 +1,16 @@
 #include "Runtime/Defaults/UserDefaults.h"
 
+#include <locale.h>
+#include <stdlib.h>
+#if __has_include(<xlocale.h>)
+#include <xlocale.h>
+#endif
+
 #include <algorithm>
 #include <array>
-#include <charconv>
 #include <cmath>
 #include <optional>
 #include <string>
-#include <system_error>
 #include <utility>
 
 #include "Runtime/Defaults/Private/DefaultsStore.h"
@@ -26,12 +30,20 @@ bool isTrueWord(std::string_view text) {
       kWords, [&](std::string_view word) { return std::ranges::equal(text, word, isSameLetter); });
 }
 
+// The locale in which numbers are written the same way everywhere. It is never freed.
+locale_t standardLocale() {
+  static constinit Lazy<locale_t> locale;
+  return locale.get([] { return newlocale(LC_ALL_MASK, "C", nullptr); });
+}
+
 bool isNumberOtherThan0(std::string_view text) {
-  if (text.starts_with('+') && !text.starts_with("+-")) text.remove_prefix(1);
-  double number = 0;
-  const char* const end = text.data() + text.size();
-  const auto [rest, error] = std::from_chars(text.data(), end, number);
-  return error == std::errc() && rest == end && number != 0 && std::isfinite(number);
+  // The function below also takes leading spaces, hexadecimal digits, "inf" and "nan".
+  if (text.find_first_not_of("+-.0123456789eE") != std::string_view::npos) return false;
+  // `std::from_chars` would do without a copy, but macOS has it for real numbers since version 26 only.
+  const std::string number(text);
+  char* end = nullptr;
+  const double value = strtod_l(number.c_str(), &end, standardLocale());
+  return end == number.c_str() + number.size() && value != 0 && std::isfinite(value);
 }
 
 std::shared_ptr<detail::DefaultsStore> standardStore() {

@@ -54,8 +54,9 @@ class Ref {
   Ref(Ref<Other>&& other) noexcept : pointer_(other.detach()) {}
 
   /// Converts a reference to a protocol into a reference to the object behind it.
-  template <std::derived_from<AnyProtocol> Other>
-    requires(std::same_as<T, Object> && !std::derived_from<Other, Object>)
+  template <class Other>
+    requires std::same_as<T, Object> &&
+             std::derived_from<Other, AnyProtocol> && (!std::derived_from<Other, Object>)
   Ref(const Ref<Other>& other) noexcept : Ref(other ? other->asObject() : nullptr) {}
 
   ~Ref() { drop(pointer_); }

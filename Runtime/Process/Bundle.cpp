@@ -3,6 +3,9 @@
 #include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Process/Private/SystemBundle.h"
 
+// A host with an identifier defines this symbol, which replaces the definition here.
+extern "C" [[gnu::weak]] constinit const char kMainBundleIdentifier[] = "";
+
 namespace rt::Bundle {
 
 namespace {
@@ -18,8 +21,11 @@ String mainIdentifier() {
     const LockGuard guard(lock);
     if (chosen != nullptr) return String::from(chosen);
   }
-  const String built = detail::systemBundleIdentifier();
-  return built.isNull() ? ""_s : built;
+  // The volatile keeps compilers from assuming what the text is.
+  const char* volatile const built = kMainBundleIdentifier;
+  const String identifier =
+      *built != '\0' ? String::fromUTF8(built) : detail::systemBundleIdentifier();
+  return identifier.isNull() ? ""_s : identifier;
 }
 
 void setMainIdentifier(const String& identifier) {

@@ -3,7 +3,7 @@
 /// The main bundle's identifier. It identifies the host program in the system log and among the files of user
 /// defaults.
 ///
-/// On Linux, which has no bundles, a host defines its identifier in any of its source files:
+/// A host defines its identifier in any of its source files:
 ///
 ///     extern "C" const char kMainBundleIdentifier[] = "com.example.Importer";
 ///
@@ -11,7 +11,8 @@
 ///
 ///     rt::Bundle::setMainIdentifier("com.example.Importer"_s);
 ///
-/// On macOS the application's own bundle has the identifier. An identifier that is set takes precedence.
+/// An identifier that is set takes precedence. On macOS, a host that does neither has the identifier of its
+/// application bundle, if it has one. Reading that one loads the framework CoreFoundation.
 ///
 /// Not for: names that people read.
 

@@ -101,15 +101,15 @@ String Number::description() const {
   char* const end = text.data() + text.size();
   char* last = nullptr;
   if (kind_ == Kind::kReal) {
+    // C++ libraries do not agree on its text.
+    if (std::isnan(real_)) return String::fromUTF8("nan");
     last = std::to_chars(text.data(), end, real_, std::chars_format::fixed).ptr;
   } else if (kind_ == Kind::kUnsigned) {
     last = std::to_chars(text.data(), end, integer_).ptr;
   } else {
     last = std::to_chars(text.data(), end, static_cast<std::int64_t>(integer_)).ptr;
   }
-  std::string_view digits(text.data(), static_cast<std::size_t>(last - text.data()));
-  if (digits == "-nan") digits.remove_prefix(1);
-  return String::fromUTF8(digits);
+  return String::fromUTF8({text.data(), static_cast<std::size_t>(last - text.data())});
 }
 
 }  // namespace rt

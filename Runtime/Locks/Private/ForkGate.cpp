@@ -249,6 +249,7 @@ void ForkGate::continueInParent() noexcept {
 }
 
 void ForkGate::continueInChild() noexcept {
+  forgetSleepersAfterFork();
   ThreadState& thread = currentThread;
   generation_.store((generation_.load(std::memory_order_relaxed) + 1) % kGenerations,
                     std::memory_order_relaxed);

@@ -39,4 +39,8 @@ inline void wakeAllAtAddress(const std::atomic<std::uint32_t>* word) noexcept {
   syscall(SYS_futex, word, FUTEX_WAKE_PRIVATE, INT_MAX, nullptr, nullptr, 0);
 }
 
+// Forgets the threads that sleep. For the child of a fork, before anything else there sleeps or wakes. The
+// kernel has done it.
+inline void forgetSleepersAfterFork() noexcept {}
+
 }  // namespace rt::detail

@@ -6,6 +6,7 @@ contradicts itself.
 
 import collections
 import hashlib
+import re
 import struct
 
 CPUS = {0x01000007: "x86_64", 0x0100000C: "arm64"}
@@ -53,6 +54,11 @@ def signed_number(data, at):
     return result - (1 << 7 * (end - at)) if data[end - 1] & 0x40 else result, end
 
 
+def wrapped(address):
+    """Returns the address as the system computes it, which goes back by adding large numbers."""
+    return address & 0xFFFFFFFFFFFFFFFF
+
+
 def text(data, at=0):
     """Reads a text that a zero byte ends."""
     return data[at:data.index(b"\0", at)].decode()
@@ -79,7 +85,7 @@ class Image:
         self.platform = self.minimum = self.name = None
         self.symbols = {}  # By address, the names of functions and variables that the file defines.
         self.has_local_symbols = False
-        self.imports, self.exports = [], set()
+        self.imports, self.exports = [], {}  # The addresses of exports, by name.
         # The pointers that the system corrects at loading: by address, the address or the Import that it points to.
         self.pointers = {}
         self.signature = None
@@ -202,9 +208,9 @@ class Image:
                 address = self.segments[value].address + offset
             elif operation == 0x30:
                 offset, at = number(part, at)
-                address += offset
+                address = wrapped(address + offset)
             elif operation == 0x40:
-                address += 8 * value
+                address = wrapped(address + 8 * value)
             elif operation == 0x50:
                 times = value
             elif operation == 0x60:
@@ -219,7 +225,7 @@ class Image:
                 raise ValueError(f"rebase operation {operation:#x}")
             for _ in range(times):
                 self.pointers[address], = struct.unpack_from("<Q", self.data, self.file_offset(address))
-                address = address + 8 + skip & 0xFFFFFFFFFFFFFFFF
+                address = wrapped(address + 8 + skip)
 
     def _read_binds(self, part, is_lazy):
         at = address = library = 0
@@ -247,7 +253,7 @@ class Image:
                 address = self.segments[value].address + offset
             elif operation == 0x80:
                 offset, at = number(part, at)
-                address += offset
+                address = wrapped(address + offset)
             elif operation == 0x90:
                 times = 1
             elif operation == 0xA0:
@@ -266,7 +272,7 @@ class Image:
                     seen.add(bound)
                     self.imports.append(bound)
                 self.pointers[address] = bound
-                address = address + 8 + skip & 0xFFFFFFFFFFFFFFFF
+                address = wrapped(address + 8 + skip)
 
     def _read_exports(self, part):
         left = [(0, b"")] if part else []
@@ -278,7 +284,8 @@ class Image:
             visited.add(node)
             size, at = number(part, node)
             if size:
-                self.exports.add(prefix.decode())
+                _, value = number(part, at)
+                self.exports[prefix.decode()] = self.base() + number(part, value)[0]
             at += size
             for _ in range(part[at]):
                 end = part.index(b"\0", at + 1)
@@ -331,6 +338,15 @@ class Image:
         return next((section for section in self.sections()
                      if section.address <= address < section.address + section.size), None)
 
+    def section(self, name):
+        """Returns the section with the name, or None."""
+        return next((section for section in self.sections() if section.name == name), None)
+
+    def is_code(self, target):
+        """Returns whether a pointer leads to code of this file. `target` is an address or an Import."""
+        segment = self.segment_at(target) if isinstance(target, int) else None
+        return segment is not None and bool(segment.initial & EXECUTE)
+
     def initialisers(self):
         """Returns the addresses of the initialisers, in the order in which the system calls them."""
         result = []
@@ -349,3 +365,16 @@ class Image:
         count = max(len(pages), len(self.signature.hashes))
         return [index for index in range(count)
                 if index >= len(pages) or self.signature.hashes[index:index + 1] != [hashlib.sha256(pages[index]).digest()]]
+
+
+def read_map(path):
+    """Reads a map, which the linker writes. Returns a list of addresses, names of object files, and names of symbols."""
+    files, symbols = {}, []
+    with open(path, encoding="utf-8") as file:
+        for line in file:
+            entry = re.match(r"(?:(0x[0-9A-F]+)\t0x[0-9A-F]+\t)?\[ *(\d+)\] (.*)\n", line)
+            if entry and entry[1]:
+                symbols.append((int(entry[1], 16), files[entry[2]], entry[3]))
+            elif entry:
+                files[entry[2]] = entry[3]
+    return symbols

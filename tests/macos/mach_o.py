@@ -9,15 +9,17 @@ import hashlib
 import re
 import struct
 
+import loading
+
 CPUS = {0x01000007: "x86_64", 0x0100000C: "arm64"}
-EXECUTABLE, DYLIB, BUNDLE = 2, 6, 8
+EXECUTABLE = 2
 # Flags of the header.
 TWO_LEVEL, STACK_EXECUTION, PIE = 0x80, 0x20000, 0x200000
 WRITE, EXECUTE = 2, 4
 MACOS = 1
 
 DYLIB_COMMANDS = {0xC: "required", 0x80000018: "weak", 0x8000001F: "re-exported", 0x80000023: "upward", 0x20: "lazy"}
-DYLIB_IDENTIFIER, SEGMENT, SYMBOL_TABLE = 0xD, 0x19, 0x2
+SEGMENT, SYMBOL_TABLE = 0x19, 0x2
 LOADER_ENVIRONMENT, RUN_PATH, OLD_VERSION, VERSION = 0x27, 0x8000001C, 0x24, 0x32
 DYLD_INFO = (0x22, 0x80000022)
 CHAINED_FIXUPS, EXPORTS_TRIE, CODE_SIGNATURE = 0x80000034, 0x80000033, 0x1D
@@ -27,41 +29,11 @@ INITIALISER_POINTERS, INITIALISER_OFFSETS = 0x9, 0x16
 Segment = collections.namedtuple("Segment", "name address size offset length maximum initial sections")
 Section = collections.namedtuple("Section", "segment name address size offset type")
 Dylib = collections.namedtuple("Dylib", "path kind")
-# `library` is the number of a dylib, counted from 1, or one of the numbers below.
-Import = collections.namedtuple("Import", "name library is_weak")
-OWN_IMAGE, MAIN_PROGRAM, ANY_IMAGE, COALESCED = 0, -1, -2, -3
-Signature = collections.namedtuple("Signature", "identifier is_ad_hoc limit page_size hashes executable_range")
+Signature = collections.namedtuple("Signature", "is_ad_hoc limit page_size hashes executable_range")
 
 
 class Unreadable(Exception):
     """The file is not what this module reads."""
-
-
-def number(data, at):
-    """Reads a number in groups of seven bits. Returns it and the position behind it."""
-    result = shift = 0
-    while True:
-        byte = data[at]
-        at += 1
-        result |= (byte & 0x7F) << shift
-        shift += 7
-        if byte < 0x80:
-            return result, at
-
-
-def signed_number(data, at):
-    result, end = number(data, at)
-    return result - (1 << 7 * (end - at)) if data[end - 1] & 0x40 else result, end
-
-
-def wrapped(address):
-    """Returns the address as the system computes it, which goes back by adding large numbers."""
-    return address & 0xFFFFFFFFFFFFFFFF
-
-
-def text(data, at=0):
-    """Reads a text that a zero byte ends."""
-    return data[at:data.index(b"\0", at)].decode()
 
 
 class Image:
@@ -82,10 +54,9 @@ class Image:
             raise ValueError(f"magic number {magic:#x}")
         self.cpu = CPUS[cpu]
         self.segments, self.dylibs, self.run_paths, self.environment = [], [], [], []
-        self.platform = self.minimum = self.name = None
-        self.symbols = {}  # By address, the names of functions and variables that the file defines.
+        self.platform = self.minimum = None
         self.has_local_symbols = False
-        self.imports, self.exports = [], {}  # The addresses of exports, by name.
+        self.imports, self.exports = set(), {}  # The addresses of exports, by name.
         # The pointers that the system corrects at loading: by address, the address or the Import that it points to.
         self.pointers = {}
         self.signature = None
@@ -99,18 +70,20 @@ class Image:
         for command, body in found.items():
             if command in DYLD_INFO:
                 offsets = struct.unpack_from("<10I", body, 8)
-                parts = [self.data[offset:offset + size] for offset, size in zip(offsets[::2], offsets[1::2])]
-                self._read_rebases(parts[0])
-                for part in parts[1:4]:
-                    self._read_binds(part, is_lazy=part is parts[3])
-                self._read_exports(parts[4])
+                rebases, binds, coalesced, lazy, exports = (
+                    self.data[offset:offset + size] for offset, size in zip(offsets[::2], offsets[1::2]))
+                loading.Rebases(self, rebases).run()
+                loading.Binds(self, binds, library=0).run()
+                loading.Binds(self, coalesced, library=loading.COALESCED).run()
+                loading.Binds(self, lazy, library=0).run()
+                loading.read_exports(self, exports)
                 continue
             offset, size = struct.unpack_from("<2I", body, 8)
             part = self.data[offset:offset + size]
             if command == CHAINED_FIXUPS:
-                self._read_chains(part)
+                loading.read_chains(self, part)
             elif command == EXPORTS_TRIE:
-                self._read_exports(part)
+                loading.read_exports(self, part)
             else:
                 self._read_signature(part)
                 self.signature_offset = offset
@@ -119,19 +92,16 @@ class Image:
         if command == SEGMENT:
             self._read_segment(body)
         elif command in DYLIB_COMMANDS:
-            self.dylibs.append(Dylib(text(body, struct.unpack_from("<I", body, 8)[0]), DYLIB_COMMANDS[command]))
-        elif command in (DYLIB_IDENTIFIER, RUN_PATH, LOADER_ENVIRONMENT):
-            value = text(body, struct.unpack_from("<I", body, 8)[0])
-            if command == DYLIB_IDENTIFIER:
-                self.name = value
-            else:
-                (self.run_paths if command == RUN_PATH else self.environment).append(value)
+            self.dylibs.append(Dylib(loading.text(body, struct.unpack_from("<I", body, 8)[0]), DYLIB_COMMANDS[command]))
+        elif command in (RUN_PATH, LOADER_ENVIRONMENT):
+            value = loading.text(body, struct.unpack_from("<I", body, 8)[0])
+            (self.run_paths if command == RUN_PATH else self.environment).append(value)
         elif command in (VERSION, OLD_VERSION):
             platform, version = struct.unpack_from("<2I", body, 8) if command == VERSION else (
                 MACOS, *struct.unpack_from("<I", body, 8))
             self.platform, self.minimum = platform, (version >> 16, version >> 8 & 0xFF)
         elif command == SYMBOL_TABLE:
-            self._read_symbols(*struct.unpack_from("<4I", body, 8))
+            self._read_symbols(*struct.unpack_from("<2I", body, 8))
         elif command in (CHAINED_FIXUPS, EXPORTS_TRIE, CODE_SIGNATURE, *DYLD_INFO):
             found[command] = body
 
@@ -147,151 +117,10 @@ class Image:
             raise ValueError(f"{name} is longer than the file")
         self.segments.append(segment)
 
-    def _read_symbols(self, offset, count, names, size):
-        names = self.data[names:names + size]
-        for index in range(count):
-            name, kind, section, _, value = struct.unpack_from("<I2BHQ", self.data, offset + 16 * index)
-            is_debugging, is_external, is_defined = kind & 0xE0, kind & 0x01, section != 0
-            self.has_local_symbols |= bool(is_debugging or not is_external)
-            if is_defined and not is_debugging:
-                self.symbols.setdefault(value, text(names, name))
-
-    # The newer form of fixups: each page has a chain of pointers, and each of these has the distance to the next.
-
-    def _read_chains(self, part):
-        _, starts, imports, names, count, form, _ = struct.unpack_from("<7I", part)
-        for index in range(count):
-            if form in (1, 2):
-                bits, = struct.unpack_from("<I", part, imports + index * 4 * form)
-                library, is_weak, name = bits & 0xFF, bits >> 8 & 1, bits >> 9
-                library -= 0x100 if library > 0xF0 else 0
-            elif form == 3:
-                bits, = struct.unpack_from("<Q", part, imports + index * 16)
-                library, is_weak, name = bits & 0xFFFF, bits >> 16 & 1, bits >> 32
-                library -= 0x10000 if library > 0xFFF0 else 0
-            else:
-                raise ValueError(f"imports of form {form}")
-            self.imports.append(Import(text(part, names + name), library, bool(is_weak)))
-        for index in range(struct.unpack_from("<I", part, starts)[0]):
-            offset, = struct.unpack_from("<I", part, starts + 4 + 4 * index)
-            if offset != 0:
-                self._read_pages(part, starts + offset)
-
-    def _read_pages(self, part, at):
-        _, page_size, form, segment, _, count = struct.unpack_from("<I2HQIH", part, at)
-        if form not in (2, 6):
-            raise ValueError(f"pointers of form {form}")
-        base = self.base()
-        for page, start in enumerate(struct.unpack_from(f"<{count}H", part, at + 22)):
-            address = base + segment + page * page_size + start
-            while start != 0xFFFF:
-                pointer, = struct.unpack_from("<Q", self.data, self.file_offset(address))
-                if pointer >> 63:
-                    self.pointers[address] = self.imports[pointer & 0xFFFFFF]
-                else:
-                    self.pointers[address] = (pointer & (1 << 36) - 1) + (base if form == 6 else 0)
-                distance = pointer >> 51 & 0xFFF
-                if distance == 0:
-                    break
-                address += 4 * distance
-
-    # The older form of fixups: programs for a small machine that walks over the segments.
-
-    def _read_rebases(self, part):
-        at = address = 0
-        while at < len(part):
-            operation, value = part[at] & 0xF0, part[at] & 0x0F
-            at += 1
-            times, skip = 0, 0
-            if operation == 0x20:
-                offset, at = number(part, at)
-                address = self.segments[value].address + offset
-            elif operation == 0x30:
-                offset, at = number(part, at)
-                address = wrapped(address + offset)
-            elif operation == 0x40:
-                address = wrapped(address + 8 * value)
-            elif operation == 0x50:
-                times = value
-            elif operation == 0x60:
-                times, at = number(part, at)
-            elif operation == 0x70:
-                times = 1
-                skip, at = number(part, at)
-            elif operation == 0x80:
-                times, at = number(part, at)
-                skip, at = number(part, at)
-            elif operation not in (0x00, 0x10):
-                raise ValueError(f"rebase operation {operation:#x}")
-            for _ in range(times):
-                self.pointers[address], = struct.unpack_from("<Q", self.data, self.file_offset(address))
-                address = wrapped(address + 8 + skip)
-
-    def _read_binds(self, part, is_lazy):
-        at = address = library = 0
-        name, is_weak, seen = "", False, set(self.imports)
-        # Coalesced binds name no library.
-        if not is_lazy and part and part[0] & 0xF0 == 0x40:
-            library = COALESCED
-        while at < len(part):
-            operation, value = part[at] & 0xF0, part[at] & 0x0F
-            at += 1
-            times, skip = 0, 0
-            if operation == 0x10:
-                library = value
-            elif operation == 0x20:
-                library, at = number(part, at)
-            elif operation == 0x30:
-                library = value - 0x10 if value else 0
-            elif operation == 0x40:
-                name, is_weak = text(part, at), bool(value & 1)
-                at += len(name) + 1
-            elif operation == 0x60:
-                _, at = signed_number(part, at)
-            elif operation == 0x70:
-                offset, at = number(part, at)
-                address = self.segments[value].address + offset
-            elif operation == 0x80:
-                offset, at = number(part, at)
-                address = wrapped(address + offset)
-            elif operation == 0x90:
-                times = 1
-            elif operation == 0xA0:
-                times = 1
-                skip, at = number(part, at)
-            elif operation == 0xB0:
-                times, skip = 1, 8 * value
-            elif operation == 0xC0:
-                times, at = number(part, at)
-                skip, at = number(part, at)
-            elif operation not in (0x00, 0x50):
-                raise ValueError(f"bind operation {operation:#x}")
-            for _ in range(times):
-                bound = Import(name, library, is_weak)
-                if bound not in seen:
-                    seen.add(bound)
-                    self.imports.append(bound)
-                self.pointers[address] = bound
-                address = wrapped(address + 8 + skip)
-
-    def _read_exports(self, part):
-        left = [(0, b"")] if part else []
-        visited = set()
-        while left:
-            node, prefix = left.pop()
-            if node in visited:
-                raise ValueError("the exports are no tree")
-            visited.add(node)
-            size, at = number(part, node)
-            if size:
-                _, value = number(part, at)
-                self.exports[prefix.decode()] = self.base() + number(part, value)[0]
-            at += size
-            for _ in range(part[at]):
-                end = part.index(b"\0", at + 1)
-                child, after = number(part, end + 1)
-                left.append((child, prefix + part[at + 1:end]))
-                at = after - 1
+    def _read_symbols(self, offset, count):
+        kinds = [self.data[offset + 16 * index + 4] for index in range(count)]
+        # Symbols for debuggers have one of the upper bits, and those that other files see have the lowest one.
+        self.has_local_symbols = any(kind & 0xE0 or not kind & 0x01 for kind in kinds)
 
     def _read_signature(self, part):
         """Reads the code directory: the hashes of the file's pages."""
@@ -299,7 +128,7 @@ class Image:
         if magic != 0xFADE0CC0:
             raise ValueError(f"signature with magic number {magic:#x}")
         at = dict(struct.unpack_from(">2I", part, 12 + 8 * index) for index in range(count))[0]
-        magic, size, version, flags, hashes, identifier, _, count, limit = struct.unpack_from(">9I", part, at)
+        magic, size, version, flags, hashes, _, _, count, limit = struct.unpack_from(">9I", part, at)
         if magic != 0xFADE0C02 or version < 0x20400:
             raise ValueError(f"code directory with magic number {magic:#x} and version {version:#x}")
         hash_size, kind, _, page_size = struct.unpack_from("4B", part, at + 36)
@@ -308,7 +137,7 @@ class Image:
         start, length, _ = struct.unpack_from(">3Q", part, at + 64)
         directory = part[at:at + size]
         self.signature = Signature(
-            text(directory, identifier), bool(flags & 2), limit, 1 << page_size,
+            bool(flags & 2), limit, 1 << page_size,
             [directory[hashes + 32 * index:hashes + 32 * index + 32] for index in range(count)], (start, length))
 
     def base(self):

@@ -193,7 +193,8 @@ class FailingCalls : public testing::Test {
   void tryEachCall(const std::string& name) {
     static const std::set<std::string> kInterruptible = {"open",  "openat",  "read",     "pread64",
                                                          "write", "writev",  "pwritev2", "close",
-                                                         "poll",  "connect", "sendmsg"};
+                                                         "poll",  "select",  "pselect6",
+                                                         "connect", "sendmsg"};
     static const std::set<std::string> kOthers = {"access",
                                                   "dup",
                                                   "eventfd2",

@@ -27,13 +27,6 @@ static_assert(noexcept(UnfairLock()));
 
 constinit UnfairLock lockAtNamespaceScope;
 
-// Returns the object's address as %p prints it, for patterns.
-std::string addressOf(const void* object) {
-  std::array<char, 32> text{};
-  std::snprintf(text.data(), text.size(), "%p", object);
-  return text.data();
-}
-
 // Not analysed: death tests end the program on purpose, which the analysis cannot know.
 #define NOT_ANALYSED [&]() RT_NO_THREAD_SAFETY_ANALYSIS
 
@@ -162,6 +155,13 @@ TEST(UnfairLock, LeavesErrnoAloneWhileItWaits) {
 }
 
 #if !defined(__APPLE__)
+
+// Returns the object's address as %p prints it, for patterns.
+std::string addressOf(const void* object) {
+  std::array<char, 32> text{};
+  std::snprintf(text.data(), text.size(), "%p", object);
+  return text.data();
+}
 
 TEST(UnfairLockDeathTest, LockingTwiceEndsTheProgram) {
   UnfairLock lock;

@@ -17,7 +17,8 @@
 ///
 /// Tasks stay queued until the main thread calls `run` or `drain`, calls `sync` on the main queue, or
 /// exits. In every other way the main queue is like any `rt::Queue` (Runtime/Queues/Queue.h). On macOS the
-/// system's own main loop drains it too.
+/// system's own main loop (`CFRunLoopRun`, `NSApplicationMain`) drains it too, but not in the child of a
+/// fork. A host that calls `dispatch_main` there has no main thread any more, so nothing runs its tasks.
 ///
 /// Not for: programs whose main thread has no time to run tasks. They use a queue of their own.
 

@@ -10,7 +10,9 @@
 #include <stdexcept>
 #include <string>
 
+#include "Runtime/Defaults/Private/SystemDefaultsFolder.h"
 #include "Runtime/Defaults/UserDefaults.h"
+#include "Runtime/Process/Process.h"
 #include "tests/support/SettingsFile.h"
 
 /// Gives the test program its own standard user defaults, in a temporary folder. The destructor removes the
@@ -34,7 +36,8 @@ class PrivateDefaults {
     owner_ = getpid();
     setenv(kFolder, folder.c_str(), 1);
     setenv("XDG_CONFIG_HOME", folder.c_str(), 1);
-    std::filesystem::create_directory(file().parent_path());
+    setenv("HOME", folder.c_str(), 1);
+    std::filesystem::create_directories(file().parent_path());
   }
   PrivateDefaults(const PrivateDefaults&) = delete;
   PrivateDefaults& operator=(const PrivateDefaults&) = delete;
@@ -45,7 +48,7 @@ class PrivateDefaults {
 
   /// Returns the path of the settings' file. Its folder exists.
   std::filesystem::path file() const {
-    return folder_ / std::filesystem::read_symlink("/proc/self/exe").filename() / "defaults.conf";
+    return rt::detail::systemDefaultsFolder() + "/" + std::string(rt::Process::name().view()) + "/defaults.conf";
   }
 
   /// Gives the file the setting `key` with `value`, which it does not have yet, and `others`. No other

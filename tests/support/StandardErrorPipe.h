@@ -23,9 +23,8 @@ class StandardErrorPipe {
   enum class Kind : std::uint8_t { pipe, socket };
 
   explicit StandardErrorPipe(Kind kind = Kind::pipe) : kept_(fcntl(STDERR_FILENO, F_DUPFD_CLOEXEC, 3)) {
-    EXPECT_EQ(kind == Kind::pipe ? pipe2(ends_.data(), O_CLOEXEC)
-                                 : socketpair(AF_UNIX, SOCK_STREAM | SOCK_CLOEXEC, 0, ends_.data()),
-              0);
+    EXPECT_EQ(kind == Kind::pipe ? pipe(ends_.data()) : socketpair(AF_UNIX, SOCK_STREAM, 0, ends_.data()), 0);
+    for (const int end : ends_) fcntl(end, F_SETFD, FD_CLOEXEC);
     dup2(ends_[1], STDERR_FILENO);
   }
   StandardErrorPipe(const StandardErrorPipe&) = delete;

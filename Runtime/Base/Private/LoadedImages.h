@@ -12,14 +12,23 @@
 //
 // An image that uses a class announces it, too, since each image may have a record of its own. A literal is
 // an object. So an image with a literal announces the class of strings.
+//
+// Each source file lists the announcements that it mentions. An initialiser of the image walks the list. One
+// initialiser for each class in each source file would make hundreds of them.
 
 namespace rt::detail {
 
-// The state that a mark leads to. Each system defines its own.
-struct ImageState;
+// The state that a mark leads to. Each image has its own.
+struct ImageState {
+  bool isAnnounced = false;
+};
 
-// Images announce what they have at constructor priority 102, on macOS also at 101. 101 is the first priority
-// that is free to use. Static objects without a priority are initialised after both.
+// An entry of an image's list of announcements. It is called like a function. Each system defines its own.
+class Announcement;
+
+// Makes the announcements of the image that has `state`, from `begin` to `end`, and notes that. Runs the load
+// hooks if the image was the last one. A second call does nothing.
+void announce(ImageState& state, const Announcement* begin, const Announcement* end) noexcept;
 
 // Keeps the image with the mark `state` loaded as long as the process lives. What the image has announced is
 // referred to for ever, and so may be its literals. Does nothing for the program itself.
@@ -38,6 +47,9 @@ void runLoadHooksWhenComplete() noexcept;
 
 }  // namespace rt::detail
 
+// The header below also defines the image's `imageState`. It has the initialiser that calls the first function
+// above with that state and the image's list. Mentioning `AnnouncedOnLoading<entry>::run` puts it into the
+// list. It calls `announce(entry)`.
 #ifdef __APPLE__
 #include "Runtime/Base/Private/Darwin/ImageMark.h"
 #else

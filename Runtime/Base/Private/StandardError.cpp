@@ -1,14 +1,14 @@
 #include "Runtime/Base/Private/StandardError.h"
 
-#include <poll.h>
+#include <sys/select.h>
 #include <sys/stat.h>
-#include <sys/uio.h>
 #include <unistd.h>
 
 #include <algorithm>
 #include <cerrno>
 #include <climits>
-#include <csignal>
+
+#include "Runtime/Base/Private/SystemStandardError.h"
 
 namespace rt::StandardError {
 
@@ -16,64 +16,29 @@ namespace {
 
 using Clock = std::chrono::steady_clock;
 
-// Keeps a SIGPIPE that the calling thread raises from being delivered. Leaves any other SIGPIPE pending.
-class BrokenPipeIgnored {
- public:
-  BrokenPipeIgnored() noexcept {
-    sigemptyset(&brokenPipe_);
-    sigaddset(&brokenPipe_, SIGPIPE);
-    wasPending_ = isPending();
-    pthread_sigmask(SIG_BLOCK, &brokenPipe_, &previous_);
-  }
-  BrokenPipeIgnored(const BrokenPipeIgnored&) = delete;
-  BrokenPipeIgnored& operator=(const BrokenPipeIgnored&) = delete;
-  ~BrokenPipeIgnored() {
-    if (!wasPending_ && isPending()) {
-      int ignored = 0;
-      sigwait(&brokenPipe_, &ignored);
-    }
-    pthread_sigmask(SIG_SETMASK, &previous_, nullptr);
-  }
-
- private:
-  static bool isPending() noexcept {
-    sigset_t pending;
-    sigpending(&pending);
-    return sigismember(&pending, SIGPIPE) == 1;
-  }
-
-  sigset_t brokenPipe_;
-  sigset_t previous_;
-  bool wasPending_;
-};
-
 // Waits until there is room, or until `end`. Returns whether there is room. Also returns true if there will
 // never be room. The next write then fails and gives the reason.
 bool awaitRoom(Clock::time_point end) noexcept {
   for (;;) {
-    const auto left = std::chrono::ceil<std::chrono::milliseconds>(end - Clock::now());
-    pollfd stream{STDERR_FILENO, POLLOUT, 0};
-    const int ready = poll(&stream, 1, static_cast<int>(std::max<long long>(left.count(), 0)));
+    const auto left = std::max(std::chrono::ceil<std::chrono::microseconds>(end - Clock::now()),
+                               std::chrono::microseconds(0));
+    const auto seconds = std::chrono::duration_cast<std::chrono::seconds>(left);
+    timeval timeout{};
+    timeout.tv_sec = seconds.count();
+    timeout.tv_usec = static_cast<decltype(timeout.tv_usec)>((left - seconds).count());
+    fd_set stream;
+    FD_ZERO(&stream);
+    FD_SET(STDERR_FILENO, &stream);
+    // macOS does not poll terminals and other devices.
+    const int ready = select(STDERR_FILENO + 1, nullptr, &stream, nullptr, &timeout);
     if (ready < 0 && errno == EINTR) continue;
     return ready > 0;
   }
 }
 
-// Writes without waiting where the system can do that, since another writer may have taken the room
-// meanwhile.
-ssize_t writeWithoutWaiting(std::string_view text) noexcept {
-#ifdef __linux__
-  const iovec piece{const_cast<char*>(text.data()), text.size()};
-  const ssize_t count = pwritev2(STDERR_FILENO, &piece, 1, -1, RWF_NOWAIT);
-  if (count >= 0 || errno != EOPNOTSUPP) return count;
-#endif
-  return ::write(STDERR_FILENO, text.data(), text.size());
-}
-
 }  // namespace
 
 bool write(std::string_view text, std::chrono::milliseconds longestWait) noexcept {
-  const BrokenPipeIgnored guard;
   const Clock::time_point end = Clock::now() + longestWait;
   // A file takes the whole text at once. Any other stream that reports room has room for PIPE_BUF bytes.
   struct stat status{};
@@ -84,7 +49,7 @@ bool write(std::string_view text, std::chrono::milliseconds longestWait) noexcep
       count = ::write(STDERR_FILENO, text.data(), text.size());
     } else {
       if (!awaitRoom(end)) return false;
-      count = writeWithoutWaiting(text.substr(0, PIPE_BUF));
+      count = detail::writeStandardErrorOnce(text.substr(0, PIPE_BUF));
     }
     if (count > 0) {
       text.remove_prefix(static_cast<std::size_t>(count));

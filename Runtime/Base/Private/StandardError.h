@@ -20,7 +20,7 @@ namespace rt::StandardError {
 ///
 /// Threads: any thread may call this. It takes no lock and allocates nothing. The texts of several threads
 /// stay apart if standard error is a file. Otherwise each text may be only as long as a pipe takes in one
-/// piece (4096 bytes on Linux).
+/// piece (4096 bytes on Linux, 512 on macOS).
 bool write(std::string_view text, std::chrono::milliseconds longestWait) noexcept;
 
 }  // namespace rt::StandardError

@@ -95,6 +95,16 @@ constexpr bool isValidUTF8(std::string_view bytes) noexcept {
   return validUTF8Length(bytes) == bytes.size();
 }
 
+/// Returns how many leading bytes of `text` fit into `room` bytes if no character is cut in two. Text that
+/// has no beginning of a character there is cut anywhere, so that something fits.
+constexpr std::size_t lengthThatFits(std::string_view text, std::size_t room) noexcept {
+  if (text.size() <= room) return text.size();
+  std::size_t length = room;
+  // A byte of the form 10xxxxxx continues a character.
+  while (length > 0 && (static_cast<unsigned char>(text[length]) & 0xC0U) == 0x80U) --length;
+  return length > 0 ? length : room;
+}
+
 /// Writes `character` to `bytes`, which has room for `kMaximumUTF8Length` bytes. Returns how many bytes it
 /// took. Writes U+FFFD for a surrogate and for a value above U+10FFFF.
 constexpr std::size_t encodeUTF8(char32_t character, char* bytes) noexcept {

@@ -123,4 +123,15 @@ TEST(UTF8, RepairsEachInvalidSequenceOnce) {
   EXPECT_EQ(rt::String::fromUTF8Repaired(""), "");
 }
 
+TEST(UTF8, CutsBetweenCharacters) {
+  EXPECT_EQ(rt::lengthThatFits("", 2), 0U);
+  EXPECT_EQ(rt::lengthThatFits("abc", 3), 3U);
+  EXPECT_EQ(rt::lengthThatFits("abc", 2), 2U);
+  EXPECT_EQ(rt::lengthThatFits("a\u00E9b", 2), 1U);
+  EXPECT_EQ(rt::lengthThatFits("a\u00E9b", 3), 3U);
+  EXPECT_EQ(rt::lengthThatFits("a\U0001F600", 4), 1U);
+  // No character begins here, and something has to fit.
+  EXPECT_EQ(rt::lengthThatFits("\x80\x80\x80", 2), 2U);
+}
+
 }  // namespace

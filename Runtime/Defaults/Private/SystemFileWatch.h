@@ -36,10 +36,12 @@ class SystemFileWatch {
   const std::string path_;
   std::atomic<bool> isStopped_{false};
   FileDescriptor events_;
-  // Wakes the thread that waits. On macOS, `events_` does that as well.
+  // On Linux: wakes the thread that waits. On macOS, `events_` does that as well.
   FileDescriptor wake_;
-  // Identifiers of inotify, or descriptors on macOS.
+  // On Linux: the identifiers of what is watched.
   std::vector<int> watched_;
+  // On macOS: what is watched. Closing a file ends its events.
+  std::vector<FileDescriptor> files_;
 };
 
 }  // namespace rt::detail

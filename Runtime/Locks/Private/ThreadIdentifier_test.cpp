@@ -1,7 +1,6 @@
 #include "Runtime/Locks/Private/ThreadIdentifier.h"
 
 #include <gtest/gtest.h>
-#include <sys/syscall.h>
 #include <sys/wait.h>
 #include <unistd.h>
 

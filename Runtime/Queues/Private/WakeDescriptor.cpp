@@ -64,6 +64,7 @@ void WakeDescriptor::wait() noexcept {
 }
 
 void WakeDescriptor::renewAfterFork() noexcept {
+  forgetSystemMainLoopAfterFork();
   isSet_.store(false);
   const int descriptor = readEnd_.load();
   if (descriptor < 0) return;

@@ -15,6 +15,10 @@ bool openSystemWake(std::array<int, 2>& ends) noexcept;
 /// Makes the system's own main loop, if there is one, drain the main queue.
 void wakeSystemMainLoop() noexcept;
 
+/// Makes `wakeSystemMainLoop` do nothing from now on if that loop does not work in the child of a fork. For
+/// the child.
+void forgetSystemMainLoopAfterFork() noexcept;
+
 class WakeDescriptor {
  public:
   constexpr WakeDescriptor() noexcept = default;

@@ -4,8 +4,10 @@
 //
 // The first work starts the first thread. A thread that has had no work for `idleTimeout` ends. Work that
 // finds no idle thread gets a new one, up to kMaximumThreads for utility work and as many for all other
-// work. So tasks that wait for each other on different queues do not starve each other. On macOS the system
-// has the threads.
+// work. So tasks that wait for each other on different queues do not starve each other.
+//
+// macOS has threads for all queues of a process. They are not used, since they end the child of a fork that
+// uses them.
 
 #include <atomic>
 #include <cstdint>

@@ -11,26 +11,33 @@
 namespace rt::detail {
 
 // The state that the mark of an image leads to. It is hidden, so that each image has its own.
-struct ImageState {
-  bool isAnnounced = false;
-};
 [[gnu::visibility("hidden")]] inline constinit ImageState imageState;
-
-// Calls the functions of the image that has `state`, and notes that the image has announced what it has. Runs
-// the load hooks if the image was the last one. A second call does nothing. `begin` and `end` are the image's
-// list of functions, below.
-void announce(ImageState& state, const std::int32_t* begin, const std::int32_t* end) noexcept;
 
 inline constexpr char kImageMarkName[] = "rt-image";
 inline constexpr unsigned kImageMarkType = 1;
 
-// The list of functions that announce what an image has. Each entry is the distance from the entry to a
-// function, so that loading the image needs no relocation. The linker joins the entries and names both ends
-// of the list.
+// The distance from this object to a function, so that loading the image needs no relocation.
+class Announcement {
+ public:
+  Announcement() = delete;  // Only `AnnouncedOnLoading` makes one, below.
+  Announcement(const Announcement&) = delete;
+  Announcement& operator=(const Announcement&) = delete;
+
+  void operator()() const {
+    const std::uintptr_t address =
+        reinterpret_cast<std::uintptr_t>(this) + static_cast<std::uintptr_t>(std::intptr_t{distance_});
+    reinterpret_cast<void (*)()>(address)();  // NOLINT(performance-no-int-to-ptr): the linker says so
+  }
+
+ private:
+  std::int32_t distance_;
+};
+
+// The list of the image's announcements. The linker joins them and names both ends of the list.
 [[gnu::weak,
-  gnu::visibility("hidden")]] extern const std::int32_t announcementsBegin[] asm("__start_rt_announcements");
+  gnu::visibility("hidden")]] extern const Announcement announcementsBegin[] asm("__start_rt_announcements");
 [[gnu::weak,
-  gnu::visibility("hidden")]] extern const std::int32_t announcementsEnd[] asm("__stop_rt_announcements");
+  gnu::visibility("hidden")]] extern const Announcement announcementsEnd[] asm("__stop_rt_announcements");
 
 // clang may run initialisers of static objects at compile time, so it must know what runs before them. The
 // attribute tells it that, and makes one call for each source file. With g++, the function puts itself into a

@@ -1,7 +1,3 @@
-// An image with classes is never unloaded, because its objects, literals and class methods may be anywhere in
-// the program. `announce` has the loader keep the image. A linker option would not do: it would not reach a
-// plug-in that takes the runtime from its host.
-
 #include "Runtime/Base/Private/LoadedImages.h"
 
 #include <dlfcn.h>
@@ -86,18 +82,6 @@ int inspect(dl_phdr_info* image, std::size_t /*size*/, void* /*context*/) {
 }
 
 }  // namespace
-
-void announce(ImageState& state, const std::int32_t* begin, const std::int32_t* end) noexcept {
-  if (state.isAnnounced) return;
-  for (const std::int32_t* distance = begin; distance != end; ++distance) {
-    const std::uintptr_t address =
-        reinterpret_cast<std::uintptr_t>(distance) + static_cast<std::uintptr_t>(std::intptr_t{*distance});
-    reinterpret_cast<void (*)()>(address)();  // NOLINT(performance-no-int-to-ptr): the linker says so
-  }
-  state.isAnnounced = true;
-  keepImage(state);
-  runLoadHooksWhenComplete();
-}
 
 void keepImage(const ImageState& state) noexcept {
   if (dlsym == nullptr) return;

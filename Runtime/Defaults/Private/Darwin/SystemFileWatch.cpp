@@ -5,6 +5,7 @@
 #include <unistd.h>
 
 #include <cerrno>
+#include <string>
 #include <system_error>
 #include <utility>
 
@@ -20,10 +21,17 @@ constexpr unsigned kEvents = NOTE_WRITE | NOTE_EXTEND | NOTE_ATTRIB | NOTE_DELET
   throw std::system_error(errno, std::generic_category(), what);
 }
 
-// Adds `path` to `queue`. Returns the descriptor that it is watched by, or none if it cannot be opened.
-FileDescriptor watch(int queue, const char* path) {
-  FileDescriptor file(open(path, O_EVTONLY | O_CLOEXEC));
-  if (!file) return file;
+// Adds `path` to `queue`. Returns the descriptor that it is watched by, or none if nothing at the path can be
+// opened. Events of its folder then tell when that changes.
+FileDescriptor watch(int queue, const std::string& path) {
+  FileDescriptor file(open(path.c_str(), O_EVTONLY | O_CLOEXEC));
+  if (!file) {
+    if (errno == ENOENT || errno == ENOTDIR || errno == EACCES || errno == ELOOP ||
+        errno == EOPNOTSUPP) {  // a socket
+      return file;
+    }
+    fail("open");
+  }
   struct kevent event;
   EV_SET(&event, file.get(), EVFILT_VNODE, EV_ADD | EV_CLEAR, kEvents, 0, nullptr);
   if (kevent(queue, &event, 1, nullptr, 0, nullptr) != 0) fail("kevent");
@@ -41,26 +49,28 @@ SystemFileWatch::SystemFileWatch(const std::string& path) : path_(path), events_
   arm();
 }
 
-SystemFileWatch::~SystemFileWatch() {
-  for (const int file : watched_) close(file);
-}
+SystemFileWatch::~SystemFileWatch() = default;
 
 void SystemFileWatch::arm() {
   // Events of a folder are about the names in it, and events of the file about its content.
-  std::vector<int> watched;
-  watched.reserve(2);
-  std::string folder = folderOf(path_);
-  FileDescriptor file = watch(events_.get(), folder.c_str());
-  while (!file && folder != "/") {
-    folder = folderOf(folder);
-    file = watch(events_.get(), folder.c_str());
+  const std::string whole = folderOf(path_);
+  std::vector<FileDescriptor> watched;
+  // Watches the file's folder, or the nearest folder above it that can be watched. A folder below that one
+  // may appear meanwhile, so the loop goes on until it finds the same folder twice.
+  std::string found;
+  for (std::string folder = whole;;) {
+    if (FileDescriptor file = watch(events_.get(), folder)) {
+      watched.push_back(std::move(file));
+      if (folder == whole || folder == found) break;
+      found = std::exchange(folder, whole);
+    } else if (folder != "/") {
+      folder = folderOf(folder);
+    } else {
+      fail("open");
+    }
   }
-  if (!file) fail("open");
-  FileDescriptor target = watch(events_.get(), path_.c_str());
-  watched.push_back(file.release());
-  if (target) watched.push_back(target.release());
-  for (const int old : watched_) close(old);
-  watched_ = std::move(watched);
+  if (FileDescriptor target = watch(events_.get(), path_)) watched.push_back(std::move(target));
+  files_ = std::move(watched);
 }
 
 bool SystemFileWatch::wait() {

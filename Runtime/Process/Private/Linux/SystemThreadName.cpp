@@ -8,6 +8,7 @@
 #include <cerrno>
 #include <string_view>
 
+#include "Runtime/Base/Private/UTF8.h"
 #include "Runtime/Locks/Private/Lazy.h"
 
 namespace rt::detail {
@@ -52,12 +53,8 @@ String systemThreadName() {
 void setSystemThreadName(const String& name) noexcept {
   const Text& unnamed = firstProcessName();
   const std::string_view text = name.isNull() ? std::string_view(unnamed.data()) : name.view();
-  std::size_t length = text.size() < kCapacity ? text.size() : kCapacity - 1;
-  // A byte of the form 10xxxxxx continues a character, which must not be cut in two.
-  while (length > 0 && length < text.size() && (static_cast<unsigned char>(text[length]) & 0xC0U) == 0x80U)
-    --length;
   Text shortened{};
-  text.copy(shortened.data(), length);
+  text.copy(shortened.data(), lengthThatFits(text, kCapacity - 1));
   prctl(PR_SET_NAME, shortened.data());
 }
 

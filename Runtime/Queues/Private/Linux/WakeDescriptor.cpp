@@ -11,4 +11,6 @@ bool openSystemWake(std::array<int, 2>& ends) noexcept {
 
 void wakeSystemMainLoop() noexcept {}
 
+void forgetSystemMainLoopAfterFork() noexcept {}
+
 }  // namespace rt::detail

@@ -2,55 +2,35 @@
 
 #include <os/log.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <string_view>
+
+#include "Runtime/Base/Private/UTF8.h"
 
 namespace rt {
 
 namespace {
 
 // The log cuts what an entry brings along at about 1 KiB.
-constexpr std::size_t kLongestPiece = 960;
+constexpr std::size_t kLongestEntry = 960;
+constexpr std::size_t kLongestName = 255;
 
-// The beginning of a text, as much as fits, with a NUL at its end. The log takes no other text. A NUL within
-// the text becomes "\x00". No character is cut in two.
-template <std::size_t longest>
-class Piece {
+// The text that the log takes ends with NUL. A NUL within the text becomes a space.
+template <std::size_t capacity>
+class EndedText {
  public:
-  // Takes what fits from the beginning of `text` and removes it there.
-  explicit Piece(std::string_view& text) noexcept {
-    constexpr std::string_view kNUL = "\\x00";
-    std::size_t taken = 0;
-    std::size_t length = 0;
-    // Where the last character began, in `text` and in the piece.
-    std::size_t lastTaken = 0;
-    std::size_t lastLength = 0;
-    while (taken < text.size()) {
-      if ((static_cast<unsigned char>(text[taken]) & 0xC0U) != 0x80U) {
-        lastTaken = taken;
-        lastLength = length;
-      }
-      const std::string_view next = text[taken] == '\0' ? kNUL : text.substr(taken, 1);
-      if (length + next.size() > longest) {
-        // Bytes that are no text may have no beginning of a character.
-        if (lastTaken > 0) {
-          taken = lastTaken;
-          length = lastLength;
-        }
-        break;
-      }
-      length += next.copy(text_.data() + length, next.size());
-      ++taken;
-    }
-    text_[length] = '\0';
-    text.remove_prefix(taken);
+  // Precondition: `text` has `capacity` bytes at most.
+  explicit EndedText(std::string_view text) noexcept {
+    const auto end = std::ranges::replace_copy(text, text_.begin(), '\0', ' ').out;
+    *end = '\0';
   }
 
-  const char* c_str() const noexcept { return text_.data(); }
+  const char* begin() const noexcept { return text_.data(); }
 
  private:
-  std::array<char, longest + 1> text_;
+  std::array<char, capacity + 1> text_;
 };
 
 // Keeps `errno` as it is.
@@ -65,11 +45,14 @@ class ErrnoKept {
   int error_ = errno;
 };
 
+EndedText<kLongestName> nameOf(const String& name) noexcept {
+  const std::string_view text = name.view();
+  return EndedText<kLongestName>(text.substr(0, lengthThatFits(text, kLongestName)));
+}
+
 // The system keeps one object for each subsystem and category, so there is no need to keep it here.
 os_log_t logOf(const String& subsystem, const String& category) noexcept {
-  std::string_view subsystemText = subsystem.view();
-  std::string_view categoryText = category.view();
-  return os_log_create(Piece<255>(subsystemText).c_str(), Piece<255>(categoryText).c_str());
+  return os_log_create(nameOf(subsystem).begin(), nameOf(category).begin());
 }
 
 os_log_type_t typeOf(SystemLog::Type type) noexcept {
@@ -97,8 +80,10 @@ void SystemLog::write(Type type, std::string_view text) const noexcept {
   const ErrnoKept guard;
   const os_log_t log = logOf(subsystem_, category_);
   do {
-    const Piece<kLongestPiece> piece(text);
-    os_log_with_type(log, typeOf(type), "%{public}s", piece.c_str());
+    const std::size_t length = lengthThatFits(text, kLongestEntry);
+    const EndedText<kLongestEntry> entry(text.substr(0, length));
+    os_log_with_type(log, typeOf(type), "%{public}s", entry.begin());
+    text.remove_prefix(length);
   } while (!text.empty());
 }
 

@@ -9,6 +9,7 @@
 #include <string>
 
 #include "Runtime/Base/Private/StandardError.h"
+#include "Runtime/Base/Private/UTF8.h"
 #include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/SystemLog/Private/Linux/LogSocket.h"
 
@@ -55,14 +56,6 @@ std::string sender() {
   return text + '[' + std::to_string(getpid()) + ']';
 }
 
-// Returns how many bytes of `text` fit into `room` bytes, without cutting a character in two.
-std::size_t packetLength(std::string_view text, std::size_t room) noexcept {
-  if (text.size() <= room) return text.size();
-  std::size_t length = room;
-  while (length > 0 && (static_cast<unsigned char>(text[length]) & 0xC0U) == 0x80U) --length;
-  return length > 0 ? length : room;
-}
-
 }  // namespace
 
 Delivery writeToSyslog(const LogEntry& entry, const Patience& patience) {
@@ -91,7 +84,7 @@ Delivery writeToSyslog(const LogEntry& entry, const Patience& patience) {
   appendBody(body, entry);
   std::string_view rest = body;
   do {
-    const std::size_t length = packetLength(rest, kLongestPacket - headLength);
+    const std::size_t length = lengthThatFits(rest, kLongestPacket - headLength);
     packet.resize(headLength);
     packet += rest.substr(0, length);
     rest.remove_prefix(length);

@@ -2,8 +2,6 @@
 
 #include <pthread.h>
 #include <sched.h>
-#include <sys/resource.h>
-#include <unistd.h>
 
 #include <array>
 #include <csignal>
@@ -13,6 +11,7 @@
 #include "Runtime/Locks/Private/AddressWait.h"
 #include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Process/Private/SystemThreadName.h"
+#include "Runtime/Queues/Private/WorkerPriority.h"
 
 namespace rt::detail {
 
@@ -69,8 +68,8 @@ class IdleWorker {
   std::atomic<std::uint32_t> state_ = kAwake;
 };
 
-// The work and the workers of one niceness. A worker keeps its niceness: becoming less nice takes a
-// privilege.
+// The work and the workers of one priority. A worker keeps its priority: raising it takes a privilege on some
+// systems.
 class Level {
  public:
   void schedule(Work& work) noexcept {
@@ -134,7 +133,6 @@ class Level {
       lock_.unlock();
       return work;
     }
-    // The worker is nicer than wanted, since the system did not let it become less nice.
     if (!mayBeIdle) {
       --threadCount_;
       lock_.unlock();
@@ -179,7 +177,6 @@ class Level {
 // clang may read both of two variables and then choose between the values. The thread sanitizer reports the
 // read that is not needed, which happens without the lock.
 constinit std::array<Level, 2> levels;
-constexpr int kNicenessOfUtility = 5;
 
 // The calling worker's level. Null on all other threads.
 constinit thread_local Level* levelOfCaller = nullptr;
@@ -190,15 +187,11 @@ Level& level(QualityOfService qualityOfService) noexcept {
 
 void* runWorker(void* argument) {
   levelOfCaller = static_cast<Level*>(argument);
-  // Counted from the main thread, since the thread that creates this one may be nicer than the process. If
-  // the system does not let the worker become less nice, it does the work that waits and does not stay for
-  // more.
-  const int ofProcess = getpriority(PRIO_PROCESS, static_cast<id_t>(getpid()));
-  const int added = levelOfCaller == &level(QualityOfService::kUtility) ? kNicenessOfUtility : 0;
-  const bool isAsNiceAsWanted = setpriority(PRIO_PROCESS, 0, ofProcess + added) == 0;
+  // A worker whose priority is too low does the work that waits and does not stay for more.
+  const bool mayBeIdle = takeWorkerPriority(levelOfCaller == &level(QualityOfService::kUtility));
   // A thread inherits its creator's name.
   setSystemThreadName(nullptr);
-  levelOfCaller->run(isAsNiceAsWanted);
+  levelOfCaller->run(mayBeIdle);
   return nullptr;
 }
 

@@ -1,0 +1,9 @@
+#include "initialisers.h"
+
+namespace {
+
+const Announcement inner("inner library");
+
+}  // namespace
+
+void useInner() {}

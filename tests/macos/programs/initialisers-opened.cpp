@@ -1,0 +1,7 @@
+#include "initialisers.h"
+
+namespace {
+
+const Announcement opened("opened bundle");
+
+}  // namespace

@@ -1,0 +1,11 @@
+#include "initialisers.h"
+
+namespace {
+
+const Announcement outer("outer library");
+
+}  // namespace
+
+void useOuter() {
+  useInner();
+}

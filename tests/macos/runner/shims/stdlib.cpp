@@ -1,0 +1,56 @@
+#include <fcntl.h>
+#include <unistd.h>
+
+#include <climits>
+#include <cstdlib>
+
+#include "tests/macos/runner/Shims.h"
+#include "tests/macos/runner/shims/Files.h"
+
+namespace {
+
+int makeFile(char* path, int flags) {
+  return converted(mkostemp(path, linuxOpenFlags(flags)));
+}
+
+}  // namespace
+
+shims::Table shims::stdlib() {
+  static const Shim table[] = {
+      shim("_Exit", &::_Exit),
+      shim("abort", &::abort),
+      shim("aligned_alloc", &::aligned_alloc),
+      shim("arc4random", &::arc4random),
+      shim("atoi", &::atoi),
+      shim("atol", &::atol),
+      shim("bsearch", &::bsearch),
+      shim("calloc", &::calloc),
+      shim("environ", &environ),
+      shim("exit", &::exit),
+      shim("free", &::free),
+      shim("getenv", &::getenv),
+      shim("malloc", &::malloc),
+      shim("mkdtemp", systemCall<&::mkdtemp>),
+      shim("mkostemp", &makeFile),
+      shim("mkstemp", systemCall<&::mkstemp>),
+      shim("posix_memalign", &::posix_memalign),
+      shim("qsort", &::qsort),
+      shim("quick_exit", &::quick_exit),
+      shim("rand", &::rand),
+      shim("realloc", &::realloc),
+      shim("realpath", systemCall<&::realpath>),
+      shim("realpath$DARWIN_EXTSN", systemCall<&::realpath>),
+      shim("setenv", systemCall<&::setenv>),
+      shim("srand", &::srand),
+      shim("strtod", &::strtod),
+      shim("strtof", &::strtof),
+      shim("strtol", &::strtol),
+      shim("strtold", &::strtold),
+      shim("strtoll", &::strtoll),
+      shim("strtoul", &::strtoul),
+      shim("strtoull", &::strtoull),
+      shim("system", libraryCall<&::system>),
+      shim("unsetenv", systemCall<&::unsetenv>),
+  };
+  return table;
+}

@@ -1,0 +1,218 @@
+// A queue is an inotify descriptor, and a descriptor of its own for the event that the program sends to itself. A file is
+// watched until its descriptor is closed, as on macOS.
+
+#include "KernelQueue.h"
+
+#include <poll.h>
+#include <pthread.h>
+#include <sys/eventfd.h>
+#include <sys/inotify.h>
+#include <sys/stat.h>
+#include <unistd.h>
+
+#include <array>
+#include <cstdint>
+#include <cstring>
+#include <ctime>
+#include <map>
+#include <mutex>
+#include <string>
+
+#include "tests/macos/runner/Shims.h"
+
+namespace {
+
+// struct kevent of macOS
+struct Event {
+  std::uint64_t identifier;
+  std::int16_t filter;
+  std::uint16_t flags;
+  std::uint32_t filterFlags;
+  std::int64_t data;
+  void* context;
+};
+static_assert(sizeof(Event) == 32);
+
+constexpr std::int16_t kFile = -4;
+constexpr std::int16_t kUser = -10;
+
+constexpr std::uint16_t kAdd = 0x1;
+constexpr std::uint16_t kEnable = 0x4;
+constexpr std::uint16_t kClear = 0x20;
+
+constexpr std::uint32_t kTrigger = 0x01000000;
+constexpr std::uint32_t kDeleted = 0x1;
+constexpr std::uint32_t kWritten = 0x2;
+constexpr std::uint32_t kExtended = 0x4;
+constexpr std::uint32_t kAttributes = 0x8;
+constexpr std::uint32_t kLinks = 0x10;
+constexpr std::uint32_t kRenamed = 0x20;
+
+struct Watch {
+  int number;  // inotify's
+  std::uint32_t wanted;
+  void* context;
+};
+
+struct Queue {
+  int user;
+  std::map<int, Watch> watches;  // by the watched descriptor
+};
+
+std::map<int, Queue> queues;
+std::mutex lock;
+
+int makeQueue() {
+  // Queues are not inherited by the child of a fork.
+  [[maybe_unused]] static const int registered = pthread_atfork(
+      [] { lock.lock(); }, [] { lock.unlock(); },
+      [] {
+        for (const auto& [file, queue] : queues) {
+          close(file);
+          close(queue.user);
+        }
+        queues.clear();
+        lock.unlock();
+      });
+  const int file = inotify_init1(IN_NONBLOCK);
+  if (file < 0) return converted(file);
+  const int user = eventfd(0, EFD_NONBLOCK | EFD_CLOEXEC);
+  if (user < 0) {
+    convertErrno();
+    close(file);
+    return -1;
+  }
+  const std::lock_guard guard(lock);
+  queues[file] = {.user = user, .watches = {}};
+  return file;
+}
+
+int addWatch(int queueFile, Queue& queue, const Event& change) {
+  constexpr std::uint32_t kKnown = kDeleted | kWritten | kExtended | kAttributes | kLinks | kRenamed;
+  if ((change.filterFlags & ~kKnown) != 0) refuse("kevent watches a file for 0x%x", change.filterFlags);
+  const auto file = static_cast<int>(change.identifier);
+  const std::string link = "/proc/self/fd/" + std::to_string(file);
+  constexpr std::uint32_t kMask = IN_MODIFY | IN_ATTRIB | IN_DELETE_SELF | IN_MOVE_SELF | IN_CREATE | IN_DELETE |
+                                  IN_MOVED_FROM | IN_MOVED_TO;
+  const int number = inotify_add_watch(queueFile, link.c_str(), kMask);
+  if (number < 0) return converted(number);
+  queue.watches[file] = {.number = number, .wanted = change.filterFlags, .context = change.context};
+  return 0;
+}
+
+int apply(int queueFile, Queue& queue, const Event& change) {
+  if ((change.flags & ~(kAdd | kEnable | kClear)) != 0) refuse("kevent is called with the flags 0x%x", change.flags);
+  if (change.filter == kFile) return addWatch(queueFile, queue, change);
+  if (change.filter != kUser || change.identifier != 0) refuse("kevent is called with the filter %d", change.filter);
+  if ((change.filterFlags & kTrigger) != 0) {
+    const std::uint64_t one = 1;
+    if (write(queue.user, &one, sizeof one) < 0) return converted(-1);
+  }
+  return 0;
+}
+
+// What an event of inotify is on macOS, where a file without a name is a deleted one.
+std::uint32_t darwinFlags(std::uint32_t mask, int file) {
+  std::uint32_t flags = 0;
+  if ((mask & IN_MODIFY) != 0) flags |= kWritten | kExtended;
+  if ((mask & (IN_CREATE | IN_DELETE | IN_MOVED_FROM | IN_MOVED_TO)) != 0) flags |= kWritten;
+  if ((mask & IN_DELETE_SELF) != 0) flags |= kDeleted;
+  if ((mask & IN_MOVE_SELF) != 0) flags |= kRenamed;
+  if ((mask & IN_ATTRIB) != 0) {
+    struct stat status{};
+    flags |= fstat(file, &status) == 0 && status.st_nlink == 0 ? kDeleted : kAttributes;
+  }
+  return flags;
+}
+
+// Reads what inotify has, and puts one event for each file that wants it into `events`. Returns how many.
+int readEvents(int queueFile, Event* events, int room) {
+  alignas(inotify_event) std::array<char, 65536> buffer;
+  const ssize_t size = read(queueFile, buffer.data(), buffer.size());
+  if (size < 0) return errno == EAGAIN ? 0 : converted(-1);
+  std::map<int, Event> found;
+  const std::lock_guard guard(lock);
+  const auto queue = queues.find(queueFile);
+  if (queue == queues.end()) return 0;
+  for (ssize_t at = 0; at < size;) {
+    inotify_event event{};
+    std::memcpy(&event, buffer.data() + at, sizeof event);
+    at += static_cast<ssize_t>(sizeof event + event.len);
+    for (const auto& [file, watch] : queue->second.watches) {
+      if (watch.number != event.wd) continue;
+      const std::uint32_t flags = darwinFlags(event.mask, file) & watch.wanted;
+      if (flags == 0) continue;
+      Event& darwin = found[file];
+      darwin.identifier = static_cast<std::uint64_t>(file);
+      darwin.filter = kFile;
+      darwin.filterFlags |= flags;
+      darwin.context = watch.context;
+    }
+  }
+  if (found.size() > static_cast<std::size_t>(room)) refuse("kevent has room for %d events only", room);
+  int count = 0;
+  for (const auto& [file, event] : found) events[count++] = event;
+  return count;
+}
+
+int changeAndWait(int queueFile, const Event* changes, int changeCount, Event* events, int room,
+                  const timespec* timeout) {
+  int user = -1;
+  {
+    const std::lock_guard guard(lock);
+    const auto queue = queues.find(queueFile);
+    if (queue == queues.end()) {
+      errno = EBADF;
+      return -1;
+    }
+    user = queue->second.user;
+    for (int number = 0; number < changeCount; ++number) {
+      if (apply(queueFile, queue->second, changes[number]) != 0) return -1;
+    }
+  }
+  if (room == 0) return 0;
+  for (;;) {
+    std::array<pollfd, 2> files = {
+        {{.fd = queueFile, .events = POLLIN, .revents = 0}, {.fd = user, .events = POLLIN, .revents = 0}}};
+    const int ready = ppoll(files.data(), files.size(), timeout, nullptr);
+    if (ready <= 0) return converted(ready);
+    if (files[1].revents != 0) {
+      std::uint64_t count = 0;
+      if (read(user, &count, sizeof count) < 0) continue;
+      events[0] = {};
+      events[0].filter = kUser;
+      return 1;
+    }
+    // The caller may want none of what has happened.
+    if (const int count = readEvents(queueFile, events, room); count != 0) return count;
+  }
+}
+
+}  // namespace
+
+void KernelQueue::closing(int file) {
+  const std::lock_guard guard(lock);
+  if (const auto queue = queues.find(file); queue != queues.end()) {
+    close(queue->second.user);
+    queues.erase(queue);
+    return;
+  }
+  for (auto& [queueFile, queue] : queues) {
+    const auto watch = queue.watches.find(file);
+    if (watch == queue.watches.end()) continue;
+    const int number = watch->second.number;
+    queue.watches.erase(watch);
+    // inotify has one watch for a file, whatever the number of descriptors.
+    bool isShared = false;
+    for (const auto& [other, otherWatch] : queue.watches) isShared |= otherWatch.number == number;
+    if (!isShared) inotify_rm_watch(queueFile, number);
+  }
+}
+
+shims::Table shims::sysEvent() {
+  static const Shim table[] = {
+      shim("kqueue", &makeQueue),
+      shim("kevent", &changeAndWait),
+  };
+  return table;
+}

@@ -1,9 +1,11 @@
-# Checks the files that were built for macOS, and the package. None of these tests needs macOS.
+# Checks the files that were built for macOS, and the package. None of these tests needs macOS. Include this file after all
+# folders with programs.
 
 find_package(Python3 REQUIRED COMPONENTS Interpreter)
 set(folder "${CMAKE_CURRENT_LIST_DIR}")
 set(stubs "${PROJECT_SOURCE_DIR}/build/macos-stubs")
-set(check_mach_o Python3::Interpreter "${folder}/check-mach-o"
+# Tests that name the target of the interpreter would run it like a program for macOS.
+set(check_mach_o "${Python3_EXECUTABLE}" "${folder}/check-mach-o"
   --stubs "${stubs}/${MACOS_PROCESSOR}.tbd" --minimum "${CMAKE_OSX_DEPLOYMENT_TARGET}")
 
 # Like that of Linux, the command carries the libraries, and few functions run before `main`: one announces all classes, and
@@ -35,22 +37,18 @@ function(find_linked_files variable directory)
   set(${variable} "${files}" PARENT_SCOPE)
 endfunction()
 
-# Called when all targets are known.
-function(check_all_linked_files)
-  find_linked_files(files "${PROJECT_SOURCE_DIR}")
-  add_test(NAME macos.files.all COMMAND ${check_mach_o} ${files})
-endfunction()
-cmake_language(DEFER DIRECTORY "${PROJECT_SOURCE_DIR}" CALL check_all_linked_files)
+find_linked_files(files "${PROJECT_SOURCE_DIR}")
+add_test(NAME macos.files.all COMMAND ${check_mach_o} ${files})
 
 # Checks the check itself.
-add_test(NAME macos.files.broken COMMAND Python3::Interpreter "${folder}/check-mach-o-test"
+add_test(NAME macos.files.broken COMMAND "${Python3_EXECUTABLE}" "${folder}/check-mach-o-test"
   "${stubs}/x86_64.tbd" "${stubs}/arm64.tbd" "${PROJECT_SOURCE_DIR}/cmake/macos/x86_64-apple-macos-clang++")
 
 # Checks the package: a host that has nothing else builds against it, and runs if something here can run it.
 find_program(PKG_CONFIG NAMES pkgconf pkg-config)
 mark_as_advanced(PKG_CONFIG)
-list(REMOVE_ITEM check_mach_o Python3::Interpreter)
 add_test(NAME macos.package COMMAND "${CMAKE_COMMAND}" "-DBUILD=${PROJECT_BINARY_DIR}" "-DROOT=${PROJECT_SOURCE_DIR}"
   "-DCOMPILER=${CMAKE_CXX_COMPILER}" "-DPROCESSOR=${MACOS_PROCESSOR}" "-DLAUNCHER=${CMAKE_CROSSCOMPILING_EMULATOR}"
-  "-DCHECK=${Python3_EXECUTABLE};${check_mach_o}" "-DPKG_CONFIG=${PKG_CONFIG}"
+  "-DCHECK=${check_mach_o}" "-DPKG_CONFIG=${PKG_CONFIG}"
   "-DWORK=${CMAKE_CURRENT_BINARY_DIR}/package" -P "${folder}/package_test.cmake")
+set_tests_properties(macos.package PROPERTIES COST 1000)  # It takes longest, so it begins first.

@@ -11,7 +11,8 @@ set(check_mach_o "${Python3_EXECUTABLE}" "${folder}/check-mach-o"
 # Like that of Linux, the command carries the libraries, and few functions run before `main`: one announces all classes, and
 # the others belong to profiling and to the C++ library.
 add_test(NAME macos.files.command COMMAND ${check_mach_o}
-  --alone --hidden --stripped --signed --initialisers 4 --size 1200000 --map "$<TARGET_FILE:mount-point>.map"
+  --alone --hidden --imports ___stack_chk_fail --stripped --signed --initialisers 4 --size 1200000
+  --map "$<TARGET_FILE:mount-point>.map"
   --first rt6detail13announceImage
   --contains SRLRegistry4load --contains LUMLogMultiplexer14logWithMessage --contains PECErrorHandler9register_
   --contains ZEBLogger12sharedLogger --contains LUMLoggingReroutingZEBLogger --contains AVOProvider3get

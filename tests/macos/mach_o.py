@@ -24,10 +24,11 @@ LOADER_ENVIRONMENT, RUN_PATH, OLD_VERSION, VERSION = 0x27, 0x8000001C, 0x24, 0x3
 DYLD_INFO = (0x22, 0x80000022)
 CHAINED_FIXUPS, EXPORTS_TRIE, CODE_SIGNATURE = 0x80000034, 0x80000033, 0x1D
 INITIALISER_POINTERS, INITIALISER_OFFSETS = 0x9, 0x16
+INSTRUCTIONS = 0x80000400
 
 # `maximum` and `initial` are protections.
 Segment = collections.namedtuple("Segment", "name address size offset length maximum initial sections")
-Section = collections.namedtuple("Section", "segment name address size offset type")
+Section = collections.namedtuple("Section", "segment name address size offset type is_code")
 Dylib = collections.namedtuple("Dylib", "path kind")
 Signature = collections.namedtuple("Signature", "is_ad_hoc limit page_size hashes executable_range")
 
@@ -111,7 +112,8 @@ class Image:
         sections = []
         for index in range(count):
             section, _, address, size, offset, _, _, _, flags = struct.unpack_from("<16s16s2Q5I", body, 72 + 80 * index)
-            sections.append(Section(name, section.rstrip(b"\0").decode(), address, size, offset, flags & 0xFF))
+            sections.append(Section(name, section.rstrip(b"\0").decode(), address, size, offset, flags & 0xFF,
+                                    bool(flags & INSTRUCTIONS)))
         segment = Segment(name, *numbers, sections)
         if segment.offset + segment.length > len(self.data):
             raise ValueError(f"{name} is longer than the file")
@@ -173,8 +175,8 @@ class Image:
 
     def is_code(self, target):
         """Returns whether a pointer leads to code of this file. `target` is an address or an Import."""
-        segment = self.segment_at(target) if isinstance(target, int) else None
-        return segment is not None and bool(segment.initial & EXECUTE)
+        section = self.section_at(target) if isinstance(target, int) else None
+        return section is not None and section.is_code
 
     def initialisers(self):
         """Returns the addresses of the initialisers, in the order in which the system calls them."""

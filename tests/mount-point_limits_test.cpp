@@ -125,8 +125,9 @@ class MountPointMemoryLimitTest : public MountPointTest {
     expectResult(run({"a"}, limiting(resource, limit)), 17, "Failed to create [/Volumes/a], errno: 17\n");
     expectSuccess(run({"a", "--remove"}, limiting(resource, limit)));
     if (resource == RLIMIT_STACK) return;  // The stack holds the arguments.
-    expectResult(run({name}, limiting(resource, limit)), 36,
-                 "Failed to create [/Volumes/" + name + "], errno: 36\n");
+    const int number = numberOf(ENAMETOOLONG);
+    expectResult(run({name}, limiting(resource, limit)), number,
+                 "Failed to create [/Volumes/" + name + "], errno: " + std::to_string(number) + "\n");
   }
 };
 

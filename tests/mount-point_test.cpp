@@ -9,6 +9,7 @@
 
 #include <algorithm>
 #include <array>
+#include <cerrno>
 #include <filesystem>
 #include <fstream>
 #include <sstream>
@@ -144,8 +145,10 @@ TEST_F(MountPointTest, ReportsATooLongNameInFull) {
   for (int count = 0; count < 128; ++count) accents += "\xc3\xa9";
   for (const std::string& name :
        {std::string(256, 'x'), accents, std::string(5000, 'x'), std::string(131071, 'x')}) {
-    expectResult(run({name}), 36, "Failed to create [/Volumes/" + name + "], errno: 36\n");
-    expectResult(run({name, "--remove"}), 36, "Failed to remove [/Volumes/" + name + "], errno: 36\n");
+    const int number = numberOf(ENAMETOOLONG);
+    const std::string error = ", errno: " + std::to_string(number) + "\n";
+    expectResult(run({name}), number, "Failed to create [/Volumes/" + name + "]" + error);
+    expectResult(run({name, "--remove"}), number, "Failed to remove [/Volumes/" + name + "]" + error);
   }
 }
 
@@ -184,16 +187,18 @@ TEST_F(MountPointTest, FailsToMakeADirectoryIfAFileOrALinkHasItsName) {
 }
 
 struct Injection {
-  const char* error;
-  int number;
+  const char* name;
+  int error;
 };
-constexpr std::array kInjections = {Injection{"EDQUOT", 122}, Injection{"EIO", 5}, Injection{"EPERM", 1},
-                                    Injection{"EMLINK", 31}, Injection{"EINTR:when=1", 4}};
+constexpr std::array kInjections = {Injection{"EDQUOT", EDQUOT}, Injection{"EIO", EIO},
+                                    Injection{"EPERM", EPERM}, Injection{"EMLINK", EMLINK},
+                                    Injection{"EINTR:when=1", EINTR}};
 
 TEST_F(MountPointTest, ReportsEveryErrorOfMkdir) {
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
-  for (const auto& [error, number] : kInjections) {
-    expectResult(runInjected("mkdir,mkdirat", error, {"a"}), number,
+  for (const auto& [name, error] : kInjections) {
+    const int number = numberOf(error);
+    expectResult(runInjected("mkdir,mkdirat", name, {"a"}), number,
                  "Failed to create [/Volumes/a], errno: " + std::to_string(number) + "\n");
     EXPECT_THAT(volumes(), IsEmpty());
   }
@@ -201,8 +206,9 @@ TEST_F(MountPointTest, ReportsEveryErrorOfMkdir) {
 
 TEST_F(MountPointTest, LeavesTheDirectoryIfItsOwnerCannotBeChanged) {
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
-  for (const auto& [error, number] : kInjections) {
-    expectResult(runInjected("chown,fchown,lchown,fchownat", error, {"a"}), number,
+  for (const auto& [name, error] : kInjections) {
+    const int number = numberOf(error);
+    expectResult(runInjected("chown,fchown,lchown,fchownat", name, {"a"}), number,
                  "Failed to chown [/Volumes/a], errno: " + std::to_string(number) + "\n");
     EXPECT_EQ(volumes(), std::vector<std::string>{"a"});
     expectSuccess(run({"a", "--remove"}));
@@ -272,7 +278,9 @@ TEST_F(MountPointTest, TreatsAMissingDirectoryAsRemoved) {
 
 TEST_F(MountPointTest, FailsToRemoveADirectoryThatIsNotEmpty) {
   fs::create_directories("/Volumes/a/b");
-  expectResult(run({"a", "--remove"}), 39, "Failed to remove [/Volumes/a], errno: 39\n");
+  const int number = numberOf(ENOTEMPTY);
+  expectResult(run({"a", "--remove"}), number,
+               "Failed to remove [/Volumes/a], errno: " + std::to_string(number) + "\n");
   EXPECT_TRUE(fs::exists("/Volumes/a/b"));
 }
 
@@ -297,7 +305,8 @@ TEST_F(MountPointTest, FailsToRemoveAnythingButADirectory) {
 TEST_F(MountPointTest, FailsToRemoveDotAndDotDot) {
   expectResult(run({".", "--remove"}), 22, "Failed to remove [/Volumes/.], errno: 22\n");
   const ProcessResult result = run({"..", "--remove"});
-  expectResult(result, 39, "Failed to remove [/Volumes/..], errno: 39\n");
+  const int number = numberOf(ENOTEMPTY);
+  expectResult(result, number, "Failed to remove [/Volumes/..], errno: " + std::to_string(number) + "\n");
 }
 
 TEST_F(MountPointTest, TreatsTheEmptyNameAsVolumesWhenRemoving) {
@@ -323,8 +332,9 @@ TEST_F(MountPointTest, FailsToRemoveADirectoryWithoutPermission) {
 TEST_F(MountPointTest, ReportsEveryErrorOfRmdir) {
   if (const std::string problem = tracingRefusal(); !problem.empty()) GTEST_SKIP() << problem;
   fs::create_directory("/Volumes/a");
-  for (const auto& [error, number] : kInjections) {
-    expectResult(runInjected("rmdir", error, {"a", "--remove"}), number,
+  for (const auto& [name, error] : kInjections) {
+    const int number = numberOf(error);
+    expectResult(runInjected("rmdir", name, {"a", "--remove"}), number,
                  "Failed to remove [/Volumes/a], errno: " + std::to_string(number) + "\n");
   }
   EXPECT_EQ(volumes(), std::vector<std::string>{"a"});

@@ -17,7 +17,8 @@ enum class Making : std::uint8_t {
 /// The program may run with raised privileges on the caller's behalf. The mode is 0700 less the umask. If the
 /// parent has a default access control list, the list replaces the umask.
 ///
-/// Precondition: the calling thread has taken on the identity of its caller (`CallerIdentity.h`).
+/// Precondition: the calling thread has taken on the identity of its caller (`CallerIdentity.h`). On macOS,
+/// no other function of this header has been called, since each of them gives up root's rights for good.
 ///
 /// The caller may stop the process between any two steps, and wait until something else is at `path`. The
 /// caller never gets that. docs/security.md explains how this is prevented, and where it is not.

@@ -22,8 +22,8 @@ namespace rt::Thread {
 /// Errors: throws std::bad_alloc on macOS, at the first call on a thread.
 String currentName();
 
-/// Names the calling thread. Null removes its name. The system shows the name too. On Linux it shows the
-/// first 15 bytes at most, without an incomplete character at the end.
+/// Names the calling thread. Null removes its name. The system shows the name too. It shows the first 15
+/// bytes at most, on macOS 63, without an incomplete character at the end.
 /// Errors: throws std::bad_alloc at the first name of a thread. The thread has no name then.
 void setCurrentName(const String& name);
 

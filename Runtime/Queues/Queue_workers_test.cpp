@@ -1,9 +1,7 @@
 // The threads that run the tasks of queues.
 
-#if !defined(__APPLE__)
-
 #include <gtest/gtest.h>
-#include <sys/prctl.h>
+#include <pthread.h>
 #include <sys/resource.h>
 #include <unistd.h>
 
@@ -26,6 +24,7 @@
 #include "Runtime/Process/Thread.h"
 #include "Runtime/Queues/Private/WorkerPool.h"
 #include "tests/support/ClockHook.h"
+#include "tests/support/ForkTest.h"
 #include "tests/support/QueueTest.h"
 #include "tests/support/Sanitizers.h"
 
@@ -36,6 +35,9 @@ using rt::QualityOfService;
 using rt::Queue;
 using rt::Ref;
 
+constexpr const char* kNoCount = "only Linux tells how many threads a process has";
+
+// Returns how many threads this process has. Linux only.
 std::ptrdiff_t threadCount() {
   return std::distance(std::filesystem::directory_iterator("/proc/self/task"),
                        std::filesystem::directory_iterator());
@@ -81,6 +83,7 @@ TEST_F(QueueTest, WaitingTasksDoNotNeedFreeThreads) {
 
 TEST_F(QueueTest, IdleThreadsEnd) {
   if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer has a thread of its own";
+  if (RT_TEST_IS_APPLE) GTEST_SKIP() << kNoCount;
   queue_->async([] {});
   queue_->barrierSync();
   waitUntilWorkersHaveEnded();
@@ -114,6 +117,7 @@ TEST_F(QueueDeathTest, AWorkerThatGetsWorkAsItsIdleTimeEndsRunsIt) {
 }
 
 TEST_F(QueueDeathTest, NoThreadStartsBeforeTheFirstAsync) {
+  if (RT_TEST_IS_APPLE) GTEST_SKIP() << kNoCount;
   EXPECT_EXIT(
       {
         const std::ptrdiff_t before = threadCount();
@@ -159,7 +163,7 @@ TEST_F(QueueDeathTest, FaultsOfATaskReachTheHostsHandler) {
 }
 
 TEST_F(QueueTest, WorkersDoNotBearTheNameOfTheirStarter) {
-  if (!RT_TEST_THREAD_SANITIZER) waitUntilWorkersHaveEnded();
+  if (!RT_TEST_THREAD_SANITIZER && !RT_TEST_IS_APPLE) waitUntilWorkersHaveEnded();
   std::thread([&] {
     rt::Thread::setCurrentName("Importer"_s);
     const Ref<Queue> queue = rt::make<Queue>("test"_s);
@@ -168,7 +172,7 @@ TEST_F(QueueTest, WorkersDoNotBearTheNameOfTheirStarter) {
     char ofSystem[16] = "";
     queue->async([&] {
       name = rt::Thread::currentName();
-      prctl(PR_GET_NAME, ofSystem);
+      pthread_getname_np(pthread_self(), ofSystem, sizeof ofSystem);
       hasRun.count_down();
     });
     hasRun.wait();
@@ -176,6 +180,30 @@ TEST_F(QueueTest, WorkersDoNotBearTheNameOfTheirStarter) {
     EXPECT_STRNE(ofSystem, "Importer");
   }).join();
 }
+
+#if defined(__APPLE__)
+
+TEST_F(QueueTest, ClassOfThreadsFollowsQualityOfService) {
+  const struct {
+    QualityOfService qualityOfService;
+    qos_class_t ofSystem;
+  } cases[] = {{QualityOfService::kUserInteractive, QOS_CLASS_DEFAULT},
+               {QualityOfService::kDefault, QOS_CLASS_DEFAULT},
+               {QualityOfService::kUtility, QOS_CLASS_UTILITY}};
+  for (const auto& each : cases) {
+    const Ref<Queue> queue = rt::make<Queue>("class"_s, each.qualityOfService);
+    std::latch hasRun(1);
+    qos_class_t ofTask = QOS_CLASS_UNSPECIFIED;
+    queue->async([&] {
+      ofTask = qos_class_self();
+      hasRun.count_down();
+    });
+    hasRun.wait();
+    EXPECT_EQ(ofTask, each.ofSystem);
+  }
+}
+
+#else
 
 TEST_F(QueueTest, NicenessFollowsQualityOfService) {
   const int ofProcess = getpriority(PRIO_PROCESS, static_cast<id_t>(getpid()));
@@ -228,6 +256,8 @@ TEST_F(QueueDeathTest, NicenessDoesNotSpreadToUrgentWork) {
       testing::ExitedWithCode(0), "");
 }
 
+#endif
+
 // Where the system refuses threads.
 class QueueWithoutThreadsDeathTest : public QueueTest {
  protected:
@@ -235,6 +265,7 @@ class QueueWithoutThreadsDeathTest : public QueueTest {
     if (RT_TEST_THREAD_SANITIZER || RT_TEST_ADDRESS_SANITIZER) {
       GTEST_SKIP() << "the sanitizers need more memory than a limit allows";
     }
+    if (RT_TEST_IS_APPLE) GTEST_SKIP() << "macOS does not limit the memory for stacks";
   }
 };
 
@@ -309,5 +340,3 @@ TEST_F(QueueWithoutThreadsDeathTest, TasksRunBeforeTheProcessExitsAlsoWithoutThr
 }
 
 }  // namespace
-
-#endif  // !defined(__APPLE__)

@@ -52,22 +52,6 @@ Ref<LUMLogMessage> messageIn(const rt::String& function, const rt::String& text)
                                       nullptr, nullptr, nullptr, nullptr);
 }
 
-TEST(LUMSystemLoggerFormatter, PutsTheFunctionBeforeTheText) {
-  const Ref<LUMSystemLoggerFormatter> formatter = LUMSystemLoggerFormatter::init();
-  EXPECT_EQ(formatter->formattedLogMessage(*messageIn("int main()"_s, "started"_s)), "int main(): started");
-  EXPECT_EQ(formatter->formattedLogMessage(*messageIn("f"_s, ""_s)), "f: ");
-  EXPECT_EQ(formatter->formattedLogMessage(*messageIn("%@"_s, "100 %"_s)), "%@: 100 %");
-  EXPECT_EQ(formatter->formattedLogMessage(*messageIn("f"_s, nullptr)), "f: (null)");
-}
-
-TEST(LUMSystemLoggerFormatter, GivesTheTextAloneWithoutAFunction) {
-  const Ref<LUMSystemLoggerFormatter> formatter = LUMSystemLoggerFormatter::init();
-  EXPECT_EQ(formatter->formattedLogMessage(*messageIn(""_s, "started"_s)), "started");
-  EXPECT_EQ(formatter->formattedLogMessage(*messageIn(nullptr, "started"_s)), "started");
-  EXPECT_EQ(formatter->formattedLogMessage(*messageIn(nullptr, ""_s)), "");
-  EXPECT_EQ(formatter->formattedLogMessage(*messageIn(nullptr, nullptr)), nullptr);
-}
-
 class LUMSystemLoggerTest : public testing::Test {
  protected:
   void SetUp() override {

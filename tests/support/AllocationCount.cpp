@@ -13,12 +13,12 @@ constinit thread_local std::int64_t allocated = 0;
 constinit thread_local std::int64_t freed = 0;
 constinit std::atomic<std::int64_t> live = 0;
 
-void countAllocation() noexcept {
+[[maybe_unused]] void countAllocation() noexcept {
   ++allocated;
   live.fetch_add(1, std::memory_order_relaxed);
 }
 
-void countFree() noexcept {
+[[maybe_unused]] void countFree() noexcept {
   ++freed;
   live.fetch_sub(1, std::memory_order_relaxed);
 }

@@ -12,6 +12,13 @@ function(linked_part name source)
   target_link_libraries(${name} PRIVATE MountPoint::Options)
 endfunction()
 
+# uses_program(LIBRARY) lets the library use symbols of the program that loads it. Linkers for Linux always allow that.
+function(uses_program library)
+  if(CMAKE_SYSTEM_NAME STREQUAL "Darwin")
+    target_link_options(${library} PRIVATE -undefined dynamic_lookup)
+  endif()
+endfunction()
+
 # linked_variants(PREFIX) calls two functions of the caller:
 #
 #   PREFIX_parts(SET OPTION…)          once for each way to compile the parts; OPTION… are compiler options

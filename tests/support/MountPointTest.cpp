@@ -30,6 +30,22 @@ void MountPointTest::SetUp() {
   PrivateRoot::mountVolumes();
 }
 
+int MountPointTest::numberOf(int error) {
+  if (!kIsForMacOS) return error;
+  switch (error) {
+    case EAGAIN:
+      return 35;
+    case ENAMETOOLONG:
+      return 63;
+    case ENOTEMPTY:
+      return 66;
+    case EDQUOT:
+      return 69;
+    default:
+      return error;
+  }
+}
+
 bool MountPointTest::isMachineRoot() {
   return asMachineRoot;
 }

@@ -27,6 +27,15 @@ class MountPointTest : public testing::Test {
   static constexpr const char* kCommand = "/mount-point";
   /// The command's instrumentation: "", "coverage" or the name of a sanitizer.
   static constexpr std::string_view kInstrumentation = INSTRUMENTATION;
+#ifdef COMMAND_IS_FOR_MACOS
+  static constexpr bool kIsForMacOS = true;
+#else
+  static constexpr bool kIsForMacOS = false;
+#endif
+
+  /// Returns the number of an error, for example EAGAIN, on the system that the command is for. Several
+  /// differ.
+  static int numberOf(int error);
 
   void SetUp() override;
 

@@ -2,14 +2,12 @@
 
 #include <fcntl.h>
 #include <poll.h>
-#include <sys/ptrace.h>
 #include <sys/wait.h>
 #include <unistd.h>
 
 #include <array>
 #include <cerrno>
 #include <csignal>
-#include <cstdint>
 #include <cstdio>
 #include <cstdlib>
 #include <stdexcept>
@@ -27,7 +25,8 @@ struct Pipe {
 
   Pipe() {
     std::array<int, 2> ends{};
-    require(pipe2(ends.data(), O_CLOEXEC) == 0, "pipe2");
+    require(pipe(ends.data()) == 0, "pipe");
+    for (const int end : ends) fcntl(end, F_SETFD, FD_CLOEXEC);
     readEnd = ends[0];
     writeEnd = ends[1];
   }
@@ -98,41 +97,6 @@ bool RunningProcess::reap(int& status, int options) const {
     if (errno != EINTR) return false;
   }
   return true;
-}
-
-// The program stops at its start, at each signal, and before and after each system call. The stop for a
-// system call has the bit 0x80.
-StoppedProcess::StoppedProcess(long systemCall, const std::vector<std::string>& arguments,
-                               const std::function<void()>& beforeExec)
-    : RunningProcess(arguments, [&] {
-        // This must come before `beforeExec`, while the child has the same identity as its tracer. The kernel
-        // checks again at the program's start whether the tracer may trace it.
-        require(ptrace(PTRACE_TRACEME, 0, nullptr, nullptr) == 0, "ptrace");
-        if (beforeExec) beforeExec();
-      }) {
-  constexpr int kCallStop = SIGTRAP | 0x80;
-  int status = 0;
-  const auto isStopped = [&] { return reap(status, 0) && WIFSTOPPED(status); };
-  bool isSet = isStopped() && ptrace(PTRACE_SETOPTIONS, child_, nullptr, PTRACE_O_TRACESYSGOOD) == 0;
-  for (bool isInside = false; isSet;) {
-    const int signal = WSTOPSIG(status);
-    if (signal == kCallStop) {
-      __ptrace_syscall_info call{};
-      require(ptrace(PTRACE_GET_SYSCALL_INFO, child_, sizeof call, &call) > 0, "ptrace");
-      if (call.op == PTRACE_SYSCALL_INFO_EXIT && isInside) break;
-      isInside =
-          call.op == PTRACE_SYSCALL_INFO_ENTRY && call.entry.nr == static_cast<std::uint64_t>(systemCall);
-    }
-    const int passedOn = signal == kCallStop || signal == SIGTRAP ? 0 : signal;
-    require(ptrace(PTRACE_SYSCALL, child_, nullptr, passedOn) == 0, "ptrace");
-    isSet = isStopped();
-  }
-  if (!isSet) {
-    child_ = -1;
-    throw std::runtime_error("the program ended before it could be stopped");
-  }
-  require(ptrace(PTRACE_DETACH, child_, nullptr, SIGSTOP) == 0, "ptrace");
-  require(reap(status, WUNTRACED) && WIFSTOPPED(status), "waitpid");
 }
 
 ProcessResult RunningProcess::wait() {

@@ -6,13 +6,14 @@
 ///     if (owner_ == rt::currentThreadToken()) ...
 ///
 /// The identifier is the number that the system's tools show. It is not 0 and is below 2^31. It differs
-/// between the living threads of a process.
+/// between the living threads of a process. On macOS it is the name of the thread's Mach port.
 ///
 /// The token is for data that is kept in memory, which a fork copies. A thread that forks has the same token
 /// in the child. There, `isThreadGone` is true for the tokens of all other threads. Both numbers may be
 /// reused after a thread has ended.
 ///
-/// The first call on a thread asks the system. No call allocates.
+/// The first call on a thread asks the system. No call allocates, except that macOS allocates a thread's
+/// variables of an image when the thread first uses one of them.
 ///
 /// Threads: any thread may call these functions at any time. This includes signal handlers, the loading of
 /// the program and the destructors of thread-local variables.

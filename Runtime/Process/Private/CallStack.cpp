@@ -21,6 +21,11 @@ namespace rt::CallStack {
 
 namespace {
 
+// Addresses are kept as numbers of 64 bits.
+static_assert(sizeof(decltype(_Unwind_GetIP(nullptr))) == sizeof(std::uint64_t) &&
+              sizeof(decltype(_Unwind_GetCFA(nullptr))) == sizeof(std::uint64_t) &&
+              sizeof(void*) == sizeof(std::uint64_t));
+
 struct Capture {
   std::span<std::uint64_t> addresses;
   std::size_t count = 0;

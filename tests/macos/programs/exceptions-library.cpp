@@ -4,15 +4,15 @@ void throwProblem(int number) {
   throw Problem(number);
 }
 
-std::string whatIsThrownBy(void (*function)()) {
+int numberThrownBy(void (*function)()) {
   try {
     function();
   } catch (const Problem& problem) {
-    return std::string(problem.what()) + " " + std::to_string(problem.number);
-  } catch (const std::exception& exception) {
-    return exception.what();
+    return problem.number;
+  } catch (const Trouble& trouble) {
+    return trouble.number + 100;
   }
-  return "nothing";
+  return 0;
 }
 
 void passThrough(void (*function)(), int& destroyed) {

@@ -1,17 +1,19 @@
 #pragma once
 
-#include <exception>
-#include <string>
-
-/// Weak definitions with a type that program and library share.
-struct Problem : std::exception {
-  explicit Problem(int number) : number(number) {}
-  const char* what() const noexcept override { return "a problem"; }
+/// Weak definitions of types that program and library share. The standard library's types would not be shared, since each
+/// image has that library in itself.
+struct Trouble {
+  explicit Trouble(int number) : number(number) {}
+  virtual ~Trouble() = default;
   int number;
 };
 
+struct Problem : Trouble {
+  using Trouble::Trouble;
+};
+
 [[noreturn]] void throwProblem(int number);
-/// Calls the function, and returns the text of the exception that it throws.
-std::string whatIsThrownBy(void (*function)());
+/// Calls the function, and returns the number of the `Problem` that it throws, or the number of another `Trouble` and 100.
+int numberThrownBy(void (*function)());
 /// Calls the function with an object on the stack, and lets exceptions pass.
 void passThrough(void (*function)(), int& destroyed);

@@ -16,5 +16,5 @@ namespace {
 int main(int count, char**) {
   std::puts("main");
   if (count > 100) return copyfile("a", "b", nullptr, 0);
-  return count > 100 ? acl_valid(nullptr) : 0;
+  return count > 50 ? acl_valid(nullptr) : 0;
 }

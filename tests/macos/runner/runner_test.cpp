@@ -77,7 +77,7 @@ TEST_P(Runner, PassesExceptionsBetweenImages) {
 TEST_P(Runner, EndsAProgramThatDoesNotCatchAnException) {
   const ProcessResult result = run("exceptions", {"terminate"});
   EXPECT_EQ(result.signal, SIGABRT);
-  EXPECT_THAT(result.standardError, HasSubstr("terminating due to uncaught exception of type Problem: a problem"));
+  EXPECT_THAT(result.standardError, HasSubstr("terminating due to uncaught exception of type Problem"));
 }
 
 TEST_P(Runner, OpensAndClosesBundles) {
@@ -159,10 +159,6 @@ TEST_P(Runner, RefusesAFileThatEndsTooEarly) {
 
 TEST_P(Runner, JoinsAProgram) {
   const fs::path joined = folder() / "joined";
-  expectGood(runProcess({RUNNER, "--join", path("thread-locals"), joined}));
-  const ProcessResult result = runProcess({joined});
-  EXPECT_EQ(result.exitStatus, 125);
-  EXPECT_THAT(result.standardError, HasSubstr("thread-locals-library"));
   expectGood(runProcess({RUNNER, "--join", path("system"), joined}));
   expectGood(runProcess({joined, "threads"}));
 }

@@ -39,7 +39,7 @@ using ConditionAttributes = Darwin<pthread_condattr_t, 16>;
 constexpr std::int64_t kInitialised = 0x52756e6e;
 // Those of the static initialisers.
 constexpr std::int64_t kStaticMutex = 0x32AAABA7;
-constexpr std::int64_t kStaticCondition = 0x3CB0BB9B;
+constexpr std::int64_t kStaticCondition = 0x3CB0B1BB;
 constexpr std::int64_t kStaticReadWriteLock = 0x2DA8B3B4;
 constexpr std::int64_t kStaticOnce = 0x30B1BCBA;
 

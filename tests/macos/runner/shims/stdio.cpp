@@ -1,6 +1,6 @@
 // Streams are those of the C library. They are only used through functions.
 
-#include <unistd.h>
+#include <fcntl.h>
 
 #include <cstdarg>
 #include <cstdio>
@@ -36,6 +36,15 @@ void describeError(const char* text) {
   std::fprintf(stderr, "%s: %s\n", text, textOf(errno));
 }
 
+int renameWith(const char* from, const char* to, unsigned flags) {
+  constexpr unsigned kSwap = 2;
+  constexpr unsigned kNeverReplace = 4;
+  if ((flags & ~(kSwap | kNeverReplace)) != 0) refuse("renamex_np is called with the flags 0x%x", flags);
+  const unsigned linux =
+      ((flags & kSwap) != 0 ? RENAME_EXCHANGE : 0U) | ((flags & kNeverReplace) != 0 ? RENAME_NOREPLACE : 0U);
+  return converted(renameat2(AT_FDCWD, from, AT_FDCWD, to, linux));
+}
+
 }  // namespace
 
 shims::Table shims::stdio() {
@@ -69,6 +78,7 @@ shims::Table shims::stdio() {
       shim("putchar", libraryCall<&::putchar>),
       shim("puts", libraryCall<&::puts>),
       shim("remove", systemCall<&::remove>),
+      shim("renamex_np", &renameWith),
       shim("setbuf", &::setbuf),
       shim("setvbuf", &::setvbuf),
       shim("snprintf", &::snprintf),

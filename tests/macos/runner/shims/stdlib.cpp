@@ -4,13 +4,23 @@
 #include <climits>
 #include <cstdlib>
 
+#include "tests/macos/runner/Images.h"
 #include "tests/macos/runner/Shims.h"
 #include "tests/macos/runner/shims/Files.h"
+
+extern "C" int __cxa_atexit(void (*function)(void*), void* object, void* image);
 
 namespace {
 
 int makeFile(char* path, int flags) {
   return converted(mkostemp(path, linuxOpenFlags(flags)));
+}
+
+// Such a function also runs when the caller's image is unloaded.
+int callAtExit(void (*function)()) {
+  const Image* const image = Images::containing(__builtin_return_address(0));
+  if (image == nullptr) refuse("atexit is called by no image");
+  return __cxa_atexit(reinterpret_cast<void (*)(void*)>(function), nullptr, const_cast<void*>(image->header()));
 }
 
 }  // namespace
@@ -19,6 +29,7 @@ shims::Table shims::stdlib() {
   static const Shim table[] = {
       shim("_Exit", &::_Exit),
       shim("abort", &::abort),
+      shim("atexit", &callAtExit),
       shim("aligned_alloc", &::aligned_alloc),
       shim("arc4random", &::arc4random),
       shim("atoi", &::atoi),

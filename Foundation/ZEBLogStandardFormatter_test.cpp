@@ -56,7 +56,8 @@ class ZEBLogStandardFormatterTest : public testing::Test {
   static std::string rest() {
     char text[256];
     std::snprintf(text, sizeof text, " %s[%d/0x%lx] [lvl=3] main() 7 left",
-                  std::string(rt::Process::name().view()).c_str(), getpid(), std::bit_cast<unsigned long>(pthread_self()));
+                  std::string(rt::Process::name().view()).c_str(), getpid(),
+                  std::bit_cast<unsigned long>(pthread_self()));
     return text;
   }
 

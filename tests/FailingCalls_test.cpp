@@ -191,10 +191,9 @@ class FailingCalls : public testing::Test {
 
   // Runs the program `name` once for each of its calls and makes that call fail.
   void tryEachCall(const std::string& name) {
-    static const std::set<std::string> kInterruptible = {"open",  "openat",  "read",     "pread64",
-                                                         "write", "writev",  "pwritev2", "close",
-                                                         "poll",  "select",  "pselect6",
-                                                         "connect", "sendmsg"};
+    static const std::set<std::string> kInterruptible = {
+        "open",  "openat", "read",   "pread64",  "write",   "writev", "pwritev2",
+        "close", "poll",   "select", "pselect6", "connect", "sendmsg"};
     static const std::set<std::string> kOthers = {"access",
                                                   "dup",
                                                   "eventfd2",

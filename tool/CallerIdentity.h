@@ -12,8 +12,9 @@
 /// - CAP_DAC_OVERRIDE is not permitted.
 /// - The system refuses a step, as a filter of system calls may.
 ///
-/// On macOS the effective user and group become the real ones, and the saved user stays root. The functions of
-/// `CallersDirectory.h` give up the saved user for good. Nothing changes if the effective user is not root.
+/// On macOS the effective user and group become the real ones, and the saved user stays root. The functions
+/// of `CallersDirectory.h` give up the saved user for good. Nothing changes if the effective user is not
+/// root.
 ///
 /// If nothing else interferes, the caller gets the same results with and without this call. Changes `errno`.
 ///

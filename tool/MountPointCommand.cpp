@@ -3,8 +3,8 @@
 //
 // Writes messages with <cstdio>. Streams would set up a locale and eight objects before `main`, for a program
 // that prints at most one line. `stderr` is unbuffered, and glibc hands one `fprintf` of up to 8 KiB to the
-// kernel in one `write`. So the lines of commands that run at the same time do not mix. macOS writes pieces of
-// 1 KiB.
+// kernel in one `write`. So the lines of commands that run at the same time do not mix. macOS writes pieces
+// of 1 KiB.
 //
 // The exit status is `errno` after the message. If the message cannot be written, `write` has replaced
 // `errno`, and the status tells that failure instead.

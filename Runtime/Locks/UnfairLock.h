@@ -18,8 +18,8 @@
 /// thread that unlocks it and locks it again at once may well get it first.
 ///
 /// A thread ends the program if it locks a lock that it holds, or unlocks a lock that it does not hold. On
-/// Linux a line on standard error names the lock and the thread. On macOS the program ends by a trap without a
-/// line, and the crash report gives the reason.
+/// Linux a line on standard error names the lock and the thread. On macOS the program ends by a trap without
+/// a line, and the crash report gives the reason.
 ///
 /// The lock itself needs no memory. A thread that takes its first lock registers with the thread library,
 /// which then tells when the thread ends. Registering allocates if the process has many thread-specific keys.

@@ -55,8 +55,8 @@ class Ref {
 
   /// Converts a reference to a protocol into a reference to the object behind it.
   template <class Other>
-    requires std::same_as<T, Object> &&
-             std::derived_from<Other, AnyProtocol> && (!std::derived_from<Other, Object>)
+    requires std::same_as<T, Object> && std::derived_from<Other, AnyProtocol> &&
+             (!std::derived_from<Other, Object>)
   Ref(const Ref<Other>& other) noexcept : Ref(other ? other->asObject() : nullptr) {}
 
   ~Ref() { drop(pointer_); }

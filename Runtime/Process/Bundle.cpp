@@ -23,8 +23,7 @@ String mainIdentifier() {
   }
   // The volatile keeps compilers from assuming what the text is.
   const char* volatile const built = kMainBundleIdentifier;
-  const String identifier =
-      *built != '\0' ? String::fromUTF8(built) : detail::systemBundleIdentifier();
+  const String identifier = *built != '\0' ? String::fromUTF8(built) : detail::systemBundleIdentifier();
   return identifier.isNull() ? ""_s : identifier;
 }
 

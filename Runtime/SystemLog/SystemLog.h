@@ -29,7 +29,8 @@
 /// The first entry opens a socket, which the process keeps. It is closed on exec. The next entry after the
 /// restart of a daemon finds the daemon again. In the child of a fork the log works, and counts from 0.
 ///
-/// On macOS an entry goes to the unified log, which decides what is enabled and kept. `log show --info --debug
+/// On macOS an entry goes to the unified log, which decides what is enabled and kept. `log show --info
+/// --debug
 /// --predicate 'subsystem == "com.example.host"'` shows it. That log cuts entries at about 1 KiB. So an entry
 /// of more than 960 bytes becomes several, and no character is cut in two. A NUL becomes a space. Subsystem
 /// and category are cut at 255 bytes. No entry is counted as dropped, since the log does not tell. In the
@@ -60,8 +61,8 @@ class SystemLog {
   bool isEnabled(Type type) const noexcept;
 
   /// Writes the entry `text`, which should be UTF-8. If a journal listens, or the unified log, takes no lock
-  /// of its own and allocates nothing itself. Preserves `errno`. May also be called while the program is being loaded, and after `main`.
-  /// Threads: thread-safe. Threads do not wait for each other's entries.
+  /// of its own and allocates nothing itself. Preserves `errno`. May also be called while the program is
+  /// being loaded, and after `main`. Threads: thread-safe. Threads do not wait for each other's entries.
   /// Errors: drops and counts an entry that cannot be written, as described above.
   void write(Type type, std::string_view text) const noexcept;
 

@@ -25,8 +25,8 @@ int readClock(clockid_t clock, timespec* time) noexcept {
 
 }  // namespace
 
-// The program's function takes precedence over the C library's, also for the C++ library. On Linux it does for
-// the system's libraries, too.
+// The program's function takes precedence over the C library's, also for the C++ library. On Linux it does
+// for the system's libraries, too.
 extern "C" int clock_gettime(clockid_t clock, timespec* time) noexcept(noexcept(clock_gettime(clock, time))) {
   const int status = readClock(clock, time);
   const ClockHook hook = clockHook.load();

@@ -48,7 +48,8 @@ class PrivateDefaults {
 
   /// Returns the path of the settings' file. Its folder exists.
   std::filesystem::path file() const {
-    return rt::detail::systemDefaultsFolder() + "/" + std::string(rt::Process::name().view()) + "/defaults.conf";
+    return rt::detail::systemDefaultsFolder() + "/" + std::string(rt::Process::name().view()) +
+           "/defaults.conf";
   }
 
   /// Gives the file the setting `key` with `value`, which it does not have yet, and `others`. No other

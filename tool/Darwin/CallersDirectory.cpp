@@ -1,5 +1,5 @@
-// macOS cannot keep one of root's rights without the others, and a caller cannot write in /Volumes. So root works
-// here, where the caller may stop the process between any two steps and reuse any name in /Volumes.
+// macOS cannot keep one of root's rights without the others, and a caller cannot write in /Volumes. So root
+// works here, where the caller may stop the process between any two steps and reuse any name in /Volumes.
 //
 // Root makes the directory inside a folder of its own that nobody else can enter, and hands it over there by
 // its descriptor. Then root moves it to `path`, if nothing is there. So nothing else can be handed over, and

@@ -47,9 +47,9 @@ void runLoadHooksWhenComplete() noexcept;
 
 }  // namespace rt::detail
 
-// The header below also defines the image's `imageState`. It has the initialiser that calls the first function
-// above with that state and the image's list. Mentioning `AnnouncedOnLoading<entry>::run` puts it into the
-// list. It calls `announce(entry)`.
+// The header below also defines the image's `imageState`. It has the initialiser that calls the first
+// function above with that state and the image's list. Mentioning `AnnouncedOnLoading<entry>::run` puts it
+// into the list. It calls `announce(entry)`.
 #ifdef __APPLE__
 #include "Runtime/Base/Private/Darwin/ImageMark.h"
 #else

@@ -1,7 +1,7 @@
-// The system's own functions that sleep at an address exist since macOS 14.4 only. So the sleeping threads are
-// in a table, by the address that they sleep at. A thread enters itself and reads the word under the table's
-// mutex. A thread that wakes others has changed the word before it takes that mutex. So either the first
-// thread sees the new value, or the second one finds it in the table.
+// The system's own functions that sleep at an address exist since macOS 14.4 only. So the sleeping threads
+// are in a table, by the address that they sleep at. A thread enters itself and reads the word under the
+// table's mutex. A thread that wakes others has changed the word before it takes that mutex. So either the
+// first thread sees the new value, or the second one finds it in the table.
 
 #include "Runtime/Locks/Private/AddressWait.h"
 
@@ -64,8 +64,7 @@ class Locked {
  public:
   explicit Locked(const void* address) noexcept
       // The multiplier spreads addresses that differ in any of their bits over the upper bits of the product.
-      : sleepers_(
-            table[std::bit_cast<std::uintptr_t>(address) * 0x9E3779B97F4A7C15U >> (64U - kTableBits)]) {
+      : sleepers_(table[std::bit_cast<std::uintptr_t>(address) * 0x9E3779B97F4A7C15U >> (64U - kTableBits)]) {
     pthread_mutex_lock(&sleepers_.mutex);
   }
   Locked(const Locked&) = delete;

@@ -34,7 +34,7 @@ class ThreadReference {
   static void set(Ref<T> object) {
     // `giveUp` has already run on this thread, so nothing would release the object later.
     if (hasEnded_) return;
-    if (object) giveUpAtEnd();
+    if (object || object_ != nullptr) giveUpAtEnd(object.get());
     Ref<T> previous = Ref<T>::adopt(object_);
     object_ = object.detach();
   }
@@ -42,20 +42,23 @@ class ThreadReference {
  private:
   // Uses a key of the thread library, which reports a lack of memory. The destructor of a thread_local
   // variable would need memory too, and the C library ends the program if it gets none.
-  static void giveUpAtEnd() {
+  //
+  // The key's value is the object itself. macOS frees a thread's variables before it calls the destructors of
+  // later keys, and a variable that is used then has its initial value again.
+  static void giveUpAtEnd(T* object) {
     static constinit Lazy<pthread_key_t> shared;
     const pthread_key_t key = shared.get([] {
       pthread_key_t made{};
       if (pthread_key_create(&made, giveUp) != 0) throw std::bad_alloc();
       return made;
     });
-    if (pthread_getspecific(key) == nullptr && pthread_setspecific(key, &object_) != 0)
-      throw std::bad_alloc();
+    if (pthread_setspecific(key, object) != 0) throw std::bad_alloc();
   }
 
-  static void giveUp(void* /*object*/) noexcept {
+  static void giveUp(void* object) noexcept {
     hasEnded_ = true;
-    Ref<T>::adopt(std::exchange(object_, nullptr));
+    object_ = nullptr;
+    Ref<T>::adopt(static_cast<T*>(object));
   }
 
   static constinit thread_local T* object_;

@@ -27,15 +27,24 @@ using testing::Not;
 constexpr const char* kTwice =
     "Trying to register bindings module data twice. This is likely caused by loading multiple bindings "
     "modules in the same app or test. See docs/registry.md#registering-bindings-module-twice.";
-constexpr const char* kTakenAgain =
-    "rt: the lock at 0x[0-9a-f]+ is taken again by thread [0-9]+, which holds it\n";
 constexpr const char* kAsksInCallback =
     "SRLRegistry: an error callback asks a registry whose lock at 0x[0-9a-f]+ is held; callbacks must not\n";
 constexpr const char* kWaitsInCallback =
     "SRLMemoizingScope: an error callback asks for the instance for 0x[0-9a-f]+, which is being made; "
     "callbacks must not\n";
+
+// How misuse of a lock ends the program. macOS has a lock of its own, which prints nothing.
+#if defined(__APPLE__)
+constexpr int kSignalOfLock = SIGILL;
+constexpr const char* kTakenAgain = "";
+constexpr const char* kNotHeld = "";
+#else
+constexpr int kSignalOfLock = SIGABRT;
+constexpr const char* kTakenAgain =
+    "rt: the lock at 0x[0-9a-f]+ is taken again by thread [0-9]+, which holds it\n";
 constexpr const char* kNotHeld =
     "rt: the lock at 0x[0-9a-f]+ is needed by thread [0-9]+, but no thread holds it\n";
+#endif
 
 // An error callback that prints the report and returns.
 void print(const Ref<PECErrorDescription>& error) {
@@ -101,28 +110,30 @@ TEST_F(SRLRegistryDeathTest, ModulesRegisteredTwiceEndTheProgramEvenIfTheCallbac
     try {
       registry_->internalRegisterBindings({});
     } catch (...) {
-      std::fputs("caught\n", stderr);
+      std::fputs("the caller has caught it\n", stderr);
     }
   };
   setCallback([](const Ref<PECErrorDescription>& error) {
     print(error);
     throw Thrown();
   });
-  EXPECT_EXIT(registerTwice(), KilledBySignal(SIGABRT), AllOf(HasSubstr(kTwice), Not(HasSubstr("caught"))));
+  EXPECT_EXIT(registerTwice(), KilledBySignal(SIGABRT),
+              AllOf(HasSubstr(kTwice), Not(HasSubstr("has caught"))));
   // The default error callback throws, too.
   setCallback(nullptr);
-  EXPECT_EXIT(registerTwice(), KilledBySignal(SIGABRT), AllOf(HasSubstr(kTwice), Not(HasSubstr("caught"))));
+  EXPECT_EXIT(registerTwice(), KilledBySignal(SIGABRT),
+              AllOf(HasSubstr(kTwice), Not(HasSubstr("has caught"))));
 }
 
 TEST_F(SRLRegistryDeathTest, FunctionsThatNeedTheLockEndTheProgramWithoutIt) {
   const auto registerBindings = [this]() RT_NO_THREAD_SAFETY_ANALYSIS {
     registry_->registerBindings(module_.bindings().front());
   };
-  EXPECT_EXIT(registerBindings(), KilledBySignal(SIGABRT), ContainsRegex(kNotHeld));
+  EXPECT_EXIT(registerBindings(), KilledBySignal(kSignalOfLock), ContainsRegex(kNotHeld));
   const auto ask = [this]() RT_NO_THREAD_SAFETY_ANALYSIS {
     registry_->apiIdentifierForProtocol(&rt::protocolInfo<TestClock>());
   };
-  EXPECT_EXIT(ask(), KilledBySignal(SIGABRT), ContainsRegex(kNotHeld));
+  EXPECT_EXIT(ask(), KilledBySignal(kSignalOfLock), ContainsRegex(kNotHeld));
 }
 
 // Each registry has a lock of its own.
@@ -132,7 +143,7 @@ TEST_F(SRLRegistryDeathTest, FunctionsThatNeedTheLockEndTheProgramWithAnotherLoc
     const rt::LockGuard guard(*registry_->lock());
     copy->registerBindings(module_.bindings().front());
   };
-  EXPECT_EXIT(registerBindings(), KilledBySignal(SIGABRT), ContainsRegex(kNotHeld));
+  EXPECT_EXIT(registerBindings(), KilledBySignal(kSignalOfLock), ContainsRegex(kNotHeld));
 }
 
 TEST_F(SRLRegistryDeathTest, FunctionsThatTakeTheLockEndTheProgramIfItIsHeld) {
@@ -148,7 +159,7 @@ TEST_F(SRLRegistryDeathTest, FunctionsThatTakeTheLockEndTheProgramIfItIsHeld) {
       const rt::LockGuard guard(*registry_->lock());
       take();
     };
-    EXPECT_EXIT(takeTwice(), KilledBySignal(SIGABRT), ContainsRegex(kTakenAgain));
+    EXPECT_EXIT(takeTwice(), KilledBySignal(kSignalOfLock), ContainsRegex(kTakenAgain));
   }
 }
 
@@ -186,7 +197,7 @@ TEST_F(SRLRegistryDeathTest, ALoggerThatUsesTheRegistryUnderItsLockEndsTheProgra
     const SRLAPIRegistrationData unknown{.identifier = "Unknown", .identifierLength = 7};
     registry_->internalService(&unknown, {});
   };
-  EXPECT_EXIT(report(), KilledBySignal(SIGABRT), ContainsRegex(kTakenAgain));
+  EXPECT_EXIT(report(), KilledBySignal(kSignalOfLock), ContainsRegex(kTakenAgain));
 }
 
 // Another thread holds the lock. It may be waiting to report until this callback returns.

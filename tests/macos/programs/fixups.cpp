@@ -52,7 +52,8 @@ int main() {
   for (const int* pointer : neighbours) areNeighboursRight &= pointer == &own;
   check(areNeighboursRight, "pointers next to each other point to the variable");
   for (std::size_t at = 0; at < std::size(gaps); ++at) {
-    check(gaps[at].pointer == &own && gaps[at].number == at + 1, "pointers with gaps, and only they, were changed");
+    check(gaps[at].pointer == &own && gaps[at].number == at + 1,
+          "pointers with gaps, and only they, were changed");
   }
   for (const Page& page : pages) check(page.pointer == &own, "pointers on many pages point to the variable");
   for (const Far& each : farApart) check(each.first == &own && each.last == &own, "pointers far apart");
@@ -67,7 +68,8 @@ int main() {
   check(librarySharedValue() == &Shared<char>::value, "a static member of a template is one");
   check(toShared == sharedVariable && *toSharedWithAddend == 3, "pointers to a weak variable");
   check(librarySharedRange() == &sharedRange, "a weak constant is one");
-  check(sharedRange.end - sharedRange.begin == 2 && *(sharedRange.end - 1) == 7, "an addend to a weak definition");
+  check(sharedRange.end - sharedRange.begin == 2 && *(sharedRange.end - 1) == 7,
+        "an addend to a weak definition");
   check(&noImageHasThisFunction == nullptr, "a function that may be missing is null");
   return failures();
 }

@@ -12,7 +12,8 @@ const Announcement first("first file");
 bool wasCalledWithArguments = false;
 
 [[gnu::constructor]] void takeArguments(int count, char** arguments, char** environment) {
-  wasCalledWithArguments = count == 2 && std::strstr(arguments[0], "initialisers") != nullptr && environment != nullptr;
+  wasCalledWithArguments =
+      count == 2 && std::strstr(arguments[0], "initialisers") != nullptr && environment != nullptr;
 }
 
 }  // namespace

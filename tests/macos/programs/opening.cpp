@@ -30,7 +30,8 @@ int main(int count, char** arguments) {
   const char* const path = arguments[1];
   _dyld_register_func_for_remove_image(&noteRemoval);
 
-  check(dlopen("/no/such/bundle", RTLD_NOW) == nullptr && dlerror() != nullptr, "a missing bundle is an error");
+  check(dlopen("/no/such/bundle", RTLD_NOW) == nullptr && dlerror() != nullptr,
+        "a missing bundle is an error");
   check(dlerror() == nullptr, "an error is told once");
   check(dlopen(path, RTLD_NOLOAD) == nullptr, "the bundle is not loaded yet");
 
@@ -40,7 +41,8 @@ int main(int count, char** arguments) {
   const auto next = reinterpret_cast<int (*)()>(dlsym(bundle, "nextNumber"));
   check(next != nullptr && next() == 141 && next() == 142, "the bundle's function works");
   check(dlsym(bundle, "noSuchFunction") == nullptr && dlerror() != nullptr, "a missing function is an error");
-  check(dlsym(RTLD_DEFAULT, "nextNumber") == reinterpret_cast<void*>(next), "the function is found in all images");
+  check(dlsym(RTLD_DEFAULT, "nextNumber") == reinterpret_cast<void*>(next),
+        "the function is found in all images");
   check(dlsym(RTLD_DEFAULT, "printf") != nullptr, "a function of the system is found");
 
   Dl_info information{};

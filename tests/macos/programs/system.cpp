@@ -3,6 +3,7 @@
 #include <dirent.h>
 #include <fcntl.h>
 #include <os/lock.h>
+#include <os/log.h>
 #include <pthread.h>
 #include <sys/event.h>
 #include <sys/stat.h>
@@ -26,8 +27,10 @@ void testFiles() {
   check(mkdir("folder", 0750) == 0 && errno == 0, "a folder is made, and errno stays");
   check(mkdir("folder/file", 0700) == 0, "a folder in the folder");
   check(rmdir("folder") == -1 && errno == ENOTEMPTY, "ENOTEMPTY has its number");
-  check(mkdir(std::string(300, 'x').c_str(), 0700) == -1 && errno == ENAMETOOLONG, "ENAMETOOLONG has its number");
-  check(symlink("loop", "loop") == 0 && open("loop", O_RDONLY) == -1 && errno == ELOOP, "ELOOP has its number");
+  check(mkdir(std::string(300, 'x').c_str(), 0700) == -1 && errno == ENAMETOOLONG,
+        "ENAMETOOLONG has its number");
+  check(symlink("loop", "loop") == 0 && open("loop", O_RDONLY) == -1 && errno == ELOOP,
+        "ELOOP has its number");
   check(std::string(std::strerror(ENOTEMPTY)) == "Directory not empty", "an error has its text");
   check(std::string(std::strerror(1000)) == "Unknown error: 1000", "an unknown error has its text");
 
@@ -36,7 +39,8 @@ void testFiles() {
   check(lstat("loop", &status) == 0 && S_ISLNK(status.st_mode), "lstat");
 
   const int file = open("text", O_RDWR | O_CREAT | O_EXCL | O_APPEND | O_CLOEXEC | O_NONBLOCK, 0640);
-  check(file >= 0 && fstat(file, &status) == 0 && status.st_size == 0 && (status.st_mode & 0777) == 0640, "open");
+  check(file >= 0 && fstat(file, &status) == 0 && status.st_size == 0 && (status.st_mode & 0777) == 0640,
+        "open");
   check((fcntl(file, F_GETFL) & (O_APPEND | O_NONBLOCK)) == (O_APPEND | O_NONBLOCK), "F_GETFL");
   check(fcntl(file, F_GETFD) == FD_CLOEXEC, "O_CLOEXEC");
   check(write(file, "abc", 3) == 3 && fcntl(file, F_FULLFSYNC) == 0, "F_FULLFSYNC");
@@ -57,7 +61,8 @@ void testFiles() {
 
 void testPipes() {
   int ends[2];
-  check(pipe(ends) == 0 && fcntl(ends[1], F_SETNOSIGPIPE, 1) == 0 && fcntl(ends[1], F_GETNOSIGPIPE) == 1, "mark");
+  check(pipe(ends) == 0 && fcntl(ends[1], F_SETNOSIGPIPE, 1) == 0 && fcntl(ends[1], F_GETNOSIGPIPE) == 1,
+        "mark");
   fcntl(ends[0], F_SETFL, O_NONBLOCK);
   char byte = 0;
   check(read(ends[0], &byte, 1) == -1 && errno == EAGAIN, "EAGAIN has its number");
@@ -74,7 +79,8 @@ void testSignals() {
   action.sa_flags = SA_RESTART;
   check(sigaction(SIGUSR1, &action, nullptr) == 0 && raise(SIGUSR1) == 0 && received == SIGUSR1, "a handler");
   struct sigaction previous{};
-  check(sigaction(SIGUSR1, nullptr, &previous) == 0 && previous.sa_handler == action.sa_handler, "its address");
+  check(sigaction(SIGUSR1, nullptr, &previous) == 0 && previous.sa_handler == action.sa_handler,
+        "its address");
   check((previous.sa_flags & SA_RESTART) != 0, "its flag");
   sigset_t set;
   sigset_t before;
@@ -171,12 +177,14 @@ void testQueue() {
   check(kevent(queue, nullptr, 0, &event, 1, &noTime) == 0, "nothing has happened");
   close(open("new", O_CREAT | O_WRONLY, 0600));
   check(kevent(queue, nullptr, 0, &event, 1, nullptr) == 1, "something has happened");
-  check(event.filter == EVFILT_VNODE && (event.fflags & NOTE_WRITE) != 0, "it is that the folder has changed");
+  check(event.filter == EVFILT_VNODE && (event.fflags & NOTE_WRITE) != 0,
+        "it is that the folder has changed");
   EV_SET(&change, 0, EVFILT_USER, EV_ADD | EV_CLEAR, NOTE_FFNOP, 0, nullptr);
   check(kevent(queue, &change, 1, nullptr, 0, nullptr) == 0, "the program may send an event");
   EV_SET(&change, 0, EVFILT_USER, 0, NOTE_TRIGGER, 0, nullptr);
   check(kevent(queue, &change, 1, nullptr, 0, nullptr) == 0, "it does");
-  check(kevent(queue, nullptr, 0, &event, 1, nullptr) == 1 && event.filter == EVFILT_USER, "the event arrives");
+  check(kevent(queue, nullptr, 0, &event, 1, nullptr) == 1 && event.filter == EVFILT_USER,
+        "the event arrives");
   close(folder);
   close(queue);
 }
@@ -201,6 +209,9 @@ int main(int count, char** arguments) {
     testThreads();
   } else if (test == "queue") {
     testQueue();
+  } else if (test == "log") {
+    os_log_t log = os_log_create("com.example", "net");
+    os_log_with_type(log, OS_LOG_TYPE_ERROR, "a %{public}s, %s", "text", "secret");
   } else if (test == "foreign-unlock") {
     static os_unfair_lock lock = OS_UNFAIR_LOCK_INIT;
     os_unfair_lock_lock(&lock);

@@ -18,7 +18,8 @@ thread_local char large[100'000];
 thread_local Counted counted;
 thread_local std::string text = "text";
 
-// Registers that functions may change keep their values when a variable's address is taken for the first time.
+// Registers that functions may change keep their values when a variable's address is taken for the first
+// time.
 [[gnu::noinline]] double sumOfMany(double a, double b, double c, double d, long e, long f) {
   const double before = a * b + c * d;
   initialised += 1;

@@ -1,4 +1,5 @@
-// Each page of a segment may have one chain. A place in it is 8 bytes: what to write, and the distance to the next place.
+// Each page of a segment may have one chain. A place in it is 8 bytes: what to write, and the distance to the
+// next place.
 
 #include "ChainedFixups.h"
 
@@ -35,7 +36,8 @@ constexpr std::size_t kPageStarts = 22;
 constexpr std::uint16_t kNoChain = 0xffff;
 constexpr std::uint16_t kSeveralChains = 0x8000;
 
-enum class PointerFormat : std::uint16_t { Address = 2, Offset = 6 };
+// The linker makes pointers of one form: targets are addresses in the file.
+constexpr std::uint16_t kTargetIsAddress = 2;
 
 std::uint64_t bits(std::uint64_t value, unsigned first, unsigned count) {
   return (value >> first) & ((std::uint64_t{1} << count) - 1);
@@ -59,23 +61,25 @@ std::vector<std::uint64_t> resolveImports(const Image& image, FileBytes data, co
     switch (static_cast<ImportFormat>(header.importFormat)) {
       case ImportFormat::Plain: {
         const auto word = valueAt<std::uint32_t>(data, header.importsOffset + number * 4);
-        addresses.push_back(resolved(ordinalOf(bits(word, 0, 8), 8), bits(word, 8, 1) != 0, bits(word, 9, 23)));
+        addresses.push_back(
+            resolved(ordinalOf(bits(word, 0, 8), 8), bits(word, 8, 1) != 0, bits(word, 9, 23)));
         break;
       }
       case ImportFormat::WithAddend: {
         const std::size_t offset = header.importsOffset + number * 8;
         const auto word = valueAt<std::uint32_t>(data, offset);
         const auto addend = valueAt<std::int32_t>(data, offset + 4);
-        addresses.push_back(resolved(ordinalOf(bits(word, 0, 8), 8), bits(word, 8, 1) != 0, bits(word, 9, 23)) +
-                            static_cast<std::uint64_t>(std::int64_t{addend}));
+        addresses.push_back(
+            resolved(ordinalOf(bits(word, 0, 8), 8), bits(word, 8, 1) != 0, bits(word, 9, 23)) +
+            static_cast<std::uint64_t>(std::int64_t{addend}));
         break;
       }
       case ImportFormat::WithLongAddend: {
         const std::size_t offset = header.importsOffset + number * 16;
         const auto word = valueAt<std::uint64_t>(data, offset);
         const auto addend = valueAt<std::uint64_t>(data, offset + 8);
-        addresses.push_back(resolved(ordinalOf(bits(word, 0, 16), 16), bits(word, 16, 1) != 0, bits(word, 32, 32)) +
-                            addend);
+        addresses.push_back(
+            resolved(ordinalOf(bits(word, 0, 16), 16), bits(word, 16, 1) != 0, bits(word, 32, 32)) + addend);
         break;
       }
       default:
@@ -85,8 +89,7 @@ std::vector<std::uint64_t> resolveImports(const Image& image, FileBytes data, co
   return addresses;
 }
 
-void followChain(const Image& image, std::uint64_t place, PointerFormat format,
-                 const std::vector<std::uint64_t>& imports) {
+void followChain(const Image& image, std::uint64_t place, const std::vector<std::uint64_t>& imports) {
   for (;;) {
     auto* const pointer = reinterpret_cast<std::uint64_t*>(place);
     const std::uint64_t value = *pointer;
@@ -95,8 +98,7 @@ void followChain(const Image& image, std::uint64_t place, PointerFormat format,
       if (number >= imports.size()) refuseShortFile();
       *pointer = imports[number] + bits(value, 24, 8);
     } else {
-      const std::uint64_t target = bits(value, 0, 36) | (bits(value, 36, 8) << 56);
-      *pointer = target + (format == PointerFormat::Address ? image.slide() : image.start());
+      *pointer = (bits(value, 0, 36) | (bits(value, 36, 8) << 56)) + image.slide();
     }
     const std::uint64_t distance = bits(value, 51, 12) * 4;
     if (distance == 0) return;
@@ -119,15 +121,14 @@ void followChains(const Image& image, const macho::DataCommand& where, const Res
     if (offset == 0) continue;
     const std::size_t begin = header.startsOffset + offset;
     const auto starts = valueAt<SegmentStarts>(data, begin);
-    const auto format = static_cast<PointerFormat>(starts.pointerFormat);
-    if (format != PointerFormat::Address && format != PointerFormat::Offset) {
+    if (starts.pointerFormat != kTargetIsAddress) {
       refuse("%s has chained pointers of the form %u", image.path().c_str(), starts.pointerFormat);
     }
     for (std::size_t page = 0; page < starts.pageCount; ++page) {
       const auto start = valueAt<std::uint16_t>(data, begin + kPageStarts + page * 2);
       if (start == kNoChain) continue;
       if ((start & kSeveralChains) != 0) refuse("%s has several chains in a page", image.path().c_str());
-      followChain(image, image.start() + starts.segmentOffset + page * starts.pageSize + start, format, imports);
+      followChain(image, image.start() + starts.segmentOffset + page * starts.pageSize + start, imports);
     }
   }
 }

@@ -118,7 +118,8 @@ void bind(const Image& image, FileBytes program, Binding binding, const Resolve&
   const auto bindOnce = [&](std::uint64_t gap) {
     const std::uint64_t address = resolve(import);
     // A weak binding follows another one to the same place, which stays if no image defines the symbol.
-    if (address != 0 || binding != Binding::Weak) place.pointer() = address + static_cast<std::uint64_t>(addend);
+    if (address != 0 || binding != Binding::Weak)
+      place.pointer() = address + static_cast<std::uint64_t>(addend);
     place.moveBy(kPointer + gap);
   };
   while (!reader.isAtEnd()) {

@@ -27,8 +27,8 @@ T valueAt(FileBytes bytes, std::size_t offset);
 
 /// A Mach-O file in memory: a program, a library or a bundle.
 ///
-/// The constructor reads the load commands and maps the segments, all of them writable, so that they can be fixed up.
-/// It refuses a file with a load command that it does not know.
+/// The constructor reads the load commands and maps the segments, all of them writable, so that they can be
+/// fixed up. It refuses a file with a load command that it does not know.
 ///
 /// Threads: not thread-safe until `protect` has returned; afterwards thread-safe.
 class Image {

@@ -30,7 +30,8 @@ struct Loaded {
   Loaded(const std::string& path, FileBytes bytes) : image(path, bytes) {}
 
   Image image;
-  // One for each library, in the order of ordinals. Null stands for the system's library and for a missing one.
+  // One for each library, in the order of ordinals. Null stands for the system's library and for a missing
+  // one.
   std::vector<Loaded*> libraries;
   // How many `open`s and images need this one.
   int users = 0;
@@ -142,7 +143,8 @@ void loadLibraries(Loaded& loaded) {
 }
 
 Loaded& loadFile(const std::string& path) {
-  if (Loaded* known = firstImage([&](const Loaded& loaded) { return loaded.image.path() == path; })) return *known;
+  if (Loaded* known = firstImage([&](const Loaded& loaded) { return loaded.image.path() == path; }))
+    return *known;
   Loaded& loaded = add(path, bytesOfFile(path));
   loadLibraries(loaded);
   return loaded;
@@ -207,12 +209,13 @@ std::uint64_t resolve(const Loaded& importer, const Import& import) {
   return library.name.starts_with(kSystemLibraries) ? inSystem(import.name) : 0;
 }
 
-// Whether an import may be null is a question of the system's version. The runner has one version only, so it does not
-// guess: a name that it does not know is an error in any case, unless the name belongs to an image.
+// Whether an import may be null is a question of the system's version. The runner has one version only, so it
+// does not guess: a name that it does not know is an error in any case, unless the name belongs to an image.
 bool mayBeNull(const Loaded& importer, const Import& import) {
   if (!import.mayBeMissing) return false;
   if (import.ordinal <= 0) return true;
-  return !importer.image.libraries()[static_cast<std::size_t>(import.ordinal) - 1].name.starts_with(kSystemLibraries);
+  return !importer.image.libraries()[static_cast<std::size_t>(import.ordinal) - 1].name.starts_with(
+      kSystemLibraries);
 }
 
 void fixUp(const Loaded& loaded) {
@@ -225,10 +228,12 @@ void fixUp(const Loaded& loaded) {
   });
 }
 
-// Fixes up and protects the images from the given number on. Refuses them if they import a name that is nowhere.
+// Fixes up and protects the images from the given number on. Refuses them if they import a name that is
+// nowhere.
 void prepare(std::size_t first) {
   const std::size_t count = imageCount.load(std::memory_order_acquire);
-  for (std::size_t number = first; number < count; ++number) fixUp(*images[number].load(std::memory_order_acquire));
+  for (std::size_t number = first; number < count; ++number)
+    fixUp(*images[number].load(std::memory_order_acquire));
   if (!unknownNames.empty()) {
     std::string list;
     for (const std::string& name : unknownNames) list += "\n  " + name;
@@ -245,7 +250,8 @@ void prepare(std::size_t first) {
 
 using Main = int (*)(int, char**, char**, const char**);
 
-// macOS passes a fourth array of strings, which tells the system's own libraries about the process. It is empty here.
+// macOS passes a fourth array of strings, which tells the system's own libraries about the process. It is
+// empty here.
 std::array<const char*, 1> systemStrings{};
 
 void callInitialiser(const Loaded& loaded, std::uint64_t address) {
@@ -307,7 +313,8 @@ Arguments& arguments() {
 }
 
 int run(const std::string& path, FileBytes bytes, FileBytes unwinderBytes, const Arguments& given) {
-  pthread_atfork([] { loading.lock(); }, [] { loading.unlock(); }, [] { loading.unlock(); });
+  // In a child, the thread that has locked has another number, so the lock is made anew.
+  pthread_atfork([] { loading.lock(); }, [] { loading.unlock(); }, [] { std::construct_at(&loading); });
   arguments() = given;
   Loaded& main = add(path, bytes);
   Loaded& unwinding = add("/usr/lib/system/libunwind.dylib", unwinderBytes);
@@ -328,7 +335,8 @@ const Image* open(const std::string& path, int flags) {
   const std::lock_guard guard(loading);
   const std::string file = canonical(path);
   if (file.empty()) return nullptr;
-  const bool isLoaded = firstImage([&](const Loaded& loaded) { return loaded.image.path() == file; }) != nullptr;
+  const bool isLoaded =
+      firstImage([&](const Loaded& loaded) { return loaded.image.path() == file; }) != nullptr;
   if ((flags & kOnlyIfLoaded) != 0 && !isLoaded) return nullptr;
   const std::size_t first = count();
   Loaded& loaded = loadFile(file);

@@ -1,7 +1,8 @@
 #pragma once
 
-// The parts of the Mach-O format that the runner reads. The names are those of <mach-o/loader.h>, <mach-o/nlist.h> and
-// <mach-o/fixup-chains.h>, in this project's style. All numbers are little-endian, as on the machines that run this.
+// The parts of the Mach-O format that the runner reads. The names are those of <mach-o/loader.h>,
+// <mach-o/nlist.h> and <mach-o/fixup-chains.h>, in this project's style. All numbers are little-endian, as on
+// the machines that run this.
 
 #include <array>
 #include <cstdint>
@@ -14,7 +15,8 @@ constexpr std::uint32_t kProcessorX86_64 = 0x01000007;
 /// Kinds of files.
 enum class FileType : std::uint32_t { Executable = 2, Library = 6, Bundle = 8 };
 
-/// Bits of `Header::flags`. Only images with these bits take part when weak definitions are shared between images.
+/// Bits of `Header::flags`. Only images with these bits take part when weak definitions are shared between
+/// images.
 constexpr std::uint32_t kDefinesWeakSymbols = 0x8000;
 constexpr std::uint32_t kBindsToWeakSymbols = 0x10000;
 

@@ -16,7 +16,8 @@ struct Case {
   std::string reason;
 };
 
-// The cases of the program. A line of the list is "PROGRAM SUITE.CASE REASON"; one that begins with "#" is a comment.
+// The cases of the program. A line of the list is "PROGRAM SUITE.CASE REASON"; one that begins with "#" is a
+// comment.
 std::vector<Case> casesOf(const std::string& program) {
   std::ifstream list(NOT_SHOWN);
   if (!list.is_open()) refuse("%s cannot be read", NOT_SHOWN);
@@ -49,7 +50,8 @@ bool skipCasesNotShown(const std::string& program, int count, char** arguments) 
   std::string excluded;
   for (const Case& each : cases) {
     if (filter == each.name) {
-      std::printf("tests/macos/NotShown.txt: Skipped\n%s\n\n[  SKIPPED ] %s\n", each.reason.c_str(), each.name.c_str());
+      std::printf("tests/macos/NotShown.txt: Skipped\n%s\n\n[  SKIPPED ] %s\n", each.reason.c_str(),
+                  each.name.c_str());
       return true;
     }
     excluded += (excluded.empty() ? "-" : ":") + each.name;

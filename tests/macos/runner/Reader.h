@@ -6,8 +6,8 @@
 
 #include "Image.h"
 
-/// Reads the variable-length numbers and the texts of fixups and exports, one after the other. Refuses the file if the
-/// bytes end in the middle of one.
+/// Reads the variable-length numbers and the texts of fixups and exports, one after the other. Refuses the
+/// file if the bytes end in the middle of one.
 class Reader {
  public:
   explicit Reader(FileBytes bytes, std::size_t position = 0) : bytes_(bytes), position_(position) {}

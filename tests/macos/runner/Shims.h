@@ -18,7 +18,8 @@ struct Shim {
 /// Returns the address of a shim, or null if there is none of this name.
 const void* shimNamed(std::string_view name);
 
-/// Makes an entry of a table of shims. For a function with overloads, name the type: `shim<double(double)>("ceil", ceil)`.
+/// Makes an entry of a table of shims. For a function with overloads, name the type:
+/// `shim<double(double)>("ceil", ceil)`.
 template <class Type>
 Shim shim(std::string_view name, Type* object) {
   if constexpr (std::is_function_v<Type>) {
@@ -28,8 +29,8 @@ Shim shim(std::string_view name, Type* object) {
   }
 }
 
-/// The numbers of errors that differ. A program's `errno` is that of the C library, and has macOS's number whenever the
-/// program can see it.
+/// The numbers of errors that differ. A program's `errno` is that of the C library, and has macOS's number
+/// whenever the program can see it.
 int darwinError(int linuxError);
 int linuxError(int darwinError);
 
@@ -95,6 +96,7 @@ namespace shims {
 
 using Table = std::span<const Shim>;
 
+Table copyfile();
 Table coreFoundation();
 Table ctype();
 Table cxxabi();
@@ -122,6 +124,7 @@ Table sysResource();
 Table sysSelect();
 Table sysSocket();
 Table sysStat();
+Table sysStatvfs();
 Table sysWait();
 Table time();
 Table unistd();

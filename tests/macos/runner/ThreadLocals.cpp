@@ -45,8 +45,8 @@ pthread_key_t endOfThread() {
 
 }  // namespace
 
-// The function of descriptors changes no register but the one with its result, not even those that functions may change.
-// So it is written in assembly, as is the code around the first call of a thread.
+// The function of descriptors changes no register but the one with its result, not even those that functions
+// may change. So it is written in assembly, as is the code around the first call of a thread.
 extern "C" {
 constinit thread_local Blocks macosRunnerThreadBlocks{};
 void macosRunnerThreadLocalAddress();
@@ -106,7 +106,8 @@ void* macosRunnerAllocateThreadBlock(std::uint64_t block) {
     refuse("there is no memory for thread-local variables");
   }
   auto* const bytes = static_cast<std::byte*>(memory);
-  std::fill_n(std::ranges::copy(variables.data, bytes).out, variables.size - variables.data.size(), std::byte{0});
+  std::fill_n(std::ranges::copy(variables.data, bytes).out, variables.size - variables.data.size(),
+              std::byte{0});
   macosRunnerThreadBlocks[number] = memory;
   pthread_setspecific(endOfThread(), &macosRunnerThreadBlocks);
   return memory;
@@ -136,5 +137,6 @@ void prepareThreadLocals(const Image& image) {
 }
 
 const void* threadLocalBootstrap() {
-  return reinterpret_cast<const void*>(+[] { refuse("a thread-local variable was used before it was prepared"); });
+  return reinterpret_cast<const void*>(
+      +[] { refuse("a thread-local variable was used before it was prepared"); });
 }

@@ -1,7 +1,8 @@
 // macos-runner PROGRAM [ARGUMENT…]
 //
-// Runs a Mach-O program for x86-64 on Linux, at the processor's own speed. The program's code is mapped and called; what it
-// imports from libSystem are functions of the C library, or shims that translate between the systems.
+// Runs a Mach-O program for x86-64 on Linux, at the processor's own speed. The program's code is mapped and
+// called; what it imports from libSystem are functions of the C library, or shims that translate between the
+// systems.
 //
 // macos-runner --argument-0 NAME PROGRAM [ARGUMENT…]
 //
@@ -9,10 +10,11 @@
 //
 // macos-runner --join PROGRAM FILE
 //
-// Writes a program for Linux to FILE that runs PROGRAM, which it contains. Such a program may run set-user-ID.
+// Writes a program for Linux to FILE that runs PROGRAM, which it contains. Such a program may run
+// set-user-ID.
 //
-// Exits with 125 where it would have to guess what macOS does, and says why. Before the program runs, it does so with the
-// names of all imports that it does not know. A test case that NotShown.txt lists is not run.
+// Exits with 125 where it would have to guess what macOS does, and says why. Before the program runs, it does
+// so with the names of all imports that it does not know. A test case that NotShown.txt lists is not run.
 
 #include <sys/stat.h>
 #include <unistd.h>
@@ -106,8 +108,9 @@ int main(int count, char** arguments) {
     at = 3;
   }
   if (at >= count) {
-    std::fprintf(stderr, "usage: macos-runner [--argument-0 NAME] PROGRAM [ARGUMENT...]\n"
-                         "       macos-runner --join PROGRAM FILE\n");
+    std::fprintf(stderr,
+                 "usage: macos-runner [--argument-0 NAME] PROGRAM [ARGUMENT...]\n"
+                 "       macos-runner --join PROGRAM FILE\n");
     return 2;
   }
   const std::string path = absolute(arguments[at]);

@@ -7,6 +7,8 @@
 #include <csignal>
 #include <filesystem>
 #include <fstream>
+#include <iterator>
+#include <sstream>
 #include <string>
 #include <vector>
 
@@ -15,9 +17,7 @@
 namespace {
 
 namespace fs = std::filesystem;
-using testing::AllOf;
 using testing::HasSubstr;
-using testing::Not;
 
 // Each test runs the programs whose fixups are opcodes, and those whose fixups are chains.
 class Runner : public testing::TestWithParam<const char*> {
@@ -55,6 +55,10 @@ INSTANTIATE_TEST_SUITE_P(Chains, Runner, testing::Values("-chained"));
 
 TEST_P(Runner, FixesUpPointersIntoTheImageAndIntoLibraries) {
   expectGood(run("fixups"));
+}
+
+TEST_P(Runner, FixesUpPointersFarBehindALibrary) {
+  expectGood(run("fixups-far"));
 }
 
 TEST_P(Runner, InitialisesLibrariesFirstAndFilesInTheOrderOfTheLinker) {
@@ -122,12 +126,23 @@ TEST_P(Runner, WatchesFolders) {
   expectGood(run("system", {"queue"}));
 }
 
+TEST_P(Runner, WritesTheLogIntoAFile) {
+  const fs::path log = folder() / "log";
+  setenv("MACOS_RUNNER_LOG", log.c_str(), 1);
+  expectGood(run("system", {"log"}));
+  unsetenv("MACOS_RUNNER_LOG");
+  std::ostringstream written;
+  written << std::ifstream(log).rdbuf();
+  EXPECT_EQ(written.str(), "10 [com.example:net] a text, <private>\n");
+}
+
 TEST_P(Runner, NamesUnknownImportsBeforeAnythingRuns) {
   const ProcessResult result = run("unknown-import");
   EXPECT_EQ(result.exitStatus, 125);
   EXPECT_EQ(result.standardOutput, "");
-  EXPECT_EQ(result.standardError, "macos-runner: neither an image nor a shim has these names:\n  _acl_valid (" +
-                                      path("unknown-import") + ")\n  _copyfile (" + path("unknown-import") + ")\n");
+  EXPECT_EQ(result.standardError,
+            "macos-runner: neither an image nor a shim has these names:\n  _acl_valid (" +
+                path("unknown-import") + ")\n  _copyfile (" + path("unknown-import") + ")\n");
 }
 
 TEST_P(Runner, RefusesWhatAShimDoesNotKnow) {
@@ -153,7 +168,8 @@ TEST_P(Runner, RefusesAFileThatEndsTooEarly) {
     std::ofstream(part, std::ios::binary) << bytes.substr(0, size);
     const ProcessResult result = runProcess({RUNNER, part});
     EXPECT_EQ(result.exitStatus, 125) << size;
-    EXPECT_EQ(result.standardError, "macos-runner: a Mach-O file ends in the middle of what it says\n") << size;
+    EXPECT_EQ(result.standardError, "macos-runner: a Mach-O file ends in the middle of what it says\n")
+        << size;
   }
 }
 

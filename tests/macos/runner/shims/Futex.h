@@ -7,8 +7,8 @@
 #include <cstdint>
 #include <ctime>
 
-/// Sleeps while `word` is `expected`, for no longer than `timeout` if that is not null. Returns what the system call
-/// returns, with Linux's `errno`.
+/// Sleeps while `word` is `expected`, for no longer than `timeout` if that is not null. Returns what the
+/// system call returns, with Linux's `errno`.
 inline long futexWait(void* word, std::uint32_t expected, const timespec* timeout) {
   return syscall(SYS_futex, word, FUTEX_WAIT_PRIVATE, expected, timeout, nullptr, 0);
 }

@@ -2,8 +2,8 @@
 
 #include <cstddef>
 
-// Writing into a pipe that nobody reads sends SIGPIPE. On macOS the signal goes to the process, not to the thread. A
-// descriptor may have a mark that no signal is sent; Linux has no such mark.
+// Writing into a pipe that nobody reads sends SIGPIPE. On macOS the signal goes to the process, not to the
+// thread. A descriptor may have a mark that no signal is sent; Linux has no such mark.
 
 /// Gives the descriptor the mark, or takes it away. Returns 0, or -1 with Linux's `errno`.
 int setNoSigPipe(int file, bool isSet);

@@ -1,5 +1,5 @@
-// Inline functions of <ctype.h> read a table with the properties of characters. It is that of the "C" locale, which is
-// the only one that programs use here.
+// Inline functions of <ctype.h> read a table with the properties of characters. It is that of the "C" locale,
+// which is the only one that programs use here.
 
 #include <array>
 #include <cctype>

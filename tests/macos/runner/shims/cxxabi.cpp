@@ -18,7 +18,8 @@ __extension__ unsigned __int128 __umodti3(unsigned __int128, unsigned __int128);
 
 namespace {
 
-// The destructors of thread-local variables run at the end of their thread, before those of the thread's values.
+// The destructors of thread-local variables run at the end of their thread, before those of the thread's
+// values.
 void destroyAtEndOfThread(void (*function)(void*), void* object) {
   __cxa_thread_atexit_impl(function, object, &__dso_handle);
 }

@@ -64,8 +64,10 @@ int fileOf(Folder* folder) {
 
 shims::Table shims::dirent() {
   static const Shim table[] = {
-      shim("opendir$INODE64", &openFolder), shim("fdopendir$INODE64", &openFolderOf),
-      shim("readdir$INODE64", &readFolder), shim("closedir", &closeFolder),
+      shim("opendir$INODE64", &openFolder),
+      shim("fdopendir$INODE64", &openFolderOf),
+      shim("readdir$INODE64", &readFolder),
+      shim("closedir", &closeFolder),
       shim("dirfd", &fileOf),
   };
   return table;

@@ -1,5 +1,5 @@
-// A process has the main queue, and a thread that runs it: the main thread, in `dispatch_main`. Nothing else of the
-// system's queues is used. They cannot be used in the child of a fork, if the parent has used them.
+// A process has the main queue, and a thread that runs it: the main thread, in `dispatch_main`. Nothing else
+// of the system's queues is used. They cannot be used in the child of a fork, if the parent has used them.
 
 #include <pthread.h>
 

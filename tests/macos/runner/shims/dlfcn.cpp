@@ -22,7 +22,8 @@ const void* const kDefault = reinterpret_cast<const void*>(std::intptr_t{-2});
 const void* const kMainOnly = reinterpret_cast<const void*>(std::intptr_t{-5});
 
 // A handle for the one framework that has shims.
-constexpr std::string_view kCoreFoundation = "/System/Library/Frameworks/CoreFoundation.framework/CoreFoundation";
+constexpr std::string_view kCoreFoundation =
+    "/System/Library/Frameworks/CoreFoundation.framework/CoreFoundation";
 constexpr char kFramework = 0;
 
 thread_local std::string problem;
@@ -39,7 +40,8 @@ const void* openImage(const char* path, int flags) {
   if (path == kCoreFoundation) return &kFramework;
   const std::string_view name = path;
   if (name.starts_with("/System/") || name.starts_with("/usr/lib/")) {
-    // An image that needs another library of the system than libSystem is not run, so no such library is loaded.
+    // An image that needs another library of the system than libSystem is not run, so no such library is
+    // loaded.
     if ((flags & Images::kOnlyIfLoaded) != 0) return failWith(std::string(name) + " is not loaded");
     refuse("%s is opened, for which there are no shims", path);
   }
@@ -117,7 +119,8 @@ std::intptr_t imageSlide(std::uint32_t number) {
 
 void* sectionOf(const void* header, const char* segment, const char* name, unsigned long* size) {
   const Image* const image = Images::withHeader(header);
-  const std::span<std::byte> section = image == nullptr ? std::span<std::byte>() : image->section(segment, name);
+  const std::span<std::byte> section =
+      image == nullptr ? std::span<std::byte>() : image->section(segment, name);
   *size = section.size();
   return section.data();
 }

@@ -19,18 +19,9 @@ struct Flag {
 };
 
 constexpr Flag kOpenFlags[] = {
-    {0x4, O_NONBLOCK},
-    {0x8, O_APPEND},
-    {0x80, O_SYNC},
-    {0x100, O_NOFOLLOW},
-    {0x200, O_CREAT},
-    {0x400, O_TRUNC},
-    {0x800, O_EXCL},
-    {0x8000, O_PATH},  // O_EVTONLY
-    {0x20000, O_NOCTTY},
-    {0x100000, O_DIRECTORY},
-    {0x400000, O_DSYNC},
-    {0x1000000, O_CLOEXEC},
+    {0x4, O_NONBLOCK},   {0x8, O_APPEND},         {0x80, O_SYNC},      {0x100, O_NOFOLLOW},
+    {0x200, O_CREAT},    {0x400, O_TRUNC},        {0x800, O_EXCL},     {0x8000, O_PATH},  // O_EVTONLY
+    {0x20000, O_NOCTTY}, {0x100000, O_DIRECTORY}, {0x400000, O_DSYNC}, {0x1000000, O_CLOEXEC},
 };
 
 constexpr Flag kAtFlags[] = {

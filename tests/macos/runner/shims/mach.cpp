@@ -52,10 +52,8 @@ int timebase(Timebase* result) {
 
 shims::Table shims::machine() {
   static const Shim table[] = {
-      shim("mach_task_self_", &ownTask),
-      shim("task_threads", &threadsOf),
-      shim("vm_deallocate", &deallocate),
-      shim("mach_absolute_time", &absoluteTime),
+      shim("mach_task_self_", &ownTask),     shim("task_threads", &threadsOf),
+      shim("vm_deallocate", &deallocate),    shim("mach_absolute_time", &absoluteTime),
       shim("mach_timebase_info", &timebase),
   };
   return table;

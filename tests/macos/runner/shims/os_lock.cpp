@@ -1,5 +1,5 @@
-// A lock is the port of its owner, or 0. The upper bit says that a thread sleeps. Misuse ends the program, with a trap and
-// no word on standard error, as on macOS.
+// A lock is the port of its owner, or 0. The upper bit says that a thread sleeps. Misuse ends the program,
+// with a trap and no word on standard error, as on macOS.
 
 #include <atomic>
 

@@ -1,5 +1,5 @@
-// Entries go into a file, if the variable MACOS_RUNNER_LOG names one. A line has the entry's type, subsystem, category and
-// text. A part of the text that the caller did not declare public is replaced, as the log does.
+// Entries go into a file, if the variable MACOS_RUNNER_LOG names one. A line has the entry's type, subsystem,
+// category and text. A part of the text that the caller did not declare public is replaced, as the log does.
 
 #include <fcntl.h>
 #include <unistd.h>
@@ -42,8 +42,8 @@ bool isEnabled(const Log*, std::uint8_t type) {
   return type != kDebug;
 }
 
-// The arguments of an entry, as the compiler lays them out: two bytes, of which the second is the number of arguments;
-// then for each one its kind and privacy, its size and its bytes.
+// The arguments of an entry, as the compiler lays them out: two bytes, of which the second is the number of
+// arguments; then for each one its kind and privacy, its size and its bytes.
 class Entry {
  public:
   explicit Entry(FileBytes bytes) : bytes_(bytes), left_(valueAt<std::uint8_t>(bytes, 1)) {}
@@ -110,7 +110,8 @@ std::string formatted(std::string_view format, Entry entry) {
   return text;
 }
 
-void add(const void*, const Log* log, std::uint8_t type, const char* format, const void* buffer, std::uint32_t size) {
+void add(const void*, const Log* log, std::uint8_t type, const char* format, const void* buffer,
+         std::uint32_t size) {
   const int error = errno;
   const std::string text = formatted(format, Entry({static_cast<const std::byte*>(buffer), size}));
   if (const char* const path = std::getenv("MACOS_RUNNER_LOG")) {

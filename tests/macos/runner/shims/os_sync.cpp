@@ -25,8 +25,8 @@ void requireKnown(std::uint32_t operation, const char* function) {
   }
 }
 
-// Sleeps until the word of 4 or 8 bytes changes, or until the time is over. Returns how many threads still sleep there,
-// which nobody asks for, or -1.
+// Sleeps until the word of 4 or 8 bytes changes, or until the time is over. Returns how many threads still
+// sleep there, which nobody asks for, or -1.
 int wait(std::uint32_t operation, void* address, std::uint64_t expected, std::uint32_t microseconds) {
   requireKnown(operation, "__ulock_wait");
   // The kernel compares the lower half only. A change of the upper half alone wakes the sleeper too.

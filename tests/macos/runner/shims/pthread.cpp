@@ -1,8 +1,9 @@
-// The objects of macOS are larger than those of the C library, which lie in them behind the signature. An object with a
-// static initialiser is the signature and zeros, and zeros are also a static initialiser of the C library. So nothing is
-// allocated, and no first use has to be noticed.
+// The objects of macOS are larger than those of the C library, which lie in them behind the signature. An
+// object with a static initialiser is the signature and zeros, and zeros are also a static initialiser of the
+// C library. So nothing is allocated, and no first use has to be noticed.
 //
-// A condition variable is as large as the C library's. There the signature is replaced by zeros at the first use.
+// A condition variable is as large as the C library's. There the signature is replaced by zeros at the first
+// use.
 
 #include <pthread.h>
 #include <sched.h>
@@ -196,8 +197,8 @@ int destroyAttributes(Attributes* attributes) {
 
 int setDetached(Attributes* attributes, int state) {
   constexpr int kDetached = 2;
-  return pthread_attr_setdetachstate(
-      host(attributes), state == kDetached ? PTHREAD_CREATE_DETACHED : PTHREAD_CREATE_JOINABLE);
+  return pthread_attr_setdetachstate(host(attributes),
+                                     state == kDetached ? PTHREAD_CREATE_DETACHED : PTHREAD_CREATE_JOINABLE);
 }
 
 int setStackSize(Attributes* attributes, std::size_t size) {

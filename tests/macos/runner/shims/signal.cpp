@@ -37,7 +37,7 @@ struct Flag {
   int darwin;
   int linux;
 };
-constexpr Flag kFlags[] = {{0x1, SA_ONSTACK},   {0x2, SA_RESTART},   {0x4, static_cast<int>(SA_RESETHAND)},
+constexpr Flag kFlags[] = {{0x1, SA_ONSTACK},   {0x2, SA_RESTART},  {0x4, static_cast<int>(SA_RESETHAND)},
                            {0x8, SA_NOCLDSTOP}, {0x10, SA_NODEFER}, {0x20, SA_NOCLDWAIT}};
 
 int changeAction(int darwin, const Action* given, Action* previous) {

@@ -7,6 +7,7 @@
 #include <cwchar>
 
 #include "tests/macos/runner/Shims.h"
+#include "tests/macos/runner/shims/Files.h"
 
 namespace {
 
@@ -36,13 +37,18 @@ void describeError(const char* text) {
   std::fprintf(stderr, "%s: %s\n", text, textOf(errno));
 }
 
-int renameWith(const char* from, const char* to, unsigned flags) {
+int renameAtWith(int fromFolder, const char* from, int toFolder, const char* to, unsigned flags) {
   constexpr unsigned kSwap = 2;
   constexpr unsigned kNeverReplace = 4;
-  if ((flags & ~(kSwap | kNeverReplace)) != 0) refuse("renamex_np is called with the flags 0x%x", flags);
+  if ((flags & ~(kSwap | kNeverReplace)) != 0) refuse("renameatx_np is called with the flags 0x%x", flags);
   const unsigned linux =
       ((flags & kSwap) != 0 ? RENAME_EXCHANGE : 0U) | ((flags & kNeverReplace) != 0 ? RENAME_NOREPLACE : 0U);
-  return converted(renameat2(AT_FDCWD, from, AT_FDCWD, to, linux));
+  return converted(renameat2(linuxFolder(fromFolder), from, linuxFolder(toFolder), to, linux));
+}
+
+int renameWith(const char* from, const char* to, unsigned flags) {
+  constexpr int kCurrentFolder = -2;
+  return renameAtWith(kCurrentFolder, from, kCurrentFolder, to, flags);
 }
 
 }  // namespace
@@ -78,6 +84,7 @@ shims::Table shims::stdio() {
       shim("putchar", libraryCall<&::putchar>),
       shim("puts", libraryCall<&::puts>),
       shim("remove", systemCall<&::remove>),
+      shim("renameatx_np", &renameAtWith),
       shim("renamex_np", &renameWith),
       shim("setbuf", &::setbuf),
       shim("setvbuf", &::setvbuf),

@@ -1,8 +1,8 @@
-#include <fcntl.h>
+#include <sys/stat.h>
 #include <unistd.h>
 
-#include <climits>
 #include <cstdlib>
+#include <cstring>
 
 #include "tests/macos/runner/Images.h"
 #include "tests/macos/runner/Shims.h"
@@ -16,11 +16,27 @@ int makeFile(char* path, int flags) {
   return converted(mkostemp(path, linuxOpenFlags(flags)));
 }
 
+// Makes a folder with a name that nothing in `folder` has. Its last six characters replace the pattern's.
+char* makeFolderAt(int folder, char* pattern) {
+  const std::size_t length = std::strlen(pattern);
+  if (length < 6) refuse("mkdtempat_np is called with the pattern %s", pattern);
+  for (;;) {
+    for (std::size_t at = length - 6; at < length; ++at) {
+      pattern[at] = static_cast<char>('a' + arc4random_uniform(26));
+    }
+    if (mkdirat(linuxFolder(folder), pattern, 0700) == 0) return pattern;
+    if (errno == EEXIST) continue;
+    convertErrno();
+    return nullptr;
+  }
+}
+
 // Such a function also runs when the caller's image is unloaded.
 int callAtExit(void (*function)()) {
   const Image* const image = Images::containing(__builtin_return_address(0));
   if (image == nullptr) refuse("atexit is called by no image");
-  return __cxa_atexit(reinterpret_cast<void (*)(void*)>(function), nullptr, const_cast<void*>(image->header()));
+  return __cxa_atexit(reinterpret_cast<void (*)(void*)>(function), nullptr,
+                      const_cast<void*>(image->header()));
 }
 
 }  // namespace
@@ -42,6 +58,7 @@ shims::Table shims::stdlib() {
       shim("getenv", &::getenv),
       shim("malloc", &::malloc),
       shim("mkdtemp", systemCall<&::mkdtemp>),
+      shim("mkdtempat_np", &makeFolderAt),
       shim("mkostemp", &makeFile),
       shim("mkstemp", systemCall<&::mkstemp>),
       shim("posix_memalign", &::posix_memalign),

@@ -13,10 +13,12 @@ shims::Table shims::string() {
       shim("memcpy", &::memcpy),
       shim("memmove", &::memmove),
       shim("memset", &::memset),
-      shim("memset_pattern16", +[](void* to, const void* pattern, std::size_t size) {
-        auto* bytes = static_cast<char*>(to);
-        for (std::size_t at = 0; at < size; ++at) bytes[at] = static_cast<const char*>(pattern)[at % 16];
-      }),
+      shim(
+          "memset_pattern16",
+          +[](void* to, const void* pattern, std::size_t size) {
+            auto* bytes = static_cast<char*>(to);
+            for (std::size_t at = 0; at < size; ++at) bytes[at] = static_cast<const char*>(pattern)[at % 16];
+          }),
       shim("strcasecmp", &::strcasecmp),
       shim("strcat", &::strcat),
       shim<const char*(const char*, int)>("strchr", ::strchr),

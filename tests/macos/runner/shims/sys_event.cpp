@@ -1,7 +1,5 @@
-// A queue is an inotify descriptor, and a descriptor of its own for the event that the program sends to itself. A file is
-// watched until its descriptor is closed, as on macOS.
-
-#include "KernelQueue.h"
+// A queue is an inotify descriptor, and a descriptor of its own for the event that the program sends to
+// itself. A file is watched until its descriptor is closed, as on macOS.
 
 #include <poll.h>
 #include <pthread.h>
@@ -18,6 +16,7 @@
 #include <mutex>
 #include <string>
 
+#include "KernelQueue.h"
 #include "tests/macos/runner/Shims.h"
 
 namespace {
@@ -56,7 +55,9 @@ struct Watch {
 
 struct Queue {
   int user;
-  std::map<int, Watch> watches;  // by the watched descriptor
+  // Both by the watched descriptor. Events stay until the program takes them.
+  std::map<int, Watch> watches;
+  std::map<int, Event> events;
 };
 
 std::map<int, Queue> queues;
@@ -64,16 +65,15 @@ std::mutex lock;
 
 int makeQueue() {
   // Queues are not inherited by the child of a fork.
-  [[maybe_unused]] static const int registered = pthread_atfork(
-      [] { lock.lock(); }, [] { lock.unlock(); },
-      [] {
-        for (const auto& [file, queue] : queues) {
-          close(file);
-          close(queue.user);
-        }
-        queues.clear();
-        lock.unlock();
-      });
+  [[maybe_unused]] static const int registered = pthread_atfork([] { lock.lock(); }, [] { lock.unlock(); },
+                                                                [] {
+                                                                  for (const auto& [file, queue] : queues) {
+                                                                    close(file);
+                                                                    close(queue.user);
+                                                                  }
+                                                                  queues.clear();
+                                                                  lock.unlock();
+                                                                });
   const int file = inotify_init1(IN_NONBLOCK);
   if (file < 0) return converted(file);
   const int user = eventfd(0, EFD_NONBLOCK | EFD_CLOEXEC);
@@ -83,7 +83,7 @@ int makeQueue() {
     return -1;
   }
   const std::lock_guard guard(lock);
-  queues[file] = {.user = user, .watches = {}};
+  queues[file] = {.user = user, .watches = {}, .events = {}};
   return file;
 }
 
@@ -92,8 +92,8 @@ int addWatch(int queueFile, Queue& queue, const Event& change) {
   if ((change.filterFlags & ~kKnown) != 0) refuse("kevent watches a file for 0x%x", change.filterFlags);
   const auto file = static_cast<int>(change.identifier);
   const std::string link = "/proc/self/fd/" + std::to_string(file);
-  constexpr std::uint32_t kMask = IN_MODIFY | IN_ATTRIB | IN_DELETE_SELF | IN_MOVE_SELF | IN_CREATE | IN_DELETE |
-                                  IN_MOVED_FROM | IN_MOVED_TO;
+  constexpr std::uint32_t kMask = IN_MODIFY | IN_ATTRIB | IN_DELETE_SELF | IN_MOVE_SELF | IN_CREATE |
+                                  IN_DELETE | IN_MOVED_FROM | IN_MOVED_TO;
   const int number = inotify_add_watch(queueFile, link.c_str(), kMask);
   if (number < 0) return converted(number);
   queue.watches[file] = {.number = number, .wanted = change.filterFlags, .context = change.context};
@@ -101,9 +101,11 @@ int addWatch(int queueFile, Queue& queue, const Event& change) {
 }
 
 int apply(int queueFile, Queue& queue, const Event& change) {
-  if ((change.flags & ~(kAdd | kEnable | kClear)) != 0) refuse("kevent is called with the flags 0x%x", change.flags);
+  if ((change.flags & ~(kAdd | kEnable | kClear)) != 0)
+    refuse("kevent is called with the flags 0x%x", change.flags);
   if (change.filter == kFile) return addWatch(queueFile, queue, change);
-  if (change.filter != kUser || change.identifier != 0) refuse("kevent is called with the filter %d", change.filter);
+  if (change.filter != kUser || change.identifier != 0)
+    refuse("kevent is called with the filter %d", change.filter);
   if ((change.filterFlags & kTrigger) != 0) {
     const std::uint64_t one = 1;
     if (write(queue.user, &one, sizeof one) < 0) return converted(-1);
@@ -125,66 +127,66 @@ std::uint32_t darwinFlags(std::uint32_t mask, int file) {
   return flags;
 }
 
-// Reads what inotify has, and puts one event for each file that wants it into `events`. Returns how many.
-int readEvents(int queueFile, Event* events, int room) {
+// Takes what inotify has. Returns 0, or -1.
+int collect(int queueFile, Queue& queue) {
   alignas(inotify_event) std::array<char, 65536> buffer;
   const ssize_t size = read(queueFile, buffer.data(), buffer.size());
   if (size < 0) return errno == EAGAIN ? 0 : converted(-1);
-  std::map<int, Event> found;
-  const std::lock_guard guard(lock);
-  const auto queue = queues.find(queueFile);
-  if (queue == queues.end()) return 0;
   for (ssize_t at = 0; at < size;) {
     inotify_event event{};
     std::memcpy(&event, buffer.data() + at, sizeof event);
     at += static_cast<ssize_t>(sizeof event + event.len);
-    for (const auto& [file, watch] : queue->second.watches) {
-      if (watch.number != event.wd) continue;
+    for (const auto& [file, watch] : queue.watches) {
       const std::uint32_t flags = darwinFlags(event.mask, file) & watch.wanted;
-      if (flags == 0) continue;
-      Event& darwin = found[file];
+      if (watch.number != event.wd || flags == 0) continue;
+      Event& darwin = queue.events[file];
       darwin.identifier = static_cast<std::uint64_t>(file);
       darwin.filter = kFile;
       darwin.filterFlags |= flags;
       darwin.context = watch.context;
     }
   }
-  if (found.size() > static_cast<std::size_t>(room)) refuse("kevent has room for %d events only", room);
+  return 0;
+}
+
+// Moves what has happened into `events`. Returns how many there are, or -1.
+int take(int queueFile, Queue& queue, Event* events, int room) {
   int count = 0;
-  for (const auto& [file, event] : found) events[count++] = event;
+  std::uint64_t triggers = 0;
+  if (read(queue.user, &triggers, sizeof triggers) == sizeof triggers) {
+    events[count] = {};
+    events[count++].filter = kUser;
+  }
+  if (collect(queueFile, queue) != 0) return -1;
+  while (count < room && !queue.events.empty()) {
+    events[count++] = queue.events.begin()->second;
+    queue.events.erase(queue.events.begin());
+  }
   return count;
 }
 
 int changeAndWait(int queueFile, const Event* changes, int changeCount, Event* events, int room,
                   const timespec* timeout) {
-  int user = -1;
-  {
-    const std::lock_guard guard(lock);
-    const auto queue = queues.find(queueFile);
-    if (queue == queues.end()) {
-      errno = EBADF;
-      return -1;
-    }
-    user = queue->second.user;
-    for (int number = 0; number < changeCount; ++number) {
-      if (apply(queueFile, queue->second, changes[number]) != 0) return -1;
-    }
-  }
-  if (room == 0) return 0;
   for (;;) {
-    std::array<pollfd, 2> files = {
-        {{.fd = queueFile, .events = POLLIN, .revents = 0}, {.fd = user, .events = POLLIN, .revents = 0}}};
+    std::array<pollfd, 2> files{};
+    {
+      const std::lock_guard guard(lock);
+      const auto found = queues.find(queueFile);
+      if (found == queues.end()) {
+        errno = EBADF;
+        return -1;
+      }
+      Queue& queue = found->second;
+      for (; changeCount != 0; --changeCount, ++changes) {
+        if (apply(queueFile, queue, *changes) != 0) return -1;
+      }
+      if (room == 0) return 0;
+      if (const int count = take(queueFile, queue, events, room); count != 0) return count;
+      files = {{{.fd = queueFile, .events = POLLIN, .revents = 0},
+                {.fd = queue.user, .events = POLLIN, .revents = 0}}};
+    }
     const int ready = ppoll(files.data(), files.size(), timeout, nullptr);
     if (ready <= 0) return converted(ready);
-    if (files[1].revents != 0) {
-      std::uint64_t count = 0;
-      if (read(user, &count, sizeof count) < 0) continue;
-      events[0] = {};
-      events[0].filter = kUser;
-      return 1;
-    }
-    // The caller may want none of what has happened.
-    if (const int count = readEvents(queueFile, events, room); count != 0) return count;
   }
 }
 
@@ -202,6 +204,7 @@ void KernelQueue::closing(int file) {
     if (watch == queue.watches.end()) continue;
     const int number = watch->second.number;
     queue.watches.erase(watch);
+    queue.events.erase(file);
     // inotify has one watch for a file, whatever the number of descriptors.
     bool isShared = false;
     for (const auto& [other, otherWatch] : queue.watches) isShared |= otherWatch.number == number;

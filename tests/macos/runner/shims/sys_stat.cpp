@@ -73,6 +73,10 @@ int statusAt(int folder, const char* path, Status* status, int flags) {
   return fill(fstatat(linuxFolder(folder), path, &found, linuxAtFlags(flags)), found, status);
 }
 
+int makeFolderAt(int folder, const char* path, mode_t mode) {
+  return converted(mkdirat(linuxFolder(folder), path, mode));
+}
+
 int changeModeAt(int folder, const char* path, mode_t mode, int flags) {
   return converted(fchmodat(linuxFolder(folder), path, mode, linuxAtFlags(flags)));
 }
@@ -103,6 +107,7 @@ shims::Table shims::sysStat() {
       shim("fchmod", systemCall<&::fchmod>),
       shim("fchmodat", &changeModeAt),
       shim("mkdir", systemCall<&::mkdir>),
+      shim("mkdirat", &makeFolderAt),
       shim("mkfifo", systemCall<&::mkfifo>),
       shim("umask", &::umask),
       shim("utimensat", &changeTimes),

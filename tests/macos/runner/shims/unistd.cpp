@@ -34,7 +34,8 @@ std::atomic<bool>* markOf(int file) {
   return file >= 0 && number < marks.size() ? &marks[number] : nullptr;
 }
 
-// Calls `call`, which may send SIGPIPE to this thread, and discards the signal if the descriptor has the mark.
+// Calls `call`, which may send SIGPIPE to this thread, and discards the signal if the descriptor has the
+// mark.
 template <class Call>
 ssize_t withoutSigPipe(int file, Call call) {
   if (!hasNoSigPipe(file)) return converted(call());
@@ -159,8 +160,8 @@ int execute(const char* path, char* const* arguments, char* const* environment) 
   std::string option = "--argument-0";
   std::string file = path;
   std::string empty;
-  std::vector<char*> all = {runner.data(), option.data(), arguments[0] == nullptr ? empty.data() : arguments[0],
-                            file.data()};
+  std::vector<char*> all = {runner.data(), option.data(),
+                            arguments[0] == nullptr ? empty.data() : arguments[0], file.data()};
   for (std::size_t number = 1; arguments[0] != nullptr && arguments[number] != nullptr; ++number) {
     all.push_back(arguments[number]);
   }

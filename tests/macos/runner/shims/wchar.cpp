@@ -17,21 +17,11 @@ const wchar_t* findCharacter(const wchar_t* text, wchar_t character, std::size_t
 
 shims::Table shims::wchar() {
   static const Shim table[] = {
-      shim("swprintf", &::swprintf),
-      shim("wcscmp", &::wcscmp),
-      shim("wcslen", &::wcslen),
-      shim("wcsstr", &find),
-      shim("wcstod", &::wcstod),
-      shim("wcstof", &::wcstof),
-      shim("wcstol", &::wcstol),
-      shim("wcstold", &::wcstold),
-      shim("wcstoll", &::wcstoll),
-      shim("wcstoul", &::wcstoul),
-      shim("wcstoull", &::wcstoull),
-      shim("wmemchr", &findCharacter),
-      shim("wmemcmp", &::wmemcmp),
-      shim("wmemcpy", &::wmemcpy),
-      shim("wmemmove", &::wmemmove),
+      shim("swprintf", &::swprintf), shim("wcscmp", &::wcscmp),     shim("wcslen", &::wcslen),
+      shim("wcsstr", &find),         shim("wcstod", &::wcstod),     shim("wcstof", &::wcstof),
+      shim("wcstol", &::wcstol),     shim("wcstold", &::wcstold),   shim("wcstoll", &::wcstoll),
+      shim("wcstoul", &::wcstoul),   shim("wcstoull", &::wcstoull), shim("wmemchr", &findCharacter),
+      shim("wmemcmp", &::wmemcmp),   shim("wmemcpy", &::wmemcpy),   shim("wmemmove", &::wmemmove),
       shim("wmemset", &::wmemset),
   };
   return table;

@@ -67,7 +67,7 @@ void freeLocale(locale_t locale) {
 }
 
 char* setLocale(int category, const char* name) {
-  static constexpr std::array kCategories = {LC_ALL,      LC_COLLATE, LC_CTYPE,   LC_MONETARY,
+  static constexpr std::array kCategories = {LC_ALL,     LC_COLLATE, LC_CTYPE,   LC_MONETARY,
                                              LC_NUMERIC, LC_TIME,    LC_MESSAGES};
   return setlocale(kCategories.at(static_cast<std::size_t>(category)), name);
 }
@@ -76,8 +76,8 @@ char* setLocale(int category, const char* name) {
 lconv* reordered(const lconv* from) {
   static thread_local lconv result;
   result = *from;
-  const std::array ordered = {from->int_p_cs_precedes, from->int_n_cs_precedes, from->int_p_sep_by_space,
-                              from->int_n_sep_by_space, from->int_p_sign_posn,  from->int_n_sign_posn};
+  const std::array ordered = {from->int_p_cs_precedes,  from->int_n_cs_precedes, from->int_p_sep_by_space,
+                              from->int_n_sep_by_space, from->int_p_sign_posn,   from->int_n_sign_posn};
   std::memcpy(&result.int_p_cs_precedes, ordered.data(), ordered.size());
   return &result;
 }
@@ -91,7 +91,8 @@ lconv* conventionsIn(locale_t locale) {
   return reordered(localeconv());
 }
 
-[[gnu::format(printf, 4, 5)]] int printIn(char* buffer, std::size_t size, locale_t locale, const char* format, ...) {
+[[gnu::format(printf, 4, 5)]] int printIn(char* buffer, std::size_t size, locale_t locale, const char* format,
+                                          ...) {
   const Use use(locale);
   std::va_list arguments;
   va_start(arguments, format);

@@ -23,9 +23,10 @@ bool awaitRoom(Clock::time_point end) noexcept {
     const auto left = std::max(std::chrono::ceil<std::chrono::microseconds>(end - Clock::now()),
                                std::chrono::microseconds(0));
     const auto seconds = std::chrono::duration_cast<std::chrono::seconds>(left);
-    timeval timeout{};
-    timeout.tv_sec = seconds.count();
-    timeout.tv_usec = static_cast<decltype(timeout.tv_usec)>((left - seconds).count());
+    // The system's type for microseconds may have 32 bits.
+    using Microseconds = std::chrono::duration<decltype(timeval::tv_usec), std::micro>;
+    timeval timeout{.tv_sec = seconds.count(),
+                    .tv_usec = std::chrono::duration_cast<Microseconds>(left - seconds).count()};
     fd_set stream;
     FD_ZERO(&stream);
     FD_SET(STDERR_FILENO, &stream);

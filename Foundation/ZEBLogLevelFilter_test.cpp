@@ -23,7 +23,6 @@ using namespace rt::literals;
 
 constexpr const char* kSetting = "ZEBVerboseLogging";
 
-// NOLINTNEXTLINE(bugprone-throwing-static-initialization): without it no test can run
 const PrivateDefaults privateDefaults;
 
 class ZEBLogLevelFilterTest : public testing::Test {

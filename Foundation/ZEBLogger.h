@@ -179,7 +179,7 @@ class RT_VISIBLE ZEBLogger : public rt::Implements<ZEBLogger, rt::Object, ZEBLog
                                   const rt::FormatString<std::type_identity_t<Arguments>...>& format,
                                   const Arguments&... arguments) {
     const rt::String text = format.string();
-    logVariadic(level, func, &text, rt::toVariadic(arguments)...);
+    logVariadic(level, func, &text, rt::toVariadic(rt::toArgument(arguments))...);
   }
 
   // Takes the arguments in the form that `rt::toVariadic` gives them.

@@ -44,6 +44,7 @@
 #include "Runtime/Queues/QualityOfService.h"
 #include "Runtime/Queues/Queue.h"
 #include "Runtime/SystemLog/SystemLog.h"
+#include "Runtime/Text/Description.h"
 #include "Runtime/Text/Format.h"
 #include "Runtime/Text/FormatString.h"
 #include "Runtime/Values/Array.h"

@@ -325,6 +325,7 @@ BENCHMARK_CAPTURE(errorOurs, , false)->Name("Logging/error with call stack/witho
 BENCHMARK(unwinder)->Name("Logging/error with call stack/unwinder");
 
 const Bound syncBound("Logging/sync", "spdlog", 1.5);
+const Bound refusedBound("Logging/refused", "spdlog", 1.0);
 const Bound glogBound("Logging/sync", "glog", 1.0);
 
 }  // namespace

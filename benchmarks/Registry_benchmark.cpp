@@ -115,8 +115,8 @@ struct Least {
     benchmark::DoNotOptimize(unknown.find(api));
     return nullptr;
   }
-  [[gnu::always_inline]] inline Ref<rt::Object> keptInstance(const SRLImplementationRegistrationData& record,
-                                                             const SRLScopeTagSet& tags) {
+  [[gnu::always_inline]] Ref<rt::Object> keptInstance(const SRLImplementationRegistrationData& record,
+                                                      const SRLScopeTagSet& tags) {
     Ref<rt::Object> instance;
     if (SRLScopeTagSetDetail::hasOneTagForEachBit(tags, record.scopeType) &&
         SRLScopeTagSetEqual(scopeTags, tags))

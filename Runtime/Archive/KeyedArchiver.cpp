@@ -1,10 +1,16 @@
 #include "Runtime/Archive/KeyedArchiver.h"
 
 #include <algorithm>
+#include <cstdint>
+#include <functional>
 #include <limits>
+#include <map>
+#include <string>
+#include <unordered_map>
 #include <utility>
 
 #include "Runtime/Archive/Private/KeyedArchiveFormat.h"
+#include "Runtime/Archive/Private/PropertyList.h"
 #include "Runtime/Objects/Exception.h"
 #include "Runtime/Values/Array.h"
 #include "Runtime/Values/Dictionary.h"
@@ -52,13 +58,58 @@ std::size_t sum(std::size_t first, std::size_t second) noexcept {
 
 }  // namespace
 
-KeyedArchiver::KeyedArchiver() : dictionaries_(1) {
+class KeyedArchiver::Encoder {
+ public:
+  // The functions of KeyedArchiver. `archiver` is the one that objects' `encodeWithCoder` gets.
+  explicit Encoder(KeyedArchiver& archiver);
+  void encodeObject(const Ref<Object>& object, std::string_view key);
+  std::vector<std::byte> encodedData();
+
+ private:
+  using Index = PropertyList::Index;
+  struct Known {
+    std::size_t place;
+    // Retained, so that no other object gets its address.
+    Ref<Object> object;
+    // 0 while the object is being encoded.
+    std::size_t size;
+  };
+
+  // Returns the index of a reference to `object`. Archives `object` if it is not archived yet.
+  Index reference(const Ref<Object>& object);
+  Index contentOf(const Ref<Object>& object);
+  PropertyList::Dictionary partsOf(const SecureCoding& object);
+  PropertyList::Dictionary partsOfCollection(const Object& object);
+  Index listOf(const std::vector<Ref<Object>>& objects);
+  Index classReference(const ClassInfo& info);
+  Index referenceTo(std::size_t place);
+  Index text(std::string_view text);
+
+  KeyedArchiver& archiver_;
+  PropertyList list_;
+  // The value of "$objects".
+  PropertyList::Array places_;
+  // The objects that are being encoded, from the top down.
+  std::vector<PropertyList::Dictionary> dictionaries_;
+  std::unordered_map<const Object*, Known> known_;
+  // The places of strings, by their texts.
+  std::unordered_map<Index, std::size_t> strings_;
+  std::unordered_map<const ClassInfo*, Index> classes_;
+  std::unordered_map<std::size_t, Index> references_;
+  std::map<std::string, Index, std::less<>> texts_;
+  // Sizes are counted as detail::keyedArchive::maximumSize says. `size_` is what has been counted of the
+  // object that is being encoded, and `largestSize_` is the size of the largest object at the top.
+  std::size_t size_ = 0;
+  std::size_t largestSize_ = 0;
+  // How many calls of `encodeObject` have begun and not ended without an exception.
+  std::size_t unfinished_ = 0;
+};
+
+KeyedArchiver::Encoder::Encoder(KeyedArchiver& archiver) : archiver_(archiver), dictionaries_(1) {
   places_.push_back(text(kNull));
 }
 
-KeyedArchiver::~KeyedArchiver() = default;
-
-void KeyedArchiver::encodeObject(const Ref<Object>& object, std::string_view key) {
+void KeyedArchiver::Encoder::encodeObject(const Ref<Object>& object, std::string_view key) {
   // An exception leaves it incremented for good.
   ++unfinished_;
   const Index keyIndex = text(escaped(key));
@@ -75,7 +126,7 @@ void KeyedArchiver::encodeObject(const Ref<Object>& object, std::string_view key
   --unfinished_;
 }
 
-std::vector<std::byte> KeyedArchiver::encodedData() {
+std::vector<std::byte> KeyedArchiver::Encoder::encodedData() {
   if (unfinished_ != 0) fail("an object is being encoded, or could not be");
   // The values around the objects are in the list for the time of this call. More objects may be encoded
   // later.
@@ -104,13 +155,7 @@ std::vector<std::byte> KeyedArchiver::encodedData() {
   return bytes;
 }
 
-std::vector<std::byte> KeyedArchiver::archivedDataWithRootObject(const Ref<Object>& object) {
-  KeyedArchiver archiver;
-  archiver.encodeObject(object, kRootKey);
-  return archiver.encodedData();
-}
-
-KeyedArchiver::Index KeyedArchiver::reference(const Ref<Object>& object) {
+KeyedArchiver::Encoder::Index KeyedArchiver::Encoder::reference(const Ref<Object>& object) {
   if (object == nullptr) return referenceTo(0);
   if (const auto* string = cast<StringObject>(object.get())) {
     // Equal strings become one: they cannot be told apart.
@@ -136,7 +181,7 @@ KeyedArchiver::Index KeyedArchiver::reference(const Ref<Object>& object) {
   return referenceTo(place);
 }
 
-KeyedArchiver::Index KeyedArchiver::contentOf(const Ref<Object>& object) {
+KeyedArchiver::Encoder::Index KeyedArchiver::Encoder::contentOf(const Ref<Object>& object) {
   if (const auto* number = cast<Number>(object.get())) return list_.add(valueOf(*number));
   if (dictionaries_.size() > kMaximumDepth) fail("objects are nested too deeply");
   const auto* coding = cast<SecureCoding>(object.get());
@@ -147,15 +192,15 @@ KeyedArchiver::Index KeyedArchiver::contentOf(const Ref<Object>& object) {
   return list_.add(std::move(parts));
 }
 
-PropertyList::Dictionary KeyedArchiver::partsOf(const SecureCoding& object) {
+PropertyList::Dictionary KeyedArchiver::Encoder::partsOf(const SecureCoding& object) {
   dictionaries_.emplace_back();
-  object.encodeWithCoder(*this);
+  object.encodeWithCoder(archiver_);
   PropertyList::Dictionary parts = std::move(dictionaries_.back());
   dictionaries_.pop_back();
   return parts;
 }
 
-PropertyList::Dictionary KeyedArchiver::partsOfCollection(const Object& object) {
+PropertyList::Dictionary KeyedArchiver::Encoder::partsOfCollection(const Object& object) {
   std::vector<Ref<Object>> keys;
   std::vector<Ref<Object>> elements;
   const auto* dictionary = cast<Dictionary>(&object);
@@ -188,14 +233,14 @@ PropertyList::Dictionary KeyedArchiver::partsOfCollection(const Object& object) 
   return parts;
 }
 
-KeyedArchiver::Index KeyedArchiver::listOf(const std::vector<Ref<Object>>& objects) {
+KeyedArchiver::Encoder::Index KeyedArchiver::Encoder::listOf(const std::vector<Ref<Object>>& objects) {
   PropertyList::Array references;
   references.reserve(objects.size());
   for (const Ref<Object>& object : objects) references.push_back(reference(object));
   return list_.add(std::move(references));
 }
 
-KeyedArchiver::Index KeyedArchiver::classReference(const ClassInfo& info) {
+KeyedArchiver::Encoder::Index KeyedArchiver::Encoder::classReference(const ClassInfo& info) {
   const auto known = classes_.find(&info);
   if (known != classes_.end()) return known->second;
   PropertyList::Array names;
@@ -209,18 +254,38 @@ KeyedArchiver::Index KeyedArchiver::classReference(const ClassInfo& info) {
   return classes_[&info] = referenceTo(places_.size() - 1);
 }
 
-KeyedArchiver::Index KeyedArchiver::referenceTo(std::size_t place) {
+KeyedArchiver::Encoder::Index KeyedArchiver::Encoder::referenceTo(std::size_t place) {
   const auto [known, isNew] = references_.try_emplace(place, 0);
   if (isNew) known->second = list_.add(PropertyList::Reference{place});
   return known->second;
 }
 
-KeyedArchiver::Index KeyedArchiver::text(std::string_view text) {
+KeyedArchiver::Encoder::Index KeyedArchiver::Encoder::text(std::string_view text) {
   const auto known = texts_.find(text);
   if (known != texts_.end()) return known->second;
   const Index index = list_.add(PropertyList::Text(text));
   texts_.emplace(text, index);
   return index;
+}
+
+KeyedArchiver::KeyedArchiver() : encoder_(new Encoder(*this)) {}
+
+KeyedArchiver::~KeyedArchiver() {
+  delete encoder_;
+}
+
+void KeyedArchiver::encodeObject(const Ref<Object>& object, std::string_view key) {
+  encoder_->encodeObject(object, key);
+}
+
+std::vector<std::byte> KeyedArchiver::encodedData() {
+  return encoder_->encodedData();
+}
+
+std::vector<std::byte> KeyedArchiver::archivedDataWithRootObject(const Ref<Object>& object) {
+  KeyedArchiver archiver;
+  archiver.encodeObject(object, kRootKey);
+  return archiver.encodedData();
 }
 
 }  // namespace rt

@@ -18,8 +18,7 @@
 /// counts each object and each byte of a text as often as it is reached. A larger object is refused, since
 /// it would not be read.
 ///
-/// The bytes are a binary property list (Runtime/Archive/Private/PropertyList.h). It is a dictionary with
-/// these keys:
+/// The bytes are a binary property list. It is a dictionary with these keys:
 ///
 ///     | "$archiver"   "KeyedArchiver"
 ///     | "$version"    100000
@@ -37,15 +36,10 @@
 /// classes.
 
 #include <cstddef>
-#include <cstdint>
-#include <map>
-#include <string>
 #include <string_view>
-#include <unordered_map>
 #include <vector>
 
 #include "Runtime/Archive/Coding.h"
-#include "Runtime/Archive/Private/PropertyList.h"
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
@@ -79,42 +73,10 @@ class KeyedArchiver final {
   static std::vector<std::byte> archivedDataWithRootObject(const Ref<Object>& object);
 
  private:
-  using Index = PropertyList::Index;
-  struct Known {
-    std::size_t place;
-    // Retained, so that no other object gets its address.
-    Ref<Object> object;
-    // 0 while the object is being encoded.
-    std::size_t size;
-  };
+  // Defined in the source file, since most of what it needs is slow to parse.
+  class Encoder;
 
-  // Returns the index of a reference to `object`. Archives `object` if it is not archived yet.
-  Index reference(const Ref<Object>& object);
-  Index contentOf(const Ref<Object>& object);
-  PropertyList::Dictionary partsOf(const SecureCoding& object);
-  PropertyList::Dictionary partsOfCollection(const Object& object);
-  Index listOf(const std::vector<Ref<Object>>& objects);
-  Index classReference(const ClassInfo& info);
-  Index referenceTo(std::size_t place);
-  Index text(std::string_view text);
-
-  PropertyList list_;
-  // The value of "$objects".
-  PropertyList::Array places_;
-  // The objects that are being encoded, from the top down.
-  std::vector<PropertyList::Dictionary> dictionaries_;
-  std::unordered_map<const Object*, Known> known_;
-  // The places of strings, by their texts.
-  std::unordered_map<Index, std::size_t> strings_;
-  std::unordered_map<const ClassInfo*, Index> classes_;
-  std::unordered_map<std::size_t, Index> references_;
-  std::map<std::string, Index, std::less<>> texts_;
-  // Sizes are counted as detail::keyedArchive::maximumSize says. `size_` is what has been counted of the
-  // object that is being encoded, and `largestSize_` is the size of the largest object at the top.
-  std::size_t size_ = 0;
-  std::size_t largestSize_ = 0;
-  // How many calls of `encodeObject` have begun and not ended without an exception.
-  std::size_t unfinished_ = 0;
+  Encoder* const encoder_;
 };
 
 }  // namespace rt

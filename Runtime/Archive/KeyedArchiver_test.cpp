@@ -255,7 +255,7 @@ Ref<rt::Object> randomObject(std::mt19937_64& random, int depth) {
 }
 
 TEST(KeyedArchiver, ReadsBackRandomObjects) {
-  std::mt19937_64 random(20010101);  // NOLINT(cert-msc*): the same objects in every run
+  std::mt19937_64 random(20010101);  // the same objects in every run
   for (int round = 0; round < 300; ++round) {
     const Ref<rt::Object> object = randomObject(random, 5);
     const Ref<rt::Object> read = throughAnArchive(object);

@@ -1,9 +1,15 @@
 #include "Runtime/Archive/KeyedUnarchiver.h"
 
 #include <algorithm>
+#include <cstdint>
+#include <optional>
+#include <string>
+#include <unordered_map>
 #include <utility>
+#include <vector>
 
 #include "Runtime/Archive/Private/KeyedArchiveFormat.h"
+#include "Runtime/Archive/Private/PropertyList.h"
 #include "Runtime/Objects/ClassMethod.h"
 #include "Runtime/Values/Array.h"
 #include "Runtime/Values/Dictionary.h"
@@ -23,31 +29,100 @@ std::string quoted(std::string_view text) {
 
 }  // namespace
 
-// Makes an object the one whose keys are decoded, until the scope ends.
-class KeyedUnarchiver::Level {
+class KeyedUnarchiver::Decoder {
  public:
-  Level(KeyedUnarchiver& unarchiver, Index index)
-      : unarchiver_(unarchiver), index_(index), container_(unarchiver.container_) {
-    ++unarchiver_.depth_;
-    unarchiver_.isDecoding_[index_] = true;
-    unarchiver_.container_ = index_;
+  // The functions of KeyedUnarchiver. `unarchiver` is the one that classes' `initWithCoder` gets.
+  Decoder(KeyedUnarchiver& unarchiver, std::span<const std::byte> bytes);
+  bool containsValueForKey(std::string_view key) const;
+  Ref<Object> decodeObjectOfClasses(std::span<const ClassInfo* const> classes, std::string_view key);
+  Ref<Array> decodeArrayOfObjectsOfClasses(std::span<const ClassInfo* const> classes, std::string_view key);
+  const String& error() const noexcept { return error_; }
+
+ private:
+  using Index = PropertyList::Index;
+  using Initializer = Ref<Object>(KeyedUnarchiver&);
+  class Level;
+  // The classes that an object may have. Each list that has been asked for has a number.
+  using Classes = std::vector<const ClassInfo*>;
+  // The numbers of two lists of classes: that for the object, and that for its elements.
+  struct Wanted {
+    std::size_t classes;
+    std::size_t elements;
+    bool isElement = false;
+  };
+
+  struct Decoded {
+    Ref<Object> object;
+    std::size_t size = 0;
+  };
+
+  std::size_t numberOf(std::span<const ClassInfo* const> classes);
+
+  // All of these return null or false if they fail.
+  Ref<Object> decode(std::string_view key, Wanted wanted);
+  const PropertyList::Array* archivedObjects();
+  Ref<Object> decodeReference(Index reference, Wanted wanted);
+  Ref<Object> decodeValue(Index index, Wanted wanted);
+  Ref<Object> decodePlain(Index index, Wanted wanted);
+  Ref<Object> decodeInstance(Index index, Wanted wanted);
+  Ref<Object> decodeWithCoder(const ClassInfo& info);
+  Ref<Object> decodeCollection(Index index, const ClassInfo& info, Wanted wanted);
+  Ref<Object> decodeDictionary(Index index, const std::vector<Ref<Object>>& elements, Wanted wanted);
+  bool decodeList(Index owner, std::string_view key, Wanted wanted, std::vector<Ref<Object>>& objects);
+  Initializer* initializerOf(const ClassInfo& info);
+  const ClassInfo* classOf(Index index);
+  const ClassInfo* archivedClass(Index index);
+  bool isAllowed(const ClassInfo& info, Wanted wanted);
+  bool grow(std::size_t size);
+  Ref<Object> fail(const std::string& reason);
+
+  KeyedUnarchiver& unarchiver_;
+  PropertyList list_;
+  // Values of `list_`: that of "$objects", and the dictionary whose keys are being decoded.
+  const PropertyList::Array* objects_ = nullptr;
+  Index container_ = 0;
+  std::size_t depth_ = 0;
+  std::vector<Classes> classes_;
+  std::unordered_map<std::uint64_t, Decoded> decoded_;
+  // Sizes are counted as detail::keyedArchive::maximumSize says. `size_` is that of all decoded objects,
+  // `sizeLimit_` what `size_` may be when the current object at the top is decoded, and `maximumSize_` the
+  // largest size of one object.
+  std::size_t size_ = 0;
+  std::size_t sizeLimit_ = 0;
+  const std::size_t maximumSize_;
+  std::vector<bool> isDecoding_;
+  std::unordered_map<Index, Index> listOwners_;
+  // The classes of objects, and the classes that archived classes stand for.
+  std::unordered_map<Index, const ClassInfo*> classesOfObjects_;
+  std::unordered_map<Index, const ClassInfo*> archivedClasses_;
+  std::unordered_map<const ClassInfo*, Initializer*> initializers_;
+  String error_;
+};
+
+// Makes an object the one whose keys are decoded, until the scope ends.
+class KeyedUnarchiver::Decoder::Level {
+ public:
+  Level(Decoder& decoder, Index index) : decoder_(decoder), index_(index), container_(decoder.container_) {
+    ++decoder_.depth_;
+    decoder_.isDecoding_[index_] = true;
+    decoder_.container_ = index_;
   }
   Level(const Level&) = delete;
   Level& operator=(const Level&) = delete;
   ~Level() {
-    --unarchiver_.depth_;
-    unarchiver_.isDecoding_[index_] = false;
-    unarchiver_.container_ = container_;
+    --decoder_.depth_;
+    decoder_.isDecoding_[index_] = false;
+    decoder_.container_ = container_;
   }
 
  private:
-  KeyedUnarchiver& unarchiver_;
+  Decoder& decoder_;
   const Index index_;
   const Index container_;
 };
 
-KeyedUnarchiver::KeyedUnarchiver(std::span<const std::byte> bytes)
-    : maximumSize_(detail::keyedArchive::maximumSize(bytes.size())) {
+KeyedUnarchiver::Decoder::Decoder(KeyedUnarchiver& unarchiver, std::span<const std::byte> bytes)
+    : unarchiver_(unarchiver), maximumSize_(detail::keyedArchive::maximumSize(bytes.size())) {
   try {
     list_ = PropertyList::decoded(bytes);
   } catch (const MalformedPropertyList& error) {
@@ -58,9 +133,7 @@ KeyedUnarchiver::KeyedUnarchiver(std::span<const std::byte> bytes)
   isDecoding_.resize(list_.values.size());
 }
 
-KeyedUnarchiver::~KeyedUnarchiver() = default;
-
-const PropertyList::Array* KeyedUnarchiver::archivedObjects() {
+const PropertyList::Array* KeyedUnarchiver::Decoder::archivedObjects() {
   const auto under = [this](std::string_view key) {
     // A missing key yields an index that no value has.
     return list_.find(list_.root, key).value_or(static_cast<Index>(list_.values.size()));
@@ -79,24 +152,23 @@ const PropertyList::Array* KeyedUnarchiver::archivedObjects() {
   return objects;
 }
 
-bool KeyedUnarchiver::containsValueForKey(std::string_view key) const {
+bool KeyedUnarchiver::Decoder::containsValueForKey(std::string_view key) const {
   return error_.isNull() && list_.find(container_, escaped(key)).has_value();
 }
 
-Ref<Object> KeyedUnarchiver::decodeObjectOfClasses(std::span<const ClassInfo* const> classes,
-                                                   std::string_view key) {
+Ref<Object> KeyedUnarchiver::Decoder::decodeObjectOfClasses(std::span<const ClassInfo* const> classes,
+                                                            std::string_view key) {
   const std::size_t number = numberOf(classes);
   return decode(key, {.classes = number, .elements = number});
 }
 
-Ref<Array> KeyedUnarchiver::decodeArrayOfObjectsOfClasses(std::initializer_list<const ClassInfo*> classes,
-                                                          std::string_view key) {
+Ref<Array> KeyedUnarchiver::Decoder::decodeArrayOfObjectsOfClasses(std::span<const ClassInfo* const> classes,
+                                                                   std::string_view key) {
   const ClassInfo* const array = &classInfo<Array>();
-  return cast<Array>(decode(key, {.classes = numberOf({&array, 1}),
-                                  .elements = numberOf(std::span(classes.begin(), classes.size()))}));
+  return cast<Array>(decode(key, {.classes = numberOf({&array, 1}), .elements = numberOf(classes)}));
 }
 
-std::size_t KeyedUnarchiver::numberOf(std::span<const ClassInfo* const> classes) {
+std::size_t KeyedUnarchiver::Decoder::numberOf(std::span<const ClassInfo* const> classes) {
   Classes allowed(classes.begin(), classes.end());
   std::ranges::sort(allowed);
   const auto known = std::ranges::find(classes_, allowed);
@@ -105,7 +177,7 @@ std::size_t KeyedUnarchiver::numberOf(std::span<const ClassInfo* const> classes)
   return number;
 }
 
-Ref<Object> KeyedUnarchiver::decode(std::string_view key, Wanted wanted) {
+Ref<Object> KeyedUnarchiver::Decoder::decode(std::string_view key, Wanted wanted) {
   if (!error_.isNull()) return nullptr;
   const std::optional<Index> index = list_.find(container_, escaped(key));
   if (!index) return fail("there is nothing under the key " + quoted(key));
@@ -113,27 +185,19 @@ Ref<Object> KeyedUnarchiver::decode(std::string_view key, Wanted wanted) {
   return decodeReference(*index, wanted);
 }
 
-Ref<Object> KeyedUnarchiver::unarchivedObjectOfClasses(std::initializer_list<const ClassInfo*> classes,
-                                                       std::span<const std::byte> bytes, String* error) {
-  KeyedUnarchiver unarchiver(bytes);
-  Ref<Object> object = unarchiver.decodeObjectOfClasses(classes, kRootKey);
-  if (object == nullptr && error != nullptr) *error = unarchiver.error();
-  return object;
-}
-
-Ref<Object> KeyedUnarchiver::decodeReference(Index reference, Wanted wanted) {
+Ref<Object> KeyedUnarchiver::Decoder::decodeReference(Index reference, Wanted wanted) {
   const auto* place = list_.get<PropertyList::Reference>(reference);
   if (place == nullptr || place->number >= objects_->size()) return fail("a reference to no object");
   if (place->number == 0) return nullptr;
   return decodeValue((*objects_)[place->number], wanted);
 }
 
-Ref<Object> KeyedUnarchiver::decodeValue(Index index, Wanted wanted) {
+Ref<Object> KeyedUnarchiver::Decoder::decodeValue(Index index, Wanted wanted) {
   if (list_.get<PropertyList::Dictionary>(index) != nullptr) return decodeInstance(index, wanted);
   return decodePlain(index, wanted);
 }
 
-Ref<Object> KeyedUnarchiver::decodePlain(Index index, Wanted wanted) {
+Ref<Object> KeyedUnarchiver::Decoder::decodePlain(Index index, Wanted wanted) {
   auto& [object, size] = decoded_[index];
   if (object == nullptr) {
     size = 1;
@@ -156,7 +220,7 @@ Ref<Object> KeyedUnarchiver::decodePlain(Index index, Wanted wanted) {
   return grow(size) ? object : nullptr;
 }
 
-Ref<Object> KeyedUnarchiver::decodeInstance(Index index, Wanted wanted) {
+Ref<Object> KeyedUnarchiver::Decoder::decodeInstance(Index index, Wanted wanted) {
   const ClassInfo* info = classOf(index);
   if (info == nullptr || !isAllowed(*info, wanted)) return nullptr;
   const bool isCollection = info == &classInfo<Array>() || info == &classInfo<Dictionary>();
@@ -180,16 +244,16 @@ Ref<Object> KeyedUnarchiver::decodeInstance(Index index, Wanted wanted) {
   return object;
 }
 
-Ref<Object> KeyedUnarchiver::decodeWithCoder(const ClassInfo& info) {
+Ref<Object> KeyedUnarchiver::Decoder::decodeWithCoder(const ClassInfo& info) {
   Initializer* const initializer = initializerOf(info);
   if (initializer == nullptr) return fail("the class " + quoted(info.name) + " cannot be unarchived");
-  Ref<Object> object = initializer(*this);
+  Ref<Object> object = initializer(unarchiver_);
   if (object == nullptr) return fail("the class " + quoted(info.name) + " refused what is archived for it");
   if (!object->isKindOf(info)) return fail("the class " + quoted(info.name) + " made another object");
   return object;
 }
 
-Ref<Object> KeyedUnarchiver::decodeCollection(Index index, const ClassInfo& info, Wanted wanted) {
+Ref<Object> KeyedUnarchiver::Decoder::decodeCollection(Index index, const ClassInfo& info, Wanted wanted) {
   wanted = {.classes = wanted.elements, .elements = wanted.elements, .isElement = true};
   std::vector<Ref<Object>> elements;
   if (!decodeList(index, kElementsKey, wanted, elements)) return nullptr;
@@ -197,8 +261,8 @@ Ref<Object> KeyedUnarchiver::decodeCollection(Index index, const ClassInfo& info
   return decodeDictionary(index, elements, wanted);
 }
 
-Ref<Object> KeyedUnarchiver::decodeDictionary(Index index, const std::vector<Ref<Object>>& elements,
-                                              Wanted wanted) {
+Ref<Object> KeyedUnarchiver::Decoder::decodeDictionary(Index index, const std::vector<Ref<Object>>& elements,
+                                                       Wanted wanted) {
   std::vector<Ref<Object>> keys;
   if (!decodeList(index, kKeysKey, wanted, keys)) return nullptr;
   if (keys.size() != elements.size()) return fail("a Dictionary with more or fewer keys than elements");
@@ -214,8 +278,8 @@ Ref<Object> KeyedUnarchiver::decodeDictionary(Index index, const std::vector<Ref
   return std::move(builder).dictionary();
 }
 
-bool KeyedUnarchiver::decodeList(Index owner, std::string_view key, Wanted wanted,
-                                 std::vector<Ref<Object>>& objects) {
+bool KeyedUnarchiver::Decoder::decodeList(Index owner, std::string_view key, Wanted wanted,
+                                          std::vector<Ref<Object>>& objects) {
   const std::optional<Index> index = list_.find(owner, key);
   const auto* references = index ? list_.get<PropertyList::Array>(*index) : nullptr;
   if (!index || references == nullptr) return fail("a collection without " + std::string(key)) != nullptr;
@@ -232,7 +296,7 @@ bool KeyedUnarchiver::decodeList(Index owner, std::string_view key, Wanted wante
   return true;
 }
 
-KeyedUnarchiver::Initializer* KeyedUnarchiver::initializerOf(const ClassInfo& info) {
+KeyedUnarchiver::Decoder::Initializer* KeyedUnarchiver::Decoder::initializerOf(const ClassInfo& info) {
   const auto [known, isNew] = initializers_.try_emplace(&info, nullptr);
   if (isNew && info.conformsTo(protocolInfo<SecureCoding>())) {
     for (const ClassMethod& method : classMethods(info)) {
@@ -243,7 +307,7 @@ KeyedUnarchiver::Initializer* KeyedUnarchiver::initializerOf(const ClassInfo& in
 }
 
 // The class is looked for once for each object, since an object may have many keys.
-const ClassInfo* KeyedUnarchiver::classOf(Index index) {
+const ClassInfo* KeyedUnarchiver::Decoder::classOf(Index index) {
   const ClassInfo*& info = classesOfObjects_[index];
   if (info != nullptr) return info;
   const std::optional<Index> reference = list_.find(index, kClassKey);
@@ -254,7 +318,7 @@ const ClassInfo* KeyedUnarchiver::classOf(Index index) {
 }
 
 // Here too, each class is looked for once.
-const ClassInfo* KeyedUnarchiver::archivedClass(Index index) {
+const ClassInfo* KeyedUnarchiver::Decoder::archivedClass(Index index) {
   const ClassInfo*& info = archivedClasses_[index];
   if (info != nullptr) return info;
   const std::optional<Index> name = list_.find(index, kClassNameKey);
@@ -265,7 +329,7 @@ const ClassInfo* KeyedUnarchiver::archivedClass(Index index) {
   return info;
 }
 
-bool KeyedUnarchiver::isAllowed(const ClassInfo& info, Wanted wanted) {
+bool KeyedUnarchiver::Decoder::isAllowed(const ClassInfo& info, Wanted wanted) {
   const Classes& classes = classes_[wanted.classes];
   if (std::ranges::any_of(classes, [&](const ClassInfo* each) { return info.isSubclassOf(*each); }))
     return true;
@@ -275,15 +339,47 @@ bool KeyedUnarchiver::isAllowed(const ClassInfo& info, Wanted wanted) {
   return false;
 }
 
-bool KeyedUnarchiver::grow(std::size_t size) {
+bool KeyedUnarchiver::Decoder::grow(std::size_t size) {
   size_ += size;
   if (size_ > sizeLimit_) fail("objects are referred to too often");
   return error_.isNull();
 }
 
-Ref<Object> KeyedUnarchiver::fail(const std::string& reason) {
+Ref<Object> KeyedUnarchiver::Decoder::fail(const std::string& reason) {
   if (error_.isNull()) error_ = String::fromUTF8Repaired(reason);
   return nullptr;
+}
+
+KeyedUnarchiver::KeyedUnarchiver(std::span<const std::byte> bytes) : decoder_(new Decoder(*this, bytes)) {}
+
+KeyedUnarchiver::~KeyedUnarchiver() {
+  delete decoder_;
+}
+
+bool KeyedUnarchiver::containsValueForKey(std::string_view key) const {
+  return decoder_->containsValueForKey(key);
+}
+
+Ref<Object> KeyedUnarchiver::decodeObjectOfClasses(std::span<const ClassInfo* const> classes,
+                                                   std::string_view key) {
+  return decoder_->decodeObjectOfClasses(classes, key);
+}
+
+Ref<Array> KeyedUnarchiver::decodeArrayOfObjectsOfClasses(std::initializer_list<const ClassInfo*> classes,
+                                                          std::string_view key) {
+  return decoder_->decodeArrayOfObjectsOfClasses(std::span(classes.begin(), classes.size()), key);
+}
+
+const String& KeyedUnarchiver::error() const noexcept {
+  return decoder_->error();
+}
+
+Ref<Object> KeyedUnarchiver::unarchivedObjectOfClasses(std::initializer_list<const ClassInfo*> classes,
+                                                       std::span<const std::byte> bytes, String* error) {
+  KeyedUnarchiver unarchiver(bytes);
+  Ref<Object> object = unarchiver.decodeObjectOfClasses(classes, kRootKey);
+  if (object == nullptr && error != nullptr) *error = unarchiver.error();
+  return object;
 }
 
 }  // namespace rt

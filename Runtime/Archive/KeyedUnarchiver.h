@@ -31,17 +31,11 @@
 /// or short real numbers is malformed, since KeyedArchiver writes none.
 
 #include <cstddef>
-#include <cstdint>
 #include <initializer_list>
-#include <optional>
 #include <span>
-#include <string>
 #include <string_view>
-#include <unordered_map>
-#include <vector>
 
 #include "Runtime/Archive/Coding.h"
-#include "Runtime/Archive/Private/PropertyList.h"
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"
@@ -94,7 +88,7 @@ class KeyedUnarchiver final {
   }
 
   /// Describes the first error, for people. Null if there is none.
-  const String& error() const noexcept { return error_; }
+  const String& error() const noexcept;
 
   /// Returns the object under the key "root" of the archive `bytes`, which must have one of `classes`. If it
   /// returns null, it sets `*error` to what `error()` would be, unless `error` is null.
@@ -108,63 +102,10 @@ class KeyedUnarchiver final {
   }
 
  private:
-  using Index = PropertyList::Index;
-  using Initializer = Ref<Object>(KeyedUnarchiver&);
-  class Level;
-  // The classes that an object may have. Each list that has been asked for has a number.
-  using Classes = std::vector<const ClassInfo*>;
-  // The numbers of two lists of classes: that for the object, and that for its elements.
-  struct Wanted {
-    std::size_t classes;
-    std::size_t elements;
-    bool isElement = false;
-  };
+  // Defined in the source file, since most of what it needs is slow to parse.
+  class Decoder;
 
-  struct Decoded {
-    Ref<Object> object;
-    std::size_t size = 0;
-  };
-
-  std::size_t numberOf(std::span<const ClassInfo* const> classes);
-
-  // All of these return null or false if they fail.
-  Ref<Object> decode(std::string_view key, Wanted wanted);
-  const PropertyList::Array* archivedObjects();
-  Ref<Object> decodeReference(Index reference, Wanted wanted);
-  Ref<Object> decodeValue(Index index, Wanted wanted);
-  Ref<Object> decodePlain(Index index, Wanted wanted);
-  Ref<Object> decodeInstance(Index index, Wanted wanted);
-  Ref<Object> decodeWithCoder(const ClassInfo& info);
-  Ref<Object> decodeCollection(Index index, const ClassInfo& info, Wanted wanted);
-  Ref<Object> decodeDictionary(Index index, const std::vector<Ref<Object>>& elements, Wanted wanted);
-  bool decodeList(Index owner, std::string_view key, Wanted wanted, std::vector<Ref<Object>>& objects);
-  Initializer* initializerOf(const ClassInfo& info);
-  const ClassInfo* classOf(Index index);
-  const ClassInfo* archivedClass(Index index);
-  bool isAllowed(const ClassInfo& info, Wanted wanted);
-  bool grow(std::size_t size);
-  Ref<Object> fail(const std::string& reason);
-
-  PropertyList list_;
-  // Values of `list_`: that of "$objects", and the dictionary whose keys are being decoded.
-  const PropertyList::Array* objects_ = nullptr;
-  Index container_ = 0;
-  std::size_t depth_ = 0;
-  std::vector<Classes> classes_;
-  std::unordered_map<std::uint64_t, Decoded> decoded_;
-  // Sizes are counted as detail::keyedArchive::maximumSize says. `size_` is that of all decoded objects,
-  // `sizeLimit_` what `size_` may be when the current object at the top is decoded, and `maximumSize_` the
-  // largest size of one object.
-  std::size_t size_ = 0;
-  std::size_t sizeLimit_ = 0;
-  const std::size_t maximumSize_;
-  std::vector<bool> isDecoding_;
-  std::unordered_map<Index, Index> listOwners_;
-  // The classes of objects, and the classes that archived classes stand for.
-  std::unordered_map<Index, const ClassInfo*> classesOfObjects_;
-  std::unordered_map<Index, const ClassInfo*> archivedClasses_;
-  std::unordered_map<const ClassInfo*, Initializer*> initializers_;
-  String error_;
+  Decoder* const decoder_;
 };
 
 }  // namespace rt

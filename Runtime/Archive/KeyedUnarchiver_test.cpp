@@ -364,7 +364,7 @@ TEST(KeyedUnarchiver, StopsAtObjectsThatAreReferredToTooOften) {
 }
 
 TEST(KeyedUnarchiver, SurvivesDamagedArchives) {
-  std::mt19937_64 random(7);  // NOLINT(cert-msc*): the same damage in every run
+  std::mt19937_64 random(7);  // the same damage in every run
   const Bytes bytes = archive(rt::Array::of(rt::make<Tag>("tag"_s, rt::make<ColoredTag>("red"_s)),
                                             rt::Dictionary::of({{"key"_s, rt::Array::of("text"_s)}})));
   for (std::size_t length = 0; length < bytes.size(); ++length) {

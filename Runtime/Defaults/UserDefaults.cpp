@@ -46,10 +46,10 @@ bool isNumberOtherThan0(std::string_view text) {
   return end == number.c_str() + number.size() && value != 0 && std::isfinite(value);
 }
 
-std::shared_ptr<detail::DefaultsStore> standardStore() {
+Ref<detail::DefaultsStore> standardStore() {
   const std::string folder = detail::systemDefaultsFolder();
   if (folder.empty()) {
-    return std::make_shared<detail::DefaultsStore>(
+    return make<detail::DefaultsStore>(
         "", "there are no user defaults: the environment names no folder for them");
   }
   const String identifier = Bundle::mainIdentifier();
@@ -57,16 +57,15 @@ std::shared_ptr<detail::DefaultsStore> standardStore() {
   const std::string_view name = application.view();
   if (name.empty() || name == "." || name == ".." ||
       name.find_first_of(std::string_view("/\0", 2)) != std::string_view::npos) {
-    return std::make_shared<detail::DefaultsStore>(
+    return make<detail::DefaultsStore>(
         "", "there are no user defaults: the application's name is none for a folder: " + std::string(name));
   }
-  return std::make_shared<detail::DefaultsStore>(folder + "/" + std::string(name) + "/defaults.conf", "");
+  return make<detail::DefaultsStore>(folder + "/" + std::string(name) + "/defaults.conf", "");
 }
 
 }  // namespace
 
-UserDefaults::UserDefaults(std::shared_ptr<detail::DefaultsStore> store) noexcept
-    : store_(std::move(store)) {}
+UserDefaults::UserDefaults(Ref<detail::DefaultsStore> store) noexcept : store_(std::move(store)) {}
 
 UserDefaults::~UserDefaults() {
   store_->stop();
@@ -80,7 +79,7 @@ Ref<UserDefaults> UserDefaults::standardUserDefaults() {
 Ref<UserDefaults> UserDefaults::initWithPath(const String& path) {
   if (!path.hasPrefix("/") || path.contains(std::string_view("\0", 1))) return nullptr;
   return Ref<UserDefaults>::adopt(
-      new UserDefaults(std::make_shared<detail::DefaultsStore>(std::string(path.view()), "")));
+      new UserDefaults(make<detail::DefaultsStore>(std::string(path.view()), "")));
 }
 
 void UserDefaults::setReportHandler(Block<void(const String&)> handler) {
@@ -101,6 +100,14 @@ UserDefaults::Observation UserDefaults::observe(std::string_view key, Notify not
   return {this, store_->observe(key, notify == Notify::kAlsoNow, std::move(observer))};
 }
 
+UserDefaults::Observation::Observation() noexcept = default;
+
+UserDefaults::Observation::Observation(Ref<UserDefaults> defaults,
+                                       Ref<detail::DefaultsObserver> observer) noexcept
+    : defaults_(std::move(defaults)), observer_(std::move(observer)) {}
+
+UserDefaults::Observation::Observation(Observation&& other) noexcept = default;
+
 UserDefaults::Observation& UserDefaults::Observation::operator=(Observation&& other) noexcept {
   if (this != &other) {
     remove();
@@ -110,8 +117,12 @@ UserDefaults::Observation& UserDefaults::Observation::operator=(Observation&& ot
   return *this;
 }
 
+UserDefaults::Observation::~Observation() {
+  remove();
+}
+
 void UserDefaults::Observation::remove() noexcept {
-  const auto observer = std::exchange(observer_, nullptr);
+  const Ref<detail::DefaultsObserver> observer = std::exchange(observer_, nullptr);
   const Ref<UserDefaults> defaults = std::exchange(defaults_, nullptr);
   if (observer != nullptr) defaults->store_->remove(*observer);
 }

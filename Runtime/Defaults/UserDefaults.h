@@ -51,9 +51,7 @@
 /// Not for: secrets; large or many values; values that change often.
 
 #include <cstdint>
-#include <memory>
 #include <string_view>
-#include <utility>
 
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Block.h"
@@ -65,8 +63,8 @@
 namespace rt {
 
 namespace detail {
+class DefaultsObserver;
 class DefaultsStore;
-struct DefaultsObserver;
 }  // namespace detail
 
 class RT_VISIBLE UserDefaults final : public Implements<UserDefaults, Object> {
@@ -83,10 +81,10 @@ class RT_VISIBLE UserDefaults final : public Implements<UserDefaults, Object> {
   class [[nodiscard]] Observation {
    public:
     /// Makes an object without an observation.
-    Observation() noexcept = default;
-    Observation(Observation&& other) noexcept = default;
+    Observation() noexcept;
+    Observation(Observation&& other) noexcept;
     Observation& operator=(Observation&& other) noexcept;
-    ~Observation() { remove(); }
+    ~Observation();
 
     /// Ends the observation. When it returns, the observer is not running and will never run again. The
     /// observer itself may call it, and then runs to its end. Does nothing if there is no observation.
@@ -100,11 +98,10 @@ class RT_VISIBLE UserDefaults final : public Implements<UserDefaults, Object> {
 
    private:
     friend class UserDefaults;
-    Observation(Ref<UserDefaults> defaults, std::shared_ptr<detail::DefaultsObserver> observer) noexcept
-        : defaults_(std::move(defaults)), observer_(std::move(observer)) {}
+    Observation(Ref<UserDefaults> defaults, Ref<detail::DefaultsObserver> observer) noexcept;
 
     Ref<UserDefaults> defaults_;
-    std::shared_ptr<detail::DefaultsObserver> observer_;
+    Ref<detail::DefaultsObserver> observer_;
   };
 
   /// Returns the application's own user defaults. Never null. They are made on first use and never
@@ -147,9 +144,9 @@ class RT_VISIBLE UserDefaults final : public Implements<UserDefaults, Object> {
   Observation observe(std::string_view key, Notify notify, Block<void()> observer);
 
  private:
-  explicit UserDefaults(std::shared_ptr<detail::DefaultsStore> store) noexcept;
+  explicit UserDefaults(Ref<detail::DefaultsStore> store) noexcept;
 
-  const std::shared_ptr<detail::DefaultsStore> store_;
+  const Ref<detail::DefaultsStore> store_;
 };
 
 }  // namespace rt

@@ -208,7 +208,7 @@ TEST(Ref, AllocatesNothingButTheObject) {
 TEST(Ref, CountsLikeTheModel) {
   constexpr std::size_t kRefs = 16;
   constexpr std::size_t kObjects = 8;
-  std::mt19937 random(20240229);  // NOLINT(cert-msc32-c,cert-msc51-cpp): the same each time
+  std::mt19937 random(20240229);  // the same each time
   const auto pick = [&random](std::size_t count) { return random() % count; };
 
   std::array<rt::Ref<SystemClock>, kRefs> classRefs;

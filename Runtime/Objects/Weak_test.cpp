@@ -95,7 +95,7 @@ TEST(Weak, IsCopiedMovedAndReplaced) {
   rt::Weak<Listener> weak = one;
   const rt::Weak<Listener> copy = weak;
   rt::Weak<Listener> moved = std::move(weak);
-  EXPECT_FALSE(weak.lock());  // NOLINT(bugprone-use-after-move,clang-analyzer-cplusplus.Move)
+  EXPECT_FALSE(weak.lock());  // NOLINT(bugprone-use-after-move)
   EXPECT_EQ(copy.lock(), one);
   EXPECT_EQ(moved.lock(), one);
   moved = another;

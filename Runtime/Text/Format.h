@@ -68,7 +68,8 @@ String formatVariadic(const char* format, std::size_t length, ...);
 /// std::bad_alloc.
 template <class... Arguments>
 String format(FormatString<std::type_identity_t<Arguments>...> format, const Arguments&... arguments) {
-  return detail::formatVariadic(format.view().data(), format.view().size(), toVariadic(arguments)...);
+  return detail::formatVariadic(format.view().data(), format.view().size(),
+                                toVariadic(toArgument(arguments))...);
 }
 
 }  // namespace rt

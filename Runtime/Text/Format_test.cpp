@@ -479,7 +479,7 @@ template <class... Arguments>
 std::string recordChecked(rt::FormatString<std::type_identity_t<Arguments>...> format,
                           const Arguments&... arguments) {
   return record(sizeof...(Arguments), rt::kArgumentKinds<Arguments...>.data(), format.string().object(),
-                rt::toVariadic(arguments)...);
+                rt::toVariadic(rt::toArgument(arguments))...);
 }
 
 TEST(FormatArguments, PassThroughVariableArguments) {

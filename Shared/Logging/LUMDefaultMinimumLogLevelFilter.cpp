@@ -1,5 +1,7 @@
 #include "Shared/Logging/LUMDefaultMinimumLogLevelFilter.h"
 
+#include <atomic>
+
 #include "Runtime/Locks/Private/Lazy.h"
 #include "Runtime/Objects/String.h"
 #include "Runtime/Process/Process.h"
@@ -14,9 +16,22 @@ LUMLogLevel levelFromEnvironment() {
   return LUMLogLevelError;
 }
 
+constinit rt::Lazy<LUMLogLevel> threshold;
+
+// The threshold once it has been read. 0 before, since a filter that has not been asked may admit anything.
+constinit std::atomic<LUMLogLevel> knownThreshold = 0;
+
 }  // namespace
 
 bool LUMDefaultMinimumLogLevelFilter::allowLogMessage(const LUMLogMessage& message) const {
-  static constinit rt::Lazy<LUMLogLevel> threshold;
-  return message.level() >= threshold.get(levelFromEnvironment);
+  const LUMLogLevel level = threshold.get(levelFromEnvironment);
+  if (knownThreshold.load(std::memory_order_relaxed) != level) [[unlikely]] {
+    knownThreshold.store(level, std::memory_order_relaxed);
+    LUMLogInterestChanged();
+  }
+  return message.level() >= level;
+}
+
+LUMLogLevel LUMDefaultMinimumLogLevelFilter::lowestLevel(const rt::String* /*component*/) const noexcept {
+  return isExactly(*this) ? knownThreshold.load(std::memory_order_relaxed) : 0;
 }

@@ -15,13 +15,15 @@
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"
 #include "Shared/Logging/LUMLogFilter.h"
+#include "Shared/Logging/LUMLogInterest.h"
 
 class RT_VISIBLE LUMDefaultMinimumLogLevelFilter
-    : public rt::Implements<LUMDefaultMinimumLogLevelFilter, rt::Object, LUMLogFilter> {
+    : public rt::Implements<LUMDefaultMinimumLogLevelFilter, rt::Object, LUMLogFilter, LUMLogInterest> {
  public:
   static rt::Ref<LUMDefaultMinimumLogLevelFilter> init() {
     return rt::make<LUMDefaultMinimumLogLevelFilter>();
   }
 
   bool allowLogMessage(const LUMLogMessage& message) const override;
+  LUMLogLevel lowestLevel(const rt::String* component) const noexcept override;
 };

@@ -115,7 +115,6 @@ rt::Ref<LUMLogMessage> LUMLog(LUMLogLevel level, const char* file, const char* f
   std::va_list arguments;
   va_start(arguments, format);
   const ListEnd end(arguments);
-  // NOLINTNEXTLINE(clang-analyzer-valist.Unterminated): `end` calls va_end
   return logArguments(level, file, function, line, metadata, argumentCount, argumentKinds, format, arguments);
 }
 
@@ -126,7 +125,7 @@ rt::Ref<LUMLogMessage> LUMLogV(LUMLogLevel level, rt::String file, rt::String fu
                                std::va_list arguments) {
   std::va_list walked;
   va_copy(walked, arguments);
-  const ListEnd end(walked);  // NOLINT(clang-analyzer-valist.Unterminated): `end` calls va_end
+  const ListEnd end(walked);
   rt::String text = rt::formatV(format, arguments);
   return LUMLogMessage::initWithLevel(level, format, std::move(text), std::move(file), std::move(function),
                                       line, nullptr, nullptr, callstack,

@@ -6,6 +6,7 @@
 ///
 ///     LUMLogAt(LUMLogLevelInfo, "%@ has %d entries"_s, name, count);
 ///     LUMLogAt(LUMLogLevelError, metadata, "cannot open %s (error %d)"_s, path, errno);
+///     LUMLogAt(LUMLogLevelInfo, "%@ is done"_s, name, LUMLogField("entries", count));
 ///
 /// Each call builds a message and hands it to the shared multiplexer (Shared/Logging/LUMLogMultiplexer.h). By
 /// default the multiplexer writes it to the system's log. The message holds the text, the source location,
@@ -36,13 +37,15 @@
 
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
-#include "Runtime/Process/Private/CallStack.h"
+#include "Runtime/Process/Private/KeepFrame.h"
 #include "Runtime/Text/FormatString.h"
 #include "Runtime/Text/Private/FormatArguments.h"
 #include "Shared/Logging/LUMLogCallstack.h"
+#include "Shared/Logging/LUMLogField.h"
 #include "Shared/Logging/LUMLogLevel.h"
 #include "Shared/Logging/LUMLogMessage.h"
 #include "Shared/Logging/LUMLogMetadata.h"
+#include "Shared/Logging/Private/LUMLogWanted.h"
 
 /// The kind of a variadic argument, with the values of rt::ArgumentKind.
 using LUMLogArgumentKind = std::uint32_t;
@@ -75,7 +78,53 @@ rt::Ref<LUMLogMessage> LUMLogV(LUMLogLevel level, rt::String file, rt::String fu
                                const LUMLogArgumentKind* argumentKinds, const rt::String& format,
                                std::va_list arguments);
 
-/// A literal format that is checked against `Arguments`, with the source location of the call.
+namespace LUMLogDetail {
+
+// The arguments of the format: all that come before the first field.
+template <class Before, class... Rest>
+struct FormatArguments;
+template <class... Before>
+struct FormatArguments<void(Before...)> {
+  using Format = rt::FormatString<Before...>;
+  static constexpr std::int32_t kCount = sizeof...(Before);
+  static constexpr const LUMLogArgumentKind* kinds() noexcept { return rt::kArgumentKinds<Before...>.data(); }
+};
+template <class... Before, class First, class... Rest>
+  requires(!isField<First>)
+struct FormatArguments<void(Before...), First, Rest...> : FormatArguments<void(Before..., First), Rest...> {};
+template <class... Before, class First, class... Rest>
+  requires isField<First>
+struct FormatArguments<void(Before...), First, Rest...> : FormatArguments<void(Before...)> {
+  static_assert((isField<Rest> && ...), "fields come after the arguments of the format");
+};
+
+// The fields are behind what the format reads, so it does not matter what is passed for them.
+template <class T>
+constexpr int variadicArgument(const LUMLogField<T>& /*field*/) noexcept {
+  return 0;
+}
+template <class T>
+constexpr decltype(auto) variadicArgument(const T& argument) {
+  return rt::toArgument(argument);
+}
+
+template <class... Arguments>
+rt::Ref<LUMLogMetadata> metadataWithFields(const rt::Ref<LUMLogMetadata>& metadata,
+                                           const Arguments&... arguments) {
+  rt::Ref<LUMLogMetadata> all = metadata;
+  [[maybe_unused]] const auto add = [&all]<class T>(const T& argument) {
+    if constexpr (isField<T>) {
+      all = LUMLogMetadata::metadataByAddingProperties(all, {{argument.name(), argument.value()}});
+    }
+  };
+  (add(arguments), ...);
+  return all;
+}
+
+}  // namespace LUMLogDetail
+
+/// A literal format that is checked against those of `Arguments` that are no fields, with the source location
+/// of the call.
 template <class... Arguments>
 struct LUMLogFormat {
   template <class Literal>
@@ -84,20 +133,35 @@ struct LUMLogFormat {
                          std::source_location callSite = std::source_location::current())
       : text(literal), location(callSite) {}
 
-  rt::FormatString<Arguments...> text;
+  LUMLogDetail::FormatArguments<void(), Arguments...>::Format text;
   std::source_location location;
 };
 
-/// Logs `arguments`, formatted by the literal `format`, and returns the message. Always inlined, so that the
-/// caller is the first frame of the call stack.
+/// Logs `arguments`, formatted by the literal `format`, and returns the message. Fields (LUMLogField.h) may
+/// follow the arguments of the format.
+///
+/// If all filters and loggers say in advance that they do not want the message
+/// (Shared/Logging/LUMLogInterest.h), makes none and returns null. The descriptions of arguments and fields
+/// are then not asked for.
+///
+/// Always inlined, so that the caller is the first frame of the call stack.
 template <class... Arguments>
 [[gnu::always_inline]] inline rt::Ref<LUMLogMessage> LUMLogAt(
     LUMLogLevel level, const rt::Ref<LUMLogMetadata>& metadata,
     const LUMLogFormat<std::type_identity_t<Arguments>...>& format, const Arguments&... arguments) {
-  rt::Ref<LUMLogMessage> message =
-      LUMLog(level, format.location.file_name(), format.location.function_name(), format.location.line(),
-             metadata, static_cast<std::int32_t>(sizeof...(Arguments)),
-             rt::kArgumentKinds<Arguments...>.data(), format.text.string(), rt::toVariadic(arguments)...);
+  using FormatArguments = LUMLogDetail::FormatArguments<void(), Arguments...>;
+  if (!LUMLogWanted::isWanted(level, metadata)) return nullptr;
+  rt::Ref<LUMLogMessage> message;
+  if constexpr (FormatArguments::kCount == sizeof...(Arguments)) {
+    message = LUMLog(level, format.location.file_name(), format.location.function_name(),
+                     format.location.line(), metadata, FormatArguments::kCount, FormatArguments::kinds(),
+                     format.text.string(), rt::toVariadic(rt::toArgument(arguments))...);
+  } else {
+    message = LUMLog(level, format.location.file_name(), format.location.function_name(),
+                     format.location.line(), LUMLogDetail::metadataWithFields(metadata, arguments...),
+                     FormatArguments::kCount, FormatArguments::kinds(), format.text.string(),
+                     rt::toVariadic(LUMLogDetail::variadicArgument(arguments))...);
+  }
   rt::CallStack::keepFrame();
   return message;
 }

@@ -4,13 +4,24 @@
 #include <array>
 #include <cstddef>
 #include <cstdio>
+#include <cstdlib>
 #include <limits>
+#include <memory>
 #include <new>
 #include <utility>
 
 #include "Runtime/Objects/StringBuilder.h"
 #include "Runtime/Process/Private/CallStack.h"
 #include "Runtime/Values/Number.h"
+
+namespace {
+
+struct Free {
+  void operator()(std::uint64_t* addresses) const noexcept { std::free(addresses); }
+};
+using Addresses = std::unique_ptr<std::uint64_t[], Free>;
+
+}  // namespace
 
 rt::Ref<LUMLogAddressCallstack> LUMLogAddressCallstack::addressCallstackIgnoringFrameCount(
     std::uint64_t count) {
@@ -48,8 +59,10 @@ rt::Ref<LUMLogAddressCallstack> LUMLogAddressCallstack::initWithAddresses(std::u
                                                                           std::uint64_t addressCount,
                                                                           std::uint64_t ignoreFrameCount) {
   Addresses owned(addresses);
-  return rt::Ref<LUMLogAddressCallstack>::adopt(
-      new LUMLogAddressCallstack(std::move(owned), addressCount, ignoreFrameCount));
+  auto stack = rt::Ref<LUMLogAddressCallstack>::adopt(
+      new LUMLogAddressCallstack(addresses, addressCount, ignoreFrameCount));
+  static_cast<void>(owned.release());
+  return stack;
 }
 
 rt::Ref<LUMLogAddressCallstack> LUMLogAddressCallstack::initWithAddresses(
@@ -64,12 +77,16 @@ rt::Ref<LUMLogAddressCallstack> LUMLogAddressCallstack::initWithAddresses(
   return initWithAddresses(values.release(), count, 0);
 }
 
-LUMLogAddressCallstack::LUMLogAddressCallstack(Addresses addresses, std::uint64_t addressCount,
+LUMLogAddressCallstack::LUMLogAddressCallstack(std::uint64_t* addresses, std::uint64_t addressCount,
                                                std::uint64_t ignoreFrameCount) noexcept
-    : addresses_(std::move(addresses)),
+    : addresses_(addresses),
       addressCount_(addressCount),
-      filteredAddresses_(addresses_.get() + ignoreFrameCount),
+      filteredAddresses_(addresses_ + ignoreFrameCount),
       filteredAddressCount_(addressCount_ - ignoreFrameCount) {}
+
+LUMLogAddressCallstack::~LUMLogAddressCallstack() {
+  std::free(addresses_);
+}
 
 void LUMLogAddressCallstack::enumerateAddressesWithBlock(const Visitor& visitor) const {
   if (!visitor) return;

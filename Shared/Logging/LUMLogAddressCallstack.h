@@ -16,9 +16,8 @@
 ///
 /// Not for: readers who need names. See LUMLogSymbolCallstack, or give these addresses to a debugger.
 
+#include <cstddef>
 #include <cstdint>
-#include <cstdlib>
-#include <memory>
 #include <span>
 
 #include "Runtime/Base/Visibility.h"
@@ -74,20 +73,18 @@ class RT_VISIBLE LUMLogAddressCallstack
   rt::String description() const override;
 
  protected:
-  struct Free {
-    void operator()(std::uint64_t* addresses) const noexcept { std::free(addresses); }
-  };
-  using Addresses = std::unique_ptr<std::uint64_t[], Free>;
-
-  LUMLogAddressCallstack(Addresses addresses, std::uint64_t addressCount,
+  /// Makes what `initWithAddresses` returns.
+  LUMLogAddressCallstack(std::uint64_t* addresses, std::uint64_t addressCount,
                          std::uint64_t ignoreFrameCount) noexcept;
+  ~LUMLogAddressCallstack() override;
 
  private:
   std::span<const std::uint64_t> kept() const noexcept {
     return {filteredAddresses_, static_cast<std::size_t>(filteredAddressCount_)};
   }
 
-  const Addresses addresses_;
+  // Owned, and freed with `free`.
+  std::uint64_t* const addresses_;
   const std::uint64_t addressCount_;
   const std::uint64_t* const filteredAddresses_;
   const std::uint64_t filteredAddressCount_;

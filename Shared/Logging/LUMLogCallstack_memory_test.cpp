@@ -40,7 +40,7 @@ constinit thread_local int refused = 0;
 
 #if FAILS_MALLOC
 
-// NOLINTBEGIN(bugprone-reserved-identifier,cert-dcl37-c,cert-dcl51-cpp,readability-identifier-naming,readability-inconsistent-declaration-parameter-name)
+// NOLINTBEGIN(bugprone-reserved-identifier,readability-inconsistent-declaration-parameter-name)
 extern "C" {
 
 void* __libc_malloc(std::size_t size);
@@ -66,7 +66,7 @@ void* realloc(void* ptr, std::size_t size) {
 }
 
 }  // extern "C"
-// NOLINTEND(bugprone-reserved-identifier,cert-dcl37-c,cert-dcl51-cpp,readability-identifier-naming,readability-inconsistent-declaration-parameter-name)
+// NOLINTEND(bugprone-reserved-identifier,readability-inconsistent-declaration-parameter-name)
 
 #elif !RT_TEST_THREAD_SANITIZER  // It brings its own operator new.
 
@@ -113,7 +113,6 @@ int failuresOf(Take take) {
 }
 
 // Does the same for a stack of addresses that is captured `depth` calls further in.
-// NOLINTNEXTLINE(misc-no-recursion)
 [[gnu::noinline]] int failuresAtDepth(int depth) {
   const int failures =
       depth > 0 ? failuresAtDepth(depth - 1)

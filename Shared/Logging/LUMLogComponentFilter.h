@@ -17,9 +17,10 @@
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
 #include "Shared/Logging/LUMLogFilter.h"
+#include "Shared/Logging/LUMLogInterest.h"
 
 class RT_VISIBLE LUMLogComponentFilter
-    : public rt::Implements<LUMLogComponentFilter, rt::Object, LUMLogFilter> {
+    : public rt::Implements<LUMLogComponentFilter, rt::Object, LUMLogFilter, LUMLogInterest> {
  public:
   /// Makes a filter for `component`. If `component` is null, no message passes, not even one without a
   /// component.
@@ -28,6 +29,7 @@ class RT_VISIBLE LUMLogComponentFilter
   }
 
   bool allowLogMessage(const LUMLogMessage& message) const override;
+  LUMLogLevel lowestLevel(const rt::String* component) const noexcept override;
 
  protected:
   explicit LUMLogComponentFilter(rt::String component) noexcept : component_(std::move(component)) {}

@@ -3,3 +3,7 @@
 bool LUMLogDropAllFilter::allowLogMessage(const LUMLogMessage& /*message*/) const {
   return false;
 }
+
+LUMLogLevel LUMLogDropAllFilter::lowestLevel(const rt::String* /*component*/) const noexcept {
+  return isExactly(*this) ? LUMLogLevelNone : 0;
+}

@@ -11,10 +11,13 @@
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"
 #include "Shared/Logging/LUMLogFilter.h"
+#include "Shared/Logging/LUMLogInterest.h"
 
-class RT_VISIBLE LUMLogDropAllFilter : public rt::Implements<LUMLogDropAllFilter, rt::Object, LUMLogFilter> {
+class RT_VISIBLE LUMLogDropAllFilter
+    : public rt::Implements<LUMLogDropAllFilter, rt::Object, LUMLogFilter, LUMLogInterest> {
  public:
   static rt::Ref<LUMLogDropAllFilter> init() { return rt::make<LUMLogDropAllFilter>(); }
 
   bool allowLogMessage(const LUMLogMessage& message) const override;
+  LUMLogLevel lowestLevel(const rt::String* component) const noexcept override;
 };

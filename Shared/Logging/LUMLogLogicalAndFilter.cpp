@@ -9,3 +9,14 @@ bool LUMLogLogicalAndFilter::allowLogMessage(const LUMLogMessage& message) const
     return filter != nullptr && filter->allowLogMessage(message);
   });
 }
+
+LUMLogLevel LUMLogLogicalAndFilter::lowestLevel(const rt::String* component) const noexcept {
+  if (!isExactly(*this)) return 0;
+  if (!filters_ || filters_->isEmpty()) return LUMLogLevelNone;
+  LUMLogLevel lowest = 0;
+  for (const rt::Ref<rt::Object>& element : *filters_) {
+    const auto* filter = rt::cast<LUMLogFilter>(element.get());
+    lowest = std::max(lowest, filter != nullptr ? LUMLogLowestLevel(filter, component) : LUMLogLevelNone);
+  }
+  return lowest;
+}

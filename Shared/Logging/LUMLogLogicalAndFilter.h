@@ -19,9 +19,10 @@
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Values/Array.h"
 #include "Shared/Logging/LUMLogFilter.h"
+#include "Shared/Logging/LUMLogInterest.h"
 
 class RT_VISIBLE LUMLogLogicalAndFilter
-    : public rt::Implements<LUMLogLogicalAndFilter, rt::Object, LUMLogFilter> {
+    : public rt::Implements<LUMLogLogicalAndFilter, rt::Object, LUMLogFilter, LUMLogInterest> {
  public:
   /// Makes a filter of `filters`, which are asked in order until one refuses the message. An element that is
   /// not a LUMLogFilter refuses every message. If `filters` is null or empty, nothing passes.
@@ -30,6 +31,7 @@ class RT_VISIBLE LUMLogLogicalAndFilter
   }
 
   bool allowLogMessage(const LUMLogMessage& message) const override;
+  LUMLogLevel lowestLevel(const rt::String* component) const noexcept override;
 
  protected:
   explicit LUMLogLogicalAndFilter(rt::Ref<rt::Array> filters) noexcept : filters_(std::move(filters)) {}

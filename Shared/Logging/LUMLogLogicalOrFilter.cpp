@@ -8,3 +8,14 @@ bool LUMLogLogicalOrFilter::allowLogMessage(const LUMLogMessage& message) const 
            return filter != nullptr && filter->allowLogMessage(message);
          });
 }
+
+LUMLogLevel LUMLogLogicalOrFilter::lowestLevel(const rt::String* component) const noexcept {
+  if (!isExactly(*this)) return 0;
+  LUMLogLevel lowest = LUMLogLevelNone;
+  if (!filters_) return lowest;
+  for (const rt::Ref<rt::Object>& element : *filters_) {
+    if (const auto* filter = rt::cast<LUMLogFilter>(element.get()))
+      lowest = std::min(lowest, LUMLogLowestLevel(filter, component));
+  }
+  return lowest;
+}

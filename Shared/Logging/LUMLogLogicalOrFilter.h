@@ -16,9 +16,10 @@
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Values/Array.h"
 #include "Shared/Logging/LUMLogFilter.h"
+#include "Shared/Logging/LUMLogInterest.h"
 
 class RT_VISIBLE LUMLogLogicalOrFilter
-    : public rt::Implements<LUMLogLogicalOrFilter, rt::Object, LUMLogFilter> {
+    : public rt::Implements<LUMLogLogicalOrFilter, rt::Object, LUMLogFilter, LUMLogInterest> {
  public:
   /// Makes a filter of `filters`, which are asked in order until one lets the message pass. An element that
   /// is not a LUMLogFilter lets no message pass. If `filters` is null or empty, nothing passes.
@@ -27,6 +28,7 @@ class RT_VISIBLE LUMLogLogicalOrFilter
   }
 
   bool allowLogMessage(const LUMLogMessage& message) const override;
+  LUMLogLevel lowestLevel(const rt::String* component) const noexcept override;
 
  protected:
   explicit LUMLogLogicalOrFilter(rt::Ref<rt::Array> filters) noexcept : filters_(std::move(filters)) {}

@@ -2,6 +2,8 @@
 
 #include <utility>
 
+#include "Runtime/Base/Private/WallClock.h"
+#include "Runtime/Locks/Private/ThreadIdentifier.h"
 #include "Runtime/Process/Thread.h"
 #include "Runtime/Queues/Queue.h"
 
@@ -46,7 +48,9 @@ LUMLogMessage::LUMLogMessage(LUMLogLevel level, rt::String format, rt::String fo
       dispatchQueueLabel_(dispatchQueueLabel ? std::move(dispatchQueueLabel) : rt::Queue::currentLabel()),
       callstack_(rt::copy(callstack)),
       safeParameters_(std::move(safeParameters)),
-      logMetadata_(std::move(logMetadata)) {}
+      logMetadata_(std::move(logMetadata)),
+      time_(rt::WallClock::nanoseconds()),
+      threadIdentifier_(rt::currentThreadIdentifier()) {}
 
 bool LUMLogMessage::isEqual(const rt::Object* other) const {
   if (this == other) return true;

@@ -65,7 +65,14 @@ class RT_VISIBLE LUMLogMessage : public rt::Implements<LUMLogMessage, rt::Object
   /// Returns the metadata that the caller gave, or null.
   const rt::Ref<LUMLogMetadata>& logMetadata() const noexcept { return logMetadata_; }
 
-  /// Returns whether `other` is a message with equal fields.
+  /// Returns when the message was made, in nanoseconds since the start of 1970, in UTC.
+  std::int64_t time() const noexcept { return time_; }
+
+  /// Returns the number that the system's tools show for the thread that made the message.
+  std::uint32_t threadIdentifier() const noexcept { return threadIdentifier_; }
+
+  /// Returns whether `other` is a message with equal fields. The time and the thread's identifier do not
+  /// count, nor for the hash.
   bool isEqual(const rt::Object* other) const override;
   std::uint64_t hash() const override;
 
@@ -87,4 +94,6 @@ class RT_VISIBLE LUMLogMessage : public rt::Implements<LUMLogMessage, rt::Object
   const rt::Ref<LUMLogCallstack> callstack_;
   const rt::Ref<rt::Dictionary> safeParameters_;
   const rt::Ref<LUMLogMetadata> logMetadata_;
+  const std::int64_t time_;
+  const std::uint32_t threadIdentifier_;
 };

@@ -2,10 +2,12 @@
 
 #include <gtest/gtest.h>
 
+#include <ctime>
 #include <functional>
 #include <thread>
 #include <vector>
 
+#include "Runtime/Locks/Private/ThreadIdentifier.h"
 #include "Runtime/Process/Thread.h"
 #include "Runtime/Queues/Queue.h"
 #include "Runtime/Values/Number.h"
@@ -43,6 +45,46 @@ rt::Ref<LUMLogMessage> messageOf(const rt::String& threadName, const rt::String&
   fields.threadName = threadName;
   fields.dispatchQueueLabel = label;
   return fields.message();
+}
+
+// The system's time of day in nanoseconds. A message's time may differ by a millisecond.
+std::int64_t systemTime() {
+  timespec now{};
+  EXPECT_EQ(clock_gettime(CLOCK_REALTIME, &now), 0);
+  return now.tv_sec * 1'000'000'000 + now.tv_nsec;
+}
+
+TEST(LUMLogMessage, KnowsWhenItWasMade) {
+  constexpr std::int64_t kTolerance = 1'000'000;
+  const std::int64_t before = systemTime();
+  const rt::Ref<LUMLogMessage> message = Fields().message();
+  const std::int64_t after = systemTime();
+  EXPECT_GE(message->time(), before - kTolerance);
+  EXPECT_LE(message->time(), after + kTolerance);
+  EXPECT_EQ(rt::copy(message)->time(), message->time());
+}
+
+TEST(LUMLogMessage, KnowsTheThreadThatMadeIt) {
+  EXPECT_EQ(Fields().message()->threadIdentifier(), rt::currentThreadIdentifier());
+  rt::Ref<LUMLogMessage> message;
+  rt::ThreadIdentifier maker = 0;
+  std::thread([&] {
+    message = Fields().message();
+    maker = rt::currentThreadIdentifier();
+  }).join();
+  EXPECT_EQ(message->threadIdentifier(), maker);
+  EXPECT_NE(message->threadIdentifier(), rt::currentThreadIdentifier());
+}
+
+TEST(LUMLogMessage, EqualsOneOfAnotherTimeAndThread) {
+  const rt::Ref<LUMLogMessage> message = Fields().message();
+  rt::Ref<LUMLogMessage> other;
+  do {
+    std::thread([&] { other = Fields().message(); }).join();
+  } while (other->time() == message->time());
+  EXPECT_NE(message->threadIdentifier(), other->threadIdentifier());
+  EXPECT_TRUE(message->isEqual(other.get()));
+  EXPECT_EQ(message->hash(), other->hash());
 }
 
 TEST(LUMLogMessage, HoldsItsFields) {

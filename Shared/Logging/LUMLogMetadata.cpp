@@ -34,6 +34,15 @@ rt::Ref<LUMLogMetadata> LUMLogMetadata::messageWithKey(const rt::String& key,
   return metadataWith(std::move(changed));
 }
 
+rt::Ref<LUMLogMetadata> LUMLogMetadata::metadataByAddingProperties(
+    const rt::Ref<LUMLogMetadata>& metadata,
+    std::initializer_list<std::pair<rt::String, rt::Ref<rt::Object>>> added) {
+  rt::Dictionary::Builder changed =
+      metadata ? rt::Dictionary::Builder(*metadata->properties_) : rt::Dictionary::Builder();
+  for (const auto& [key, value] : added) changed.set(key, rt::copy(value));
+  return metadataWith(std::move(changed));
+}
+
 rt::Ref<LUMLogMetadata> LUMLogMetadata::metadataWith(rt::Dictionary::Builder&& properties) {
   return rt::Ref<LUMLogMetadata>::adopt(new LUMLogMetadata(std::move(properties).dictionary()));
 }

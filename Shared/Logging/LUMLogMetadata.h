@@ -12,7 +12,9 @@
 ///
 /// Not for: arguments of the text (Shared/Logging/LUMSafeParameter.h).
 
+#include <atomic>
 #include <cstdint>
+#include <initializer_list>
 #include <utility>
 
 #include "Runtime/Base/Visibility.h"
@@ -65,6 +67,12 @@ class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Obje
   /// null `key` changes nothing. Despite its name, this function returns metadata and not a message.
   rt::Ref<LUMLogMetadata> messageWithKey(const rt::String& key, const rt::Ref<rt::Object>& value) const;
 
+  /// Returns metadata with the properties of `metadata`, which may be null, and `added`. A null value removes
+  /// the property of its key. No key is null.
+  static rt::Ref<LUMLogMetadata> metadataByAddingProperties(
+      const rt::Ref<LUMLogMetadata>& metadata,
+      std::initializer_list<std::pair<rt::String, rt::Ref<rt::Object>>> added);
+
   /// Same as `messageWithKey`, for the predefined keys.
   rt::Ref<LUMLogMetadata> metadataByAddingObfuscatedKiriID(
       const rt::Ref<rt::Object>& obfuscatedKiriID) const {
@@ -102,6 +110,10 @@ class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Obje
 
  private:
   static rt::Ref<LUMLogMetadata> metadataWith(rt::Dictionary::Builder&& properties);
+
+  // What the shared multiplexer wants of the component, with its generation (Private/LUMLogWanted.h).
+  friend class LUMLogWanted;
+  mutable std::atomic<std::uint64_t> wanted_ = 0;
 
   const rt::Ref<rt::Dictionary> properties_;
 };

@@ -3,3 +3,7 @@
 bool LUMLogMinimumLevelFilter::allowLogMessage(const LUMLogMessage& message) const {
   return message.level() >= minimumLevel_;
 }
+
+LUMLogLevel LUMLogMinimumLevelFilter::lowestLevel(const rt::String* /*component*/) const noexcept {
+  return isExactly(*this) ? minimumLevel_ : 0;
+}

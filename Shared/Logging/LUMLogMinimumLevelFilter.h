@@ -11,16 +11,18 @@
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"
 #include "Shared/Logging/LUMLogFilter.h"
+#include "Shared/Logging/LUMLogInterest.h"
 #include "Shared/Logging/LUMLogLevel.h"
 
 class RT_VISIBLE LUMLogMinimumLevelFilter
-    : public rt::Implements<LUMLogMinimumLevelFilter, rt::Object, LUMLogFilter> {
+    : public rt::Implements<LUMLogMinimumLevelFilter, rt::Object, LUMLogFilter, LUMLogInterest> {
  public:
   static rt::Ref<LUMLogMinimumLevelFilter> initWithMinimumLevel(LUMLogLevel minimumLevel) {
     return rt::Ref<LUMLogMinimumLevelFilter>::adopt(new LUMLogMinimumLevelFilter(minimumLevel));
   }
 
   bool allowLogMessage(const LUMLogMessage& message) const override;
+  LUMLogLevel lowestLevel(const rt::String* component) const noexcept override;
 
  protected:
   explicit LUMLogMinimumLevelFilter(LUMLogLevel minimumLevel) noexcept : minimumLevel_(minimumLevel) {}

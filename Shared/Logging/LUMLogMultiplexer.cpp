@@ -16,6 +16,8 @@
 #include "Runtime/Queues/QualityOfService.h"
 #include "Runtime/Queues/Queue.h"
 #include "Shared/Logging/LUMDefaultMinimumLogLevelFilter.h"
+#include "Shared/Logging/LUMLogInterest.h"
+#include "Shared/Logging/Private/LUMLogWanted.h"
 
 namespace {
 
@@ -42,6 +44,34 @@ void deliver(LUMLogger& logger, const rt::Ref<LUMLogMessage>& message) {
   if (admits(logger, *message)) logger.logWithMessage(message);
 }
 
+// Queues `message` for those of `loggers` that do not want it at once, and returns those that do. A function
+// of its own, so that a message costs nothing extra if there are no asynchronous loggers.
+[[gnu::noinline]] std::vector<rt::Ref<LUMAsyncLogger>> deliverLater(
+    const std::vector<rt::Ref<LUMAsyncLogger>>& loggers, const rt::Ref<LUMLogMessage>& message,
+    rt::Queue& loggingQueue) {
+  std::vector<rt::Ref<LUMAsyncLogger>> laterLoggers;
+  std::vector<rt::Ref<LUMAsyncLogger>> blockingLoggers;
+  for (const rt::Ref<LUMAsyncLogger>& logger : loggers) {
+    const bool isBlocking = admits(*logger, *message) &&
+                            logger->dispatchModeForMessage(*message) == LUMLogDispatchModeSynchronous;
+    std::vector<rt::Ref<LUMAsyncLogger>>& list = isBlocking ? blockingLoggers : laterLoggers;
+    list.reserve(loggers.size());
+    list.push_back(logger);
+  }
+  if (laterLoggers.empty()) return blockingLoggers;
+  loggingQueue.async([loggers = std::move(laterLoggers), message] {
+    for (const rt::Ref<LUMAsyncLogger>& logger : loggers) {
+      if (const rt::Ref<rt::Queue> queue = logger->operationQueue()) {
+        try {
+          queue->async([logger, message] { deliver(*logger, message); });
+        } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): there is no caller to tell
+        }
+      }
+    }
+  });
+  return blockingLoggers;
+}
+
 }  // namespace
 
 struct LUMLogMultiplexer::Lists {
@@ -64,7 +94,11 @@ class LUMLogMultiplexer::Members final : public rt::Implements<Members, rt::Obje
 
 const rt::Ref<LUMLogMultiplexer>& LUMLogMultiplexer::sharedInstance() {
   static constinit rt::Lazy<rt::Ref<LUMLogMultiplexer>> instance;
-  return instance.get(init);
+  return instance.get([] {
+    rt::Ref<LUMLogMultiplexer> shared = init();
+    LUMLogWanted::attach(*shared);
+    return shared;
+  });
 }
 
 rt::Ref<LUMLogMultiplexer> LUMLogMultiplexer::init() {
@@ -95,7 +129,8 @@ LUMLogMultiplexer::~LUMLogMultiplexer() = default;
   }
 
   std::vector<rt::Ref<LUMAsyncLogger>> blockingLoggers;
-  if (!lists.asyncLoggers.empty()) blockingLoggers = deliverLater(lists.asyncLoggers, message);
+  if (!lists.asyncLoggers.empty())
+    blockingLoggers = deliverLater(lists.asyncLoggers, message, *loggingQueue_);
 
   for (const rt::Ref<LUMSyncLogger>& logger : lists.syncLoggers) deliver(*logger, message);
 
@@ -106,29 +141,22 @@ LUMLogMultiplexer::~LUMLogMultiplexer() = default;
   }
 }
 
-std::vector<rt::Ref<LUMAsyncLogger>> LUMLogMultiplexer::deliverLater(
-    const std::vector<rt::Ref<LUMAsyncLogger>>& loggers, const rt::Ref<LUMLogMessage>& message) {
-  std::vector<rt::Ref<LUMAsyncLogger>> laterLoggers;
-  std::vector<rt::Ref<LUMAsyncLogger>> blockingLoggers;
-  for (const rt::Ref<LUMAsyncLogger>& logger : loggers) {
-    const bool isBlocking = admits(*logger, *message) &&
-                            logger->dispatchModeForMessage(*message) == LUMLogDispatchModeSynchronous;
-    std::vector<rt::Ref<LUMAsyncLogger>>& list = isBlocking ? blockingLoggers : laterLoggers;
-    list.reserve(loggers.size());
-    list.push_back(logger);
-  }
-  if (laterLoggers.empty()) return blockingLoggers;
-  loggingQueue_->async([loggers = std::move(laterLoggers), message] {
-    for (const rt::Ref<LUMAsyncLogger>& logger : loggers) {
-      if (const rt::Ref<rt::Queue> queue = logger->operationQueue()) {
-        try {
-          queue->async([logger, message] { deliver(*logger, message); });
-        } catch (const std::bad_alloc&) {  // NOLINT(bugprone-empty-catch): there is no caller to tell
-        }
-      }
+LUMLogLevel LUMLogMultiplexer::lowestLevel(const rt::String* component) const noexcept {
+  const rt::Ref<Members> current = members_.load();
+  const Lists& lists = current->lists;
+  LUMLogLevel ofLoggers = LUMLogLevelNone;
+  const auto ask = [&](const auto& loggers) {
+    for (const auto& logger : loggers) {
+      const auto* interest = rt::cast<LUMLogInterest>(logger.get());
+      ofLoggers = std::min(ofLoggers, interest != nullptr ? interest->lowestLevel(component) : 0);
     }
-  });
-  return blockingLoggers;
+  };
+  ask(lists.syncLoggers);
+  ask(lists.asyncLoggers);
+  LUMLogLevel ofFilters = 0;
+  for (const rt::Ref<LUMLogFilter>& filter : lists.filters)
+    ofFilters = std::max(ofFilters, LUMLogLowestLevel(filter.get(), component));
+  return std::max(ofFilters, ofLoggers);
 }
 
 // Replaces the members by what `change` makes of a copy. Starts again if another thread was faster.
@@ -138,8 +166,9 @@ void LUMLogMultiplexer::replaceMembers(Change change) {
     const rt::Ref<Members> known = members_.load();
     Lists lists = known->lists;
     change(lists);
-    if (members_.compareExchange(known, rt::make<Members>(std::move(lists)))) return;
+    if (members_.compareExchange(known, rt::make<Members>(std::move(lists)))) break;
   }
+  LUMLogWanted::refresh();
 }
 
 void LUMLogMultiplexer::addLogFilter(const rt::Ref<LUMLogFilter>& filter) {

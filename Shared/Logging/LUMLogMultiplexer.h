@@ -38,7 +38,6 @@
 /// Not for: several multiplexers in one program. LUMLog uses only the shared one.
 
 #include <atomic>
-#include <vector>
 
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Class.h"
@@ -83,6 +82,11 @@ class RT_VISIBLE LUMLogMultiplexer
   /// "LUMLogMultiplexer".
   const rt::Ref<rt::Queue>& loggingQueue() const noexcept { return loggingQueue_; }
 
+  /// Returns the lowest level that passes the filters and that some logger wants, as far as they say so
+  /// (LUMLogInterest.h). `LUMLogAt` does not make messages below that level. `component` is that of
+  /// LUMLogInterest.
+  LUMLogLevel lowestLevel(const rt::String* component) const noexcept;
+
   bool captureCallStack() const override { return captureCallStack_.load(std::memory_order_relaxed); }
   void setCaptureCallStack(bool capture) override;
   bool captureCallStackAddresses() const override {
@@ -102,10 +106,6 @@ class RT_VISIBLE LUMLogMultiplexer
 
   template <class Change>
   void replaceMembers(Change change);
-  // Queues `message` for those of `loggers` that do not want it at once, and returns those that do. A
-  // function of its own, so that a message costs nothing extra if there are no asynchronous loggers.
-  [[gnu::noinline]] std::vector<rt::Ref<LUMAsyncLogger>> deliverLater(
-      const std::vector<rt::Ref<LUMAsyncLogger>>& loggers, const rt::Ref<LUMLogMessage>& message);
 
   // Replaced as a whole, never changed, so that each message keeps the filters and loggers that it found.
   rt::AtomicRef<Members> members_;

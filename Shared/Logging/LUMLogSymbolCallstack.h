@@ -32,8 +32,8 @@ class RT_VISIBLE LUMLogSymbolCallstack
   /// Makes a call stack of `symbols`, an array of strings that may be null. Throws std::bad_alloc.
   static rt::Ref<LUMLogSymbolCallstack> initWithSymbols(rt::Ref<rt::Array> symbols);
 
-  /// Returns the lines as given. Captured lines have the form that Runtime/Process/Private/CallStack.h
-  /// describes.
+  /// Returns the lines as given. A captured line has the call's number, from 0, the image, the address, and
+  /// the function with the distance from its start.
   const rt::Ref<rt::Array>& symbols() const noexcept { return symbols_; }
 
   /// Returns whether `other` is a LUMLogSymbolCallstack with equal lines.

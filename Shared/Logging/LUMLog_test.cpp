@@ -95,7 +95,9 @@ TEST_F(LUMLogTest, LogsTheMessageThatItReturns) {
 TEST_F(LUMLogTest, ReturnsAMessageThatAFilterRefuses) {
   const rt::Ref<LUMLogFilter> filter = LUMLogDropAllFilter::init();
   multiplexer_->addLogFilter(filter);
-  const rt::Ref<LUMLogMessage> message = LUMLogAt(LUMLogLevelError, "%d entries", 3);
+  const LUMLogArgumentKind kind = 2;
+  const rt::Ref<LUMLogMessage> message =
+      LUMLog(LUMLogLevelError, "file", "function", 1, nullptr, 1, &kind, "%d entries"_s, 3);
   multiplexer_->removeLogFilter(filter);
   ASSERT_TRUE(message);
   EXPECT_EQ(message->formattedString(), "3 entries");

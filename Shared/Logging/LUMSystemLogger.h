@@ -18,9 +18,11 @@
 #include "Runtime/Objects/String.h"
 #include "Shared/Logging/LUMLogFilter.h"
 #include "Shared/Logging/LUMLogFormatter.h"
+#include "Shared/Logging/LUMLogInterest.h"
 #include "Shared/Logging/LUMSyncLogger.h"
 
-class RT_VISIBLE LUMSystemLogger : public rt::Implements<LUMSystemLogger, rt::Object, LUMSyncLogger> {
+class RT_VISIBLE LUMSystemLogger
+    : public rt::Implements<LUMSystemLogger, rt::Object, LUMSyncLogger, LUMLogInterest> {
  public:
   /// Makes a logger with `filter`, which may be null, and `formatter`. A null `formatter` stands for a
   /// LUMSystemLoggerFormatter. Stores the main bundle's identifier at the time of the call.
@@ -33,6 +35,10 @@ class RT_VISIBLE LUMSystemLogger : public rt::Implements<LUMSystemLogger, rt::Ob
   void logWithMessage(const rt::Ref<LUMLogMessage>& message) override;
 
   rt::Ref<LUMLogFilter> filter() const override { return filter_; }
+
+  LUMLogLevel lowestLevel(const rt::String* component) const noexcept override {
+    return isExactly(*this) ? LUMLogLowestLevel(filter_.get(), component) : 0;
+  }
 
  protected:
   LUMSystemLogger(rt::Ref<LUMLogFilter> filter, rt::Ref<LUMLogFormatter> formatter);

@@ -1,6 +1,10 @@
 # Builds for macOS on Linux, for the processor MACOS_PROCESSOR (x86_64 or arm64), with the tools of
 # `script/bootstrap macos`. The presets `macos` and `macos-arm64` use it.
 
+if(NOT EXISTS "${CMAKE_CURRENT_LIST_DIR}/../../build/macos-tools/version")
+  message(FATAL_ERROR "The tools for macOS are missing. Run: script/bootstrap macos")
+endif()
+
 set(CMAKE_SYSTEM_NAME Darwin)
 set(CMAKE_SYSTEM_PROCESSOR ${MACOS_PROCESSOR})
 list(APPEND CMAKE_TRY_COMPILE_PLATFORM_VARIABLES MACOS_PROCESSOR)

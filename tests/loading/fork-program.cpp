@@ -69,7 +69,7 @@ int main(int argumentCount, char** arguments) {
   });
   bool isRight = use();
   for (int i = 0; i < 20 && isRight; ++i) {
-    isRight = isTrueInChild([] { return use() && use() && isTrueInChild(use); }) && use();
+    isRight = isTrueInChild([] { return use() && isTrueInChild(use) && use(); }) && use();
   }
   isEnding = true;
   other.join();

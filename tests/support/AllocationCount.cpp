@@ -46,7 +46,7 @@ bool AllocationCount::isSupported() noexcept {
 #elif defined(__GLIBC__)
 
 // The C library lets a program replace malloc. Its own functions remain available under these names.
-// NOLINTBEGIN(bugprone-reserved-identifier,cert-dcl37-c,cert-dcl51-cpp,readability-identifier-naming,readability-inconsistent-declaration-parameter-name)
+// NOLINTBEGIN(bugprone-reserved-identifier)
 extern "C" {
 
 void* __libc_malloc(std::size_t size);
@@ -91,13 +91,13 @@ int posix_memalign(void** memptr, std::size_t alignment, std::size_t size) {
   return 0;
 }
 
-void free(void* block) {
-  if (block != nullptr) countFree();
-  __libc_free(block);
+void free(void* ptr) {
+  if (ptr != nullptr) countFree();
+  __libc_free(ptr);
 }
 
 }  // extern "C"
-// NOLINTEND(bugprone-reserved-identifier,cert-dcl37-c,cert-dcl51-cpp,readability-identifier-naming,readability-inconsistent-declaration-parameter-name)
+// NOLINTEND(bugprone-reserved-identifier)
 
 bool AllocationCount::isSupported() noexcept {
   return true;

@@ -27,9 +27,10 @@ int readClock(clockid_t clock, timespec* time) noexcept {
 
 // The program's function takes precedence over the C library's, also for the C++ library. On Linux it does
 // for the system's libraries, too.
-extern "C" int clock_gettime(clockid_t clock, timespec* time) noexcept(noexcept(clock_gettime(clock, time))) {
-  const int status = readClock(clock, time);
+extern "C" int clock_gettime(clockid_t clock_id,
+                             timespec* tp) noexcept(noexcept(clock_gettime(clock_id, tp))) {
+  const int status = readClock(clock_id, tp);
   const ClockHook hook = clockHook.load();
-  if (status == 0 && hook != nullptr) hook(clock, *time);
+  if (status == 0 && hook != nullptr) hook(clock_id, *tp);
   return status;
 }

@@ -28,7 +28,7 @@ namespace {
 using Extent = AllocationFailure::Extent;
 
 // The result of a child.
-enum Result : int { kSurvived = 0, kHasNoSuchAllocation = 1, kFailed = 2 };
+enum Result : std::uint8_t { kSurvived = 0, kHasNoSuchAllocation = 1, kFailed = 2 };
 
 // The limit in seconds for a child. Only a child that hangs takes longer on any machine.
 constexpr unsigned kPatience = 120;

@@ -20,7 +20,6 @@
 #include "Foundation/ZEBLogger.h"
 #include "tests/support/PrivateDefaults.h"
 
-// NOLINTNEXTLINE(bugprone-throwing-static-initialization): if it throws, the tests cannot run
 inline const PrivateDefaults privateDefaults;
 
 // Records each line with its level before it.

@@ -38,13 +38,16 @@
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"
 #include "Shared/Logging/LUMLogFilter.h"
+#include "Shared/Logging/LUMLogInterest.h"
+#include "Shared/Logging/LUMLogLevel.h"
 #include "Shared/Logging/LUMLogMessage.h"
 #include "Shared/Logging/LUMSyncLogger.h"
 
 /// Receives an error, which is not null. Never runs on two threads at once.
 using PECErrorHandlerBlock = rt::Block<void(const rt::Ref<PECErrorDescription>& error)>;
 
-class RT_VISIBLE PECErrorHandler : public rt::Implements<PECErrorHandler, rt::Object, LUMSyncLogger> {
+class RT_VISIBLE PECErrorHandler
+    : public rt::Implements<PECErrorHandler, rt::Object, LUMSyncLogger, LUMLogInterest> {
  public:
   /// Returns the process's handler, which is never destroyed. Thread-safe.
   static const rt::Ref<PECErrorHandler>& sharedInstance();
@@ -64,6 +67,10 @@ class RT_VISIBLE PECErrorHandler : public rt::Implements<PECErrorHandler, rt::Ob
 
   /// Returns a filter that admits LUMLogLevelFault and higher levels.
   rt::Ref<LUMLogFilter> filter() const override { return filter_; }
+
+  LUMLogLevel lowestLevel(const rt::String* component) const noexcept override {
+    return isExactly(*this) ? LUMLogLowestLevel(filter_.get(), component) : 0;
+  }
 
   /// Sets the callback. If `block` is null, or if a callback is set already, reports an error and changes
   /// nothing.

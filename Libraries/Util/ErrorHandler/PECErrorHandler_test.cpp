@@ -307,7 +307,7 @@ TEST_F(PECErrorHandlerTest, ThrowsWithoutACallbackAndCountsNothing) {
 }
 
 TEST_F(PECErrorHandlerTest, AlwaysReturnsTheSameDefaultCallback) {
-  const PECErrorHandlerBlock block = handler_->defaultErrorHandlerBlock();
+  const PECErrorHandlerBlock block = PECErrorHandler::defaultErrorHandlerBlock();
   ASSERT_TRUE(block);
   EXPECT_EQ(block, handler_->defaultErrorHandlerBlock());
   EXPECT_EQ(block, PECErrorHandler::init()->defaultErrorHandlerBlock());

@@ -30,7 +30,7 @@
 #include "Libraries/Util/ErrorHandler/PECErrorHandler.h"
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
-#include "Runtime/Process/Private/CallStack.h"
+#include "Runtime/Process/Private/KeepFrame.h"
 #include "Runtime/Text/FormatString.h"
 #include "Runtime/Text/Private/FormatArguments.h"
 #include "Runtime/Values/Number.h"

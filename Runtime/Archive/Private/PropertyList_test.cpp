@@ -282,7 +282,7 @@ PropertyList randomList(std::mt19937_64& random) {
 }
 
 TEST(PropertyList, ReadsBackRandomLists) {
-  std::mt19937_64 random(20010101);  // NOLINT(cert-msc*): the same lists in every run
+  std::mt19937_64 random(20010101);  // the same lists in every run
   for (int round = 0; round < 300; ++round) {
     const PropertyList list = randomList(random);
     const Bytes bytes = list.encoded();
@@ -295,7 +295,7 @@ TEST(PropertyList, ReadsBackRandomLists) {
 
 // If bytes are cut off or changed, the result is an exception or a list that can be written again.
 TEST(PropertyList, SurvivesDamagedBytes) {
-  std::mt19937_64 random(7);  // NOLINT(cert-msc*): the same damage in every run
+  std::mt19937_64 random(7);  // the same damage in every run
   const Bytes bytes = randomList(random).encoded();
   for (std::size_t length = 0; length < bytes.size(); ++length) {
     EXPECT_THROW(PropertyList::decoded(std::span(bytes).first(length)), rt::MalformedPropertyList);

@@ -4,12 +4,12 @@
 #include <gtest/gtest.h>
 #include <unistd.h>
 
+#include <array>
 #include <chrono>
 #include <csignal>
 #include <cstdio>
 #include <string>
 #include <thread>
-#include <vector>
 
 #include "tests/support/AllocationCount.h"
 #include "tests/support/StandardErrorPipe.h"
@@ -61,9 +61,9 @@ TEST(StandardError, GivesUpIfAnotherWriterTakesTheRoom) {
     StandardErrorPipe pipe;
     pipe.fill();
     EXPECT_EQ(pipe.take(4096).size(), 4096U);
-    std::vector<std::thread> writers;
-    for (int i = 0; i < 4; ++i) {
-      writers.emplace_back([] { StandardError::write(std::string(4096, 'w'), milliseconds(0)); });
+    std::array<std::thread, 4> writers;
+    for (std::thread& writer : writers) {
+      writer = std::thread([] { StandardError::write(std::string(4096, 'w'), milliseconds(0)); });
     }
     for (std::thread& writer : writers) writer.join();
   }

@@ -96,9 +96,8 @@ std::optional<std::string> DefaultsStore::value(std::string_view key) {
   return value;
 }
 
-std::shared_ptr<DefaultsObserver> DefaultsStore::observe(std::string_view key, bool alsoNow,
-                                                         Block<void()> block) {
-  auto observer = std::make_shared<DefaultsObserver>(std::string(key), std::move(block));
+Ref<DefaultsObserver> DefaultsStore::observe(std::string_view key, bool alsoNow, Block<void()> block) {
+  Ref<DefaultsObserver> observer = make<DefaultsObserver>(key, std::move(block));
   const Observers itself{observer};
   std::string watchProblem;
   std::string readProblem;
@@ -200,7 +199,7 @@ std::string DefaultsStore::startWatching() {
   try {
     auto watch = std::make_shared<SystemFileWatch>(file_.path());
     const SignalsBlocked blocked;
-    std::thread([self = shared_from_this(), watch] { self->watch(watch); }).detach();
+    std::thread([self = Ref(this), watch] { self->watch(watch); }).detach();
     watch_ = std::move(watch);
     return {};
   } catch (const std::system_error& error) {

@@ -12,6 +12,7 @@
 #include <optional>
 #include <string>
 #include <string_view>
+#include <utility>
 #include <vector>
 
 #include "Runtime/Defaults/Private/DefaultsFile.h"
@@ -20,6 +21,9 @@
 #include "Runtime/Locks/Private/ThreadIdentifier.h"
 #include "Runtime/Locks/UnfairLock.h"
 #include "Runtime/Objects/Block.h"
+#include "Runtime/Objects/Class.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
 
 namespace rt::detail {
@@ -32,7 +36,13 @@ void setDefaultsReportHandler(Block<void(const String&)> handler);
 void reportDefaults(std::initializer_list<std::string_view> parts) noexcept;
 
 /// An observer of a key. The store's lock guards all members but the key.
-struct DefaultsObserver {
+class DefaultsObserver final : public Implements<DefaultsObserver, Object> {
+ public:
+  static constexpr std::string_view kClassName = "UserDefaultsObserver";
+
+  DefaultsObserver(std::string_view observedKey, Block<void()> observer)
+      : key(observedKey), block(std::move(observer)) {}
+
   const std::string key;
   Block<void()> block;
   /// The value that it was last called for.
@@ -44,14 +54,16 @@ struct DefaultsObserver {
 };
 
 /// Threads: any thread may use it. Runtime/Defaults/UserDefaults.h has the contracts of its functions.
-class DefaultsStore : public std::enable_shared_from_this<DefaultsStore> {
+class DefaultsStore final : public Implements<DefaultsStore, Object> {
  public:
+  static constexpr std::string_view kClassName = "UserDefaultsStore";
+
   /// Makes a store for the file at `path`. If `path` is empty, there is no file and `problem` says why.
   DefaultsStore(std::string path, std::string problem);
 
   std::optional<std::string> value(std::string_view key);
 
-  std::shared_ptr<DefaultsObserver> observe(std::string_view key, bool alsoNow, Block<void()> block);
+  Ref<DefaultsObserver> observe(std::string_view key, bool alsoNow, Block<void()> block);
   void remove(DefaultsObserver& observer) noexcept;
 
   /// Ends the thread that waits for changes.
@@ -75,7 +87,7 @@ class DefaultsStore : public std::enable_shared_from_this<DefaultsStore> {
   // Returns a new watch as soon as the system allows one, or null if the thread is to end.
   std::shared_ptr<SystemFileWatch> renewedWatch() noexcept;
 
-  using Observers = std::vector<std::shared_ptr<DefaultsObserver>>;
+  using Observers = std::vector<Ref<DefaultsObserver>>;
   // Returns the observers whose value has changed and that no other thread calls or is about to call. From
   // now on the calling thread is about to call them. Sets `problem` to a report to make.
   [[nodiscard]] Observers claim(std::string& problem) RT_EXCLUDES(lock_);

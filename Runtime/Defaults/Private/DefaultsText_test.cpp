@@ -80,7 +80,7 @@ TEST(DefaultsText, ReportsWhatIsMalformedAndWhere) {
 
 // Reads random settings with escaped characters, and compares them with a map.
 TEST(DefaultsText, ReadsRandomSettings) {
-  std::mt19937_64 random(2001);  // NOLINT(cert-msc*): the same texts in every run
+  std::mt19937_64 random(2001);  // the same texts in every run
   const std::vector<std::pair<std::string, std::string>> pieces{
       {"a", "a"},         {" ", " "},      {"\t", R"(\t)"},       {"=", "="},
       {"#", "#"},         {"\"", R"(\")"}, {"\\", R"(\\)"},       {"\n", R"(\n)"},

@@ -7,6 +7,7 @@
 #include <sched.h>
 #include <sys/mman.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <chrono>
@@ -62,9 +63,7 @@ struct ForkGate::Places {
   template <class Visit>
   static void forEach(Visit visit) {
     for (Places* each = &places_; each != nullptr; each = each->next.load(std::memory_order_acquire)) {
-      for (Place& place : each->all) {
-        if (visit(place)) return;
-      }
+      if (std::ranges::any_of(each->all, visit)) return;
     }
   }
 };
@@ -184,13 +183,19 @@ std::atomic<std::uint32_t>& ForkGate::beginCounting() noexcept {
   const int error = errno;
   currentThreadToken();
   ThreadState& self = currentThread;
-  Place* const place = registerHandlers() ? takePlace() : nullptr;
+  Place* place = nullptr;
+  if (registerHandlers()) {
+    // At the end of a thread, macOS frees its variables before it calls the destructors of keys, which may
+    // lock. The key still knows the thread's place then.
+    place = static_cast<Place*>(pthread_getspecific(forks_.end));
+    if (place == nullptr) place = takePlace();
+  }
   std::atomic<std::uint32_t>* count = &self.unseenLockCount;
   if (place != nullptr) count = &place->heldLocks;
   std::atomic<std::uint32_t>* known = nullptr;
   if (!self.lockCount.compare_exchange_strong(known, count)) {
     // A signal handler on this thread has taken a place meanwhile.
-    if (place != nullptr) place->isTaken.store(false, std::memory_order_release);
+    if (place != nullptr && known != count) place->isTaken.store(false, std::memory_order_release);
   } else if (place != nullptr && pthread_setspecific(forks_.end, place) != 0) {
     // Nobody would give the place back, so the thread counts elsewhere. Forks do not wait for this thread.
     giveBack(*place, &self.unseenLockCount);

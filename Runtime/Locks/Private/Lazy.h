@@ -57,7 +57,7 @@ class Lazy {
 
   LongLock lock_;
   std::atomic<bool> isMade_ = false;
-  alignas(T) std::byte storage_[sizeof(T)]{};  // NOLINT(modernize-avoid-c-arrays)
+  alignas(T) std::byte storage_[sizeof(T)]{};
 };
 
 }  // namespace rt

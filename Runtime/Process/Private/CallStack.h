@@ -19,6 +19,7 @@
 #include <vector>
 
 #include "Runtime/Objects/String.h"
+#include "Runtime/Process/Private/KeepFrame.h"
 
 namespace rt::CallStack {
 
@@ -30,12 +31,6 @@ namespace rt::CallStack {
 /// capture ends at a frame that cannot be unwound. A function that is inlined, or that has made a tail call,
 /// has no frame.
 [[gnu::noinline]] std::size_t capture(std::span<std::uint64_t> addresses) noexcept;
-
-/// Keeps the frame of a function that would otherwise end in a tail call. Call it after the function's last
-/// call.
-[[gnu::always_inline]] inline void keepFrame() noexcept {
-  asm volatile("" ::: "memory");  // NOLINT(hicpp-no-assembler): does nothing, and the compiler must keep it
-}
 
 /// Returns a line for each of `addresses`. It has a number, from 0, the image, the address, and the function
 /// with the distance from its start:

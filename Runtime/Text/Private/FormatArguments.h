@@ -6,13 +6,14 @@
 ///     template <class... Arguments>
 ///     void record(const char* format, const Arguments&... arguments) {
 ///       recordVariadic(sizeof...(Arguments), rt::kArgumentKinds<Arguments...>.data(), format,
-///                      rt::toVariadic(arguments)...);
+///                      rt::toVariadic(rt::toArgument(arguments))...);
 ///     }
 ///
 /// An object may be an `rt::String`, an `rt::Ref<T>`, or a pointer to a class or protocol. It is passed as
-/// `rt::Object*`. Other arguments may be any pointer, number, character or boolean, and any enumeration
-/// that converts to an integer. Other classes, such as std::string, do not compile: a format would print
-/// their internal bytes.
+/// `rt::Object*`. A value that has a description (Runtime/Text/Description.h), such as a std::string, is
+/// passed as the object of that. Other arguments may be any pointer, number, character or boolean, and any
+/// enumeration that converts to an integer. Other classes do not compile: a format would print their internal
+/// bytes.
 ///
 /// Not for: arguments whose types are known only at run time.
 
@@ -26,6 +27,7 @@
 #include "Runtime/Objects/Object.h"
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
+#include "Runtime/Text/Description.h"
 #include "Runtime/Text/Private/FormatDirective.h"
 
 namespace rt {
@@ -76,7 +78,7 @@ concept TextArgument =
 
 template <class T>
 consteval ArgumentTraits argumentTraits() {
-  if constexpr (ObjectArgument<T>) {
+  if constexpr (ObjectArgument<T> || Described<T>) {
     return {ArgumentKind::kObject, FormatArgument::kPointer};
   } else if constexpr (IntegerArgument<T>) {
     using Promoted = decltype(+T());
@@ -94,8 +96,8 @@ consteval ArgumentTraits argumentTraits() {
     return {ArgumentKind::kPointer, FormatArgument::kPointer, false, true};
   } else {
     static_assert(std::is_pointer_v<T>,
-                  "an argument of a format is an object, a number, a text that ends with NUL, or a pointer; "
-                  "for a std::string pass its c_str()");
+                  "an argument of a format is an object, a number, a text that ends with NUL, a pointer, or "
+                  "a value that has a description (Runtime/Text/Description.h)");
     return {ArgumentKind::kPointer, FormatArgument::kPointer};
   }
 }
@@ -110,6 +112,16 @@ inline constexpr ArgumentTraits kArgumentTraits = argumentTraits<std::decay_t<co
 template <class... Arguments>
 inline constexpr std::array<std::uint32_t, sizeof...(Arguments)> kArgumentKinds{
     static_cast<std::uint32_t>(detail::kArgumentTraits<Arguments>.kind)...};
+
+/// Returns the description of a value that has one, and every other argument itself.
+template <class T>
+constexpr decltype(auto) toArgument(const T& argument) {
+  if constexpr (detail::Described<T>) {
+    return describe(argument);
+  } else {
+    return (argument);
+  }
+}
 
 /// Returns `argument` in the form in which it is passed to a function with variable arguments.
 /// Ownership: an object is not retained. It must live until that function returns. Temporaries of the call's

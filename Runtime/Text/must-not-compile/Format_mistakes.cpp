@@ -11,7 +11,10 @@ const rt::Ref<rt::Number> number;
 const long wide = 0;
 const rt::String notLiteral = rt::String::fromUTF8("%d");
 
+struct Undescribed {};
+
 rt::String right[] = {
+    rt::format("%@", std::string("text")),
     rt::format("%@ %d %ld %s %p %g %ls %*d", number, 1, wide, "text", nullptr, 1.5, L"wide", 3, 4),
     rt::format("%2$d %1$@"_s, number, 2),
 };
@@ -41,12 +44,12 @@ rt::String wrong[] = {
     rt::format("%g", 1),
     rt::format("%Lg", 1.5),
     rt::format("%g", 1.5L),
-    rt::format("%s", "text"_s),
+    rt::format("%s", std::string("text")),
     rt::format("%ls", "text"),
     rt::format("%p", 1),
 #endif
 #ifdef NO_ARGUMENT
-    rt::format("%s", std::string("text")),
+    rt::format("%@", Undescribed()),
 #endif
 #ifdef NO_LITERAL
     rt::format(notLiteral, 1),

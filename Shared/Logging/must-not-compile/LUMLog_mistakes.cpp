@@ -8,7 +8,7 @@ const rt::String notLiteral = rt::String::fromUTF8("%d");
 
 void right(const rt::Ref<LUMLogMetadata>& metadata, const rt::Ref<rt::Number>& number) {
   LUMLogAt(LUMLogLevelInfo, "%@ %d", number, 1);
-  LUMLogAt(LUMLogLevelInfo, metadata, "%@ %d"_s, number, 1);
+  LUMLogAt(LUMLogLevelInfo, metadata, "%@ %d"_s, number, 1, LUMLogField("n", 1));
 }
 
 void wrong(const rt::Ref<LUMLogMetadata>& metadata, const rt::Ref<rt::Number>& number) {
@@ -17,6 +17,12 @@ void wrong(const rt::Ref<LUMLogMetadata>& metadata, const rt::Ref<rt::Number>& n
 #endif
 #ifdef TYPE
   LUMLogAt(LUMLogLevelInfo, metadata, "%@ %d"_s, number, "one");
+#endif
+#ifdef FIELD_FIRST
+  LUMLogAt(LUMLogLevelInfo, "%d"_s, LUMLogField("n", 1), 1);
+#endif
+#ifdef FIELD_VALUE
+  LUMLogAt(LUMLogLevelInfo, "text"_s, LUMLogField("n", static_cast<const void*>("")));
 #endif
 #ifdef NO_LITERAL
   LUMLogAt(LUMLogLevelInfo, notLiteral, 1);

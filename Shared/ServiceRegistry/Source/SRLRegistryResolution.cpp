@@ -126,10 +126,12 @@ rt::Ref<rt::Object> SRLRegistry::keptInstanceOf(const SRLImplementation& impleme
   return instance;
 }
 
-// Precondition: the caller retains the implementation.
-rt::Ref<rt::Object> SRLRegistry::instanceOf(SRLImplementation& implementation,
-                                            const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags,
-                                            rt::Ref<SRLMemoizingScope> scope) {
+// Precondition: the caller retains the implementation. Not inlined, since the code for a missing instance
+// slows down the requests that find one.
+[[gnu::noinline]] rt::Ref<rt::Object> SRLRegistry::instanceOf(SRLImplementation& implementation,
+                                                              const SRLAPIRegistrationData* api,
+                                                              const SRLScopeTagSet& tags,
+                                                              rt::Ref<SRLMemoizingScope> scope) {
   if (SRLPProfilingEnabled()) [[unlikely]]
     return measuredInstance(&implementation, api, tags);
   if (const SRLScopedFactory* scoped = implementation.scopedFactory())

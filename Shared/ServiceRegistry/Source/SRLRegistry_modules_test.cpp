@@ -246,7 +246,7 @@ TEST(SRLRegistrationDatasForAPI, CompareTheLengthBeforeTheBytes) {
 }
 
 TEST(SRLRegistrationDatasForAPI, AgreeWithALinearSearch) {
-  std::mt19937 random(20240229);  // NOLINT(cert-msc32-c,cert-msc51-cpp): the same at every run
+  std::mt19937 random(20240229);  // the same at every run
   const auto below = [&random](std::size_t limit) {
     return std::uniform_int_distribution<std::size_t>(0, limit - 1)(random);
   };

@@ -73,7 +73,6 @@ int inspect(dl_phdr_info* image, std::size_t /*size*/, void* /*context*/) {
   for (std::size_t i = 0; i < image->dlpi_phnum; ++i) {
     const ElfW(Phdr)& segment = image->dlpi_phdr[i];
     if (segment.p_type != PT_NOTE) continue;
-    // NOLINTNEXTLINE(performance-no-int-to-ptr): the system says so
     const auto* notes = reinterpret_cast<const std::byte*>(image->dlpi_addr + segment.p_vaddr);
     const ImageState* const state = stateIn(notes, notes + segment.p_memsz, segment.p_align == 8 ? 8 : 4);
     if (state != nullptr && !state->isAnnounced) return 1;

@@ -28,6 +28,7 @@ constexpr std::uint32_t kEvents = IN_CLOSE_WRITE | IN_CREATE | IN_DELETE | IN_MO
 
 }  // namespace
 
+// NOLINTNEXTLINE(modernize-pass-by-value): callers keep their path, so it is copied in any case
 SystemFileWatch::SystemFileWatch(const std::string& path)
     : path_(path), events_(inotify_init1(IN_CLOEXEC | IN_NONBLOCK)), wake_(eventfd(0, EFD_CLOEXEC)) {
   if (!events_) fail("inotify_init1");

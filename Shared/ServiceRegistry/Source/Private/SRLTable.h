@@ -170,7 +170,6 @@ class SRLTable {
     const std::size_t lastPlace_;
     const int shift_;
     // Not a vector, which checks each access against its size where assertions are on.
-    // NOLINTNEXTLINE(modernize-avoid-c-arrays)
     const std::unique_ptr<std::atomic<const Entry*>[]> places_;
     std::size_t count_ = 0;
     std::unique_ptr<const Index> replaced_;

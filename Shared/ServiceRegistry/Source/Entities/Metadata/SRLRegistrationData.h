@@ -41,7 +41,7 @@
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSet.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeType.h"
 
-// NOLINTBEGIN(bugprone-reserved-identifier,cert-dcl37-c,cert-dcl51-cpp): names that generated code uses
+// NOLINTBEGIN(bugprone-reserved-identifier): names that generated code uses
 
 /// How a record describes a type. The kind selects the member of the record's union.
 enum SRLInstanceTypeKind : std::uint8_t {
@@ -121,7 +121,7 @@ struct _SRLBindingRegistrationData {
   const SRLImplementationRegistrationData* const* implementations = nullptr;
 };
 
-// NOLINTEND(bugprone-reserved-identifier,cert-dcl37-c,cert-dcl51-cpp)
+// NOLINTEND(bugprone-reserved-identifier)
 
 // Generated code relies on this layout.
 static_assert(sizeof(void*) == 8);

@@ -77,7 +77,7 @@ TEST(SRLPSelectorSort, ReversesTheListIfAllAnswersAreOverZeroAndKeepsItIfNoneIs)
 
 TEST(SRLPSelectorSort, IsAStableSortForAnOrder) {
   using Pair = std::pair<int, int>;
-  std::mt19937 random(1);  // NOLINT(bugprone-random-generator-seed): the same every time
+  std::mt19937 random(1);  // the same every time
   for (std::size_t count = 0; count < 200; ++count) {
     std::vector<Pair> list;
     for (std::size_t i = 0; i < count; ++i)
@@ -107,7 +107,7 @@ TEST(SRLPSelectorSort, AsksAtMostAsOftenAsPromised) {
 }
 
 TEST(SRLPSelectorSort, KeepsEveryElementForRandomAnswers) {
-  std::mt19937_64 random(2);  // NOLINT(bugprone-random-generator-seed): the same every time
+  std::mt19937_64 random(2);  // the same every time
   for (int round = 0; round < 2000; ++round) {
     // The strings are on the heap, so that the sanitizers notice every access outside of the list.
     std::vector<std::string> list;

@@ -1,0 +1,75 @@
+#pragma once
+
+/// A named value that a message carries beside its text, so that loggers need not search the text for it.
+///
+///     LUMLogAt(LUMLogLevelInfo, "%@ is done"_s, name, LUMLogField("user", "ann"), LUMLogField("bytes", 42));
+///
+/// Fields come after the arguments of the format. They become properties of the message's metadata
+/// (LUMLogMetadata.h), beside those of the metadata that the caller gives. A field replaces a property of the
+/// same name.
+///
+/// A value is an object, a text, a number, a boolean, or has a description (Runtime/Text/Description.h). A
+/// number stays a number, and an object stays itself. All others become strings.
+///
+/// Threads: used by the thread that logs, within the call.
+///
+/// Not for: keeping. A field refers to its value and does not own it.
+
+#include <cstdint>
+#include <string_view>
+#include <type_traits>
+
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
+#include "Runtime/Objects/String.h"
+#include "Runtime/Text/Private/FormatArguments.h"
+#include "Runtime/Values/Number.h"
+
+template <class T>
+class LUMLogField {
+ public:
+  /// Makes a field. `name` is not empty, valid UTF-8, and lives as long as the program, like a literal.
+  /// `value` outlives the field.
+  constexpr LUMLogField(std::string_view name, const T& value) noexcept : name_(name), value_(value) {}
+
+  LUMLogField(const LUMLogField&) = delete;
+  LUMLogField& operator=(const LUMLogField&) = delete;
+
+  rt::String name() const { return rt::String::overStatic(name_); }
+
+  /// Returns the value as an object, or null for a null object or text. Throws std::bad_alloc, and what its
+  /// description throws.
+  rt::Ref<rt::Object> value() const {
+    using Value = std::decay_t<const T>;
+    constexpr rt::ArgumentKind kKind = rt::detail::kArgumentTraits<T>.kind;
+    static_assert(kKind != rt::ArgumentKind::kPointer && kKind != rt::ArgumentKind::kLongDouble,
+                  "the value of a field is an object, a text, a number, or has a description "
+                  "(Runtime/Text/Description.h)");
+    if constexpr (kKind == rt::ArgumentKind::kObject) {
+      return {rt::toVariadic(rt::toArgument(value_))};
+    } else if constexpr (kKind == rt::ArgumentKind::kText) {
+      const char* const text = value_;
+      return text != nullptr ? rt::String::fromUTF8Repaired(text) : rt::String();
+    } else if constexpr (std::is_enum_v<Value>) {
+      return rt::Number::of(static_cast<std::int64_t>(value_));
+    } else {
+      return rt::Number::of(value_);
+    }
+  }
+
+ private:
+  const std::string_view name_;
+  const T& value_;
+};
+
+template <class T>
+LUMLogField(std::string_view, const T&) -> LUMLogField<T>;
+
+namespace LUMLogDetail {
+
+template <class T>
+inline constexpr bool isField = false;
+template <class T>
+inline constexpr bool isField<LUMLogField<T>> = true;
+
+}  // namespace LUMLogDetail

@@ -162,7 +162,7 @@ LUMLogLevels::~LUMLogLevels() = default;
 rt::String LUMLogLevels::setText(const rt::String& text) {
   rt::String problem;
   rt::Ref<Table> table = text ? rt::make<Table>(text, "the text", problem) : nullptr;
-  if (!problem) setTable(chosen_, std::move(table));
+  if (!problem) setTable(&LUMLogLevels::chosen_, std::move(table));
   return problem;
 }
 
@@ -172,14 +172,14 @@ void LUMLogLevels::setOuterText(const rt::String& text) {
   if (problem) {
     LUMLogAt(LUMLogLevelError, "%@"_s, problem);
   } else {
-    setTable(outer_, std::move(table));
+    setTable(&LUMLogLevels::outer_, std::move(table));
   }
 }
 
-void LUMLogLevels::setTable(rt::Ref<Table>& place, rt::Ref<Table> table) {
+void LUMLogLevels::setTable(rt::Ref<Table> LUMLogLevels::*place, rt::Ref<Table> table) {
   {
     const rt::LockGuard guard(lock_);
-    place = std::move(table);
+    this->*place = std::move(table);
     current_.exchange(chosen_ ? chosen_ : outer_);
   }
   LUMLogInterestChanged();

@@ -66,7 +66,7 @@ class RT_VISIBLE LUMLogLevels final
 
   // Sets the text that counts unless `setText` has set another. Logs what is wrong with it.
   void setOuterText(const rt::String& text);
-  void setTable(rt::Ref<Table>& place, rt::Ref<Table> table);
+  void setTable(rt::Ref<Table> LUMLogLevels::*place, rt::Ref<Table> table);
 
   // The one of these two that counts, to be read without a lock.
   rt::AtomicRef<Table> current_;

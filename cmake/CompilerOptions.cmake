@@ -22,6 +22,13 @@ target_compile_options(compiler-options INTERFACE
 target_compile_options(compiler-options INTERFACE
   $<$<CXX_COMPILER_ID:GNU>:-fno-semantic-interposition>)
 
+# What is built for another machine does not name the folders of this one, so equal sources make equal packages. The C++
+# library writes the names of its headers into the debugging information.
+if(CMAKE_CROSSCOMPILING)
+  target_compile_options(compiler-options INTERFACE
+    "-fdebug-prefix-map=${PROJECT_SOURCE_DIR}=." "-fmacro-prefix-map=${PROJECT_SOURCE_DIR}/cmake=./cmake")
+endif()
+
 # These options put each function and variable into its own section. A program's linker can then drop unused ones
 # (`--gc-sections`).
 target_compile_options(compiler-options INTERFACE -ffunction-sections -fdata-sections)

@@ -11,6 +11,10 @@
 #include <stdexcept>
 #include <system_error>
 
+#ifdef COMMAND_IS_FOR_MACOS
+#include "tests/macos/runner/NotShown.h"
+#endif
+
 namespace fs = std::filesystem;
 
 namespace {
@@ -164,6 +168,9 @@ void enterPrivateRoot(const char* command, bool asOrdinaryUser) {
 }  // namespace
 
 int main(int argumentCount, char** arguments) {
+#ifdef COMMAND_IS_FOR_MACOS
+  if (skipCasesNotShown(arguments[0], argumentCount, arguments)) return 0;
+#endif
   testing::InitGoogleTest(&argumentCount, arguments);
   if (testing::GTEST_FLAG(list_tests)) return RUN_ALL_TESTS();
 

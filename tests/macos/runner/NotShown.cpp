@@ -50,8 +50,8 @@ bool skipCasesNotShown(const std::string& program, int count, char** arguments) 
   std::string excluded;
   for (const Case& each : cases) {
     if (filter == each.name) {
-      std::printf("tests/macos/NotShown.txt: Skipped\n%s\n\n[  SKIPPED ] %s\n", each.reason.c_str(),
-                  each.name.c_str());
+      std::printf("Note: Google Test filter = %s\n%s: Skipped\n%s\n\n[  SKIPPED ] %s\n", each.name.c_str(),
+                  NOT_SHOWN, each.reason.c_str(), each.name.c_str());
       return true;
     }
     excluded += (excluded.empty() ? "-" : ":") + each.name;

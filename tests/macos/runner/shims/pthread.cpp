@@ -24,14 +24,14 @@ namespace {
 // An object of macOS: a signature and room for an object of the C library.
 template <class Linux, std::size_t Size>
 struct Darwin {
+  static_assert(sizeof(std::int64_t) + sizeof(Linux) <= Size);
   std::int64_t signature;
   Linux object;
-  std::array<char, Size - sizeof(std::int64_t) - sizeof(Linux)> unused;
 };
 
 using Mutex = Darwin<pthread_mutex_t, 64>;
 using ReadWriteLock = Darwin<pthread_rwlock_t, 200>;
-using Attributes = Darwin<pthread_attr_t, 64 + 1>;
+using Attributes = Darwin<pthread_attr_t, 64>;
 using Once = Darwin<pthread_once_t, 16>;
 using MutexAttributes = Darwin<pthread_mutexattr_t, 16>;
 using ConditionAttributes = Darwin<pthread_condattr_t, 16>;
@@ -181,7 +181,6 @@ int callOnce(Once* once, void (*function)()) {
 
 // ---- Threads ----
 
-// Attributes have 64 bytes, and the C library's have 56.
 pthread_attr_t* host(Attributes* attributes) {
   return host(attributes, kInitialised);
 }
@@ -205,14 +204,17 @@ int setStackSize(Attributes* attributes, std::size_t size) {
   return pthread_attr_setstacksize(host(attributes), size);
 }
 
-// A scheduling class is advice.
-int setClass(Attributes* attributes, unsigned, int) {
-  host(attributes);
+// A thread remembers its scheduling class, which Linux does not have.
+constexpr unsigned kDefaultClass = 0x15;
+thread_local unsigned ownClass = kDefaultClass;
+
+int setOwnClass(unsigned schedulingClass, int) {
+  ownClass = schedulingClass;
   return 0;
 }
 
-int setOwnClass(unsigned, int) {
-  return 0;
+unsigned getOwnClass() {
+  return ownClass;
 }
 
 int create(pthread_t* thread, Attributes* attributes, void* (*function)(void*), void* argument) {
@@ -334,8 +336,8 @@ shims::Table shims::pthread() {
       shim("pthread_attr_destroy", &destroyAttributes),
       shim("pthread_attr_setdetachstate", &setDetached),
       shim("pthread_attr_setstacksize", &setStackSize),
-      shim("pthread_attr_set_qos_class_np", &setClass),
       shim("pthread_set_qos_class_self_np", &setOwnClass),
+      shim("qos_class_self", &getOwnClass),
       shim("pthread_create", &create),
       shim("pthread_join", &join),
       shim("pthread_detach", errorCall<&::pthread_detach>),

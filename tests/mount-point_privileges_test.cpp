@@ -149,7 +149,7 @@ TEST_F(MountPointStoppedTest, LetsItsCallerStopItButNotTraceIt) {
             attached | readMemory | openedMemory | sawProgram)
       << "the caller's own program";
 
-  const StoppedProcess stopped(SYS_mkdir, {kCommand, "a"}, as(kCaller));
+  const StoppedProcess stopped(kIsForMacOS ? SYS_mkdirat : SYS_mkdir, {kCommand, "a"}, as(kCaller));
   EXPECT_EQ(inProcessOf(kCaller, [&] { return accessTo(stopped.identifier()); }), 0);
   EXPECT_EQ(inProcessOf(kCaller, [&] { return kill(stopped.identifier(), SIGSTOP); }), 0);
 }

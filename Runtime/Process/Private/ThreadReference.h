@@ -32,9 +32,11 @@ class ThreadReference {
   /// Replaces the calling thread's object by `object`, which may be null, and releases the previous one.
   /// Throws std::bad_alloc at a thread's first object, without a change.
   static void set(Ref<T> object) {
+    if (!object && object_ == nullptr) return;
+    const pthread_key_t end = endOfThread();
     // `giveUp` has already run on this thread, so nothing would release the object later.
-    if (hasEnded_) return;
-    if (object || object_ != nullptr) giveUpAtEnd(object.get());
+    if (pthread_getspecific(end) == &hasEnded_) return;
+    if (pthread_setspecific(end, object.get()) != 0) throw std::bad_alloc();
     Ref<T> previous = Ref<T>::adopt(object_);
     object_ = object.detach();
   }
@@ -43,32 +45,34 @@ class ThreadReference {
   // Uses a key of the thread library, which reports a lack of memory. The destructor of a thread_local
   // variable would need memory too, and the C library ends the program if it gets none.
   //
-  // The key's value is the object itself. macOS frees a thread's variables before it calls the destructors of
-  // later keys, and a variable that is used then has its initial value again.
-  static void giveUpAtEnd(T* object) {
+  // The key's value is the object itself or, when the thread has released it, the address of `hasEnded_`.
+  // macOS frees a thread's variables before it calls the destructors of later keys, and a variable that is
+  // used then has its initial value again.
+  static pthread_key_t endOfThread() {
     static constinit Lazy<pthread_key_t> shared;
-    const pthread_key_t key = shared.get([] {
+    return shared.get([] {
       pthread_key_t made{};
       if (pthread_key_create(&made, giveUp) != 0) throw std::bad_alloc();
       return made;
     });
-    if (pthread_setspecific(key, object) != 0) throw std::bad_alloc();
   }
 
   static void giveUp(void* object) noexcept {
-    hasEnded_ = true;
+    // The system calls this function for the new value, too, for a few rounds.
+    pthread_setspecific(endOfThread(), &hasEnded_);
+    if (object == &hasEnded_) return;
     object_ = nullptr;
     Ref<T>::adopt(static_cast<T*>(object));
   }
 
   static constinit thread_local T* object_;
-  static constinit thread_local bool hasEnded_;
+  static constinit char hasEnded_;
 };
 
 template <class T, class Tag>
 constinit thread_local T* ThreadReference<T, Tag>::object_ = nullptr;
 
 template <class T, class Tag>
-constinit thread_local bool ThreadReference<T, Tag>::hasEnded_ = false;
+constinit char ThreadReference<T, Tag>::hasEnded_ = 0;
 
 }  // namespace rt

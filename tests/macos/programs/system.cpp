@@ -186,6 +186,14 @@ void testQueue() {
   check(kevent(queue, nullptr, 0, &event, 1, nullptr) == 1 && event.filter == EVFILT_USER,
         "the event arrives");
   close(folder);
+
+  mkdir("removed", 0700);
+  const int removed = open("removed", O_EVTONLY | O_CLOEXEC);
+  EV_SET(&change, static_cast<uintptr_t>(removed), EVFILT_VNODE, EV_ADD | EV_CLEAR, NOTE_DELETE, 0, nullptr);
+  check(kevent(queue, &change, 1, nullptr, 0, nullptr) == 0, "another folder is watched");
+  rmdir("removed");
+  check(kevent(queue, nullptr, 0, &event, 1, nullptr) == 1 && event.fflags == NOTE_DELETE, "it is removed");
+  close(removed);
   close(queue);
 }
 

@@ -32,6 +32,11 @@ class MountPointMacAttackTest : public MountPointStoppedTest {
     return "";
   }
 
+  static void expectRoots(const std::string& folder) {
+    EXPECT_EQ(statusOf("/Volumes/" + folder).st_uid, 0U);
+    EXPECT_EQ(statusOf("/Volumes/" + folder).st_mode & 07777U, 0700U);
+  }
+
   static void expectNoRootsFolder() { EXPECT_EQ(rootsFolder(), ""); }
 };
 
@@ -40,7 +45,7 @@ TEST_F(MountPointMacAttackTest, CallerDoesNotGetWhatIsPutInPlaceOfRootsFolder) {
   const ProcessResult result = attack(SYS_mkdirat, [&] {
     name = rootsFolder();
     ASSERT_NE(name, "");
-    expectOwner("/Volumes/" + name, {0, 0});
+    expectRoots(name);
     expectSuccess(runAs(kCaller, {name, "--remove"}));
     expectSuccess(runAs(kOther, {name}));
   });
@@ -83,10 +88,8 @@ TEST_F(MountPointMacAttackTest, CallerDoesNotGetTheTargetOfALink) {
 
 TEST_F(MountPointMacAttackTest, OthersCannotEnterRootsFolder) {
   attack(SYS_fchown, [] {
-    const std::string folder = "/Volumes/" + rootsFolder();
-    EXPECT_EQ(statusOf(folder).st_mode & 07777U, 0700U);
-    expectOwner(folder, {0, 0});
-    EXPECT_EQ(openingFailure(kCaller, folder), EACCES);
+    expectRoots(rootsFolder());
+    EXPECT_EQ(openingFailure(kCaller, "/Volumes/" + rootsFolder()), EACCES);
     EXPECT_NE(runAs(kCaller, {rootsFolder(), "--remove"}).exitStatus, 0);
   });
   expectOwner("/Volumes/a", kCaller);
@@ -98,7 +101,7 @@ TEST_F(MountPointMacAttackTest, LeavesRootsFolderIfItIsKilled) {
     const StoppedProcess killed(SYS_fchown, {kCommand, "a"}, as(kCaller));
   }
   EXPECT_FALSE(fs::exists("/Volumes/a"));
-  expectOwner("/Volumes/" + rootsFolder(), {0, 0});
+  expectRoots(rootsFolder());
 }
 
 TEST_F(MountPointMacAttackTest, HasItsCallersIdentityWhenItWritesAMessage) {

@@ -8,6 +8,7 @@
 #include <sys/stat.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <array>
 #include <cstdint>
 #include <cstring>
@@ -47,8 +48,10 @@ constexpr std::uint32_t kAttributes = 0x8;
 constexpr std::uint32_t kLinks = 0x10;
 constexpr std::uint32_t kRenamed = 0x20;
 
+// inotify does not tell that a folder was removed while it is open, so the folder above is watched, too.
 struct Watch {
   int number;  // inotify's
+  int above;   // that of the folder above, or -1
   std::uint32_t wanted;
   void* context;
 };
@@ -96,7 +99,11 @@ int addWatch(int queueFile, Queue& queue, const Event& change) {
                                   IN_DELETE | IN_MOVED_FROM | IN_MOVED_TO;
   const int number = inotify_add_watch(queueFile, link.c_str(), kMask);
   if (number < 0) return converted(number);
-  queue.watches[file] = {.number = number, .wanted = change.filterFlags, .context = change.context};
+  struct stat status{};
+  const bool isFolder = fstat(file, &status) == 0 && S_ISDIR(status.st_mode);
+  const int above = isFolder ? inotify_add_watch(queueFile, (link + "/..").c_str(), kMask) : -1;
+  queue.watches[file] = {
+      .number = number, .above = above, .wanted = change.filterFlags, .context = change.context};
   return 0;
 }
 
@@ -113,17 +120,21 @@ int apply(int queueFile, Queue& queue, const Event& change) {
   return 0;
 }
 
-// What an event of inotify is on macOS, where a file without a name is a deleted one.
-std::uint32_t darwinFlags(std::uint32_t mask, int file) {
+bool isRemoved(int file) {
+  struct stat status{};
+  return fstat(file, &status) == 0 && status.st_nlink == 0;
+}
+
+// What an event of inotify is on macOS, for a watched file.
+std::uint32_t darwinFlags(const inotify_event& event, const Watch& watch, int file) {
+  if (event.wd == watch.above && (event.mask & IN_DELETE) != 0 && isRemoved(file)) return kDeleted;
+  if (event.wd != watch.number) return 0;
   std::uint32_t flags = 0;
-  if ((mask & IN_MODIFY) != 0) flags |= kWritten | kExtended;
-  if ((mask & (IN_CREATE | IN_DELETE | IN_MOVED_FROM | IN_MOVED_TO)) != 0) flags |= kWritten;
-  if ((mask & IN_DELETE_SELF) != 0) flags |= kDeleted;
-  if ((mask & IN_MOVE_SELF) != 0) flags |= kRenamed;
-  if ((mask & IN_ATTRIB) != 0) {
-    struct stat status{};
-    flags |= fstat(file, &status) == 0 && status.st_nlink == 0 ? kDeleted : kAttributes;
-  }
+  if ((event.mask & IN_MODIFY) != 0) flags |= kWritten | kExtended;
+  if ((event.mask & (IN_CREATE | IN_DELETE | IN_MOVED_FROM | IN_MOVED_TO)) != 0) flags |= kWritten;
+  if ((event.mask & IN_DELETE_SELF) != 0) flags |= kDeleted;
+  if ((event.mask & IN_MOVE_SELF) != 0) flags |= kRenamed;
+  if ((event.mask & IN_ATTRIB) != 0) flags |= isRemoved(file) ? kDeleted : kAttributes;
   return flags;
 }
 
@@ -137,8 +148,8 @@ int collect(int queueFile, Queue& queue) {
     std::memcpy(&event, buffer.data() + at, sizeof event);
     at += static_cast<ssize_t>(sizeof event + event.len);
     for (const auto& [file, watch] : queue.watches) {
-      const std::uint32_t flags = darwinFlags(event.mask, file) & watch.wanted;
-      if (watch.number != event.wd || flags == 0) continue;
+      const std::uint32_t flags = darwinFlags(event, watch, file) & watch.wanted;
+      if (flags == 0) continue;
       Event& darwin = queue.events[file];
       darwin.identifier = static_cast<std::uint64_t>(file);
       darwin.filter = kFile;
@@ -202,13 +213,16 @@ void KernelQueue::closing(int file) {
   for (auto& [queueFile, queue] : queues) {
     const auto watch = queue.watches.find(file);
     if (watch == queue.watches.end()) continue;
-    const int number = watch->second.number;
+    const Watch gone = watch->second;
     queue.watches.erase(watch);
     queue.events.erase(file);
     // inotify has one watch for a file, whatever the number of descriptors.
-    bool isShared = false;
-    for (const auto& [other, otherWatch] : queue.watches) isShared |= otherWatch.number == number;
-    if (!isShared) inotify_rm_watch(queueFile, number);
+    for (const int number : {gone.number, gone.above}) {
+      const bool isShared = std::ranges::any_of(queue.watches, [&](const auto& other) {
+        return other.second.number == number || other.second.above == number;
+      });
+      if (number >= 0 && !isShared) inotify_rm_watch(queueFile, number);
+    }
   }
 }
 

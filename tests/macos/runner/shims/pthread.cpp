@@ -224,11 +224,11 @@ int create(pthread_t* thread, Attributes* attributes, void* (*function)(void*), 
 
 thread_local pid_t ownThread = 0;
 
+// Registered before the handlers of the program, which ask for the number in the child of a fork.
+[[maybe_unused]] const int registered = pthread_atfork(nullptr, nullptr, [] { ownThread = 0; });
+
 pid_t ownThreadNumber() {
-  if (ownThread == 0) {
-    [[maybe_unused]] static const int registered = pthread_atfork(nullptr, nullptr, [] { ownThread = 0; });
-    ownThread = static_cast<pid_t>(syscall(SYS_gettid));
-  }
+  if (ownThread == 0) ownThread = static_cast<pid_t>(syscall(SYS_gettid));
   return ownThread;
 }
 

@@ -66,17 +66,19 @@ struct Queue {
 std::map<int, Queue> queues;
 std::mutex lock;
 
+// Queues are not inherited by the child of a fork. A handler of the program may wait for a thread that uses a
+// queue, so this one is registered before all of them, and is called after them.
+[[maybe_unused]] const int registered = pthread_atfork([] { lock.lock(); }, [] { lock.unlock(); },
+                                                       [] {
+                                                         for (const auto& [file, queue] : queues) {
+                                                           close(file);
+                                                           close(queue.user);
+                                                         }
+                                                         queues.clear();
+                                                         lock.unlock();
+                                                       });
+
 int makeQueue() {
-  // Queues are not inherited by the child of a fork.
-  [[maybe_unused]] static const int registered = pthread_atfork([] { lock.lock(); }, [] { lock.unlock(); },
-                                                                [] {
-                                                                  for (const auto& [file, queue] : queues) {
-                                                                    close(file);
-                                                                    close(queue.user);
-                                                                  }
-                                                                  queues.clear();
-                                                                  lock.unlock();
-                                                                });
   const int file = inotify_init1(IN_NONBLOCK);
   if (file < 0) return converted(file);
   const int user = eventfd(0, EFD_NONBLOCK | EFD_CLOEXEC);

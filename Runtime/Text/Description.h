@@ -103,6 +103,17 @@ concept RangeLike = std::is_class_v<T> && !std::same_as<T, String> && requires(c
 };
 
 template <class T>
+struct ElementOfRange {
+  using Type = std::remove_cvref_t<decltype(*std::declval<const T&>().begin())>;
+};
+// The iterators of std::vector<bool> may give out objects that stand for the elements.
+template <class T>
+  requires std::same_as<typename T::value_type, bool>
+struct ElementOfRange<T> {
+  using Type = bool;
+};
+
+template <class T>
 constexpr bool isDescribed();
 
 /// A type that "%@" takes and that is no object. (Objects may have `begin`, too.)
@@ -126,7 +137,7 @@ constexpr bool isDescribed() {
     return DescribedElement<std::remove_cvref_t<decltype(T::first)>> &&
            DescribedElement<std::remove_cvref_t<decltype(T::second)>>;
   } else if constexpr (RangeLike<T>) {
-    return DescribedElement<std::remove_cvref_t<decltype(*std::declval<const T&>().begin())>>;
+    return DescribedElement<typename ElementOfRange<T>::Type>;
   } else {
     return false;
   }
@@ -175,7 +186,7 @@ void appendRange(StringBuilder& builder, const T& range) {
   std::string_view separator = "[";
   for (const auto& element : range) {
     builder.append(separator);
-    appendDescription(builder, static_cast<const std::remove_cvref_t<decltype(*range.begin())>&>(element));
+    appendDescription(builder, static_cast<const typename ElementOfRange<T>::Type&>(element));
     separator = ", ";
   }
   builder.append(separator == "[" ? std::string_view("[]") : std::string_view("]"));

@@ -1,14 +1,14 @@
 #include "Runtime/Defaults/UserDefaults.h"
 
-#include <locale.h>
-#include <stdlib.h>
 #if __has_include(<xlocale.h>)
 #include <xlocale.h>
 #endif
 
 #include <algorithm>
 #include <array>
+#include <clocale>
 #include <cmath>
+#include <cstdlib>
 #include <optional>
 #include <string>
 #include <utility>
@@ -31,10 +31,10 @@ bool isTrueWord(std::string_view text) {
 }
 
 // The locale in which numbers are written the same way everywhere. It is never freed.
-locale_t standardLocale() {
-  static constinit Lazy<locale_t> locale;
-  return locale.get([] { return newlocale(LC_ALL_MASK, "C", nullptr); });
-}
+struct StandardLocale {
+  locale_t locale = newlocale(LC_ALL_MASK, "C", nullptr);
+};
+constinit Lazy<StandardLocale> standardLocale;
 
 bool isNumberOtherThan0(std::string_view text) {
   // The function below also takes leading spaces, hexadecimal digits, "inf" and "nan".
@@ -42,7 +42,8 @@ bool isNumberOtherThan0(std::string_view text) {
   // `std::from_chars` would do without a copy, but macOS has it for real numbers since version 26 only.
   const std::string number(text);
   char* end = nullptr;
-  const double value = strtod_l(number.c_str(), &end, standardLocale());
+  const double value =
+      strtod_l(number.c_str(), &end, standardLocale.get([] { return StandardLocale(); }).locale);
   return end == number.c_str() + number.size() && value != 0 && std::isfinite(value);
 }
 

@@ -68,6 +68,26 @@ TEST_F(UserDefaultsOfOthers, NotifyObserversEvenIfAReadCameFirst) {
   }
 }
 
+// On macOS, each watched file needs a descriptor. Each change used to leave one open.
+TEST_F(UserDefaultsOfOthers, KeepNoDescriptorOpenForAnEarlierChange) {
+  constexpr int kChanges = 40;
+  const auto firstFreeDescriptor = [] {
+    const int descriptor = open("/dev/null", O_RDONLY | O_CLOEXEC);
+    close(descriptor);
+    return descriptor;
+  };
+  const auto defaults = this->defaults();
+  const auto observation = observe(defaults);
+  const int before = firstFreeDescriptor();
+  for (int i = 0; i < kChanges; ++i) {
+    const std::string value = std::to_string(i);
+    write(path(), "key = " + value);
+    await(rt::String::fromUTF8(value));
+  }
+  // The thread that watches may be at work.
+  EXPECT_LT(firstFreeDescriptor(), before + kChanges / 2);
+}
+
 TEST_F(UserDefaultsOfOthers, NotifyObserversEvenIfTheFolderWasMissing) {
   const fs::path path = folder_ / "a" / "b" / "c" / "defaults.conf";
   const auto defaults = defaultsAt(path);

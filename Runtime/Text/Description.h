@@ -174,7 +174,8 @@ template <class T>
 void appendTime(StringBuilder& builder, const T& time) {
   const auto duration = time.time_since_epoch();
   using Duration = std::remove_cv_t<decltype(duration)>;
-  if constexpr (requires { T::clock::to_time_t(time); } && std::integral<typename Duration::rep>) {
+  if constexpr (requires { T::clock::to_time_t(typename T::clock::time_point()); } &&
+                std::integral<typename Duration::rep>) {
     appendSystemTime(builder, duration.count(), Duration::period::num, Duration::period::den);
   } else {
     appendDescription(builder, duration);

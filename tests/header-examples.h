@@ -6,6 +6,7 @@
 
 #include <fcntl.h>
 #include <poll.h>
+#include <unistd.h>
 
 #include <array>
 #include <atomic>

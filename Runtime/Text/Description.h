@@ -172,10 +172,11 @@ void appendNumber(StringBuilder& builder, T value) {
 
 template <class T>
 void appendTime(StringBuilder& builder, const T& time) {
+  constexpr std::int64_t kNanoseconds = 1'000'000'000;
   const auto duration = time.time_since_epoch();
   using Duration = std::remove_cv_t<decltype(duration)>;
   if constexpr (requires { T::clock::to_time_t(typename T::clock::time_point()); } &&
-                std::integral<typename Duration::rep>) {
+                std::integral<typename Duration::rep> && kNanoseconds % Duration::period::den == 0) {
     appendSystemTime(builder, duration.count(), Duration::period::num, Duration::period::den);
   } else {
     appendDescription(builder, duration);

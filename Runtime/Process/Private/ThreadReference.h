@@ -34,10 +34,11 @@ class ThreadReference {
   static void set(Ref<T> object) {
     if (!object && object_ == nullptr) return;
     const pthread_key_t end = endOfThread();
+    void* const known = pthread_getspecific(end);
     // `giveUp` has already run on this thread, so nothing would release the object later.
-    if (pthread_getspecific(end) == &hasEnded_) return;
+    if (known == &hasEnded_) return;
     if (pthread_setspecific(end, object.get()) != 0) throw std::bad_alloc();
-    Ref<T> previous = Ref<T>::adopt(object_);
+    Ref<T> previous = Ref<T>::adopt(static_cast<T*>(known));
     object_ = object.detach();
   }
 

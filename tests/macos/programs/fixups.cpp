@@ -10,7 +10,8 @@
 
 extern "C" [[gnu::weak]] int noImageHasThisFunction();
 
-namespace {
+// Other files could change these, so the compiler has to read them.
+namespace places {
 
 int own = 20;
 
@@ -19,7 +20,7 @@ struct Gap {
   const int* pointer;
   std::uint64_t number;
 };
-const int* const volatile neighbours[] = {&own, &own, &own, &own, &own, &own, &own, &own, &own, &own,
+const int* volatile neighbours[] = {&own, &own, &own, &own, &own, &own, &own, &own, &own, &own,
                                           &own, &own, &own, &own, &own, &own, &own, &own, &own, &own};
 Gap gaps[] = {{&own, 1}, {&own, 2}, {&own, 3}, {&own, 4}, {&own, 5}, {&own, 6}};
 struct Page {
@@ -35,17 +36,19 @@ struct Far {
 Far farApart[2] = {{&own, {}, &own}, {&own, {}, &own}};
 
 // Pointers into the library, with no addend, and with such that fit into 8 and 32 bits, and below zero.
-int* const volatile toLibrary = libraryNumbers;
-int* const volatile toLibraryNear = libraryNumbers + 3;
-int* const volatile toLibraryFar = libraryNumbers + 150'000;
-int (*const volatile toFunction)(int) = &libraryFunction;
-int* const volatile beforeLibrary = libraryNumbers - 2;
+int* volatile toLibrary = libraryNumbers;
+int* volatile toLibraryNear = libraryNumbers + 3;
+int* volatile toLibraryFar = libraryNumbers + 150'000;
+int (*volatile toFunction)(int) = &libraryFunction;
+int* volatile beforeLibrary = libraryNumbers - 2;
 
 // Pointers to weak definitions.
-int* const volatile toShared = sharedVariable;
-int* const volatile toSharedWithAddend = sharedVariable + 2;
+int* volatile toShared = sharedVariable;
+int* volatile toSharedWithAddend = sharedVariable + 2;
 
-}  // namespace
+}  // namespace places
+
+using namespace places;
 
 int main() {
   bool areNeighboursRight = true;

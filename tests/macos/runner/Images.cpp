@@ -42,7 +42,7 @@ std::array<std::atomic<Loaded*>, Images::kMost> images{};
 std::atomic<std::size_t> imageCount = 0;
 // The system's own loader runs initialisers under such a lock.
 std::recursive_mutex loading;
-std::vector<void (*)(const void*, std::intptr_t)> beforeUnload;
+auto& beforeUnload = *new std::vector<void (*)(const void*, std::intptr_t)>;
 // The names that no image and no shim has, with the image that imports them.
 std::set<std::string> unknownNames;
 

@@ -18,8 +18,8 @@ constexpr shims::Table (*kTables[])() = {
 }  // namespace
 
 const void* shimNamed(std::string_view name) {
-  static const auto all = [] {
-    std::unordered_map<std::string_view, const void*> map;
+  static const auto& all = []() -> auto& {
+    auto& map = *new std::unordered_map<std::string_view, const void*>;
     for (const auto table : kTables) {
       for (const Shim& each : table()) {
         if (!map.emplace(each.name, each.address).second) {

@@ -21,8 +21,8 @@ struct Work {
 std::array<char, 64> mainQueue{};
 
 std::mutex lock;
-std::condition_variable arrival;
-std::deque<Work> works;
+std::condition_variable& arrival = *new std::condition_variable;
+std::deque<Work>& works = *new std::deque<Work>;
 bool isInChild = false;
 
 void enqueue(const void* queue, void* argument, void (*function)(void*)) {

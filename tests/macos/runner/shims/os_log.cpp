@@ -29,7 +29,7 @@ Log defaultLog;
 
 Log* create(const char* subsystem, const char* category) {
   static std::mutex lock;
-  static std::map<std::pair<std::string, std::string>, Log> logs;
+  static auto& logs = *new std::map<std::pair<std::string, std::string>, Log>;
   const std::lock_guard guard(lock);
   Log& log = logs[{subsystem, category}];
   log = {.subsystem = subsystem, .category = category};

@@ -63,7 +63,8 @@ struct Queue {
   std::map<int, Event> events;
 };
 
-std::map<int, Queue> queues;
+// Never destroyed, since threads may wait for events while the process ends.
+std::map<int, Queue>& queues = *new std::map<int, Queue>;
 std::mutex lock;
 
 // Queues are not inherited by the child of a fork. A handler of the program may wait for a thread that uses a

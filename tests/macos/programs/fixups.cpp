@@ -21,7 +21,7 @@ struct Gap {
   std::uint64_t number;
 };
 const int* volatile neighbours[] = {&own, &own, &own, &own, &own, &own, &own, &own, &own, &own,
-                                          &own, &own, &own, &own, &own, &own, &own, &own, &own, &own};
+                                    &own, &own, &own, &own, &own, &own, &own, &own, &own, &own};
 Gap gaps[] = {{&own, 1}, {&own, 2}, {&own, 3}, {&own, 4}, {&own, 5}, {&own, 6}};
 struct Page {
   const int* pointer;

@@ -124,8 +124,9 @@ TEST(Description, OfATime) {
   EXPECT_EQ(text(Halves(Halves::duration(-1))), "1969-12-31T23:59:58.5Z");
   using Quarters = std::chrono::time_point<system_clock, duration<std::int64_t, std::ratio<1, 4>>>;
   EXPECT_EQ(text(Quarters(Quarters::duration(5))), "1970-01-01T00:00:01.25Z");
+  // The system's clock cannot count these.
   using Thirtieths = std::chrono::time_point<system_clock, duration<std::int64_t, std::ratio<1, 30>>>;
-  EXPECT_EQ(text(Thirtieths(Thirtieths::duration(20))), "1970-01-01T00:00:00.666666666Z");
+  EXPECT_EQ(text(Thirtieths(Thirtieths::duration(20))), "20[1/30]s");
   using Years = std::chrono::time_point<system_clock, duration<std::int64_t, std::ratio<31'556'952>>>;
   EXPECT_EQ(text(Years(Years::duration::max())), "9223372036854775807[31556952]s");
 }

@@ -17,6 +17,7 @@
 namespace {
 
 namespace fs = std::filesystem;
+using testing::AllOf;
 using testing::HasSubstr;
 
 // Each test runs the programs whose fixups are opcodes, and those whose fixups are chains.
@@ -177,6 +178,37 @@ TEST_P(Runner, JoinsAProgram) {
   const fs::path joined = folder() / "joined";
   expectGood(runProcess({RUNNER, "--join", path("system"), joined}));
   expectGood(runProcess({joined, "threads"}));
+}
+
+// Returns the path of a program of the build. Empty if there is none.
+fs::path programNamed(const std::string& name) {
+  for (const fs::directory_entry& entry : fs::recursive_directory_iterator(fs::path(PROGRAMS) / "../../..")) {
+    if (entry.path().filename() == name && entry.is_regular_file()) return entry.path().lexically_normal();
+  }
+  return {};
+}
+
+// A line with a misspelt name would exclude nothing, and nobody would notice.
+TEST(NotShown, NamesCasesThatExist) {
+  std::ifstream list(NOT_SHOWN);
+  for (std::string line; std::getline(list, line);) {
+    if (line.empty() || line.starts_with('#')) continue;
+    SCOPED_TRACE(line);
+    std::istringstream words(line);
+    std::string program;
+    std::string suite;
+    std::string name;
+    words >> program;
+    std::getline(words >> std::ws, suite, '.');
+    words >> name;
+    const fs::path path = programNamed(program);
+    ASSERT_FALSE(path.empty());
+    std::vector<std::string> arguments = {path, "--gtest_list_tests"};
+    // Those of the command are programs for Linux.
+    if (!program.starts_with("mount-point_")) arguments.insert(arguments.begin(), RUNNER);
+    EXPECT_THAT(runProcess(arguments).standardOutput,
+                AllOf(HasSubstr(suite + ".\n"), HasSubstr("  " + name + "\n")));
+  }
 }
 
 }  // namespace

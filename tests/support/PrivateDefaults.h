@@ -47,6 +47,8 @@ class PrivateDefaults {
   }
 
   /// Returns the path of the settings' file. Its folder exists.
+  // Not static, since the folder exists only as long as this object.
+  // NOLINTNEXTLINE(readability-convert-member-functions-to-static)
   std::filesystem::path file() const {
     return rt::detail::systemDefaultsFolder() + "/" + std::string(rt::Process::name().view()) +
            "/defaults.conf";

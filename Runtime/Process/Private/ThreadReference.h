@@ -36,7 +36,7 @@ class ThreadReference {
     const pthread_key_t end = endOfThread();
     void* const known = pthread_getspecific(end);
     // `giveUp` has already run on this thread, so nothing would release the object later.
-    if (known == &hasEnded_) return;
+    if (hasEnded_ || known == &ended_) return;
     if (pthread_setspecific(end, object.get()) != 0) throw std::bad_alloc();
     Ref<T> previous = Ref<T>::adopt(static_cast<T*>(known));
     object_ = object.detach();
@@ -46,7 +46,7 @@ class ThreadReference {
   // Uses a key of the thread library, which reports a lack of memory. The destructor of a thread_local
   // variable would need memory too, and the C library ends the program if it gets none.
   //
-  // The key's value is the object itself or, when the thread has released it, the address of `hasEnded_`.
+  // The key's value is the object itself or, when the thread has just released it, the address of `ended_`.
   // macOS frees a thread's variables before it calls the destructors of later keys, and a variable that is
   // used then has its initial value again.
   static pthread_key_t endOfThread() {
@@ -59,21 +59,27 @@ class ThreadReference {
   }
 
   static void giveUp(void* object) noexcept {
-    // The system calls this function for the new value, too, for a few rounds.
-    pthread_setspecific(endOfThread(), &hasEnded_);
-    if (object == &hasEnded_) return;
+    // The system calls this function for the value `ended_` too, in its next round. It must not set a value
+    // for every round: after the last one, a sanitizer does not know the thread any more.
+    if (object == &ended_) return;
+    pthread_setspecific(endOfThread(), &ended_);
+    hasEnded_ = true;
     object_ = nullptr;
     Ref<T>::adopt(static_cast<T*>(object));
   }
 
   static constinit thread_local T* object_;
-  static constinit char hasEnded_;
+  static constinit thread_local bool hasEnded_;
+  static constinit char ended_;
 };
 
 template <class T, class Tag>
 constinit thread_local T* ThreadReference<T, Tag>::object_ = nullptr;
 
 template <class T, class Tag>
-constinit char ThreadReference<T, Tag>::hasEnded_ = 0;
+constinit thread_local bool ThreadReference<T, Tag>::hasEnded_ = false;
+
+template <class T, class Tag>
+constinit char ThreadReference<T, Tag>::ended_ = 0;
 
 }  // namespace rt

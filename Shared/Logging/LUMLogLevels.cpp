@@ -170,7 +170,10 @@ void LUMLogLevels::setOuterText(const rt::String& text) {
   rt::String problem;
   rt::Ref<Table> table = rt::make<Table>(text ? text : ""_s, kName, problem);
   if (problem) {
-    LUMLogAt(LUMLogLevelError, "%@"_s, problem);
+    // Not LUMLogAt, which would put the path of this file on the building machine into every program.
+    constexpr LUMLogArgumentKind kObject = 1;
+    LUMLog(LUMLogLevelError, "Shared/Logging/LUMLogLevels.cpp", "LUMLogLevels::setOuterText", __LINE__,
+           nullptr, 1, &kObject, "%@"_s, problem.object());
   } else {
     setTable(&LUMLogLevels::outer_, std::move(table));
   }

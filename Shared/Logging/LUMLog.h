@@ -29,8 +29,10 @@
 ///
 /// Not for: text made beforehand that may contain a '%'. Log it as an argument of "%@".
 
+#include <array>
 #include <concepts>
 #include <cstdarg>
+#include <cstddef>
 #include <cstdint>
 #include <source_location>
 #include <type_traits>
@@ -111,14 +113,13 @@ constexpr decltype(auto) variadicArgument(const T& argument) {
 template <class... Arguments>
 rt::Ref<LUMLogMetadata> metadataWithFields(const rt::Ref<LUMLogMetadata>& metadata,
                                            const Arguments&... arguments) {
-  rt::Ref<LUMLogMetadata> all = metadata;
-  [[maybe_unused]] const auto add = [&all]<class T>(const T& argument) {
-    if constexpr (isField<T>) {
-      all = LUMLogMetadata::metadataByAddingProperties(all, {{argument.name(), argument.value()}});
-    }
+  std::array<LUMLogMetadata::Property, (std::size_t{isField<Arguments>} + ...)> fields;
+  auto* place = fields.data();
+  [[maybe_unused]] const auto add = [&place]<class T>(const T& argument) {
+    if constexpr (isField<T>) *place++ = {argument.name(), argument.value()};
   };
   (add(arguments), ...);
-  return all;
+  return LUMLogMetadata::metadataByAddingProperties(metadata, fields);
 }
 
 }  // namespace LUMLogDetail
@@ -150,13 +151,15 @@ template <class... Arguments>
     LUMLogLevel level, const rt::Ref<LUMLogMetadata>& metadata,
     const LUMLogFormat<std::type_identity_t<Arguments>...>& format, const Arguments&... arguments) {
   using FormatArguments = LUMLogDetail::FormatArguments<void(), Arguments...>;
-  if (!LUMLogWanted::isWanted(level, metadata)) return nullptr;
   rt::Ref<LUMLogMessage> message;
   if constexpr (FormatArguments::kCount == sizeof...(Arguments)) {
+    if (!LUMLogWanted::isWanted(level, metadata)) return nullptr;
     message = LUMLog(level, format.location.file_name(), format.location.function_name(),
                      format.location.line(), metadata, FormatArguments::kCount, FormatArguments::kinds(),
                      format.text.string(), rt::toVariadic(rt::toArgument(arguments))...);
   } else {
+    // A field may name the component, so the message counts as one of any component.
+    if (!LUMLogWanted::isWanted(level)) return nullptr;
     message = LUMLog(level, format.location.file_name(), format.location.function_name(),
                      format.location.line(), LUMLogDetail::metadataWithFields(metadata, arguments...),
                      FormatArguments::kCount, FormatArguments::kinds(), format.text.string(),

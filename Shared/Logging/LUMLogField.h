@@ -23,7 +23,17 @@
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
 #include "Runtime/Text/Private/FormatArguments.h"
-#include "Runtime/Values/Number.h"
+
+namespace LUMLogDetail {
+
+// The value of a field as an object.
+rt::Ref<rt::Object> fieldValue(bool value);
+rt::Ref<rt::Object> fieldValue(std::int64_t value);
+rt::Ref<rt::Object> fieldValue(std::uint64_t value);
+rt::Ref<rt::Object> fieldValue(double value);
+rt::Ref<rt::Object> fieldValue(const char* text);
+
+}  // namespace LUMLogDetail
 
 template <class T>
 class LUMLogField {
@@ -48,12 +58,15 @@ class LUMLogField {
     if constexpr (kKind == rt::ArgumentKind::kObject) {
       return {rt::toVariadic(rt::toArgument(value_))};
     } else if constexpr (kKind == rt::ArgumentKind::kText) {
-      const char* const text = value_;
-      return text != nullptr ? rt::String::fromUTF8Repaired(text) : rt::String();
-    } else if constexpr (std::is_enum_v<Value>) {
-      return rt::Number::of(static_cast<std::int64_t>(value_));
+      return LUMLogDetail::fieldValue(static_cast<const char*>(value_));
+    } else if constexpr (kKind == rt::ArgumentKind::kDouble) {
+      return LUMLogDetail::fieldValue(static_cast<double>(value_));
+    } else if constexpr (std::is_same_v<Value, bool>) {
+      return LUMLogDetail::fieldValue(value_);
+    } else if constexpr (kKind == rt::ArgumentKind::kUnsigned) {
+      return LUMLogDetail::fieldValue(static_cast<std::uint64_t>(value_));
     } else {
-      return rt::Number::of(value_);
+      return LUMLogDetail::fieldValue(static_cast<std::int64_t>(value_));
     }
   }
 

@@ -9,8 +9,10 @@
 #include <vector>
 
 #include "Runtime/Values/Array.h"
+#include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLog.h"
 #include "Shared/Logging/LUMLogDropAllFilter.h"
+#include "Shared/Logging/LUMLogLevels.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMSafeNumberParameter.h"
 #include "tests/support/FirstSymbol.h"
@@ -143,6 +145,19 @@ TEST_F(LUMLogFieldTest, IsNotDescribedIfNobodyWantsTheMessage) {
   LUMLogAt(LUMLogLevelInfo, "%@"_s, Described(count), LUMLogField("described", Described(count)));
   LUMLogMultiplexer::sharedInstance()->removeLogFilter(none);
   EXPECT_EQ(count, 2);
+}
+
+// The component of the call used to decide, and the one that the field gives was not asked.
+TEST_F(LUMLogFieldTest, MayNameTheComponentThatIsWanted) {
+  const Ref<LUMLogLevels> levels = LUMLogLevels::init();
+  ASSERT_FALSE(levels->setText("error,Importer=debug"_s));
+  LUMLogMultiplexer::sharedInstance()->addLogFilter(levels);
+  LUMLogAt(LUMLogLevelDebug, "wanted"_s, LUMLogField("LUMLogMetadataComponent", "Importer"_s));
+  ASSERT_TRUE(last_);
+  EXPECT_EQ(last_->formattedString(), "wanted");
+  LUMLogAt(LUMLogLevelDebug, "refused"_s, LUMLogField("LUMLogMetadataComponent", "Other"_s));
+  LUMLogMultiplexer::sharedInstance()->removeLogFilter(levels);
+  EXPECT_EQ(last_->formattedString(), "wanted");
 }
 
 }  // namespace

@@ -34,9 +34,8 @@ rt::Ref<LUMLogMetadata> LUMLogMetadata::messageWithKey(const rt::String& key,
   return metadataWith(std::move(changed));
 }
 
-rt::Ref<LUMLogMetadata> LUMLogMetadata::metadataByAddingProperties(
-    const rt::Ref<LUMLogMetadata>& metadata,
-    std::initializer_list<std::pair<rt::String, rt::Ref<rt::Object>>> added) {
+rt::Ref<LUMLogMetadata> LUMLogMetadata::metadataByAddingProperties(const rt::Ref<LUMLogMetadata>& metadata,
+                                                                   std::span<const Property> added) {
   rt::Dictionary::Builder changed =
       metadata ? rt::Dictionary::Builder(*metadata->properties_) : rt::Dictionary::Builder();
   for (const auto& [key, value] : added) changed.set(key, rt::copy(value));

@@ -14,7 +14,7 @@
 
 #include <atomic>
 #include <cstdint>
-#include <initializer_list>
+#include <span>
 #include <utility>
 
 #include "Runtime/Base/Visibility.h"
@@ -69,9 +69,9 @@ class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Obje
 
   /// Returns metadata with the properties of `metadata`, which may be null, and `added`. A null value removes
   /// the property of its key. No key is null.
-  static rt::Ref<LUMLogMetadata> metadataByAddingProperties(
-      const rt::Ref<LUMLogMetadata>& metadata,
-      std::initializer_list<std::pair<rt::String, rt::Ref<rt::Object>>> added);
+  using Property = std::pair<rt::String, rt::Ref<rt::Object>>;
+  static rt::Ref<LUMLogMetadata> metadataByAddingProperties(const rt::Ref<LUMLogMetadata>& metadata,
+                                                            std::span<const Property> added);
 
   /// Same as `messageWithKey`, for the predefined keys.
   rt::Ref<LUMLogMetadata> metadataByAddingObfuscatedKiriID(

@@ -23,7 +23,12 @@ class RT_VISIBLE LUMLogWanted {
   [[gnu::always_inline]] static bool isWanted(LUMLogLevel level,
                                               const rt::Ref<LUMLogMetadata>& metadata) noexcept {
     if (!metadata) return level >= lowestWithoutMetadata_.load(std::memory_order_relaxed);
-    return level >= lowest_.load(std::memory_order_relaxed) && isWantedOf(*metadata, level);
+    return isWanted(level) && isWantedOf(*metadata, level);
+  }
+
+  /// Returns whether somebody may want a message of this level and any component.
+  [[gnu::always_inline]] static bool isWanted(LUMLogLevel level) noexcept {
+    return level >= lowest_.load(std::memory_order_relaxed);
   }
 
   /// Asks the filters and loggers of `shared`, the shared multiplexer, from now on.

@@ -12,5 +12,6 @@
 #include "Shared/Logging/Loggers/LUMLogLine.h"
 #include "Shared/Logging/Loggers/LUMLogLineFormatter.h"
 #include "Shared/Logging/Loggers/LUMLogOutput.h"
+#include "Shared/Logging/Loggers/LUMLogPattern.h"
 #include "Shared/Logging/Logging.h"
 // IWYU pragma: end_exports

@@ -10,6 +10,7 @@
 /// Not for: a program's output to its user.
 
 #include <chrono>
+#include <cstddef>
 #include <string_view>
 
 namespace rt::StandardError {
@@ -22,5 +23,10 @@ namespace rt::StandardError {
 /// stay apart if standard error is a file. Otherwise each text may be only as long as a pipe takes in one
 /// piece (4096 bytes on Linux, 512 on macOS).
 bool write(std::string_view text, std::chrono::milliseconds longestWait) noexcept;
+
+/// Same as `write`, for any stream. Returns how many bytes were written. If that is not all, `errno` has the
+/// reason: EAGAIN if there was no room. Also safe in a signal handler.
+/// Precondition: `descriptor` is below FD_SETSIZE.
+std::size_t writeTo(int descriptor, std::string_view text, std::chrono::milliseconds longestWait) noexcept;
 
 }  // namespace rt::StandardError

@@ -14,5 +14,6 @@
 #include "Shared/Logging/Loggers/LUMLogLineFormatter.h"
 #include "Shared/Logging/Loggers/LUMLogOutput.h"
 #include "Shared/Logging/Loggers/LUMLogPattern.h"
+#include "Shared/Logging/Loggers/LUMTerminalLogger.h"
 #include "Shared/Logging/Logging.h"
 // IWYU pragma: end_exports

@@ -45,13 +45,13 @@ class BrokenPipeIgnored {
 
 }  // namespace
 
-ssize_t writeStandardErrorOnce(std::string_view text) noexcept {
+ssize_t writeOnce(int descriptor, std::string_view text) noexcept {
   const BrokenPipeIgnored guard;
   // Another writer may have taken the room meanwhile.
   const iovec piece{const_cast<char*>(text.data()), text.size()};
-  const ssize_t count = pwritev2(STDERR_FILENO, &piece, 1, -1, RWF_NOWAIT);
+  const ssize_t count = pwritev2(descriptor, &piece, 1, -1, RWF_NOWAIT);
   if (count >= 0 || errno != EOPNOTSUPP) return count;
-  return write(STDERR_FILENO, text.data(), text.size());
+  return write(descriptor, text.data(), text.size());
 }
 
 }  // namespace rt::detail

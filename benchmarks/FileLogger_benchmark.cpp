@@ -102,16 +102,16 @@ void lineSpdlog(benchmark::State& state, bool flushes) {
   }
 }
 
-using LockedSink = spdlog::sinks::basic_file_sink_mt;
-using UnlockedSink = spdlog::sinks::basic_file_sink_st;
+constexpr auto lineLocked = lineSpdlog<spdlog::sinks::basic_file_sink_mt>;
+constexpr auto lineUnlocked = lineSpdlog<spdlog::sinks::basic_file_sink_st>;
 
 BENCHMARK_CAPTURE(lineOurs, , kStreamBuffer)->Name("FileLogger/line/ours");
-BENCHMARK_CAPTURE(lineSpdlog<LockedSink>, , false)->Name("FileLogger/line/spdlog-mt");
-BENCHMARK_CAPTURE(lineSpdlog<UnlockedSink>, , false)->Name("FileLogger/line/spdlog-st");
+BENCHMARK_CAPTURE(lineLocked, , false)->Name("FileLogger/line/spdlog-mt");
+BENCHMARK_CAPTURE(lineUnlocked, , false)->Name("FileLogger/line/spdlog-st");
 BENCHMARK_CAPTURE(lineOurs, , kLargeBuffer)->Name("FileLogger/line, 64 KB/ours");
-BENCHMARK_CAPTURE(lineSpdlog<LockedSink>, , false)->Name("FileLogger/line, 64 KB/spdlog-mt");
+BENCHMARK_CAPTURE(lineLocked, , false)->Name("FileLogger/line, 64 KB/spdlog-mt");
 BENCHMARK_CAPTURE(lineOurs, , std::size_t{0})->Name("FileLogger/line at once/ours");
-BENCHMARK_CAPTURE(lineSpdlog<LockedSink>, , true)->Name("FileLogger/line at once/spdlog-mt");
+BENCHMARK_CAPTURE(lineLocked, , true)->Name("FileLogger/line at once/spdlog-mt");
 BENCHMARK(patternOurs)->Name("FileLogger/pattern/ours");
 
 const Bound lineBound("FileLogger/line", "spdlog-mt", 0.9);

@@ -19,6 +19,25 @@ bool isControl(char character) noexcept {
   return code < 0x20 || code == 0x7F;
 }
 
+// Returns how many bytes come before the first control character.
+std::size_t plainLength(std::string_view text) noexcept {
+  // Looks at eight bytes at once. Subtracting a limit sets the highest bit of a byte below it, and then
+  // perhaps that of bytes behind it. So a word without such a bit has no control character.
+  using Word = std::uint64_t;
+  constexpr Word kOnes = 0x0101010101010101;
+  constexpr Word kHighBits = 0x80 * kOnes;
+  std::size_t length = 0;
+  for (; text.size() - length >= sizeof(Word); length += sizeof(Word)) {
+    Word word = 0;
+    std::memcpy(&word, text.data() + length, sizeof(Word));
+    const Word deletes = word ^ (0x7F * kOnes);
+    const Word found = ((word - (0x20 * kOnes)) & ~word) | ((deletes - kOnes) & ~deletes);
+    if ((found & kHighBits) != 0) break;
+  }
+  while (length < text.size() && !isControl(text[length])) ++length;
+  return length;
+}
+
 }  // namespace
 
 void LUMLogLine::append(std::size_t count, char byte) noexcept {
@@ -31,7 +50,7 @@ void LUMLogLine::append(std::size_t count, char byte) noexcept {
 void LUMLogLine::appendEscaped(std::string_view text) noexcept {
   constexpr std::string_view kDigits = "0123456789abcdef";
   while (!text.empty()) {
-    const auto plain = static_cast<std::size_t>(std::ranges::find_if(text, isControl) - text.begin());
+    const std::size_t plain = plainLength(text);
     append(text.substr(0, plain));
     if (plain == text.size()) return;
     const auto code = static_cast<unsigned char>(text[plain]);

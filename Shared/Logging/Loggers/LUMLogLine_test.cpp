@@ -3,6 +3,7 @@
 #include <gtest/gtest.h>
 
 #include <array>
+#include <cstdio>
 #include <limits>
 #include <stdexcept>
 #include <string>
@@ -82,6 +83,29 @@ TEST(LUMLogLine, EscapesControlCharacters) {
   EXPECT_EQ(escaped("plain \\ \xC3\xA4"), "plain \\ \xC3\xA4");
   EXPECT_EQ(escaped("\na\n\tb\r\x1B[31m\x7F"), "\\na\\n\\tb\\x0d\\x1b[31m\\x7f");
   EXPECT_EQ(escaped(std::string_view("\0", 1)), "\\x00");
+}
+
+TEST(LUMLogLine, FindsControlCharactersWhereverTheyAre) {
+  constexpr std::size_t kLength = 19;
+  for (int code = 0; code < 256; ++code) {
+    for (const char around : {'a', ' ', '~', '\xC3', '\x80'}) {
+      std::string expected(1, static_cast<char>(code));
+      if (code < 0x20 || code == 0x7F) {
+        expected = code == '\n' ? "\\n" : "\\t";
+        if (code != '\n' && code != '\t') {
+          std::array<char, 5> digits{};
+          std::snprintf(digits.data(), digits.size(), "\\x%02x", static_cast<unsigned>(code));
+          expected = digits.data();
+        }
+      }
+      for (std::size_t position = 0; position < kLength; ++position) {
+        std::string text(kLength, around);
+        text[position] = static_cast<char>(code);
+        EXPECT_EQ(escaped(text),
+                  std::string(position, around) + expected + std::string(kLength - position - 1, around));
+      }
+    }
+  }
 }
 
 TEST(LUMLogLine, AppendsNumbers) {

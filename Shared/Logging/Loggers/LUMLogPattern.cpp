@@ -23,6 +23,9 @@ using Kind = Step::Kind;
 constexpr std::int64_t kSecondsPerDay = 86'400;
 constexpr std::int64_t kNanosecondsPerSecond = 1'000'000'000;
 
+// By what the nanoseconds are divided if that many digits of them are wanted.
+constexpr std::uint32_t kDivisors[] = {0, 0, 0, 1'000'000, 0, 0, 1000, 0, 0, 1};
+
 // A quotient that is rounded down, and its rest.
 struct Division {
   Division(std::int64_t dividend, std::int64_t divisor) noexcept
@@ -57,68 +60,67 @@ struct Date {
   std::uint32_t day;
 };
 
-void putTwoDigits(char* place, std::uint32_t value) noexcept {
-  place[0] = static_cast<char>('0' + (value / 10));
-  place[1] = static_cast<char>('0' + (value % 10));
-}
-
 void putDigits(char* place, std::uint32_t value, std::size_t count) noexcept {
   for (; count > 0; value /= 10) place[--count] = static_cast<char>('0' + (value % 10));
 }
 
-void appendTime(LUMLogLine& line, const Step& step, std::int64_t time) {
-  const Division seconds(time, kNanosecondsPerSecond);
-  const std::int32_t offset =
-      step.kind == Kind::kUtc ? 0 : LUMLogLocalOffset::secondsAt(seconds.quotient, line.caller());
-  const Division days(seconds.quotient + offset, kSecondsPerDay);
+// Replaces the zeros in `text` by the parts of a second, in UTC, and its distance from UTC.
+void putParts(LUMLogTimeCache::Text& text, const Step& step, std::int64_t second,
+              std::int32_t offset) noexcept {
+  const Division days(second + offset, kSecondsPerDay);
   const Date date(days.quotient);
   const auto secondOfDay = static_cast<std::uint32_t>(days.rest);
-  const auto nanosecond = static_cast<std::uint32_t>(seconds.rest);
-
-  std::array<char, Step::kLongestTime> place;  // NOLINT(cppcoreguidelines-pro-type-member-init): filled below
-  std::memcpy(place.data(), step.text.data(), step.text.size());
   for (const Step::TimePart part : step.parts) {
-    char* const to = place.data() + part.position;
+    char* const to = text.data() + part.position;
     switch (part.directive) {
       case 'Y':
-        putTwoDigits(to, date.year / 100);
-        putTwoDigits(to + 2, date.year % 100);
+        putDigits(to, date.year, 4);
         break;
       case 'm':
-        putTwoDigits(to, date.month);
+        putDigits(to, date.month, 2);
         break;
       case 'd':
-        putTwoDigits(to, date.day);
+        putDigits(to, date.day, 2);
         break;
       case 'H':
-        putTwoDigits(to, secondOfDay / 3600);
+        putDigits(to, secondOfDay / 3600, 2);
         break;
       case 'M':
-        putTwoDigits(to, secondOfDay / 60 % 60);
+        putDigits(to, secondOfDay / 60 % 60, 2);
         break;
       case 'S':
-        putTwoDigits(to, secondOfDay % 60);
-        break;
-      case '3':
-        putDigits(to, nanosecond / 1'000'000, 3);
-        break;
-      case '6':
-        putDigits(to, nanosecond / 1000, 6);
-        break;
-      case '9':
-        putDigits(to, nanosecond, 9);
+        putDigits(to, secondOfDay % 60, 2);
         break;
       default: {
         // The zone. Seconds, which zones had until the 20th century, are cut off.
         const auto minutes = static_cast<std::uint32_t>(offset < 0 ? -offset : offset) / 60;
-        to[0] = offset < 0 ? '-' : '+';
-        putTwoDigits(to + 1, minutes / 60);
-        putTwoDigits(to + 3, minutes % 60);
+        *to = offset < 0 ? '-' : '+';
+        putDigits(to + 1, (minutes / 60 * 100) + (minutes % 60), 4);
         break;
       }
     }
   }
-  line.append({place.data(), step.text.size()});
+}
+
+void appendTime(LUMLogLine& line, const Step& step, std::int64_t time, LUMLogTimeCache& cache) noexcept {
+  const Division seconds(time, kNanosecondsPerSecond);
+  const std::int32_t offset =
+      step.kind == Kind::kUtc ? 0 : LUMLogLocalOffset::secondsAt(seconds.quotient, line.caller());
+  LUMLogTimeCache::Text text;
+  if (!cache.read(seconds.quotient, offset, step.text.size(), text)) [[unlikely]] {
+    text = {};
+    std::memcpy(text.data(), step.text.data(), step.text.size());
+    putParts(text, step, seconds.quotient, offset);
+    if (line.caller() == LUMLogLine::Caller::kThread) {
+      cache.write(seconds.quotient, offset, step.text.size(), text);
+    }
+  }
+  const auto nanosecond = static_cast<std::uint32_t>(seconds.rest);
+  for (const Step::TimePart fraction : step.fractions) {
+    const auto digits = static_cast<std::size_t>(fraction.directive - '0');
+    putDigits(text.data() + fraction.position, nanosecond / kDivisors[digits], digits);
+  }
+  line.append({text.data(), step.text.size()});
 }
 
 void appendLevel(LUMLogLine& line, LUMLogLevel level) {
@@ -130,11 +132,23 @@ void appendLevel(LUMLogLine& line, LUMLogLevel level) {
   }
 }
 
+// Returns the property for `key`. Most metadata has few properties, and the keys of the library itself.
+// Looking for those takes less time than hashing the key.
+const rt::Object* propertyOf(const rt::Dictionary& properties, const rt::String& key) {
+  constexpr std::size_t kFew = 8;
+  if (properties.count() <= kFew) {
+    for (const auto& [each, value] : properties) {
+      if (each.get() == key.object()) return value.get();
+    }
+  }
+  return properties.objectForKey(key);
+}
+
 // Appends the string that the metadata has for `key`.
 void appendProperty(LUMLogLine& line, const LUMLogMessage& message, const rt::String& key) {
   if (message.logMetadata() == nullptr) return;
-  const auto* const text = message.logMetadata()->properties()->objectForKey<rt::StringObject>(key);
-  if (text != nullptr) line.appendEscaped(text->view());
+  const rt::Object* const value = propertyOf(*message.logMetadata()->properties(), key);
+  if (const auto* const text = rt::cast<rt::StringObject>(value)) line.appendEscaped(text->view());
 }
 
 void appendThread(LUMLogLine& line, const LUMLogMessage& message) {
@@ -214,13 +228,13 @@ void appendStack(LUMLogLine& line, std::string_view before, const LUMLogMessage&
   line.withTextOf(message.callstack()->asObject(), [&](std::string_view text) { line.appendEscaped(text); });
 }
 
-void appendField(LUMLogLine& line, const Step& step, const LUMLogMessage& message) {
+void appendField(LUMLogLine& line, const Step& step, const LUMLogMessage& message, LUMLogTimeCache* times) {
   switch (step.kind) {
     case Kind::kLiteral:
       return line.append(step.text);
     case Kind::kTime:
     case Kind::kUtc:
-      return appendTime(line, step, message.time());
+      return appendTime(line, step, message.time(), times[step.timeIndex]);
     case Kind::kLevel:
       return appendLevel(line, message.level());
     case Kind::kComponent:
@@ -252,14 +266,14 @@ void appendField(LUMLogLine& line, const Step& step, const LUMLogMessage& messag
   }
 }
 
-// Appends a field of at least `step.width` characters.
+// Appends a field of at least `step.width` characters. A time has no width.
 void appendAligned(LUMLogLine& line, const Step& step, const LUMLogMessage& message) {
   // A text that does not fit here needs no spaces: a character has at most four bytes.
   std::array<char, 4 * Step::kLargestWidth>
       place;  // NOLINT(cppcoreguidelines-pro-type-member-init): as above
   LUMLogLine field(place, line.caller());
-  appendField(field, step, message);
-  if (!field.isComplete()) return appendField(line, step, message);
+  appendField(field, step, message, nullptr);
+  if (!field.isComplete()) return appendField(line, step, message, nullptr);
   const auto characters = static_cast<std::size_t>(std::ranges::count_if(
       field.text(), [](char byte) { return (static_cast<unsigned char>(byte) & 0xC0U) != 0x80; }));
   const std::size_t spaces = characters < step.width ? step.width - characters : 0;
@@ -268,7 +282,19 @@ void appendAligned(LUMLogLine& line, const Step& step, const LUMLogMessage& mess
   if (!step.isRightAligned) line.append(spaces, ' ');
 }
 
+bool isTime(const Step& step) noexcept {
+  return step.kind == Kind::kTime || step.kind == Kind::kUtc;
+}
+
+std::unique_ptr<LUMLogTimeCache[]> cachesFor(const std::vector<Step>& steps) {
+  const auto count = static_cast<std::size_t>(std::ranges::count_if(steps, isTime));
+  return count > 0 ? std::make_unique<LUMLogTimeCache[]>(count) : nullptr;
+}
+
 }  // namespace
+
+LUMLogPattern::LUMLogPattern(std::vector<LUMLogPatternStep> steps)
+    : steps_(std::move(steps)), times_(cachesFor(steps_)) {}
 
 rt::Ref<LUMLogPattern> LUMLogPattern::initWithPattern(const rt::String& pattern) {
   return rt::Ref<LUMLogPattern>::adopt(new LUMLogPattern(LUMLogPatternSteps(pattern.view())));
@@ -281,7 +307,7 @@ rt::Ref<LUMLogPattern> LUMLogPattern::init() {
 void LUMLogPattern::appendLine(LUMLogLine& line, const LUMLogMessage& message) const {
   for (const LUMLogPatternStep& step : steps_) {
     if (step.width == 0) {
-      appendField(line, step, message);
+      appendField(line, step, message, times_.get());
     } else {
       appendAligned(line, step, message);
     }

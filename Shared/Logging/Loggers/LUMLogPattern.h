@@ -37,7 +37,7 @@
 ///
 /// Not for: lines that programs read.
 
-#include <utility>
+#include <memory>
 #include <vector>
 
 #include "Runtime/Base/Visibility.h"
@@ -68,8 +68,9 @@ class RT_VISIBLE LUMLogPattern final : public rt::Implements<LUMLogPattern, rt::
   void appendLine(LUMLogLine& line, const LUMLogMessage& message) const override;
 
  protected:
-  explicit LUMLogPattern(std::vector<LUMLogPatternStep> steps) noexcept : steps_(std::move(steps)) {}
+  explicit LUMLogPattern(std::vector<LUMLogPatternStep> steps);
 
  private:
   const std::vector<LUMLogPatternStep> steps_;
+  const std::unique_ptr<LUMLogTimeCache[]> times_;  // one for each time among the steps
 };

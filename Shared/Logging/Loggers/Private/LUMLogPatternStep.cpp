@@ -111,6 +111,7 @@ class Parser {
     step.kind = kind;
     step.text = std::move(before);
     if (step.kind == Kind::kTime || step.kind == Kind::kUtc) {
+      step.timeIndex = timeCount_++;
       const std::string_view usual = step.kind == Kind::kTime ? kDefaultTime : kDefaultUtc;
       parseTime(step, hasOption ? option : usual, optionPosition);
     } else if (hasOption) {
@@ -180,7 +181,8 @@ class Parser {
         if (directive == '%') {
           step.text += '%';
         } else if (step.text.size() + digits <= Step::kLongestTime) {
-          step.parts.push_back({static_cast<std::uint8_t>(step.text.size()), directive});
+          (isFraction ? step.fractions : step.parts)
+              .push_back({static_cast<std::uint8_t>(step.text.size()), directive});
           step.text.append(digits, '0');
         } else {
           step.text.append(digits, '0');
@@ -218,6 +220,7 @@ class Parser {
 
   const std::string_view pattern_;
   std::size_t position_ = 0;
+  std::size_t timeCount_ = 0;
   std::vector<Step> steps_;
 };
 

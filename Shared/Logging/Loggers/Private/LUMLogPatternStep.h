@@ -8,6 +8,8 @@
 #include <string_view>
 #include <vector>
 
+#include "Shared/Logging/Loggers/Private/LUMLogTimeCache.h"
+
 struct LUMLogPatternStep {
   enum class Kind : std::uint8_t {
     kLiteral,
@@ -36,14 +38,16 @@ struct LUMLogPatternStep {
   };
 
   // A time has a fixed length, so that it is put together on the stack.
-  static constexpr std::size_t kLongestTime = 96;
+  static constexpr std::size_t kLongestTime = LUMLogTimeCache::kCapacity;
   static constexpr std::size_t kLargestWidth = 255;
 
   Kind kind = Kind::kLiteral;
   bool isRightAligned = false;
   std::uint8_t width = 0;
-  std::string text;  // a literal, the text of a time, or what comes before a field that is not empty
-  std::vector<TimePart> parts;
+  std::size_t timeIndex = 0;  // of a time, among the times of the pattern
+  std::string text;           // a literal, the text of a time, or what comes before a field that is not empty
+  std::vector<TimePart> parts;      // of a time, the same for a second
+  std::vector<TimePart> fractions;  // of a time, parts of a second
 };
 
 /// Returns the steps of `pattern`. Throws std::invalid_argument with a sentence that has the column of the

@@ -19,20 +19,28 @@ bool isControl(char character) noexcept {
   return code < 0x20 || code == 0x7F;
 }
 
-// Returns how many bytes come before the first control character.
-std::size_t plainLength(std::string_view text) noexcept {
-  // Looks at eight bytes at once. Subtracting a limit sets the highest bit of a byte below it, and then
-  // perhaps that of bytes behind it. So a word without such a bit has no control character.
-  using Word = std::uint64_t;
+using Word = std::uint64_t;
+
+// Returns whether one of the eight bytes at `bytes` is a control character.
+bool hasControl(const char* bytes) noexcept {
   constexpr Word kOnes = 0x0101010101010101;
   constexpr Word kHighBits = 0x80 * kOnes;
+  Word word = 0;
+  std::memcpy(&word, bytes, sizeof(Word));
+  const Word deletes = word ^ (0x7F * kOnes);
+  // Subtracting a limit sets the highest bit of a byte below it, and then perhaps that of bytes behind it.
+  const Word found = ((word - (0x20 * kOnes)) & ~word) | ((deletes - kOnes) & ~deletes);
+  return (found & kHighBits) != 0;
+}
+
+// Returns how many bytes come before the first control character.
+std::size_t plainLength(std::string_view text) noexcept {
   std::size_t length = 0;
-  for (; text.size() - length >= sizeof(Word); length += sizeof(Word)) {
-    Word word = 0;
-    std::memcpy(&word, text.data() + length, sizeof(Word));
-    const Word deletes = word ^ (0x7F * kOnes);
-    const Word found = ((word - (0x20 * kOnes)) & ~word) | ((deletes - kOnes) & ~deletes);
-    if ((found & kHighBits) != 0) break;
+  while (text.size() - length >= sizeof(Word) && !hasControl(text.data() + length)) length += sizeof(Word);
+  // The last eight bytes may overlap with those before them.
+  if (length > 0 && text.size() - length < sizeof(Word) &&
+      !hasControl(text.data() + text.size() - sizeof(Word))) {
+    return text.size();
   }
   while (length < text.size() && !isControl(text[length])) ++length;
   return length;
@@ -73,11 +81,14 @@ void LUMLogLine::appendNumber(std::int64_t value) noexcept {
 }
 
 void LUMLogLine::appendUnsigned(std::uint64_t value, std::size_t width) noexcept {
-  std::array<char, 20> digits{};
-  const char* const end = std::to_chars(digits.data(), digits.data() + digits.size(), value).ptr;
-  const auto count = static_cast<std::size_t>(end - digits.data());
+  std::array<char, 20> digits;  // NOLINT(cppcoreguidelines-pro-type-member-init): filled from the end
+  std::size_t count = 0;
+  do {
+    digits[digits.size() - ++count] = static_cast<char>('0' + (value % 10));
+    value /= 10;
+  } while (value > 0);
   if (count < width) append(width - count, '0');
-  append({digits.data(), count});
+  append({digits.data() + digits.size() - count, count});
 }
 
 void LUMLogLine::withText(const rt::Object* object, void (*use)(void* given, std::string_view text),

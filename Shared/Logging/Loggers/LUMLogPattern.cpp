@@ -102,18 +102,22 @@ void putParts(LUMLogTimeCache::Text& text, const Step& step, std::int64_t second
   }
 }
 
-void appendTime(LUMLogLine& line, const Step& step, std::int64_t time, LUMLogTimeCache& cache) noexcept {
+// Makes the text of a second, without parts of it.
+[[gnu::cold]] void makeTime(LUMLogTimeCache::Text& text, const Step& step, std::int64_t second,
+                            LUMLogLine::Caller caller, LUMLogTimeCache& cache) noexcept {
+  text = {};
+  std::memcpy(text.data(), step.text.data(), step.text.size());
+  putParts(text, step, second, step.kind == Kind::kUtc ? 0 : LUMLogLocalOffset::secondsAt(second, caller));
+  // In a signal handler the offset may be the wrong one.
+  if (caller == LUMLogLine::Caller::kThread) cache.write(second, step.text.size(), text);
+}
+
+[[gnu::noinline]] void appendTime(LUMLogLine& line, const Step& step, std::int64_t time,
+                                  LUMLogTimeCache& cache) noexcept {
   const Division seconds(time, kNanosecondsPerSecond);
-  const std::int32_t offset =
-      step.kind == Kind::kUtc ? 0 : LUMLogLocalOffset::secondsAt(seconds.quotient, line.caller());
   LUMLogTimeCache::Text text;
-  if (!cache.read(seconds.quotient, offset, step.text.size(), text)) [[unlikely]] {
-    text = {};
-    std::memcpy(text.data(), step.text.data(), step.text.size());
-    putParts(text, step, seconds.quotient, offset);
-    if (line.caller() == LUMLogLine::Caller::kThread) {
-      cache.write(seconds.quotient, offset, step.text.size(), text);
-    }
+  if (!cache.read(seconds.quotient, step.text.size(), text)) [[unlikely]] {
+    makeTime(text, step, seconds.quotient, line.caller(), cache);
   }
   const auto nanosecond = static_cast<std::uint32_t>(seconds.rest);
   for (const Step::TimePart fraction : step.fractions) {
@@ -203,7 +207,7 @@ std::size_t nextFields(const rt::Dictionary& properties, const Field* last, std:
 }
 
 // Sorts without memory: a pass collects the next few fields, so that any number needs little of the stack.
-void appendFields(LUMLogLine& line, std::string_view before, const LUMLogMessage& message) {
+[[gnu::noinline]] void appendFields(LUMLogLine& line, std::string_view before, const LUMLogMessage& message) {
   if (message.logMetadata() == nullptr) return;
   const rt::Dictionary& properties = *message.logMetadata()->properties();
   std::array<Field, 16> fields{};
@@ -222,7 +226,7 @@ void appendFields(LUMLogLine& line, std::string_view before, const LUMLogMessage
   }
 }
 
-void appendStack(LUMLogLine& line, std::string_view before, const LUMLogMessage& message) {
+[[gnu::noinline]] void appendStack(LUMLogLine& line, std::string_view before, const LUMLogMessage& message) {
   if (message.callstack() == nullptr) return;
   line.append(before);
   line.withTextOf(message.callstack()->asObject(), [&](std::string_view text) { line.appendEscaped(text); });
@@ -231,7 +235,7 @@ void appendStack(LUMLogLine& line, std::string_view before, const LUMLogMessage&
 void appendField(LUMLogLine& line, const Step& step, const LUMLogMessage& message, LUMLogTimeCache* times) {
   switch (step.kind) {
     case Kind::kLiteral:
-      return line.append(step.text);
+      break;
     case Kind::kTime:
     case Kind::kUtc:
       return appendTime(line, step, message.time(), times[step.timeIndex]);
@@ -249,7 +253,9 @@ void appendField(LUMLogLine& line, const Step& step, const LUMLogMessage& messag
       return line.appendEscaped(message.dispatchQueueLabel().view());
     case Kind::kFile: {
       const std::string_view path = message.file().view();
-      return line.appendEscaped(path.substr(path.rfind('/') + 1));
+      std::size_t begin = path.size();
+      while (begin > 0 && path[begin - 1] != '/') --begin;
+      return line.appendEscaped(path.substr(begin));
     }
     case Kind::kPath:
       return line.appendEscaped(message.file().view());
@@ -306,7 +312,9 @@ rt::Ref<LUMLogPattern> LUMLogPattern::init() {
 
 void LUMLogPattern::appendLine(LUMLogLine& line, const LUMLogMessage& message) const {
   for (const LUMLogPatternStep& step : steps_) {
-    if (step.width == 0) {
+    if (step.kind == Kind::kLiteral) {
+      line.append(step.text);
+    } else if (step.width == 0) {
       appendField(line, step, message, times_.get());
     } else {
       appendAligned(line, step, message);

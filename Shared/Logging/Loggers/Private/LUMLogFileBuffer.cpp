@@ -179,7 +179,12 @@ void LUMLogFileBuffer::writeInSignalHandler(std::string_view line) noexcept {
     file_.write(line);
     lock_.unlock();
   } else {
-    file_.writeInSignalHandler(line);
+    writeWithoutLock(line);
   }
   errno = error;
+}
+
+// The descriptor, which is all that this needs, never changes.
+void LUMLogFileBuffer::writeWithoutLock(std::string_view line) const noexcept {
+  file_.writeInSignalHandler(line);
 }

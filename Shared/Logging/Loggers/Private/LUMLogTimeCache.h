@@ -20,12 +20,9 @@ class LUMLogTimeCache {
 
   /// Copies the first `length` characters of the text of `second` to `text`. Returns false if the cache does
   /// not have it. More of `text` may be changed.
-  bool read(std::int64_t second, std::int32_t offset, std::size_t length, Text& text) const noexcept {
+  bool read(std::int64_t second, std::size_t length, Text& text) const noexcept {
     const std::uint32_t sequence = sequence_.load(std::memory_order_acquire);
-    if (sequence % 2 != 0 || second_.load(std::memory_order_relaxed) != second ||
-        offset_.load(std::memory_order_relaxed) != offset) {
-      return false;
-    }
+    if (sequence % 2 != 0 || second_.load(std::memory_order_relaxed) != second) return false;
     for (std::size_t i = 0; i < length; i += sizeof(Word)) {
       const Word word = words_[i / sizeof(Word)].load(std::memory_order_relaxed);
       std::memcpy(text.data() + i, &word, sizeof(Word));
@@ -35,7 +32,7 @@ class LUMLogTimeCache {
   }
 
   /// Keeps the text of `second`, unless another thread is just keeping one.
-  void write(std::int64_t second, std::int32_t offset, std::size_t length, const Text& text) noexcept {
+  void write(std::int64_t second, std::size_t length, const Text& text) noexcept {
     std::uint32_t sequence = sequence_.load(std::memory_order_relaxed);
     if (sequence % 2 != 0 ||
         !sequence_.compare_exchange_strong(sequence, sequence + 1, std::memory_order_relaxed)) {
@@ -43,7 +40,6 @@ class LUMLogTimeCache {
     }
     std::atomic_thread_fence(std::memory_order_release);
     second_.store(second, std::memory_order_relaxed);
-    offset_.store(offset, std::memory_order_relaxed);
     for (std::size_t i = 0; i < length; i += sizeof(Word)) {
       Word word = 0;
       std::memcpy(&word, text.data() + i, sizeof(Word));
@@ -56,7 +52,6 @@ class LUMLogTimeCache {
   using Word = std::uint64_t;
 
   std::atomic<std::uint32_t> sequence_ = 0;
-  std::atomic<std::int32_t> offset_ = 0;
   // No message has this time.
   std::atomic<std::int64_t> second_ = INT64_MIN;
   std::array<std::atomic<Word>, kCapacity / sizeof(Word)> words_{};

@@ -42,6 +42,15 @@ rt::Ref<LUMLogMetadata> LUMLogMetadata::metadataByAddingProperties(const rt::Ref
   return metadataWith(std::move(changed));
 }
 
+rt::Ref<LUMLogMetadata> LUMLogMetadata::metadataByMerging(const rt::Ref<LUMLogMetadata>& lower,
+                                                          const rt::Ref<LUMLogMetadata>& upper) {
+  if (!lower) return upper;
+  if (!upper) return lower;
+  rt::Dictionary::Builder merged(*lower->properties_);
+  for (const auto& [key, value] : *upper->properties_) merged.set(key, value);
+  return metadataWith(std::move(merged));
+}
+
 rt::Ref<LUMLogMetadata> LUMLogMetadata::metadataWith(rt::Dictionary::Builder&& properties) {
   return rt::Ref<LUMLogMetadata>::adopt(new LUMLogMetadata(std::move(properties).dictionary()));
 }

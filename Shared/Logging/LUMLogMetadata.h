@@ -73,6 +73,11 @@ class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Obje
   static rt::Ref<LUMLogMetadata> metadataByAddingProperties(const rt::Ref<LUMLogMetadata>& metadata,
                                                             std::span<const Property> added);
 
+  /// Returns metadata with the properties of both, each of which may be null. Those of `upper` replace those
+  /// of `lower`. Returns one of the two if the other is null.
+  static rt::Ref<LUMLogMetadata> metadataByMerging(const rt::Ref<LUMLogMetadata>& lower,
+                                                   const rt::Ref<LUMLogMetadata>& upper);
+
   /// Same as `messageWithKey`, for the predefined keys.
   rt::Ref<LUMLogMetadata> metadataByAddingObfuscatedKiriID(
       const rt::Ref<rt::Object>& obfuscatedKiriID) const {

@@ -8,6 +8,10 @@ constexpr rt::String LUMLogMetadata::kComponentKey = "LUMLogMetadataComponent"_s
 constexpr rt::String LUMLogMetadata::kCategoryKey = "LUMLogMetadataCategory"_s;
 constexpr rt::String LUMLogMetadata::kCauseKey = "LUMLogMetadataCause"_s;
 
+bool LUMLogMetadata::isPredefinedKey(const rt::String& key) noexcept {
+  return key == kObfuscatedKiriIDKey || key == kComponentKey || key == kCategoryKey || key == kCauseKey;
+}
+
 rt::Ref<LUMLogMetadata> LUMLogMetadata::initWithProperties(const rt::Ref<rt::Dictionary>& properties) {
   rt::Dictionary::Builder copies;
   if (properties) {

@@ -32,6 +32,9 @@ class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Obje
   static const rt::String kCategoryKey;          // "LUMLogMetadataCategory"
   static const rt::String kCauseKey;             // "LUMLogMetadataCause"
 
+  /// Returns whether `key` is one of these.
+  static bool isPredefinedKey(const rt::String& key) noexcept;
+
   /// Makes metadata of `properties`, whose keys are strings. Null counts as empty. Like every function that
   /// makes metadata, it throws what copying a value throws, and std::bad_alloc.
   static rt::Ref<LUMLogMetadata> initWithProperties(const rt::Ref<rt::Dictionary>& properties);

@@ -57,7 +57,8 @@ TEST_F(LUMLogSpanTest, LogsOnceAtItsEnd) {
   const LUMLogMessage& message = *messages_[0];
   EXPECT_EQ(message.level(), LUMLogLevelInfo);
   EXPECT_EQ(message.format(), "%@ took %@");
-  EXPECT_TRUE(message.formattedString().view().starts_with("import took ")) << message.formattedString().view();
+  EXPECT_TRUE(message.formattedString().view().starts_with("import took "))
+      << message.formattedString().view();
   EXPECT_EQ(message.line(), line);
   EXPECT_TRUE(message.file().view().ends_with("LUMLogSpan_test.cpp"));
   EXPECT_EQ(stringOf(message, "span"), "import");

@@ -36,9 +36,11 @@ class RT_VISIBLE LUMLogLine {
 
   /// Appends bytes as they are.
   void append(std::string_view bytes) noexcept {
-    if (length_ < place_.size()) {
-      const std::size_t room = place_.size() - length_;
-      std::memcpy(place_.data() + length_, bytes.data(), bytes.size() < room ? bytes.size() : room);
+    const std::size_t room = length_ < place_.size() ? place_.size() - length_ : 0;
+    if (bytes.size() <= room) [[likely]] {
+      std::memcpy(place_.data() + length_, bytes.data(), bytes.size());
+    } else if (room > 0) {
+      std::memcpy(place_.data() + length_, bytes.data(), room);
     }
     length_ += bytes.size();
   }

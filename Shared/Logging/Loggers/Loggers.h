@@ -9,8 +9,10 @@
 /// Not for: the headers of this project, which include what they use.
 
 // IWYU pragma: begin_exports
+#include "Shared/Logging/Loggers/LUMFileLogger.h"
 #include "Shared/Logging/Loggers/LUMLogLine.h"
 #include "Shared/Logging/Loggers/LUMLogLineFormatter.h"
 #include "Shared/Logging/Loggers/LUMLogOutput.h"
+#include "Shared/Logging/Loggers/LUMLogPattern.h"
 #include "Shared/Logging/Logging.h"
 // IWYU pragma: end_exports

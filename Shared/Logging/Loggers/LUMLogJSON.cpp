@@ -22,6 +22,7 @@
 #include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
+#include "Shared/Logging/Loggers/Private/LUMLogFields.h"
 #include "Shared/Logging/Loggers/Private/LUMLogJSONText.h"
 
 namespace {
@@ -122,54 +123,23 @@ void appendStack(LUMLogLine& line, const LUMLogCallstack& stack) {
   line.append('"');
 }
 
-// The properties that are not predefined, in the order of their names. Memory for some of them is enough: it
-// is filled again with those that come after.
-class Fields {
- public:
-  explicit Fields(const LUMLogMetadata* metadata) : metadata_(metadata) { fill({}); }
+// The properties of a span (Shared/Logging/LUMLogSpan.h).
+constexpr rt::String kTrace = "trace.id"_s;
+constexpr rt::String kSpan = "span.id"_s;
 
-  bool isAtEnd() const noexcept { return at_ == count_; }
-  std::string_view name() const noexcept { return fields_[at_].name; }
-  const rt::Object& value() const noexcept { return *fields_[at_].value; }
+// Returns the identifier of a trace or a span that `value` is, or nothing.
+std::string_view identifierOf(const rt::Object* value, std::size_t length) noexcept {
+  const auto* const string = rt::cast<rt::StringObject>(value);
+  if (string == nullptr || string->view().size() != length) return {};
+  const bool isIdentifier = string->view().find_first_not_of("0123456789abcdef") == std::string_view::npos;
+  return isIdentifier ? string->view() : std::string_view();
+}
 
-  void advance() {
-    if (++at_ == fields_.size()) fill(fields_.back().name);
-  }
-
- private:
-  struct Field {
-    std::string_view name;
-    const rt::Object* value = nullptr;
-  };
-
-  static bool isPredefined(std::string_view name) noexcept {
-    return name.starts_with("LUMLogMetadata") &&
-           (LUMLogMetadata::kComponentKey == name || LUMLogMetadata::kCategoryKey == name ||
-            LUMLogMetadata::kCauseKey == name || LUMLogMetadata::kObfuscatedKiriIDKey == name);
-  }
-
-  // Takes the fields with the first names after `last`, or the first ones of all if that is null.
-  void fill(std::string_view last) {
-    at_ = count_ = 0;
-    if (metadata_ == nullptr) return;
-    for (const auto& [key, value] : *metadata_->properties()) {
-      const auto* const string = rt::cast<rt::StringObject>(key.get());
-      if (string == nullptr || isPredefined(string->view())) continue;
-      const std::string_view name = string->view();
-      if (last.data() != nullptr && name <= last) continue;
-      if (count_ == fields_.size() && name >= fields_.back().name) continue;
-      if (count_ < fields_.size()) ++count_;
-      std::size_t place = count_ - 1;
-      for (; place > 0 && name < fields_[place - 1].name; --place) fields_[place] = fields_[place - 1];
-      fields_[place] = {name, value.get()};
-    }
-  }
-
-  const LUMLogMetadata* const metadata_;
-  std::array<Field, 16> fields_;
-  std::size_t count_ = 0;
-  std::size_t at_ = 0;
-};
+std::string_view identifierOf(std::string_view name, const rt::Object* value) noexcept {
+  if (name == kTrace) return identifierOf(value, 32);
+  if (name == kSpan) return identifierOf(value, 16);
+  return {};
+}
 
 // The members of the object "Attributes": fields and other ones in one order.
 class Attributes {
@@ -203,15 +173,18 @@ class Attributes {
   void beginMember() { line_.append(std::exchange(separator_, ",\"")); }
 
   void appendField() {
-    beginMember();
-    appendJSONText(line_, fields_.name());
-    line_.append("\":");
-    appendValue(line_, fields_.value());
+    // Those of a trace and a span have members of their own.
+    if (identifierOf(fields_.name(), &fields_.value()).empty()) {
+      beginMember();
+      appendJSONText(line_, fields_.name());
+      line_.append("\":");
+      appendValue(line_, fields_.value());
+    }
     fields_.advance();
   }
 
   LUMLogLine& line_;
-  Fields fields_;
+  LUMLogFields fields_;
   std::string_view separator_ = "{\"";
 };
 
@@ -243,11 +216,22 @@ void appendBeginning(LUMLogLine& line, const LUMLogMessage& message) noexcept {
   line.append(R"(,"Body":)");
 }
 
-void appendAttributes(LUMLogLine& line, const LUMLogMessage& message) {
+// Appends what comes after the value of "Body" and before "Resource".
+void appendContext(LUMLogLine& line, const LUMLogMessage& message) {
   const LUMLogMetadata* const metadata = message.logMetadata().get();
   const auto property = [metadata](const rt::String& key) {
     return metadata != nullptr ? metadata->properties()->objectForKey(key) : nullptr;
   };
+  const auto identifier = [&](std::string_view member, const rt::String& key) {
+    const std::string_view digits = identifierOf(key, property(key));
+    if (digits.empty()) return;
+    line.append(member);
+    line.append(digits);
+    line.append('"');
+  };
+  identifier(R"(,"TraceId":")", kTrace);
+  identifier(R"(,"SpanId":")", kSpan);
+  line.append(R"(,"Attributes":)");
   Attributes attributes(line, metadata);
   attributes.text("code.file.path", message.file());
   attributes.text("code.function.name", message.function());
@@ -315,8 +299,7 @@ void LUMLogJSON::appendWhole(LUMLogLine& line, const LUMLogMessage& message) con
   } else {
     line.append("null");
   }
-  line.append(R"(,"Attributes":)");
-  appendAttributes(line, message);
+  appendContext(line, message);
   line.append(R"(,"Resource":{"process.pid":)");
   line.appendNumber(processIdentifier());
   line.append(R"(,"service.name":")");

@@ -24,7 +24,9 @@
 #include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLog.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
+#include "Shared/Logging/LUMLogSpan.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
+#include "Shared/Logging/Loggers/LUMLogCapture.h"
 #include "Shared/Logging/Loggers/Private/LUMLogRenderedLine.h"
 #include "tests/support/AllocationCount.h"
 #include "tests/support/ForkTest.h"
@@ -220,6 +222,47 @@ TEST(LUMLogJSON, LeavesOutPropertiesWithoutAName) {
   EXPECT_NE(lineOf(Event{.metadata = fieldsOf({{Number::of(1), "one"_s}})})
                 .find(R"("Attributes":{"thread.id":N},)"),
             std::string::npos);
+}
+
+TEST(LUMLogJSON, NamesTheTraceAndTheSpan) {
+  const rt::String trace = "0123456789abcdef0123456789abcdef"_s;
+  const rt::String span = "fedcba9876543210"_s;
+  EXPECT_NE(lineOf(Event{.metadata = fieldsOf({{"trace.id"_s, trace}, {"span.id"_s, span}, {"a"_s, "b"_s}})})
+                .find(R"("Body":"text","TraceId":"0123456789abcdef0123456789abcdef",)"
+                      R"("SpanId":"fedcba9876543210","Attributes":{"a":"b","thread.id":N},)"),
+            std::string::npos);
+}
+
+// A host may have fields of these names.
+TEST(LUMLogJSON, KeepsOtherFieldsOfTheNamesOfSpans) {
+  const auto attributes = [](const rt::String& key, const Ref<rt::Object>& value) {
+    const std::string line = lineOf(Event{.metadata = fieldsOf({{key, value}})});
+    EXPECT_EQ(line.find("TraceId"), std::string::npos);
+    EXPECT_EQ(line.find("SpanId"), std::string::npos);
+    const std::size_t place = line.find('"' + std::string(key.view()) + "\":");
+    return place != std::string::npos && place > line.find("\"Attributes\":{");
+  };
+  EXPECT_TRUE(attributes("trace.id"_s, "0123456789abcdef"_s));
+  EXPECT_TRUE(attributes("trace.id"_s, "0123456789abcdef0123456789abcde\""_s));
+  EXPECT_TRUE(attributes("trace.id"_s, Number::of(7)));
+  EXPECT_TRUE(attributes("span.id"_s, "0123456789abcdef0123456789abcdef"_s));
+  EXPECT_TRUE(attributes("span.id"_s, "FEDCBA9876543210"_s));
+}
+
+// The names of the members are those of a real span.
+TEST(LUMLogJSON, RefersToTheSpanOfACall) {
+  const LUMLogCapture capture;
+  {
+    const LUMLogSpan span(LUMLogLevelInfo, "import"_s);
+    LUMLogAt(LUMLogLevelInfo, "reading"_s);
+  }
+  ASSERT_EQ(capture.messages().size(), 2U);
+  for (const Ref<LUMLogMessage>& message : capture.messages()) {
+    const std::string line = lineOf(*message);
+    EXPECT_NE(line.find("\",\"TraceId\":\""), std::string::npos) << line;
+    EXPECT_NE(line.find("\",\"SpanId\":\""), std::string::npos) << line;
+    EXPECT_EQ(line.find(".id\":\""), std::string::npos) << line;
+  }
 }
 
 TEST(LUMLogJSON, NamesTheService) {

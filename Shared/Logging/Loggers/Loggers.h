@@ -11,6 +11,8 @@
 // IWYU pragma: begin_exports
 #include "Shared/Logging/Loggers/LUMBoundedLogger.h"
 #include "Shared/Logging/Loggers/LUMFileLogger.h"
+#include "Shared/Logging/Loggers/LUMLogCapture.h"
+#include "Shared/Logging/Loggers/LUMLogJSON.h"
 #include "Shared/Logging/Loggers/LUMLogLine.h"
 #include "Shared/Logging/Loggers/LUMLogLineFormatter.h"
 #include "Shared/Logging/Loggers/LUMLogOutput.h"

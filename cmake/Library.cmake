@@ -39,18 +39,43 @@ function(mount_point_library name public_name)
     FILE_SET HEADERS DESTINATION "${CMAKE_INSTALL_INCLUDEDIR}/mount-point"
     FILE_SET needed_headers DESTINATION "${CMAKE_INSTALL_INCLUDEDIR}/mount-point")
 
-  # The prefix is relative to the .pc file, so that the installed tree can be moved. The options that link the whole
-  # library are a single word, because pkg-config reorders words.
+  # The options that link the whole library are a single word, because pkg-config reorders words.
+  if(CMAKE_SYSTEM_NAME STREQUAL "Darwin")
+    set(libs "-Wl,-force_load,\${libdir}/libmount-point-${name}.a")
+  else()
+    set(libs "-L\${libdir} -Wl,--whole-archive,-lmount-point-${name},--no-whole-archive")
+  endif()
+  mount_point_pkg_config(${name} DESCRIPTION "${library_DESCRIPTION}" LIBS "${libs}" LIBRARIES ${library_LIBRARIES})
+endfunction()
+
+# mount_point_header_library(NAME PUBLIC_NAME DESCRIPTION TEXT HEADERS FILE… [LIBRARIES NAME…])
+#
+# Adds a library without sources, whose public headers are HEADERS. The rest is as with mount_point_library.
+function(mount_point_header_library name public_name)
+  cmake_parse_arguments(PARSE_ARGV 2 library "" "DESCRIPTION" "HEADERS;LIBRARIES")
+  add_library(${name} INTERFACE)
+  add_library(MountPoint::${public_name} ALIAS ${name})
+  list(TRANSFORM library_LIBRARIES APPEND "-whole" OUTPUT_VARIABLE below)
+  target_link_libraries(${name} INTERFACE ${below})
+  set_target_properties(${name} PROPERTIES EXPORT_NAME ${public_name})
+  target_sources(${name} INTERFACE FILE_SET HEADERS BASE_DIRS "${PROJECT_SOURCE_DIR}" FILES ${library_HEADERS})
+  install(TARGETS ${name} EXPORT MountPoint COMPONENT development
+    FILE_SET HEADERS DESTINATION "${CMAKE_INSTALL_INCLUDEDIR}/mount-point")
+  mount_point_pkg_config(${name} DESCRIPTION "${library_DESCRIPTION}" LIBRARIES ${library_LIBRARIES})
+endfunction()
+
+# mount_point_pkg_config(NAME DESCRIPTION TEXT [LIBS OPTIONS] [LIBRARIES NAME…])
+#
+# Installs what pkg-config needs for the library NAME, which programs link with OPTIONS.
+function(mount_point_pkg_config name)
+  cmake_parse_arguments(PARSE_ARGV 1 library "" "DESCRIPTION;LIBS" "LIBRARIES")
+  # The prefix is relative to the .pc file, so that the installed tree can be moved.
   set(file "mount-point-${name}")
+  set(libs "${library_LIBS}")
   list(TRANSFORM library_LIBRARIES PREPEND "mount-point-" OUTPUT_VARIABLE requires)
   list(JOIN requires ", " requires)
   file(RELATIVE_PATH prefix "/prefix/${CMAKE_INSTALL_LIBDIR}/pkgconfig" "/prefix")
   string(REGEX REPLACE "/$" "" prefix "${prefix}")
-  if(CMAKE_SYSTEM_NAME STREQUAL "Darwin")
-    set(libs "-Wl,-force_load,\${libdir}/lib${file}.a")
-  else()
-    set(libs "-L\${libdir} -Wl,--whole-archive,-l${file},--no-whole-archive")
-  endif()
   configure_file("${PROJECT_SOURCE_DIR}/cmake/library.pc.in" "${PROJECT_BINARY_DIR}/${file}.pc" @ONLY)
   install(FILES "${PROJECT_BINARY_DIR}/${file}.pc" DESTINATION "${CMAKE_INSTALL_LIBDIR}/pkgconfig"
     COMPONENT development)

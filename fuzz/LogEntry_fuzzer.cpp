@@ -8,6 +8,7 @@
 
 #include <algorithm>
 #include <array>
+#include <cctype>
 #include <cerrno>
 #include <cstddef>
 #include <cstdint>
@@ -128,11 +129,32 @@ const char* severity(const LogEntry& entry) {
                                      : "2";
 }
 
+// The name that a field has in the journal, by the words of the contract.
+std::string journalName(const std::string& given) {
+  static constexpr std::array<const char*, 6> kTaken = {"PRIORITY",  "DROPPED",  "SYSLOG_IDENTIFIER",
+                                                        "SUBSYSTEM", "CATEGORY", "MESSAGE"};
+  std::string name;
+  for (const char each : given) {
+    const int upper = std::toupper(static_cast<unsigned char>(each));
+    name += (upper >= 'A' && upper <= 'Z') || (upper >= '0' && upper <= '9') ? static_cast<char>(upper) : '_';
+  }
+  const bool isTaken = std::ranges::find(kTaken, name.substr(0, 64)) != kTaken.end();
+  if (name.empty() || name[0] < 'A' || name[0] > 'Z' || isTaken) name.insert(0, "FIELD_");
+  return name.substr(0, 64);
+}
+
 void checkJournal(const LogEntry& entry) {
   daemon_.received.clear();
   require(rt::detail::writeToJournal(entry, {}) == Delivery::done);
   require(daemon_.received.size() == 1);
-  Fields expected{{"PRIORITY", severity(entry)}, {"TID", std::to_string(rt::currentThreadIdentifier())}};
+  Fields expected{{"PRIORITY", severity(entry)}};
+  bool hasThread = false;
+  for (const rt::SystemLog::Field& field :
+       entry.fields.first(std::min<std::size_t>(entry.fields.size(), 32))) {
+    expected.emplace_back(journalName(std::string(field.name)), field.value);
+    hasThread = hasThread || expected.back().first == "TID";
+  }
+  if (!hasThread) expected.emplace_back("TID", std::to_string(rt::currentThreadIdentifier()));
   if (entry.dropped != 0) expected.emplace_back("DROPPED", std::to_string(entry.dropped));
   expected.emplace_back("SYSLOG_IDENTIFIER", program_invocation_short_name);
   expected.emplace_back("SUBSYSTEM", entry.subsystem);
@@ -203,6 +225,14 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t siz
   std::erase(program, '\0');
   std::string subsystem = data.ConsumeRandomLengthString(100);
   const std::string category = data.ConsumeRandomLengthString(100);
+  std::vector<std::pair<std::string, std::string>> given(data.ConsumeIntegralInRange<std::size_t>(0, 40));
+  for (auto& [name, value] : given) {
+    name = data.ConsumeRandomLengthString(80);
+    value = data.ConsumeRandomLengthString(100);
+    if (data.ConsumeBool()) value.append(repetitions * 100, 'v');
+  }
+  std::vector<rt::SystemLog::Field> fields;
+  for (const auto& [name, value] : given) fields.push_back({name, value});
   const std::string part = data.ConsumeRemainingBytesAsString();
   std::string text;
   for (std::size_t i = 0; i < repetitions; ++i) text += part;
@@ -211,6 +241,7 @@ extern "C" int LLVMFuzzerTestOneInput(const std::uint8_t* bytes, std::size_t siz
   entry.subsystem = subsystem;
   entry.category = category;
   entry.text = text;
+  entry.fields = fields;
 
   char* const before = program_invocation_short_name;
   program_invocation_short_name = program.data();

@@ -11,7 +11,8 @@
 ///
 /// On Linux an entry goes to the journal. `journalctl SUBSYSTEM=com.example.host` shows it. Its fields are
 /// MESSAGE, PRIORITY (debug 7, info 6, error 3, fault 2), SUBSYSTEM, CATEGORY, SYSLOG_IDENTIFIER (the
-/// program's name) and TID. The journal receives entries of any size, with every byte.
+/// program's name), TID, and those that the caller gives. The journal receives entries of any size, with
+/// every byte.
 ///
 /// If no journal listens, the entry goes to the classic socket /dev/log. If nobody listens there either, it
 /// goes to standard error. In both places control characters are escaped ("\n", "\x1b"). On standard error an
@@ -38,7 +39,9 @@
 ///
 /// Not for: messages to the user of a program; secrets, since entries are public.
 
+#include <cstddef>
 #include <cstdint>
+#include <span>
 #include <string_view>
 
 #include "Runtime/Objects/String.h"
@@ -53,6 +56,19 @@ class SystemLog {
   /// The longest time that one call of `write` waits for daemons.
   static constexpr int kLongestWaitMilliseconds = 250;
 
+  /// A named value beside the text of an entry. Only the journal stores it.
+  ///
+  /// The name of the field in the journal is `name` with upper-case letters, and with '_' for all but letters
+  /// and digits. "FIELD_" precedes it if it would begin otherwise than with a letter, or be the name of
+  /// another field above. It is cut at 64 bytes. A field called TID replaces the calling thread's.
+  struct Field {
+    std::string_view name;
+    std::string_view value;
+  };
+
+  /// The number of fields that an entry may have. It is written without those beyond.
+  static constexpr std::size_t kMostFields = 32;
+
   /// Makes a log for the entries of `category` in `subsystem`. Null counts as empty.
   SystemLog(String subsystem, String category) noexcept;
 
@@ -60,11 +76,11 @@ class SystemLog {
   /// MaxLevelStore= decides what is stored. Preserves `errno`.
   bool isEnabled(Type type) const noexcept;
 
-  /// Writes the entry `text`, which should be UTF-8. If a journal listens, or the unified log, takes no lock
-  /// of its own and allocates nothing itself. Preserves `errno`. May also be called while the program is
-  /// being loaded, and after `main`. Threads: thread-safe. Threads do not wait for each other's entries.
-  /// Errors: drops and counts an entry that cannot be written, as described above.
-  void write(Type type, std::string_view text) const noexcept;
+  /// Writes the entry `text`, which should be UTF-8, with `fields`. If a journal listens, or the unified log,
+  /// takes no lock of its own and allocates nothing itself. Preserves `errno`. May also be called while the
+  /// program is being loaded, and after `main`. Threads: thread-safe. Threads do not wait for each other's
+  /// entries. Errors: drops and counts an entry that cannot be written, as described above.
+  void write(Type type, std::string_view text, std::span<const Field> fields = {}) const noexcept;
 
   /// Returns how many entries of this process were dropped so far, reported or not. Threads: thread-safe.
   static std::uint64_t droppedCount() noexcept;

@@ -12,6 +12,7 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <array>
 #include <atomic>
 #include <cerrno>
@@ -124,8 +125,8 @@ TEST_F(SystemLogTest, KeepsValuesOfAnyLength) {
     rt::SystemLog(rt::String::fromUTF8(subsystem), "lengths"_s).write(Type::info, text);
     sent.push_back(subsystem + '|' + text);
   };
-  for (std::size_t length = 1600; length < 2100; length += 3) write(0, length);
-  for (std::size_t length = 1600; length < 2100; length += 7) write(length, 300);
+  for (std::size_t length = 4450; length < 4850; length += 3) write(0, length);
+  for (std::size_t length = 4450; length < 4850; length += 7) write(length, 300);
   for (std::size_t length = 212'200; length < 213'100; length += 60) write(0, length);
   for (int i = 0; i < 100; ++i) write(random() % 3000, random() % 3000);
   std::vector<std::string> kept;
@@ -135,6 +136,64 @@ TEST_F(SystemLogTest, KeepsValuesOfAnyLength) {
   EXPECT_EQ(kept.size(), sent.size());
   EXPECT_TRUE(kept == sent);
   EXPECT_EQ(dropped(), 0U);
+}
+
+// Writes one entry with this field, and returns the name that the journal stores it under.
+std::string journalName(const std::string& name) {
+  PrivateJournal journal;
+  journal.start();
+  const rt::SystemLog::Field field{name, "the value"};
+  testLog().write(Type::info, "text", {&field, 1});
+  const PrivateJournal::Entry entry = testEntries(journal).at(0);
+  for (const auto& [stored, value] : entry) {
+    if (value == "the value") return stored;
+  }
+  return "";
+}
+
+TEST_F(SystemLogTest, NamesAFieldAsTheJournalDemands) {
+  EXPECT_EQ(journalName("USER"), "USER");
+  EXPECT_EQ(journalName("http.status-2"), "HTTP_STATUS_2");
+  EXPECT_EQ(journalName("_PID"), "FIELD__PID");
+  EXPECT_EQ(journalName("2nd"), "FIELD_2ND");
+  EXPECT_EQ(journalName(""), "FIELD_");
+  EXPECT_EQ(journalName("message"), "FIELD_MESSAGE");
+  EXPECT_EQ(journalName("a=b\nPRIORITY"), "A_B_PRIORITY");
+  EXPECT_EQ(journalName("\xC3\xA4"), "FIELD___");
+  EXPECT_EQ(journalName(std::string(100, 'n')), std::string(64, 'N'));
+}
+
+TEST_F(SystemLogTest, WritesTheFieldsOfTheCaller) {
+  PrivateJournal journal;
+  journal.start();
+  const std::string large(10'000, 'l');
+  const std::string lines = "a\nPRIORITY=0\n";
+  const std::array<rt::SystemLog::Field, 4> fields{
+      {{"empty", ""}, {"large", large}, {"lines", lines}, {"tid", "7"}}};
+  testLog().write(Type::error, "text", fields);
+  PrivateJournal::Entry entry = testEntries(journal).at(0);
+  EXPECT_EQ(entry["MESSAGE"], "text");
+  EXPECT_EQ(entry["PRIORITY"], "3");
+  EXPECT_TRUE(entry.contains("EMPTY"));
+  EXPECT_EQ(entry["LARGE"], large);
+  EXPECT_EQ(entry["LINES"], lines);
+  EXPECT_EQ(entry["TID"], "7");
+}
+
+TEST_F(SystemLogTest, WritesTheFirstFieldsOfVeryMany) {
+  PrivateJournal journal;
+  journal.start();
+  std::vector<std::string> names;
+  for (int i = 0; i < 40; ++i) names.push_back(std::string(70, 'a') + std::to_string(i));
+  for (std::string& name : names) name.erase(0, name.size() - 64);
+  const std::string value(90, 'v');
+  std::vector<rt::SystemLog::Field> fields;
+  for (const std::string& name : names) fields.push_back({name, value});
+  testLog().write(Type::info, "text", fields);
+  PrivateJournal::Entry entry = testEntries(journal).at(0);
+  EXPECT_EQ(entry["MESSAGE"], "text");
+  const auto count = std::ranges::count(entry, value, &PrivateJournal::Entry::value_type::second);
+  EXPECT_EQ(count, static_cast<std::ptrdiff_t>(rt::SystemLog::kMostFields));
 }
 
 TEST_F(SystemLogTest, AllocatesNothingIfTheJournalListens) {
@@ -147,8 +206,10 @@ TEST_F(SystemLogTest, AllocatesNothingIfTheJournalListens) {
   const rt::SystemLog log("com.example.test"_s, "unit"_s);
   if (log.isEnabled(Type::info)) log.write(Type::info, "second");
   log.write(Type::info, large);
+  const rt::SystemLog::Field field{"large", large};
+  log.write(Type::info, "third", {&field, 1});
   EXPECT_EQ(count.allocations(), 0);
-  EXPECT_EQ(messages(journal).size(), 3U);
+  EXPECT_EQ(messages(journal).size(), 4U);
 }
 
 TEST_F(SystemLogTest, PreservesErrno) {

@@ -18,6 +18,7 @@
 #include "Runtime/Values/Number.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
+#include "Shared/Logging/LUMLogScope.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
 #include "Shared/Logging/Private/LUMLogSourceText.h"
 
@@ -99,8 +100,8 @@ constexpr std::uint64_t kOwnFrameCount = 2;
   rt::String functionText = LUMLogSourceText(function);
   rt::Ref<LUMLogMessage> message =
       LUMLogV(level, fileText ? std::move(fileText) : "(invalid file)"_s,
-              functionText ? std::move(functionText) : "(invalid function)"_s, line, callstack, metadata,
-              argumentCount, argumentKinds, format, arguments);
+              functionText ? std::move(functionText) : "(invalid function)"_s, line, callstack,
+              LUMLogScope::metadataWith(metadata), argumentCount, argumentKinds, format, arguments);
   multiplexer.logWithMessage(message);
   return message;
 }

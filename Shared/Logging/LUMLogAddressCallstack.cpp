@@ -100,7 +100,7 @@ bool LUMLogAddressCallstack::isEqual(const rt::Object* other) const {
   if (this == other) return true;
   const auto* stack = rt::cast<LUMLogAddressCallstack>(other);
   return stack != nullptr && filteredAddressCount_ == stack->filteredAddressCount_ &&
-         std::ranges::equal(kept(), stack->kept());
+         std::ranges::equal(addresses(), stack->addresses());
 }
 
 std::uint64_t LUMLogAddressCallstack::hash() const {
@@ -120,7 +120,7 @@ rt::String LUMLogAddressCallstack::description() const {
   appendPointer(builder, reinterpret_cast<std::uintptr_t>(this));
   builder.append("> { ");
   const char* separator = "";
-  for (const std::uint64_t address : kept()) {
+  for (const std::uint64_t address : addresses()) {
     builder.append(std::exchange(separator, ", "));
     appendPointer(builder, address);
   }

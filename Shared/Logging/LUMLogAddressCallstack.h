@@ -60,6 +60,11 @@ class RT_VISIBLE LUMLogAddressCallstack
   /// Returns the number of addresses that are not left out.
   std::uint64_t frameCount() const noexcept { return filteredAddressCount_; }
 
+  /// Returns these addresses. They live as long as the call stack.
+  std::span<const std::uint64_t> addresses() const noexcept {
+    return {filteredAddresses_, static_cast<std::size_t>(filteredAddressCount_)};
+  }
+
   /// Calls `visitor` with each address that is not left out, in order. Does nothing if `visitor` is null.
   /// Throws what `visitor` throws.
   void enumerateAddressesWithBlock(const Visitor& visitor) const;
@@ -79,10 +84,6 @@ class RT_VISIBLE LUMLogAddressCallstack
   ~LUMLogAddressCallstack() override;
 
  private:
-  std::span<const std::uint64_t> kept() const noexcept {
-    return {filteredAddresses_, static_cast<std::size_t>(filteredAddressCount_)};
-  }
-
   // Owned, and freed with `free`.
   std::uint64_t* const addresses_;
   const std::uint64_t addressCount_;

@@ -15,14 +15,17 @@
 #include "Shared/Logging/LUMLogLevels.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMSafeNumberParameter.h"
+#include "Shared/Logging/Loggers/Testing/LUMLogMatchers.h"
 #include "tests/support/FirstSymbol.h"
-#include "tests/support/TestLoggers.h"
 
 namespace {
 
 using namespace rt::literals;
 using namespace std::chrono_literals;
+using namespace LUMLogMatchers;
 using rt::Ref;
+using testing::AllOf;
+using testing::ElementsAre;
 using testing::HasSubstr;
 
 enum Size : std::uint8_t { kSmall, kLarge };
@@ -66,29 +69,20 @@ TEST(LUMLogField, MakesAStringOfATextAndOfADescription) {
 
 class LUMLogFieldTest : public testing::Test {
  protected:
-  LUMLogFieldTest() { LUMLogMultiplexer::sharedInstance()->addSyncLogger(logger_); }
-  ~LUMLogFieldTest() override { LUMLogMultiplexer::sharedInstance()->removeSyncLogger(logger_); }
-
-  Ref<LUMLogMessage> last_;
-  const Ref<TestSyncLogger> logger_ =
-      rt::make<TestSyncLogger>([this](const Ref<LUMLogMessage>& message) { last_ = message; });
+  const LUMLogCapture capture_;
 };
 
 TEST_F(LUMLogFieldTest, BecomesAPropertyOfTheMessage) {
   const Ref<LUMLogMessage> message =
       LUMLogAt(LUMLogLevelInfo, "%d entries"_s, 3, LUMLogField("user", "ann"_s), LUMLogField("bytes", 42));
-  EXPECT_EQ(message->formattedString(), "3 entries");
-  ASSERT_TRUE(message->logMetadata());
+  EXPECT_THAT(message, AllOf(HasText("3 entries"), HasField("user", "ann"), HasField("bytes", 42)));
   EXPECT_EQ(message->logMetadata()->properties()->count(), 2U);
-  EXPECT_TRUE(rt::isEqual(message->logMetadata()->propertyForKey("user"_s), Ref<rt::Object>("ann"_s)));
-  EXPECT_TRUE(rt::isEqual(message->logMetadata()->propertyForKey("bytes"_s), rt::Number::of(42)));
 }
 
 TEST_F(LUMLogFieldTest, StandsBesideTheMetadataOfTheCall) {
   const Ref<LUMLogMetadata> importer = LUMLogMetadata::metadataWithComponent("Importer"_s);
   const Ref<LUMLogMessage> message = LUMLogAt(LUMLogLevelInfo, importer, "text"_s, LUMLogField("bytes", 42));
-  EXPECT_EQ(message->logMetadata()->component(), "Importer");
-  EXPECT_TRUE(rt::isEqual(message->logMetadata()->propertyForKey("bytes"_s), rt::Number::of(42)));
+  EXPECT_THAT(message, AllOf(HasComponent("Importer"), HasField("bytes", 42)));
   EXPECT_EQ(importer->properties()->count(), 1U);
 }
 
@@ -97,8 +91,7 @@ TEST_F(LUMLogFieldTest, ReplacesAPropertyAndALaterOneReplacesIt) {
   const Ref<LUMLogMessage> message =
       LUMLogAt(LUMLogLevelInfo, importer, "text"_s, LUMLogField("LUMLogMetadataComponent", "Other"_s),
                LUMLogField("n", 1), LUMLogField("n", 2));
-  EXPECT_EQ(message->logMetadata()->component(), "Other");
-  EXPECT_TRUE(rt::isEqual(message->logMetadata()->propertyForKey("n"_s), rt::Number::of(2)));
+  EXPECT_THAT(message, AllOf(HasComponent("Other"), HasField("n", 2)));
 }
 
 TEST_F(LUMLogFieldTest, LeavesTheMetadataAsItIsIfThereIsNone) {
@@ -124,7 +117,7 @@ TEST_F(LUMLogFieldTest, IsNoArgumentOfTheFormat) {
 
 TEST_F(LUMLogFieldTest, LeavesTheCallerTheFirstFrame) {
   functionThatLogsAField();
-  EXPECT_THAT(firstSymbolOf(*last_), HasSubstr("functionThatLogsAField("));
+  EXPECT_THAT(firstSymbolOf(*capture_.messages().at(0)), HasSubstr("functionThatLogsAField("));
 }
 
 // Counts how often its description is asked for.
@@ -153,11 +146,9 @@ TEST_F(LUMLogFieldTest, MayNameTheComponentThatIsWanted) {
   ASSERT_FALSE(levels->setText("error,Importer=debug"_s));
   LUMLogMultiplexer::sharedInstance()->addLogFilter(levels);
   LUMLogAt(LUMLogLevelDebug, "wanted"_s, LUMLogField("LUMLogMetadataComponent", "Importer"_s));
-  ASSERT_TRUE(last_);
-  EXPECT_EQ(last_->formattedString(), "wanted");
   LUMLogAt(LUMLogLevelDebug, "refused"_s, LUMLogField("LUMLogMetadataComponent", "Other"_s));
   LUMLogMultiplexer::sharedInstance()->removeLogFilter(levels);
-  EXPECT_EQ(last_->formattedString(), "wanted");
+  EXPECT_THAT(capture_.messages(), ElementsAre(HasText("wanted")));
 }
 
 }  // namespace

@@ -8,6 +8,10 @@ constexpr rt::String LUMLogMetadata::kComponentKey = "LUMLogMetadataComponent"_s
 constexpr rt::String LUMLogMetadata::kCategoryKey = "LUMLogMetadataCategory"_s;
 constexpr rt::String LUMLogMetadata::kCauseKey = "LUMLogMetadataCause"_s;
 
+bool LUMLogMetadata::isPredefinedKey(const rt::String& key) noexcept {
+  return key == kObfuscatedKiriIDKey || key == kComponentKey || key == kCategoryKey || key == kCauseKey;
+}
+
 rt::Ref<LUMLogMetadata> LUMLogMetadata::initWithProperties(const rt::Ref<rt::Dictionary>& properties) {
   rt::Dictionary::Builder copies;
   if (properties) {
@@ -40,6 +44,15 @@ rt::Ref<LUMLogMetadata> LUMLogMetadata::metadataByAddingProperties(const rt::Ref
       metadata ? rt::Dictionary::Builder(*metadata->properties_) : rt::Dictionary::Builder();
   for (const auto& [key, value] : added) changed.set(key, rt::copy(value));
   return metadataWith(std::move(changed));
+}
+
+rt::Ref<LUMLogMetadata> LUMLogMetadata::metadataByMerging(const rt::Ref<LUMLogMetadata>& lower,
+                                                          const rt::Ref<LUMLogMetadata>& upper) {
+  if (!lower) return upper;
+  if (!upper) return lower;
+  rt::Dictionary::Builder merged(*lower->properties_);
+  for (const auto& [key, value] : *upper->properties_) merged.set(key, value);
+  return metadataWith(std::move(merged));
 }
 
 rt::Ref<LUMLogMetadata> LUMLogMetadata::metadataWith(rt::Dictionary::Builder&& properties) {

@@ -32,6 +32,9 @@ class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Obje
   static const rt::String kCategoryKey;          // "LUMLogMetadataCategory"
   static const rt::String kCauseKey;             // "LUMLogMetadataCause"
 
+  /// Returns whether `key` is one of these.
+  static bool isPredefinedKey(const rt::String& key) noexcept;
+
   /// Makes metadata of `properties`, whose keys are strings. Null counts as empty. Like every function that
   /// makes metadata, it throws what copying a value throws, and std::bad_alloc.
   static rt::Ref<LUMLogMetadata> initWithProperties(const rt::Ref<rt::Dictionary>& properties);
@@ -72,6 +75,11 @@ class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Obje
   using Property = std::pair<rt::String, rt::Ref<rt::Object>>;
   static rt::Ref<LUMLogMetadata> metadataByAddingProperties(const rt::Ref<LUMLogMetadata>& metadata,
                                                             std::span<const Property> added);
+
+  /// Returns metadata with the properties of both, each of which may be null. Those of `upper` replace those
+  /// of `lower`. Returns one of the two if the other is null.
+  static rt::Ref<LUMLogMetadata> metadataByMerging(const rt::Ref<LUMLogMetadata>& lower,
+                                                   const rt::Ref<LUMLogMetadata>& upper);
 
   /// Same as `messageWithKey`, for the predefined keys.
   rt::Ref<LUMLogMetadata> metadataByAddingObfuscatedKiriID(

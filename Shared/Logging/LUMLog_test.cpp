@@ -11,6 +11,7 @@
 #include <string>
 #include <string_view>
 #include <thread>
+#include <utility>
 #include <vector>
 
 #include "Runtime/Process/Thread.h"
@@ -23,6 +24,7 @@
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
 #include "Shared/Logging/LUMSafeNumberParameter.h"
 #include "Shared/Logging/LUMSafeStringParameter.h"
+#include "Shared/Logging/Loggers/Testing/LUMLogMatchers.h"
 #include "tests/support/AllocationCount.h"
 #include "tests/support/FirstSymbol.h"
 #include "tests/support/TestLoggers.h"
@@ -30,30 +32,23 @@
 namespace {
 
 using namespace rt::literals;
+using namespace LUMLogMatchers;
+using testing::ElementsAre;
 using testing::HasSubstr;
+using testing::IsEmpty;
+using testing::SizeIs;
 
 constexpr const char* kInvalid = "a\xFF";
 
-// Stores the messages that it gets.
-class Recorder final : public rt::Implements<Recorder, rt::Object, LUMSyncLogger> {
- public:
-  void logWithMessage(const rt::Ref<LUMLogMessage>& message) override { messages.push_back(message); }
-  rt::Ref<LUMLogFilter> filter() const override { return nullptr; }
-
-  std::vector<rt::Ref<LUMLogMessage>> messages;
-};
-
-// Uses the shared multiplexer with a recorder as its only logger.
+// Uses the shared multiplexer with a capture as its only logger.
 class LUMLogTest : public testing::Test {
  protected:
   LUMLogTest() {
     const rt::Ref<LUMSystemLogger> replacement = LUMSystemLogger::initWithFilter(nullptr);
     multiplexer_->addSyncLogger(replacement);
     multiplexer_->removeSyncLogger(replacement);
-    multiplexer_->addSyncLogger(recorder_);
   }
   ~LUMLogTest() override {
-    multiplexer_->removeSyncLogger(recorder_);
     multiplexer_->setCaptureCallStack(true);
     multiplexer_->setCaptureCallStackAddresses(true);
     multiplexer_->setCaptureSwiftCallStackOnErrorAndAbove(false);
@@ -68,7 +63,7 @@ class LUMLogTest : public testing::Test {
   }
 
   const rt::Ref<LUMLogMultiplexer>& multiplexer_ = LUMLogMultiplexer::sharedInstance();
-  const rt::Ref<Recorder> recorder_ = rt::make<Recorder>();
+  std::optional<LUMLogCapture> capture_{std::in_place};
 };
 
 rt::Object* object(const rt::Ref<rt::Object>& ref) {
@@ -79,8 +74,7 @@ TEST_F(LUMLogTest, LogsTheMessageThatItReturns) {
   const rt::Ref<LUMLogMetadata> metadata = LUMLogMetadata::metadataWithComponent("c"_s);
   const rt::Ref<LUMLogMessage> message =
       LUMLog(LUMLogLevelInfo, "a/b", "-[C d:]", 17, metadata, 0, nullptr, "text"_s);
-  ASSERT_EQ(recorder_->messages.size(), 1U);
-  EXPECT_EQ(recorder_->messages[0], message);
+  EXPECT_THAT(capture_->messages(), ElementsAre(message));
   EXPECT_EQ(message->level(), LUMLogLevelInfo);
   EXPECT_EQ(message->format(), "text");
   EXPECT_EQ(message->formattedString(), "text");
@@ -102,7 +96,7 @@ TEST_F(LUMLogTest, ReturnsAMessageThatAFilterRefuses) {
   ASSERT_TRUE(message);
   EXPECT_EQ(message->formattedString(), "3 entries");
   EXPECT_TRUE(message->callstack());
-  EXPECT_TRUE(recorder_->messages.empty());
+  EXPECT_THAT(capture_->messages(), IsEmpty());
 }
 
 TEST_F(LUMLogTest, RecordsItsCallSite) {
@@ -219,7 +213,7 @@ TEST_F(LUMLogTest, LogsWithoutAFormat) {
   EXPECT_TRUE(message->format().isNull());
   EXPECT_TRUE(message->formattedString().isNull());
   EXPECT_EQ(message->safeParameters()->count(), 1U);
-  EXPECT_EQ(recorder_->messages.size(), 1U);
+  EXPECT_THAT(capture_->messages(), SizeIs(1));
 }
 
 TEST_F(LUMLogTest, ReplacesFileAndFunctionThatAreNotUTF8) {
@@ -286,7 +280,7 @@ TEST_F(LUMLogTest, TheCallStackBeginsWithTheCallingFunction) {
     multiplexer_->setCaptureCallStackAddresses(captureAddresses);
     EXPECT_THAT(firstSymbolOf(*functionThatLogs(nullptr)), HasSubstr("functionThatLogs("));
     functionThatLogsAndForgets();
-    EXPECT_THAT(firstSymbolOf(*recorder_->messages.back()), HasSubstr("functionThatLogsAndForgets("));
+    EXPECT_THAT(firstSymbolOf(*capture_->messages().back()), HasSubstr("functionThatLogsAndForgets("));
     EXPECT_THAT(firstSymbolOf(*functionThatLogsLikeAProgram()), HasSubstr("functionThatLogsLikeAProgram("));
   }
 }
@@ -311,7 +305,7 @@ TEST_F(LUMLogTest, LUMLogVMakesAMessageWithoutLoggingIt) {
   const LUMLogArgumentKind kinds[] = {0, 1};
   const rt::Ref<LUMLogMessage> message =
       messageOfList(callstack, metadata, 2, kinds, "%d %@", 3, object(safe));
-  EXPECT_TRUE(recorder_->messages.empty());
+  EXPECT_THAT(capture_->messages(), IsEmpty());
   EXPECT_EQ(message->level(), 9U);
   EXPECT_EQ(message->file(), "file");
   EXPECT_TRUE(message->function().isNull());
@@ -331,9 +325,9 @@ class Thrower final : public rt::Implements<Thrower, rt::Object> {
 TEST_F(LUMLogTest, ThrowsWhatADescriptionThrows) {
   const rt::Ref<Thrower> thrower = rt::make<Thrower>();
   EXPECT_THROW(LUMLogAt(LUMLogLevelInfo, "%@", thrower), std::runtime_error);
-  EXPECT_TRUE(recorder_->messages.empty());
+  EXPECT_THAT(capture_->messages(), IsEmpty());
   LUMLogAt(LUMLogLevelInfo, "the next");
-  EXPECT_EQ(recorder_->messages.size(), 1U);
+  EXPECT_THAT(capture_->messages(), ElementsAre(HasText("the next")));
 }
 
 // Reads each message and stores nothing.
@@ -347,12 +341,12 @@ class Reader final : public rt::Implements<Reader, rt::Object, LUMSyncLogger> {
   std::size_t length = 0;
 };
 
-// Uses a reader in place of the recorder.
+// Uses a reader in place of the capture.
 class LUMLogAllocationTest : public LUMLogTest {
  protected:
   void SetUp() override {
     if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations on this system";
-    multiplexer_->removeSyncLogger(recorder_);
+    capture_.reset();
     multiplexer_->addSyncLogger(reader_);
   }
   void TearDown() override { multiplexer_->removeSyncLogger(reader_); }

@@ -11,6 +11,7 @@
 #include "Runtime/SystemLog/SystemLog.h"
 #include "Runtime/Text/Format.h"
 #include "Shared/Logging/LUMSystemLoggerFormatter.h"
+#include "Shared/Logging/Private/LUMLogEntryFields.h"
 
 namespace {
 
@@ -61,7 +62,8 @@ void LUMSystemLogger::logWithMessage(const rt::Ref<LUMLogMessage>& message) {
   const rt::String text = textOf(*message, *formatter_);
   const std::optional<rt::SystemLog::Type> type = typeOf(message->level());
   if (text.isEmpty() || !type || !log.isEnabled(*type)) return;
-  log.write(*type, text);
+  const LUMLogEntryFields fields(*message);
+  log.write(*type, text, fields.fields());
 }
 
 rt::String LUMSystemLogger::subsystemOf(const LUMLogMessage& message) const {

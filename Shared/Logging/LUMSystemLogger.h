@@ -9,6 +9,10 @@
 /// The category of an entry is the one in the metadata. Levels 1 to 4 become entries of type debug, info,
 /// error and fault. Messages of other levels are not written.
 ///
+/// The journal also stores CODE_FILE, CODE_LINE, CODE_FUNC and TID, the time as REALTIME_TIMESTAMP in
+/// microseconds since 1970, and the other properties of the metadata: `LUMLogField("user", "ann")` becomes
+/// USER=ann. It stores 32 of all these at most.
+///
 /// Not for: text whose lifetime on disk the host must control.
 
 #include "Runtime/Base/Visibility.h"

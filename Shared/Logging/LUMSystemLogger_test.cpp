@@ -11,6 +11,8 @@
 #include <sys/wait.h>
 #include <unistd.h>
 
+#include <algorithm>
+#include <array>
 #include <cerrno>
 #include <cstdint>
 #include <cstdlib>
@@ -51,6 +53,12 @@ Ref<LUMLogMessage> messageIn(const rt::String& function, const rt::String& text)
   return LUMLogMessage::initWithLevel(LUMLogLevelInfo, "%@"_s, text, "a/b.cpp"_s, function, 7, nullptr,
                                       nullptr, nullptr, nullptr, nullptr);
 }
+
+class Mute : public rt::Implements<Mute, rt::Object> {
+ public:
+  static constexpr std::string_view kClassName = "Mute";
+  rt::String description() const override { throw std::runtime_error("no"); }
+};
 
 class LUMSystemLoggerTest : public testing::Test {
  protected:
@@ -160,6 +168,57 @@ TEST_F(LUMSystemLoggerTest, WritesTheFunctionAndTheText) {
   logger->logWithMessage(messageIn("f"_s, "100 % of %@ and %s and %n"_s));
   EXPECT_THAT(messages(),
               ElementsAre("int main(): started", "started", "f: (null)", "f: 100 % of %@ and %s and %n"));
+}
+
+TEST_F(LUMSystemLoggerTest, WritesThePlaceTheThreadAndTheTime) {
+  const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
+  Ref<LUMLogMessage> message;
+  std::thread([&] { message = messageIn("void f()"_s, "text"_s); }).join();
+  logger->logWithMessage(message);
+  logger->logWithMessage(LUMLogMessage::initWithLevel(LUMLogLevelInfo, nullptr, "bare"_s, nullptr, nullptr, 0,
+                                                      nullptr, nullptr, nullptr, nullptr, nullptr));
+  std::vector<PrivateJournal::Entry> all = entries();
+  ASSERT_EQ(all.size(), 2U);
+  EXPECT_EQ(all[0]["CODE_FILE"], "a/b.cpp");
+  EXPECT_EQ(all[0]["CODE_LINE"], "7");
+  EXPECT_EQ(all[0]["CODE_FUNC"], "void f()");
+  EXPECT_EQ(all[0]["TID"], std::to_string(message->threadIdentifier()));
+  EXPECT_EQ(all[0]["REALTIME_TIMESTAMP"], std::to_string(message->time() / 1000));
+  for (const char* name : {"CODE_FILE", "CODE_LINE", "CODE_FUNC"})
+    EXPECT_FALSE(all[1].contains(name)) << name;
+}
+
+TEST_F(LUMSystemLoggerTest, WritesThePropertiesOfTheMetadata) {
+  const Ref<LUMLogMetadata> importer = LUMLogMetadata::metadataWithObfuscatedKiriID(
+      "kiri"_s, "Importer"_s, "network"_s, rt::Ref<rt::Object>("cause"_s));
+  const std::array<LUMLogMetadata::Property, 3> properties{
+      {{"user"_s, "ann"_s}, {"bytes"_s, rt::Number::of(42)}, {"mute"_s, rt::make<Mute>()}}};
+  const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
+  logger->logWithMessage(messageWith(LUMLogLevelError, "text"_s,
+                                     LUMLogMetadata::metadataByAddingProperties(importer, properties)));
+  PrivateJournal::Entry entry = entries().at(0);
+  EXPECT_EQ(entry["USER"], "ann");
+  EXPECT_EQ(entry["BYTES"], "42");
+  EXPECT_EQ(entry["MUTE"], "(no description)");
+  for (const auto& [name, value] : entry) {
+    EXPECT_FALSE(name.starts_with("LUMLOGMETADATA")) << name;
+    EXPECT_NE(value, "kiri") << name;
+    EXPECT_NE(value, "cause") << name;
+  }
+}
+
+TEST_F(LUMSystemLoggerTest, WritesTheFirstOfVeryManyProperties) {
+  std::vector<LUMLogMetadata::Property> properties;
+  for (int i = 0; i < 100; ++i) {
+    properties.emplace_back(rt::String::fromUTF8("key" + std::to_string(i)), rt::Number::of(i));
+  }
+  const Ref<LUMSystemLogger> logger = LUMSystemLogger::initWithFilter(nullptr);
+  logger->logWithMessage(messageWith(LUMLogLevelError, "text"_s,
+                                     LUMLogMetadata::metadataByAddingProperties(nullptr, properties)));
+  PrivateJournal::Entry entry = entries().at(0);
+  EXPECT_EQ(entry["MESSAGE"], "text");
+  const auto isProperty = [](const auto& field) { return field.first.starts_with("KEY"); };
+  EXPECT_GE(std::ranges::count_if(entry, isProperty), 27);
 }
 
 TEST_F(LUMSystemLoggerTest, WritesNothingWithoutText) {

@@ -42,6 +42,8 @@
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMLogMultiplexing.h"
 #include "Shared/Logging/LUMLogNoFilter.h"
+#include "Shared/Logging/LUMLogScope.h"
+#include "Shared/Logging/LUMLogSpan.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
 #include "Shared/Logging/LUMLogger.h"
 #include "Shared/Logging/LUMSafeNumberParameter.h"

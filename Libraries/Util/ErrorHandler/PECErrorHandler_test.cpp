@@ -26,6 +26,7 @@
 #include "Shared/Logging/LUMLogMinimumLevelFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMSystemLogger.h"
+#include "Shared/Logging/Loggers/Testing/LUMLogMatchers.h"
 #include "tests/support/AtEnd.h"
 #include "tests/support/PECErrorHandlerTest.h"
 #include "tests/support/TestLoggers.h"
@@ -33,6 +34,7 @@
 namespace {
 
 using namespace rt::literals;
+using namespace LUMLogMatchers;
 using rt::Ref;
 using testing::ElementsAre;
 using testing::IsEmpty;
@@ -375,17 +377,12 @@ TEST_F(PECErrorHandlerTest, ThrowsForANullCallbackIfNoneIsSet) {
 }
 
 TEST_F(PECErrorHandlerTest, ReportsABadCallbackWithoutMetadataAndArguments) {
-  std::vector<Ref<LUMLogMessage>> messages;
-  const auto logger =
-      rt::make<TestSyncLogger>([&](const Ref<LUMLogMessage>& message) { messages.push_back(message); });
-  LUMLogMultiplexer::sharedInstance()->addSyncLogger(logger);
+  const LUMLogCapture capture;
   handler_->registerErrorHandlerBlock(tracing());
   handler_->registerErrorHandlerBlock(nullptr);
   handler_->registerErrorHandlerBlock(tracing());
-  LUMLogMultiplexer::sharedInstance()->removeSyncLogger(logger);
-  ASSERT_EQ(messages.size(), 2U);
-  for (const Ref<LUMLogMessage>& message : messages) {
-    EXPECT_EQ(message->level(), LUMLogLevelFault);
+  EXPECT_THAT(capture.messages(), ElementsAre(HasLevel(LUMLogLevelFault), HasLevel(LUMLogLevelFault)));
+  for (const Ref<LUMLogMessage>& message : capture.messages()) {
     EXPECT_EQ(message->logMetadata(), nullptr);
     EXPECT_EQ(message->safeParameters(), nullptr);
   }

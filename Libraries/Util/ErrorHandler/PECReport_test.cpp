@@ -23,12 +23,14 @@
 #include "Shared/Logging/LUMSafeNumberParameter.h"
 #include "Shared/Logging/LUMSafeStringParameter.h"
 #include "Shared/Logging/LUMSystemLogger.h"
-#include "tests/support/TestLoggers.h"
+#include "Shared/Logging/Loggers/Testing/LUMLogMatchers.h"
 
 namespace {
 
 using namespace rt::literals;
+using namespace LUMLogMatchers;
 using rt::Ref;
+using testing::ElementsAre;
 using testing::HasSubstr;
 
 constexpr const char* kFile = "Libraries/Util/ErrorHandler/PECReport_test";
@@ -42,17 +44,15 @@ class PECReportTest : public testing::Test {
   }
 
   void SetUp() override {
-    LUMLogMultiplexer::sharedInstance()->addSyncLogger(logger_);
     PECErrorHandler::sharedInstance()->setErrorHandlerBlock(
         [this](const Ref<PECErrorDescription>& error) { errors_.push_back(error); });
   }
   void TearDown() override {
-    LUMLogMultiplexer::sharedInstance()->removeSyncLogger(logger_);
     LUMLogMultiplexer::sharedInstance()->setCaptureCallStackAddresses(true);
     PECErrorHandler::resetAfterTest();
   }
 
-  const LUMLogMessage& message() const { return *messages_.at(0); }
+  const LUMLogMessage& message() const { return *capture_.messages().at(0); }
 
   // Returns the safe parameter at an index, cast to its class.
   template <class Parameter>
@@ -60,16 +60,13 @@ class PECReportTest : public testing::Test {
     return rt::cast<Parameter>(message().safeParameters()->objectForKey(rt::Number::of(place).get()));
   }
 
-  std::vector<Ref<LUMLogMessage>> messages_;
+  LUMLogCapture capture_;
   std::vector<Ref<PECErrorDescription>> errors_;
-  const Ref<LUMSyncLogger> logger_ =
-      rt::make<TestSyncLogger>([this](const Ref<LUMLogMessage>& message) { messages_.push_back(message); });
 };
 
 TEST_F(PECReportTest, LogsAFaultFromItsSite) {
   PECReport({kFile, "-[Registry add:]", 70}, "nothing to add"_s);
-  ASSERT_EQ(messages_.size(), 1U);
-  EXPECT_EQ(message().level(), LUMLogLevelFault);
+  EXPECT_THAT(capture_.messages(), ElementsAre(HasLevel(LUMLogLevelFault)));
   EXPECT_EQ(message().file(), kFile);
   EXPECT_EQ(message().function(), "-[Registry add:]");
   EXPECT_EQ(message().line(), 70U);
@@ -94,9 +91,10 @@ TEST_F(PECReportTest, RecordsItsLine) {
   PECReport({kFile, "f"}, "first"_s);
   const std::uint64_t line = __LINE__ - 1;
   PECReport({kFile, "f"}, "second"_s);
-  ASSERT_EQ(messages_.size(), 2U);
-  EXPECT_EQ(messages_[0]->line(), line);
-  EXPECT_EQ(messages_[1]->line(), line + 2);
+  const std::vector<Ref<LUMLogMessage>> messages = capture_.messages();
+  ASSERT_EQ(messages.size(), 2U);
+  EXPECT_EQ(messages[0]->line(), line);
+  EXPECT_EQ(messages[1]->line(), line + 2);
 }
 
 TEST_F(PECReportTest, KeepsEveryParameterAsASafeParameterOfTypeOne) {
@@ -157,12 +155,12 @@ std::string firstSymbolOf(const LUMLogMessage& message) {
 TEST_F(PECReportTest, CallStackBeginsWithTheReportingFunction) {
   for (const bool captureAddresses : {true, false}) {
     LUMLogMultiplexer::sharedInstance()->setCaptureCallStackAddresses(captureAddresses);
-    messages_.clear();
     functionThatReports();
     functionThatReportsParameters("text"_s);
-    ASSERT_EQ(messages_.size(), 2U);
-    EXPECT_THAT(firstSymbolOf(*messages_[0]), HasSubstr("functionThatReports("));
-    EXPECT_THAT(firstSymbolOf(*messages_[1]), HasSubstr("functionThatReportsParameters("));
+    const std::vector<Ref<LUMLogMessage>> messages = capture_.takeMessages();
+    ASSERT_EQ(messages.size(), 2U);
+    EXPECT_THAT(firstSymbolOf(*messages[0]), HasSubstr("functionThatReports("));
+    EXPECT_THAT(firstSymbolOf(*messages[1]), HasSubstr("functionThatReportsParameters("));
   }
 }
 

@@ -8,6 +8,7 @@ namespace rt::detail {
 constexpr int kSpins = 20;
 
 void SyncTask::run() {
+  const TaskContext::Scope scope(context_);
   try {
     function_();
   } catch (...) {

@@ -10,7 +10,10 @@
 #include <utility>
 
 #include "Runtime/Base/Private/FunctionView.h"
+#include "Runtime/Objects/Object.h"
+#include "Runtime/Objects/Ref.h"
 #include "Runtime/Queues/Private/LinkedList.h"
+#include "Runtime/Queues/Private/TaskContext.h"
 
 namespace rt::detail {
 
@@ -48,11 +51,13 @@ class AsyncTask final : public Task {
       AsyncTask* task;
       ~Owner() { delete task; }
     } owner{this};
+    const TaskContext::Scope scope(context_.get());
     static_cast<void>(std::move(function_)());
   }
 
  private:
   Function function_;
+  const Ref<Object> context_ = TaskContext::current();
 };
 
 /// A task in the stack frame of the thread that waits for it.
@@ -79,6 +84,7 @@ class SyncTask final : public Task {
   void wake(State state) noexcept;
 
   const FunctionView<void()> function_;
+  Object* const context_ = TaskContext::current();
   std::exception_ptr exception_;
   std::atomic<std::uint32_t> state_ = kWaiting;
 };

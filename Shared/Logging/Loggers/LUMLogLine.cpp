@@ -1,9 +1,5 @@
 #include "Shared/Logging/Loggers/LUMLogLine.h"
 
-#ifdef __GLIBCXX__
-#include <cxxabi.h>
-#endif
-
 #include <algorithm>
 #include <array>
 #include <charconv>
@@ -11,6 +7,7 @@
 #include "Runtime/Objects/String.h"
 #include "Runtime/Objects/StringObject.h"
 #include "Runtime/Values/Number.h"
+#include "Shared/Logging/Private/LUMLogDescription.h"
 
 namespace {
 
@@ -120,15 +117,5 @@ void LUMLogLine::withText(const rt::Object* object, void (*use)(void* given, std
     }
     return use(given, text.text());
   }
-  rt::String description;
-  try {
-    description = object->description();
-#ifdef __GLIBCXX__
-  } catch (const abi::__forced_unwind&) {
-    throw;
-#endif
-  } catch (...) {
-    description = rt::String::overStatic("(no description)");
-  }
-  use(given, description ? description.view() : std::string_view("(null)"));
+  use(given, LUMLogDescriptionOf(*object));
 }

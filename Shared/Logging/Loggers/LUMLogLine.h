@@ -36,11 +36,11 @@ class RT_VISIBLE LUMLogLine {
 
   /// Appends bytes as they are.
   void append(std::string_view bytes) noexcept {
-    const std::size_t room = length_ < place_.size() ? place_.size() - length_ : 0;
-    if (bytes.size() <= room) [[likely]] {
+    // Two copies, because the compiler inlines the first one if it knows the size.
+    if (const std::size_t free = room(); bytes.size() <= free) [[likely]] {
       std::memcpy(place_.data() + length_, bytes.data(), bytes.size());
-    } else if (room > 0) {
-      std::memcpy(place_.data() + length_, bytes.data(), room);
+    } else if (free > 0) {
+      std::memcpy(place_.data() + length_, bytes.data(), free);
     }
     length_ += bytes.size();
   }
@@ -66,6 +66,12 @@ class RT_VISIBLE LUMLogLine {
   /// Returns the length of the whole line in bytes, also of what did not fit.
   std::size_t length() const noexcept { return length_; }
   bool isComplete() const noexcept { return length_ <= place_.size(); }
+
+  /// Returns how many more bytes fit.
+  std::size_t room() const noexcept { return length_ < place_.size() ? place_.size() - length_ : 0; }
+
+  /// Takes back what was appended after the line had this length.
+  void cutTo(std::size_t length) noexcept { length_ = length; }
 
   /// Returns the part of the line that fits.
   std::string_view text() const noexcept {

@@ -5,13 +5,13 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
-#include <span>
 #include <string_view>
 #include <utility>
 
 #include "Runtime/Objects/StringObject.h"
 #include "Runtime/Values/Dictionary.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
+#include "Shared/Logging/Loggers/Private/LUMLogFields.h"
 #include "Shared/Logging/Loggers/Private/LUMLogLocalOffset.h"
 
 namespace {
@@ -177,52 +177,12 @@ void appendValue(LUMLogLine& line, std::string_view text) {
   line.append('"');
 }
 
-struct Field {
-  std::string_view key;
-  const rt::Object* value;
-};
-
-bool isPredefined(std::string_view key) noexcept {
-  return key == LUMLogMetadata::kComponentKey || key == LUMLogMetadata::kCategoryKey ||
-         key == LUMLogMetadata::kCauseKey || key == LUMLogMetadata::kObfuscatedKiriIDKey;
-}
-
-// Collects the first fields by name that come after `last`. Returns how many there are.
-std::size_t nextFields(const rt::Dictionary& properties, const Field* last, std::span<Field> fields) {
-  std::size_t count = 0;
-  for (const auto& [keyObject, value] : properties) {
-    const auto* const key = rt::cast<rt::StringObject>(keyObject.get());
-    if (key == nullptr || isPredefined(key->view())) continue;
-    if (last != nullptr && key->view() <= last->key) continue;
-    const std::span<Field> sorted = fields.first(count);
-    const auto place = static_cast<std::size_t>(
-        std::ranges::upper_bound(sorted, key->view(), {}, &Field::key) - sorted.begin());
-    if (place == fields.size()) continue;
-    if (count < fields.size()) ++count;
-    const std::span<Field> moved = fields.subspan(place, count - place);
-    std::ranges::move_backward(moved.first(moved.size() - 1), moved.end());
-    fields[place] = {key->view(), value.get()};
-  }
-  return count;
-}
-
-// Sorts without memory: a pass collects the next few fields, so that any number needs little of the stack.
 [[gnu::noinline]] void appendFields(LUMLogLine& line, std::string_view before, const LUMLogMessage& message) {
-  if (message.logMetadata() == nullptr) return;
-  const rt::Dictionary& properties = *message.logMetadata()->properties();
-  std::array<Field, 16> fields{};
-  Field last{};
-  bool isFirst = true;
-  for (std::size_t count = fields.size(); count == fields.size();) {
-    count = nextFields(properties, isFirst ? nullptr : &last, fields);
-    for (const Field& field : std::span(fields).first(count)) {
-      line.append(isFirst ? before : " ");
-      isFirst = false;
-      appendValue(line, field.key);
-      line.append('=');
-      line.withTextOf(field.value, [&](std::string_view text) { appendValue(line, text); });
-    }
-    if (count > 0) last = fields[count - 1];
+  for (LUMLogFields fields(message.logMetadata().get()); !fields.isAtEnd(); fields.advance()) {
+    line.append(std::exchange(before, " "));
+    appendValue(line, fields.name());
+    line.append('=');
+    line.withTextOf(&fields.value(), [&](std::string_view text) { appendValue(line, text); });
   }
 }
 

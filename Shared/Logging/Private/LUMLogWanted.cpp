@@ -5,6 +5,7 @@
 #include "Runtime/Objects/String.h"
 #include "Shared/Logging/LUMLogInterest.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
+#include "Shared/Logging/LUMLogScope.h"
 
 constinit std::atomic<LUMLogLevel> LUMLogWanted::lowest_ = 0;
 constinit std::atomic<LUMLogLevel> LUMLogWanted::lowestWithoutMetadata_ = 0;
@@ -55,6 +56,11 @@ bool LUMLogWanted::isWantedOf(const LUMLogMetadata& metadata, LUMLogLevel level)
     metadata.wanted_.store(known, std::memory_order_relaxed);
   }
   return level >= (known & kHighestLevel);
+}
+
+bool LUMLogWanted::isWantedInScope(LUMLogLevel level) noexcept {
+  const rt::Ref<LUMLogMetadata> metadata = LUMLogScope::current();
+  return metadata && isWantedOf(*metadata, level);
 }
 
 void LUMLogInterestChanged() noexcept {

@@ -22,8 +22,11 @@ class RT_VISIBLE LUMLogWanted {
   /// Returns whether somebody may want a message of this level. `metadata` may be null.
   [[gnu::always_inline]] static bool isWanted(LUMLogLevel level,
                                               const rt::Ref<LUMLogMetadata>& metadata) noexcept {
-    if (!metadata) return level >= lowestWithoutMetadata_.load(std::memory_order_relaxed);
-    return isWanted(level) && isWantedOf(*metadata, level);
+    if (!metadata) {
+      return level >= lowestWithoutMetadata_.load(std::memory_order_relaxed) ||
+             (isWanted(level) && isWantedInScope(level));
+    }
+    return isWanted(level) && (isWantedOf(*metadata, level) || isWantedInScope(level));
   }
 
   /// Returns whether somebody may want a message of this level and any component.
@@ -39,6 +42,8 @@ class RT_VISIBLE LUMLogWanted {
 
  private:
   static bool isWantedOf(const LUMLogMetadata& metadata, LUMLogLevel level) noexcept;
+  // The component may be that of the calling thread's scopes.
+  static bool isWantedInScope(LUMLogLevel level) noexcept;
 
   static constinit std::atomic<LUMLogLevel> lowest_;
   static constinit std::atomic<LUMLogLevel> lowestWithoutMetadata_;

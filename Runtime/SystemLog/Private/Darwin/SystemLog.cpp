@@ -76,7 +76,7 @@ bool SystemLog::isEnabled(Type type) const noexcept {
   return os_log_type_enabled(logOf(subsystem_, category_), typeOf(type));
 }
 
-void SystemLog::write(Type type, std::string_view text) const noexcept {
+void SystemLog::write(Type type, std::string_view text, std::span<const Field> /*fields*/) const noexcept {
   const ErrnoKept guard;
   const os_log_t log = logOf(subsystem_, category_);
   do {

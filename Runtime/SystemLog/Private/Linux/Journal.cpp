@@ -5,6 +5,7 @@
 #include <sys/uio.h>
 #include <unistd.h>
 
+#include <algorithm>
 #include <array>
 #include <cerrno>
 #include <charconv>
@@ -27,11 +28,12 @@ constinit LogSocket journal("/run/systemd/journal/socket");
 // they must outlive this object.
 class Fields {
  public:
-  Fields() noexcept = default;
+  // Makes an empty list for the entry's own fields and `extraCount` others, at most SystemLog::kMostFields.
+  explicit Fields(std::size_t extraCount) noexcept : reserve_((kOwnFields + extraCount) * kLongestFrame) {}
   Fields(const Fields&) = delete;
   Fields& operator=(const Fields&) = delete;
 
-  // Adds a field. Precondition: there are fewer than `kMostFields` fields.
+  // Adds a field. Precondition: `name` has at most `kLongestName` bytes, and there is room for the field.
   void add(std::string_view name, std::string_view value) noexcept {
     copy(name);
     if (value.find('\n') == std::string_view::npos) {
@@ -40,7 +42,7 @@ class Fields {
       copy("\n");
       copyLength(value.size());
     }
-    if (value.size() + kReserve <= kCapacity - used_) {
+    if (value.size() + reserve_ <= kCapacity - used_) {
       copy(value);
     } else {
       pieces_[count_++] = {const_cast<char*>(value.data()), value.size()};
@@ -59,11 +61,15 @@ class Fields {
 
   std::span<iovec> pieces() noexcept { return {pieces_.data(), count_}; }
 
+  static constexpr std::size_t kLongestName = 64;
+
  private:
-  static constexpr std::size_t kMostFields = 7;
-  static constexpr std::size_t kCapacity = 2048;
-  // Values leave this much of the buffer free, so that names, lengths and numbers can always be copied.
-  static constexpr std::size_t kReserve = kMostFields * 48;
+  static constexpr std::size_t kOwnFields = 7;
+  static constexpr std::size_t kMostFields = kOwnFields + SystemLog::kMostFields;
+  // What is copied of a field beside its value: the name, a line feed, the length, a line feed. A number
+  // takes no more.
+  static constexpr std::size_t kLongestFrame = kLongestName + 20 + 2;
+  static constexpr std::size_t kCapacity = 2048 + kMostFields * kLongestFrame;
 
   void copyLength(std::uint64_t length) noexcept {
     std::array<char, 8> bytes{};
@@ -91,8 +97,44 @@ class Fields {
   // Left uninitialised: clearing both would take longer than filling the part that is used.
   std::array<char, kCapacity> buffer_;
   std::array<iovec, 2 * kMostFields> pieces_;
+  // Values leave this much of the buffer free, so that names, lengths and numbers can always be copied.
+  const std::size_t reserve_;
   std::size_t used_ = 0;
   std::size_t count_ = 0;
+};
+
+// The name that a caller's field has in the journal.
+class FieldName {
+ public:
+  explicit FieldName(std::string_view name) noexcept {
+    append(name);
+    if (name.empty() || !isLetter(place_[0]) || isTaken(text())) {
+      length_ = 0;
+      append("FIELD_");
+      append(name);
+    }
+  }
+
+  std::string_view text() const noexcept { return {place_.data(), length_}; }
+
+ private:
+  static bool isLetter(char character) noexcept { return character >= 'A' && character <= 'Z'; }
+  static bool isDigit(char character) noexcept { return character >= '0' && character <= '9'; }
+  static bool isTaken(std::string_view name) noexcept {
+    constexpr std::array<std::string_view, 6> kTaken = {"PRIORITY",  "DROPPED",  "SYSLOG_IDENTIFIER",
+                                                        "SUBSYSTEM", "CATEGORY", "MESSAGE"};
+    return std::ranges::find(kTaken, name) != kTaken.end();
+  }
+
+  void append(std::string_view name) noexcept {
+    for (const char given : name.substr(0, place_.size() - length_)) {
+      const char upper = given >= 'a' && given <= 'z' ? static_cast<char>(given - 'a' + 'A') : given;
+      place_[length_++] = isLetter(upper) || isDigit(upper) ? upper : '_';
+    }
+  }
+
+  std::array<char, Fields::kLongestName> place_{};
+  std::size_t length_ = 0;
 };
 
 bool writeAll(int file, std::span<iovec> pieces) noexcept {
@@ -139,9 +181,16 @@ LogSocket::Outcome sendAsFile(std::span<iovec> pieces, const Patience& patience)
 }  // namespace
 
 Delivery writeToJournal(const LogEntry& entry, const Patience& patience) noexcept {
-  Fields fields;
+  const auto extra = entry.fields.first(std::min(entry.fields.size(), std::size_t{SystemLog::kMostFields}));
+  Fields fields(extra.size());
   fields.add("PRIORITY", static_cast<std::uint64_t>(severityOf(entry.type)));
-  fields.add("TID", currentThreadIdentifier());
+  bool hasThread = false;
+  for (const SystemLog::Field& field : extra) {
+    const FieldName name(field.name);
+    hasThread = hasThread || name.text() == "TID";
+    fields.add(name.text(), field.value);
+  }
+  if (!hasThread) fields.add("TID", currentThreadIdentifier());
   if (entry.dropped != 0) fields.add("DROPPED", entry.dropped);
   fields.add("SYSLOG_IDENTIFIER", program_invocation_short_name);
   fields.add("SUBSYSTEM", entry.subsystem);

@@ -3,6 +3,7 @@
 // An entry on its way to a daemon, and the result of delivering it. Internal to the system log.
 
 #include <cstdint>
+#include <span>
 #include <string_view>
 
 #include "Runtime/SystemLog/SystemLog.h"
@@ -14,6 +15,7 @@ struct LogEntry {
   std::string_view subsystem;
   std::string_view category;
   std::string_view text;
+  std::span<const SystemLog::Field> fields;
   /// The number of dropped entries that this entry reports. 0 if the entry is not such a report.
   std::uint64_t dropped = 0;
 };

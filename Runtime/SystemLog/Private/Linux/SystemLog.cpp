@@ -55,7 +55,7 @@ LogEntry makeReport(std::uint64_t count, std::string& text) {
   text = std::to_string(count);
   text += count == 1 ? " log entry was dropped" : " log entries were dropped";
   text += ": nothing took them in time";
-  return {SystemLog::Type::error, "rt", "SystemLog", text, count};
+  return {SystemLog::Type::error, "rt", "SystemLog", text, {}, count};
 }
 
 // Reports how many entries were dropped, if any were. Returns whether nothing is left to report.
@@ -105,12 +105,12 @@ bool SystemLog::isEnabled(Type type) const noexcept {
   return type <= Type::fault;
 }
 
-void SystemLog::write(Type type, std::string_view text) const noexcept {
+void SystemLog::write(Type type, std::string_view text, std::span<const Field> fields) const noexcept {
   const int error = errno;
   const Patience patience = patienceNow();
   // The report goes first, since the dropped entries are missing before this entry.
   const bool isReported = unreported.load(std::memory_order_relaxed) == 0 || report(patience);
-  if (!isReported || !deliver({type, subsystem_, category_, text}, patience)) drop();
+  if (!isReported || !deliver({type, subsystem_, category_, text, fields}, patience)) drop();
   errno = error;
 }
 

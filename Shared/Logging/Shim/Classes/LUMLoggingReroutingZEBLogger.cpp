@@ -10,6 +10,7 @@
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/LUMLogAppControl.h"
 #include "Shared/Logging/LUMLogMessage.h"
+#include "Shared/Logging/LUMLogScope.h"
 #include "Shared/Logging/LUMLogSymbolCallstack.h"
 
 namespace {
@@ -93,6 +94,6 @@ void LUMLoggingReroutingZEBLogger::logInternalFunc(const char* func, const rt::S
   }
   logMultiplexer_->logWithMessage(LUMLogMessage::initWithLevel(
       messageLevelOf(level), format, std::move(text), nullptr, rt::String::fromUTF8(func), 0, nullptr,
-      nullptr, callstack, nullptr, nullptr));
+      nullptr, callstack, nullptr, LUMLogScope::metadataWith(nullptr)));
   rt::CallStack::keepFrame();
 }

@@ -1,0 +1,38 @@
+#pragma once
+
+/// An object that belongs to what a thread is doing, and that goes along to the tasks that this queues.
+///
+///     const rt::TaskContext::Scope scope(request);          // for the calling thread, until the scope ends
+///     queue->async([] { handle(rt::TaskContext::current()); });                 // gets `request`, too
+///
+/// A thread has one context. Structured logging keeps the metadata of its scopes there.
+///
+/// Threads: each thread has its own context.
+///
+/// Not for: arguments of a task, which it captures.
+
+#include "Runtime/Base/Visibility.h"
+#include "Runtime/Objects/Object.h"
+
+namespace rt {
+
+class RT_VISIBLE TaskContext {
+ public:
+  /// Returns the calling thread's context, or null. Its owner is whoever made the innermost scope.
+  static Object* current() noexcept;
+
+  /// Makes `context`, which may be null, the calling thread's context until the scope ends. Does not retain
+  /// it. Scopes of a thread end in the reverse order of their beginnings.
+  class RT_VISIBLE Scope {
+   public:
+    explicit Scope(Object* context) noexcept;
+    ~Scope();
+    Scope(const Scope&) = delete;
+    Scope& operator=(const Scope&) = delete;
+
+   private:
+    Object* const outer_;
+  };
+};
+
+}  // namespace rt

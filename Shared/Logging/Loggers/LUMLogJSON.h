@@ -7,8 +7,9 @@
 ///
 /// A line looks like this, but is not broken:
 ///
-///     | {"Timestamp":"1784894400123456789","SeverityText":"error","SeverityNumber":17,"Body":"no route to
-///     a", | "Attributes":{"bytes":42,"code.file.path":"Network.cpp","code.line.number":7,"thread.id":4711},
+///     | {"Timestamp":"1784894400123456789","SeverityText":"error","SeverityNumber":17,
+///     | "Body":"no route to a",
+///     | "Attributes":{"bytes":42,"code.file.path":"Network.cpp","code.line.number":7,"thread.id":4711},
 ///     | "InstrumentationScope":{"Name":"Importer"},
 ///     | "Resource":{"process.pid":4711,"service.name":"com.example.host"}}
 ///

@@ -12,6 +12,7 @@
 #include <cstdint>
 #include <memory>
 #include <mutex>
+#include <span>
 #include <thread>
 
 #include "Comparison.h"
@@ -303,10 +304,21 @@ void errorOurs(benchmark::State& state, bool capture) {
   for (auto _ : state) LUMLogAt(LUMLogLevelError, "%s has %d entries"_s, kName, ++i);
 }
 
-// Measures the unwinder alone, which is a part of logging an error with a call stack.
+// The number of frames between a call of LUMLogAt and the unwinder.
+constexpr int kFrames = 4;
+
+[[gnu::noinline]] std::size_t captureBehind(int frames, std::span<std::uint64_t> addresses) {
+  const std::size_t count =
+      frames > 1 ? captureBehind(frames - 1, addresses) : rt::CallStack::capture(addresses);
+  rt::CallStack::keepFrame();
+  return count;
+}
+
+// Measures the unwinder alone, as deep as it is when an error with a call stack is logged.
 void unwinder(benchmark::State& state) {
+  const Company company;
   std::array<std::uint64_t, 128> addresses{};
-  for (auto _ : state) benchmark::DoNotOptimize(rt::CallStack::capture(addresses));
+  for (auto _ : state) benchmark::DoNotOptimize(captureBehind(kFrames, addresses));
 }
 
 BENCHMARK(syncOurs)->Name("Logging/sync/ours");

@@ -96,6 +96,8 @@ void appendString(LUMLogLine& line, std::string_view text) noexcept {
 }
 
 void appendValue(LUMLogLine& line, const rt::Object& value) {
+  if (const auto* const string = rt::cast<rt::StringObject>(&value))
+    return appendString(line, string->view());
   if (const auto* const number = rt::cast<rt::Number>(&value)) return appendNumber(line, *number);
   line.withTextOf(&value, [&](std::string_view text) { appendString(line, text); });
 }
@@ -123,28 +125,24 @@ void appendStack(LUMLogLine& line, const LUMLogCallstack& stack) {
   line.append('"');
 }
 
-// The properties of a span (Shared/Logging/LUMLogSpan.h).
-constexpr rt::String kTrace = "trace.id"_s;
-constexpr rt::String kSpan = "span.id"_s;
-
 // Returns the identifier of a trace or a span that `value` is, or nothing.
-std::string_view identifierOf(const rt::Object* value, std::size_t length) noexcept {
-  const auto* const string = rt::cast<rt::StringObject>(value);
+std::string_view identifierOf(const rt::Object& value, std::size_t length) noexcept {
+  const auto* const string = rt::cast<rt::StringObject>(&value);
   if (string == nullptr || string->view().size() != length) return {};
   const bool isIdentifier = string->view().find_first_not_of("0123456789abcdef") == std::string_view::npos;
   return isIdentifier ? string->view() : std::string_view();
 }
 
-std::string_view identifierOf(std::string_view name, const rt::Object* value) noexcept {
-  if (name == kTrace) return identifierOf(value, 32);
-  if (name == kSpan) return identifierOf(value, 16);
-  return {};
-}
-
 // The members of the object "Attributes": fields and other ones in one order.
 class Attributes {
  public:
-  Attributes(LUMLogLine& line, const LUMLogMetadata* metadata) : line_(line), fields_(metadata) {}
+  Attributes(LUMLogLine& line, const LUMLogMetadata* metadata) noexcept : line_(line), fields_(metadata) {}
+
+  const LUMLogFields& fields() const noexcept { return fields_; }
+
+  // What the fields of a span say (Shared/Logging/LUMLogSpan.h). Known at the end.
+  std::string_view trace() const noexcept { return trace_; }
+  std::string_view span() const noexcept { return span_; }
 
   // Begins the attribute `name`, whose value the caller appends. Called in the order of the names. Returns
   // false if a field has that name.
@@ -173,8 +171,7 @@ class Attributes {
   void beginMember() { line_.append(std::exchange(separator_, ",\"")); }
 
   void appendField() {
-    // Those of a trace and a span have members of their own.
-    if (identifierOf(fields_.name(), &fields_.value()).empty()) {
+    if (!isOfSpan(fields_.name(), fields_.value())) {
       beginMember();
       appendJSONText(line_, fields_.name());
       line_.append("\":");
@@ -183,9 +180,18 @@ class Attributes {
     fields_.advance();
   }
 
+  bool isOfSpan(std::string_view name, const rt::Object& value) noexcept {
+    std::string_view* const place = name == "trace.id" ? &trace_ : name == "span.id" ? &span_ : nullptr;
+    if (place == nullptr) return false;
+    *place = identifierOf(value, place == &trace_ ? 32 : 16);
+    return !place->empty();
+  }
+
   LUMLogLine& line_;
   LUMLogFields fields_;
   std::string_view separator_ = "{\"";
+  std::string_view trace_;
+  std::string_view span_;
 };
 
 void appendSeverity(LUMLogLine& line, LUMLogLevel level) noexcept {
@@ -216,36 +222,33 @@ void appendBeginning(LUMLogLine& line, const LUMLogMessage& message) noexcept {
   line.append(R"(,"Body":)");
 }
 
-// Appends what comes after the value of "Body" and before "Resource".
+// Appends a member whose value needs no escaping, unless the value is empty.
+void appendMember(LUMLogLine& line, std::string_view beginning, std::string_view value) noexcept {
+  if (value.empty()) return;
+  line.append(beginning);
+  line.append(value);
+  line.append('"');
+}
+
+// Appends what comes between the values of "Body" and "Resource".
 void appendContext(LUMLogLine& line, const LUMLogMessage& message) {
-  const LUMLogMetadata* const metadata = message.logMetadata().get();
-  const auto property = [metadata](const rt::String& key) {
-    return metadata != nullptr ? metadata->properties()->objectForKey(key) : nullptr;
-  };
-  const auto identifier = [&](std::string_view member, const rt::String& key) {
-    const std::string_view digits = identifierOf(key, property(key));
-    if (digits.empty()) return;
-    line.append(member);
-    line.append(digits);
-    line.append('"');
-  };
-  identifier(R"(,"TraceId":")", kTrace);
-  identifier(R"(,"SpanId":")", kSpan);
   line.append(R"(,"Attributes":)");
-  Attributes attributes(line, metadata);
+  Attributes attributes(line, message.logMetadata().get());
   attributes.text("code.file.path", message.file());
   attributes.text("code.function.name", message.function());
   if (message.line() != 0 && attributes.begin("code.line.number")) appendInteger(line, false, message.line());
   if (message.callstack() && attributes.begin("code.stacktrace")) appendStack(line, *message.callstack());
-  attributes.property("lum.category", property(LUMLogMetadata::kCategoryKey));
-  attributes.property("lum.cause", property(LUMLogMetadata::kCauseKey));
-  attributes.property("lum.obfuscated_kiri_id", property(LUMLogMetadata::kObfuscatedKiriIDKey));
+  attributes.property("lum.category", attributes.fields().category());
+  attributes.property("lum.cause", attributes.fields().cause());
+  attributes.property("lum.obfuscated_kiri_id", attributes.fields().obfuscatedKiriID());
   attributes.text("lum.queue", message.dispatchQueueLabel());
   if (attributes.begin("thread.id")) line.appendUnsigned(message.threadIdentifier());
   attributes.text("thread.name", message.threadName());
   attributes.end();
 
-  if (const rt::Object* const component = property(LUMLogMetadata::kComponentKey)) {
+  appendMember(line, R"(,"TraceId":")", attributes.trace());
+  appendMember(line, R"(,"SpanId":")", attributes.span());
+  if (const rt::Object* const component = attributes.fields().component()) {
     line.append(R"(,"InstrumentationScope":{"Name":)");
     line.withTextOf(component, [&](std::string_view text) { appendString(line, text); });
     line.append('}');

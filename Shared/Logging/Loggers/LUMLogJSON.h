@@ -7,8 +7,9 @@
 ///
 /// A line looks like this, but is not broken:
 ///
-///     | {"Timestamp":"1784894400123456789","SeverityText":"error","SeverityNumber":17,"Body":"no route to
-///     a", | "Attributes":{"bytes":42,"code.file.path":"Network.cpp","code.line.number":7,"thread.id":4711},
+///     | {"Timestamp":"1784894400123456789","SeverityText":"error","SeverityNumber":17,
+///     | "Body":"no route to a",
+///     | "Attributes":{"bytes":42,"code.file.path":"Network.cpp","code.line.number":7,"thread.id":4711},
 ///     | "InstrumentationScope":{"Name":"Importer"},
 ///     | "Resource":{"process.pid":4711,"service.name":"com.example.host"}}
 ///
@@ -19,9 +20,9 @@
 /// - SeverityText: "debug", "info", "error" or "fault", else the level as a decimal.
 /// - SeverityNumber: 5, 9, 17 and 21 for these levels. 1 for level 0. Level 5 and above have 22 to 24.
 /// - Body: the text, or null.
+/// - Attributes: the fields, and what is listed below.
 /// - TraceId, SpanId: of the innermost span (Shared/Logging/LUMLogSpan.h), if there is one. They are then no
 ///   attributes.
-/// - Attributes: the fields, and what is listed below.
 /// - InstrumentationScope: {"Name": component}, if the message has a component.
 /// - Resource: the process. `service.name` is the host's identifier (Runtime/Process/Bundle.h). Without one
 ///   it is "unknown_service:" and the name of the program.

@@ -228,8 +228,8 @@ TEST(LUMLogJSON, NamesTheTraceAndTheSpan) {
   const rt::String trace = "0123456789abcdef0123456789abcdef"_s;
   const rt::String span = "fedcba9876543210"_s;
   EXPECT_NE(lineOf(Event{.metadata = fieldsOf({{"trace.id"_s, trace}, {"span.id"_s, span}, {"a"_s, "b"_s}})})
-                .find(R"("Body":"text","TraceId":"0123456789abcdef0123456789abcdef",)"
-                      R"("SpanId":"fedcba9876543210","Attributes":{"a":"b","thread.id":N},)"),
+                .find(R"("Attributes":{"a":"b","thread.id":N},"TraceId":"0123456789abcdef0123456789abcdef",)"
+                      R"("SpanId":"fedcba9876543210","Resource")"),
             std::string::npos);
 }
 
@@ -259,7 +259,7 @@ TEST(LUMLogJSON, RefersToTheSpanOfACall) {
   ASSERT_EQ(capture.messages().size(), 2U);
   for (const Ref<LUMLogMessage>& message : capture.messages()) {
     const std::string line = lineOf(*message);
-    EXPECT_NE(line.find("\",\"TraceId\":\""), std::string::npos) << line;
+    EXPECT_NE(line.find("},\"TraceId\":\""), std::string::npos) << line;
     EXPECT_NE(line.find("\",\"SpanId\":\""), std::string::npos) << line;
     EXPECT_EQ(line.find(".id\":\""), std::string::npos) << line;
   }

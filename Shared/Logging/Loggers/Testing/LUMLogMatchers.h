@@ -7,10 +7,9 @@
 ///
 ///     const LUMLogCapture capture;
 ///     LUMLogAt(LUMLogLevelError, metadata, "no route to %@"_s, host, LUMLogField("tries", 3));
-///     EXPECT_THAT(capture.messages(), ElementsAre(AllOf(HasLevel(LUMLogLevelError),
-///     HasComponent("Importer"),
-///                                                       HasText(HasSubstr("no route")),
-///                                                       HasField("tries", Gt(2)))));
+///     EXPECT_THAT(capture.messages(),
+///                 ElementsAre(AllOf(HasLevel(LUMLogLevelError), HasComponent("Importer"),
+///                                   HasText(HasSubstr("no route")), HasField("tries", Gt(2)))));
 ///
 /// Each takes a value or a matcher. Each matches an `rt::Ref<LUMLogMessage>` that is not null, such as
 /// LUMLogCapture keeps.

@@ -10,8 +10,10 @@
 
 // IWYU pragma: begin_exports
 #include "Shared/Logging/Loggers/LUMBoundedLogger.h"
+#include "Shared/Logging/Loggers/LUMLogCrash.h"
 #include "Shared/Logging/Loggers/LUMLogLine.h"
 #include "Shared/Logging/Loggers/LUMLogLineFormatter.h"
 #include "Shared/Logging/Loggers/LUMLogOutput.h"
+#include "Shared/Logging/Loggers/LUMRingLogger.h"
 #include "Shared/Logging/Logging.h"
 // IWYU pragma: end_exports

@@ -394,7 +394,9 @@ void LUMBoundedLogger::writeAfterCrash(Losses& losses) noexcept {
     claim_.message.store(nullptr);
   }
   int looks = kCrashPatience;
-  while (queue_.head() < queue_.tail()) {
+  // Other threads may log faster than this one writes.
+  const std::uint64_t end = queue_.tail();
+  while (queue_.head() < end) {
     LUMLogMessageQueue::Taken taken;
     if (queue_.take(taken)) {
       losses.dropped += taken.position - std::exchange(expected_, taken.position + 1) + taken.droppedBefore;

@@ -405,7 +405,9 @@ bool isSanitizersSignal(int signal) {
   return kIsSanitized && (signal == SIGSEGV || signal == SIGBUS || signal == SIGILL || signal == SIGFPE);
 }
 
-void expectWritten(const std::vector<std::string>& lines, int count, const std::string& line) {
+void expectWritten(std::vector<std::string> lines, int count, const std::string& line) {
+  // A thread that waits for room gets it when the handler has written.
+  std::erase(lines, "blocked");
   std::vector<std::string> expected;
   for (int i = 0; i < count; ++i) expected.push_back(std::to_string(i));
   const auto end = std::ranges::find(lines, "crash:");

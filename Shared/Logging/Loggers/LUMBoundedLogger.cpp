@@ -88,7 +88,7 @@ LUMBoundedLogger::LUMBoundedLogger(const rt::Ref<LUMLogger>& target, LUMBoundedL
       output_(rt::cast<LUMLogOutput>(target->asObject())),
       whenFull_(options.whenFull),
       halfMask_(std::max<std::uint64_t>(std::bit_ceil(options.capacity) / 2, 1) - 1),
-      taskQueue_(rt::make<rt::Queue>("LUMBoundedLogger"_s, rt::QualityOfService::kUtility)),
+      taskQueue_(rt::make<rt::Queue>("LUMBoundedLogger"_s, rt::QualityOfService::kDefault)),
       queue_(std::bit_ceil(options.capacity)) {
   join();
 }

@@ -20,8 +20,9 @@
 ///
 /// Latency: a message waits for a millisecond at most while the task is awake, plus what the target and the
 /// system take. The task sleeps in short pauses for about six milliseconds after the last message, and then
-/// ends. The next message starts a task, which costs its thread a system call. A task that pauses occupies a
-/// utility thread of rt::Queue. So 64 loggers of this kind can be busy at once, and more take turns.
+/// ends. The next message starts a task, which costs its thread a system call. A task that pauses occupies
+/// one of the 64 threads that rt::Queue has for work other than utility work. Its priority is not lowered, since
+/// threads may wait for room.
 ///
 /// Blocking: with kBlock, a thread that logs waits for room. It must not hold a lock that the target takes. A
 /// thread that writes to a target of any LUMBoundedLogger never waits: its message is dropped and counted, if

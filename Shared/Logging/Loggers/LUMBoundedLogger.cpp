@@ -28,8 +28,8 @@ namespace {
 
 using namespace rt::literals;
 
-// How many messages are written before threads that wait for room are woken, and before the task leaves a
-// target's queue to others.
+// How many messages are written before the task looks for threads that wait, and leaves a target's queue to
+// others.
 constexpr int kBatch = 64;
 
 // The task pauses this often before it ends, each time twice as long, up to the longest pause.
@@ -39,6 +39,9 @@ constexpr std::chrono::nanoseconds kLongestPause = std::chrono::milliseconds(1);
 
 // A thread that waits for room looks again after this time, and asks for a thread for the task.
 constexpr std::uint64_t kRoomPatience = 100'000'000;
+
+// How long threads that wait stay asleep while the queue is more than half full, in nanoseconds.
+constexpr std::uint64_t kWakePeriod = 1'000'000;
 
 // How often a thread that drops the oldest message tries to get the room before another thread does.
 constexpr int kTries = 1000;
@@ -88,7 +91,7 @@ LUMBoundedLogger::LUMBoundedLogger(const rt::Ref<LUMLogger>& target, LUMBoundedL
       output_(rt::cast<LUMLogOutput>(target->asObject())),
       whenFull_(options.whenFull),
       halfMask_(std::max<std::uint64_t>(std::bit_ceil(options.capacity) / 2, 1) - 1),
-      taskQueue_(rt::make<rt::Queue>("LUMBoundedLogger"_s, rt::QualityOfService::kUtility)),
+      taskQueue_(rt::make<rt::Queue>("LUMBoundedLogger"_s, rt::QualityOfService::kDefault)),
       queue_(std::bit_ceil(options.capacity)) {
   join();
 }
@@ -225,8 +228,14 @@ bool LUMBoundedLogger::sleep(std::uint32_t progress, std::uint64_t nanoseconds) 
   return progress_.load() != progress;
 }
 
-void LUMBoundedLogger::wakeWaiters() noexcept {
+// A thread that waits for room does not get it at once: it would wait again after a few messages. The queue
+// gets half empty first, unless the target is slow.
+void LUMBoundedLogger::wakeWaiters(bool isMore) noexcept {
   if (waiters_.load() == 0) return;
+  const std::uint64_t now = rt::MonotonicClock::nanoseconds();
+  if (isMore && queue_.tail() - queue_.head() > queue_.capacity() / 2 && now - lastWake_ < kWakePeriod)
+    return;
+  lastWake_ = now;
   progress_.fetch_add(1);
   rt::detail::wakeAllAtAddress(&progress_);
 }
@@ -300,7 +309,7 @@ void LUMBoundedLogger::writeAll() noexcept {
     } else {
       isMore = writeBatch(isRefused);
     }
-    wakeWaiters();
+    wakeWaiters(isMore);
   }
 }
 
@@ -394,7 +403,9 @@ void LUMBoundedLogger::writeAfterCrash(Losses& losses) noexcept {
     claim_.message.store(nullptr);
   }
   int looks = kCrashPatience;
-  while (queue_.head() < queue_.tail()) {
+  // Other threads may log faster than this one writes.
+  const std::uint64_t end = queue_.tail();
+  while (queue_.head() < end) {
     LUMLogMessageQueue::Taken taken;
     if (queue_.take(taken)) {
       losses.dropped += taken.position - std::exchange(expected_, taken.position + 1) + taken.droppedBefore;

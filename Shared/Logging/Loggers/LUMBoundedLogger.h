@@ -20,8 +20,9 @@
 ///
 /// Latency: a message waits for a millisecond at most while the task is awake, plus what the target and the
 /// system take. The task sleeps in short pauses for about six milliseconds after the last message, and then
-/// ends. The next message starts a task, which costs its thread a system call. A task that pauses occupies a
-/// utility thread of rt::Queue. So 64 loggers of this kind can be busy at once, and more take turns.
+/// ends. The next message starts a task, which costs its thread a system call. A task that pauses occupies
+/// one of the 64 threads that rt::Queue has for work other than utility work. Its priority is not lowered,
+/// since threads may wait for room.
 ///
 /// Blocking: with kBlock, a thread that logs waits for room. It must not hold a lock that the target takes. A
 /// thread that writes to a target of any LUMBoundedLogger never waits: its message is dropped and counted, if
@@ -135,7 +136,7 @@ class RT_VISIBLE LUMBoundedLogger : public rt::Implements<LUMBoundedLogger, LUML
   bool writeNext(bool isRefused) noexcept;
   void write(const rt::Ref<LUMLogMessage>& message, bool isRefused) noexcept;
   void reportDropped(std::uint64_t count) noexcept;
-  void wakeWaiters() noexcept;
+  void wakeWaiters(bool isMore) noexcept;
 
   const LUMLogOutput* crashSelf() const noexcept override { return this; }
   LUMLogOutput* crashTarget() const noexcept override { return output_; }
@@ -168,4 +169,5 @@ class RT_VISIBLE LUMBoundedLogger : public rt::Implements<LUMBoundedLogger, LUML
   std::atomic<std::uint64_t> reportedCount_ = 0;
   // The position behind the last message that the task has taken.
   std::uint64_t expected_ = 0;
+  std::uint64_t lastWake_ = 0;
 };

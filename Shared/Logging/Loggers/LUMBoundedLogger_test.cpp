@@ -27,6 +27,7 @@
 #include "Shared/Logging/LUMLogMinimumLevelFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "tests/support/ForkTest.h"
+#include "tests/support/Sanitizers.h"
 #include "tests/support/TestLoggers.h"
 
 namespace {
@@ -507,7 +508,10 @@ TEST_F(LUMBoundedLoggerDeathTest, WritesWhatStaticDestructorsLog) {
       testing::ExitedWithCode(0), "first words;last words;$");
 }
 
+constexpr const char* kNoThreadsAfterFork = "the sanitizer allows no new threads in the child";
+
 TEST(LUMBoundedLogger, TheChildOfAForkStartsEmpty) {
+  if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << kNoThreadsAfterFork;
   for (const auto policy :
        {LUMLogWhenFull::kBlock, LUMLogWhenFull::kDropOldest, LUMLogWhenFull::kDropNewest}) {
     const Bounded bounded({.capacity = 4, .whenFull = policy});
@@ -545,6 +549,7 @@ TEST(LUMBoundedLogger, ATargetMayFork) {
 
 // Invariant: whatever the other threads were doing, the child logs at once, and the parent loses nothing.
 TEST(LUMBoundedLogger, ForksWhileThreadsLog) {
+  if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << kNoThreadsAfterFork;
   const Bounded bounded({.capacity = 8});
   std::atomic<bool> isOver = false;
   std::vector<std::thread> threads;

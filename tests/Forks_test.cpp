@@ -154,14 +154,15 @@ TEST_F(Forks, ChildMakesAnInstanceThatAnotherThreadWasMaking) {
   ParkedThread maker(parking, [&] {
     made = scope->instanceForIdentifier(&kPlace, nullptr, [&] {
       parking.park();
-      return ofParent;
+      return ofParent;  // NOLINT(performance-no-automatic-move): nothing moves it from there
     });
   });
   EXPECT_EQ(statusOfChild([&] {
               const Ref<rt::Object> ofChild = rt::make<Tag>();
               bool isCreated = false;
-              if (scope->instanceForIdentifier(&kPlace, &isCreated, [&] { return ofChild; }) != ofChild)
-                return 1;
+              // NOLINTNEXTLINE(performance-no-automatic-move): nothing moves it from there
+              const auto factory = [&] { return ofChild; };
+              if (scope->instanceForIdentifier(&kPlace, &isCreated, factory) != ofChild) return 1;
               if (!isCreated) return 2;
               const auto mustNotRun = []() -> Ref<rt::Object> { _exit(3); };
               if (scope->instanceForIdentifier(&kPlace, nullptr, mustNotRun) != ofChild) return 4;
@@ -307,10 +308,14 @@ TEST_F(Forks, DefaultsAreReadThoughAnotherThreadIsInAnObserver) {
 class BusyForks : public Forks {
  protected:
   BusyForks() {
-    const std::array<std::function<void()>, kThreads> works{
-        [this] { resolve(0); },    [this] { resolve(1); },      [this] { removeScopes(); },
-        [this] { logMessages(); }, [this] { changeLoggers(); }, [this] { logLines(); },
-        [this] { setPieces(); },   [this] { writeAndQueue(); }};
+    const std::array<std::function<void()>, kThreads> works{[this] { resolve(0); },
+                                                            [this] { resolve(1); },
+                                                            [this] { removeScopes(); },
+                                                            logMessages,
+                                                            [this] { changeLoggers(); },
+                                                            logLines,
+                                                            setPieces,
+                                                            [this] { writeAndQueue(); }};
     for (const auto& work : works) {
       threads_.emplace_back([this, work] {
         while (!isEnding_) {
@@ -386,7 +391,7 @@ class BusyForks : public Forks {
     const Ref<SRLRegistry> copy = registry_->mutableCopy();
     copy->internalService(&globalAPI, {});
   }
-  void logMessages() {
+  static void logMessages() {
     log(LUMLogLevelInfo);
     log(LUMLogLevelError);
     report();
@@ -397,11 +402,11 @@ class BusyForks : public Forks {
     LUMLogMultiplexer::sharedInstance()->removeLogFilter(filter);
     ZEBLogger::setSharedLogger(newLogger());
   }
-  void logLines() {
+  static void logLines() {
     const Ref<ZEBLogger> logger = ZEBLogger::sharedLogger();
     for (int i = 0; i < 5; ++i) logger->logError("line %d"_s, i);
   }
-  void setPieces() {
+  static void setPieces() {
     const Ref<ZEBLogger> logger = ZEBLogger::sharedLogger();
     logger->setFilter(nullptr);
     logger->setFormatter(nullptr);

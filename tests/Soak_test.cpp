@@ -24,6 +24,7 @@
 #include <filesystem>
 #include <fstream>
 #include <iterator>
+#include <memory>
 #include <optional>
 #include <random>
 #include <set>
@@ -52,6 +53,7 @@
 #include "tests/support/TestBindings.h"
 #include "tests/support/TestLoggers.h"
 
+// NOLINTNEXTLINE(bugprone-reserved-identifier): the sanitizers define it
 extern "C" std::size_t __sanitizer_get_current_allocated_bytes();
 
 namespace {
@@ -167,23 +169,35 @@ constexpr const Record* kFreshBinding[] = {&kFresh, nullptr};
 constexpr const Record* kManyBinding[] = {&kScoped, &kFresh, nullptr};
 constexpr const Record* kNullBinding[] = {&kNothing, nullptr};
 
+/// What is counted during a round.
+struct Round {
+  Ledger synchronous;
+  Ledger asynchronous;
+  Ledger blocking;
+  Ledger journal;
+  Ledger lines;
+  std::atomic<std::int32_t> reports = 0;
+  std::atomic<std::int32_t> expectedReports = 0;
+  const std::uint64_t droppedBefore = rt::SystemLog::droppedCount();
+};
+
 /// Sets up what all workers share.
 struct World {
   World() {
     SRLRegistry::setSharedInstance(registryWith({&module}));
     PECErrorHandler::register_();
     PECErrorHandler::sharedInstance()->setErrorHandlerBlock(
-        [this](const Ref<PECErrorDescription>&) { ++reports; });
+        [this](const Ref<PECErrorDescription>&) { ++round->reports; });
     const Ref<LUMLogMultiplexer>& multiplexer = LUMLogMultiplexer::sharedInstance();
     multiplexer->addSyncLogger(syncLogger);
     const auto later = rt::make<TestAsyncLogger>(
         rt::make<rt::Queue>("later"_s),
-        [this](const Ref<LUMLogMessage>& message) { takeInto(*asynchronous, *message); });
+        [this](const Ref<LUMLogMessage>& message) { takeInto(round->asynchronous, *message); });
     later->filter_ = onlyLevel(LUMLogLevelDebug);
     multiplexer->addAsyncLogger(later);
     const auto atOnce = rt::make<TestAsyncLogger>(
         rt::make<rt::Queue>("at once"_s),
-        [this](const Ref<LUMLogMessage>& message) { takeInto(*blocking, *message); });
+        [this](const Ref<LUMLogMessage>& message) { takeInto(round->blocking, *message); });
     atOnce->filter_ = onlyLevel(LUMLogLevelInfo);
     atOnce->dispatchMode_ = [](const LUMLogMessage&) { return LUMLogDispatchModeSynchronous; };
     multiplexer->addAsyncLogger(atOnce);
@@ -202,18 +216,6 @@ struct World {
     SRLRegistry::setSharedInstance(nullptr);
   }
 
-  /// Resets all counts.
-  void beginRound() {
-    synchronous.emplace();
-    asynchronous.emplace();
-    blocking.emplace();
-    journal.emplace();
-    lines.emplace();
-    reports = 0;
-    expectedReports = 0;
-    droppedBefore = rt::SystemLog::droppedCount();
-  }
-
   /// Waits until all logged messages have arrived.
   void settle() const {
     LUMLogMultiplexer::sharedInstance()->waitForLogging();
@@ -227,7 +229,7 @@ struct World {
                            {&kNullAPI, kNullBinding}}};
   std::array<Ref<rt::Object>, 16> tags;
   const Ref<TestSyncLogger> syncLogger = rt::make<TestSyncLogger>(
-      [this](const Ref<LUMLogMessage>& message) { takeInto(*synchronous, *message); }, onlyLevel(0));
+      [this](const Ref<LUMLogMessage>& message) { takeInto(round->synchronous, *message); }, onlyLevel(0));
   std::vector<Ref<TestAsyncLogger>> asyncLoggers;
   const std::string linesPath = std::string(kFolder) + "/lines";
   const Ref<ZEBLogger> olderLogger = ZEBLogger::loggerWithWriter(
@@ -237,14 +239,7 @@ struct World {
       rt::UserDefaults::initWithPath(rt::String::fromUTF8(std::string(kFolder) + "/defaults.conf"));
   SettingsFile settings{std::string(kFolder) + "/defaults.conf"};
 
-  std::optional<Ledger> synchronous;
-  std::optional<Ledger> asynchronous;
-  std::optional<Ledger> blocking;
-  std::optional<Ledger> journal;
-  std::optional<Ledger> lines;
-  std::atomic<std::int32_t> reports = 0;
-  std::atomic<std::int32_t> expectedReports = 0;
-  std::uint64_t droppedBefore = 0;
+  std::unique_ptr<Round> round = std::make_unique<Round>();
   const rt::String component = "soak"_s;
   const Ref<LUMLogMetadata> metadata = LUMLogMetadata::metadataWithComponent(component);
 };
@@ -263,7 +258,7 @@ class Worker {
         registry->removeScopesWithTag(tag);
         break;
       case 1:
-        log(*world_.journal, LUMLogLevelError, world_.metadata);
+        log(world_.round->journal, LUMLogLevelError, world_.metadata);
         break;
       case 2:
         setting_ = std::to_string(random_());
@@ -273,30 +268,30 @@ class Worker {
         expectSettingKept();
         break;
       case 4:
-        world_.olderLogger->logError("%zu %lu"_s, number_, world_.lines->next(number_));
+        world_.olderLogger->logError("%zu %lu"_s, number_, world_.round->lines.next(number_));
         break;
       case 5:
         world_.olderLogger->setFormatter(rt::make<ZEBLogBasicFormatter>());
         break;
       case 6:
-        ++world_.expectedReports;
+        ++world_.round->expectedReports;
         EXPECT_FALSE(registry->internalService(&kNullAPI, tags));
         break;
       case 7:
       case 8:
-        log(*world_.blocking, LUMLogLevelInfo);
+        log(world_.round->blocking, LUMLogLevelInfo);
         break;
       case 9:
       case 10:
       case 11:
       case 12:
-        log(*world_.asynchronous, LUMLogLevelDebug);
+        log(world_.round->asynchronous, LUMLogLevelDebug);
         break;
       case 13:
       case 14:
       case 15:
       case 16:
-        log(*world_.synchronous, 0);
+        log(world_.round->synchronous, 0);
         break;
       case 17:
       case 18:
@@ -426,10 +421,11 @@ void disturb(World& world, PrivateJournal& journal) {
 }
 
 void expectAccountedFor(World& world, const PrivateJournal& journal, const std::vector<Worker>& workers) {
-  world.synchronous->expectComplete("synchronous");
-  world.asynchronous->expectComplete("asynchronous");
-  world.blocking->expectComplete("blocking");
-  EXPECT_EQ(world.reports, world.expectedReports);
+  Round& round = *world.round;
+  round.synchronous.expectComplete("synchronous");
+  round.asynchronous.expectComplete("asynchronous");
+  round.blocking.expectComplete("blocking");
+  EXPECT_EQ(round.reports, round.expectedReports);
 
   // The journal must contain each message of the workers once, and the reports.
   std::set<std::string> texts;
@@ -441,14 +437,14 @@ void expectAccountedFor(World& world, const PrivateJournal& journal, const std::
       EXPECT_TRUE(texts.insert(entry["MESSAGE"]).second) << entry["MESSAGE"] << " has come twice";
     }
   }
-  const std::uint64_t dropped = rt::SystemLog::droppedCount() - world.droppedBefore;
-  EXPECT_EQ(entries + dropped, world.journal->sum() + static_cast<std::uint64_t>(world.reports.load()));
+  const std::uint64_t dropped = rt::SystemLog::droppedCount() - round.droppedBefore;
+  EXPECT_EQ(entries + dropped, round.journal.sum() + static_cast<std::uint64_t>(round.reports.load()));
 
   std::ifstream lines(world.linesPath);
   std::size_t worker = 0;
   std::uint64_t number = 0;
-  while (lines >> worker >> number && worker < kWorkers) world.lines->take(worker, number);
-  world.lines->expectComplete("older logger");
+  while (lines >> worker >> number && worker < kWorkers) round.lines.take(worker, number);
+  round.lines.expectComplete("older logger");
   std::filesystem::resize_file(world.linesPath, 0);
 
   for (const Ref<rt::Object>& tag : world.tags) SRLRegistry::sharedInstance()->removeScopesWithTag(tag);
@@ -463,7 +459,7 @@ TEST_F(Soak, LosesNoMessagesAndLeaksNoResources) {
       world.defaults->observe("worker0", rt::UserDefaults::Notify::kOnChange, [&] { ++changes; });
   // Tables and pools reach their final size in the first rounds.
   constexpr int kFirstRounds = 2;
-  constexpr std::size_t kToleratedBytes = 128 * 1024;
+  constexpr std::size_t kToleratedBytes = std::size_t{128} * 1024;
   constexpr std::ptrdiff_t kToleratedThreads = 8;
   std::optional<Holdings> first;
   std::uint64_t messages = 0;
@@ -471,7 +467,7 @@ TEST_F(Soak, LosesNoMessagesAndLeaksNoResources) {
   for (int round = 0; std::chrono::steady_clock::now() < end || round <= kFirstRounds; ++round) {
     PrivateJournal journal(PrivateJournal::Sockets::ownedByManager);
     journal.start();
-    world.beginRound();
+    world.round = std::make_unique<Round>();
     std::vector<Worker> workers;
     workers.reserve(kWorkers);
     for (std::size_t i = 0; i < kWorkers; ++i)
@@ -489,9 +485,10 @@ TEST_F(Soak, LosesNoMessagesAndLeaksNoResources) {
     }
     world.settle();
     expectAccountedFor(world, journal, workers);
-    for (const auto* ledger :
-         {&world.synchronous, &world.asynchronous, &world.blocking, &world.journal, &world.lines}) {
-      messages += (*ledger)->sum();
+    const Round& counts = *world.round;
+    for (const Ledger* ledger :
+         {&counts.synchronous, &counts.asynchronous, &counts.blocking, &counts.journal, &counts.lines}) {
+      messages += ledger->sum();
     }
     const Holdings holdings = Holdings::now();
     std::printf("round %d: %lu messages so far, %lu dropped; %zu bytes, %td threads, %td descriptors\n",

@@ -143,11 +143,12 @@ TEST(WithoutMemory, LogsWithTheOlderLogger) {
     const Ref<ZEBLogger> logger = ZEBLogger::standardLoggerWithPath(text);
     if (logger) {
       logger->logInfo("%@ has %d entries"_s, "text"_s, 7);
-      logger->logFuncError(__func__, "%s"_s, kLong);
+      logger->logFuncError("function", "%s"_s, kLong);
       logger->logMessage(text, ZEBLogLevelInfo);
       logger->logMessage(text, ZEBLogLevelDebug);
     }
     ZEBLogger::setSharedLogger(logger);
+    // NOLINTNEXTLINE(bugprone-lambda-function-name): the name does not matter here
     ZEBLogDebug("through the shared logger"_s);
     ZEBLogger::setSharedLogger(nullptr);
     // Each logger is null or complete.
@@ -165,7 +166,7 @@ TEST(WithoutMemory, ReroutesTheOlderLogger) {
     const Ref<ZEBLogger> logger =
         LUMLoggingReroutingZEBLogger::initWithLogMultiplexer(LUMLogMultiplexer::sharedInstance());
     logger->logInfo("%@ has %d entries"_s, "text"_s, 7);
-    logger->logFuncAssert(__func__, "%s"_s, kLong);
+    logger->logFuncAssert("function", "%s"_s, kLong);
     logger->logMessage("message"_s, ZEBLogLevelError);
   });
 }

@@ -109,7 +109,7 @@ class MountPointMemoryLimitTest : public MountPointTest {
     if (again.exitStatus == 17) {
       expectResult(again, 17, "Failed to create [/Volumes/a], errno: 17\n");
     } else {
-      EXPECT_TRUE(again.signal != 0 || again.exitStatus == 127) << *again.exitStatus;
+      EXPECT_TRUE(again.signal != 0 || again.exitStatus == 127) << again.exitStatus.value_or(-1);
       expectNoMessageOfItsOwn(again);
     }
     const ProcessResult removed = run({"a", "--remove"}, limiting(resource, limit));

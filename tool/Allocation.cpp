@@ -57,20 +57,20 @@ void* malloc(std::size_t size) noexcept {
 void free(void* /*block*/) noexcept {}
 
 // Memory that was never used is zero, so nothing is cleared.
-void* calloc(std::size_t count, std::size_t size) noexcept {
-  if (size != 0 && count > sizeof memory / size) {
+void* calloc(std::size_t nmemb, std::size_t size) noexcept {
+  if (size != 0 && nmemb > sizeof memory / size) {
     errno = ENOMEM;
     return nullptr;
   }
-  return allocate(count * size, kAlignment);
+  return allocate(nmemb * size, kAlignment);
 }
 
-void* realloc(void* block, std::size_t size) noexcept {
+void* realloc(void* ptr, std::size_t size) noexcept {
   void* const other = allocate(size, kAlignment);
-  if (block != nullptr && other != nullptr) {
+  if (ptr != nullptr && other != nullptr) {
     Header header{};
-    std::memcpy(&header, static_cast<unsigned char*>(block) - sizeof header, sizeof header);
-    std::memcpy(other, block, std::min(header.size, size));
+    std::memcpy(&header, static_cast<unsigned char*>(ptr) - sizeof header, sizeof header);
+    std::memcpy(other, ptr, std::min(header.size, size));
   }
   return other;
 }

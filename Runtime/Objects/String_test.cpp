@@ -134,7 +134,7 @@ TEST(String, CopiesShareTheObjectAndMovesLeaveNull) {
   const rt::String third = std::move(first);
   EXPECT_TRUE(first.isNull());  // NOLINT(bugprone-use-after-move): moving leaves null
   EXPECT_EQ(third, "shared");
-  rt::String& alias = second;
+  const rt::String& alias = second;
   second = alias;
   EXPECT_EQ(second, "shared");
   second = nullptr;

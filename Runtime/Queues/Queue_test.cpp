@@ -122,7 +122,7 @@ TEST_F(QueueTest, SyncNestsFromQueueToQueue) {
   int depth = 0;
   const std::function<void()> descend = [&] {
     if (depth == kQueues) return;
-    const std::size_t next = static_cast<std::size_t>(depth++);
+    const auto next = static_cast<std::size_t>(depth++);
     queues[next]->sync(descend);
   };
   queue_->async(descend);

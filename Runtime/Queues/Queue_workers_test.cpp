@@ -163,7 +163,7 @@ TEST_F(QueueDeathTest, FaultsOfATaskReachTheHostsHandler) {
 }
 
 TEST_F(QueueTest, WorkersDoNotBearTheNameOfTheirStarter) {
-  if (!RT_TEST_THREAD_SANITIZER && !RT_TEST_IS_APPLE) waitUntilWorkersHaveEnded();
+  if (!(RT_TEST_THREAD_SANITIZER || RT_TEST_IS_APPLE)) waitUntilWorkersHaveEnded();
   std::thread([&] {
     rt::Thread::setCurrentName("Importer"_s);
     const Ref<Queue> queue = rt::make<Queue>("test"_s);

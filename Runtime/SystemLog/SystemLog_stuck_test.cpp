@@ -84,10 +84,10 @@ constinit std::atomic<WorstCase*> WorstCase::current_ = nullptr;
 }  // namespace
 
 // The program's own function replaces that of the C library.
-extern "C" ssize_t sendmsg(int socket, const msghdr* message, int flags) {
-  const ssize_t result = syscall(SYS_sendmsg, socket, message, flags);
+extern "C" ssize_t sendmsg(int fd, const msghdr* message, int flags) {
+  const ssize_t result = syscall(SYS_sendmsg, fd, message, flags);
   const int error = errno;
-  if (WorstCase* worstCase = WorstCase::current()) worstCase->sent(socket, flags, result >= 0);
+  if (WorstCase* worstCase = WorstCase::current()) worstCase->sent(fd, flags, result >= 0);
   errno = error;
   return result;
 }

@@ -9,7 +9,7 @@ namespace rt::detail {
 
 namespace {
 
-constexpr std::int64_t kSecondsPerDay = 24 * 60 * 60;
+constexpr std::int64_t kSecondsPerDay = 86'400;
 
 constexpr std::int64_t floorDivide(std::int64_t dividend, std::int64_t divisor) noexcept {
   const std::int64_t quotient = dividend / divisor;

@@ -34,13 +34,13 @@ struct Point {
   int x, y;
 };
 
-rt::String descriptionOf(const Point& point) {
+static rt::String descriptionOf(const Point& point) {
   return rt::format("(%d, %d)", point.x, point.y);
 }
 
 enum class Colour : std::uint8_t { red, green };
 
-rt::String descriptionOf(Colour colour) {
+static rt::String descriptionOf(Colour colour) {
   return colour == Colour::red ? "red"_s : rt::String();
 }
 
@@ -49,13 +49,13 @@ struct Name {
   operator std::string_view() const { return "text"; }
 };
 
-rt::String descriptionOf(const Name& /*name*/) {
+static rt::String descriptionOf(const Name& /*name*/) {
   return "a name"_s;
 }
 
 struct Thrower {};
 
-rt::String descriptionOf(const Thrower& /*thrower*/) {
+static rt::String descriptionOf(const Thrower& /*thrower*/) {
   throw std::runtime_error("thrown");
 }
 

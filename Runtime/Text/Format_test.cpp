@@ -169,8 +169,8 @@ TEST(Format, Integers) {
   // The locale of the tests has no separator of thousands.
   EXPECT_EQ(formatted("%'d", 1234567), "1234567");
   enum Small : unsigned char { kOne = 1 };
-  enum Large : std::uint64_t { kTwo = 2 };
-  EXPECT_EQ(rt::format("%d %lu", kOne, kTwo), "1 2");
+  enum Large : std::uint64_t { kLarge = UINT64_MAX };
+  EXPECT_EQ(rt::format("%d %lu", kOne, kLarge), "1 18446744073709551615");
 }
 
 TEST(Format, RealNumbers) {
@@ -461,7 +461,7 @@ std::string record(int count, const std::uint32_t* kinds, const rt::StringObject
       case 1:
         text += "|" + std::string(rt::String::from(va_arg(arguments, rt::Object*)).view());
         break;
-      case 5:
+      case 5:  // NOLINT(bugprone-branch-clone): the next branch reads another type
         static_cast<void>(va_arg(arguments, double));
         break;
       case 6:

@@ -168,9 +168,7 @@ TEST(Number, ComparesAsLongDoublesDo) {
     const auto first = static_cast<long double>(integer);
     const auto second = static_cast<long double>(real);
     static_assert(std::numeric_limits<long double>::digits >= 64);
-    const auto expected = first < second   ? std::strong_ordering::less
-                          : first > second ? std::strong_ordering::greater
-                                           : std::strong_ordering::equal;
+    const std::partial_ordering expected = first <=> second;
     ASSERT_EQ(rt::Number::of(integer)->compare(*rt::Number::of(real)), expected) << integer << ' ' << real;
     ASSERT_EQ(rt::Number::of(real)->compare(*rt::Number::of(integer)), 0 <=> expected)
         << integer << ' ' << real;

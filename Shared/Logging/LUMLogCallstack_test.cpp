@@ -5,6 +5,7 @@
 #include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
+#include <algorithm>
 #include <array>
 #include <cstdint>
 #include <cstdlib>
@@ -32,7 +33,7 @@ constexpr std::uint64_t kMany = std::numeric_limits<std::uint64_t>::max();
 rt::Ref<LUMLogAddressCallstack> addresses(std::initializer_list<std::uint64_t> values,
                                           std::uint64_t ignoreFrameCount = 0) {
   auto* buffer = static_cast<std::uint64_t*>(std::malloc((values.size() + 1) * sizeof(std::uint64_t)));
-  std::copy(values.begin(), values.end(), buffer);
+  std::ranges::copy(values, buffer);
   return LUMLogAddressCallstack::initWithAddresses(buffer, values.size(), ignoreFrameCount);
 }
 

@@ -124,8 +124,8 @@ Ref<LUMLogFilter> randomFilter(std::mt19937_64& random, int depth) {
     default: {
       std::vector<Ref<rt::Object>> parts;
       for (std::uint64_t count = below(4); count > 0; --count)
-        parts.push_back(randomFilter(random, depth - 1)->asObject());
-      if (below(16) == 0) parts.push_back("no filter"_s.object());
+        parts.emplace_back(randomFilter(random, depth - 1)->asObject());
+      if (below(16) == 0) parts.emplace_back("no filter"_s.object());
       const Ref<rt::Array> all = rt::make<rt::Array>(std::move(parts));
       if (below(2) == 0) return LUMLogLogicalAndFilter::initWithFilters(all);
       return LUMLogLogicalOrFilter::initWithFilters(all);

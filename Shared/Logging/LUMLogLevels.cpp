@@ -38,7 +38,7 @@ std::optional<LUMLogLevel> levelOf(std::string_view text) {
                                   Named{"error", LUMLogLevelError},
                                   Named{"fault", LUMLogLevelFault},
                                   Named{"off", LUMLogLevelNone}};
-  const auto named = std::ranges::find(kLevels, text, &Named::name);
+  const auto* const named = std::ranges::find(kLevels, text, &Named::name);
   if (named != kLevels.end()) return named->level;
   LUMLogLevel level = 0;
   const char* const end = text.data() + text.size();
@@ -61,7 +61,7 @@ class LUMLogLevels::Table final : public rt::Implements<Table, rt::Object> {
   static constexpr std::string_view kClassName = "LUMLogLevelsTable";
 
   // Reads `text`. `problem` becomes a sentence if the text is malformed. It names the text by `name`.
-  Table(const rt::String& text, const char* name, rt::String& problem) : text_(text) {
+  Table(rt::String text, const char* name, rt::String& problem) : text_(std::move(text)) {
     const std::string_view whole = text_.view();
     if (trimmed(whole).empty()) return;
     for (std::size_t start = 0; start <= whole.size() && !problem;) {

@@ -1,6 +1,5 @@
 #include "Shared/Logging/LUMLogLevels.h"
 
-#include <gmock/gmock.h>
 #include <gtest/gtest.h>
 
 #include <array>
@@ -24,8 +23,6 @@ namespace {
 
 using namespace rt::literals;
 using rt::Ref;
-using testing::ElementsAre;
-using testing::IsEmpty;
 
 const PrivateDefaults privateDefaults;
 

@@ -13,6 +13,7 @@
 ///
 /// Not for: limits for a component or a logger. Write a filter for these.
 
+#include <algorithm>
 #include <atomic>
 #include <cstdint>
 
@@ -21,19 +22,19 @@
 class RT_VISIBLE LUMLogLimit {
  public:
   /// Allows the first time only.
-  static constexpr LUMLogLimit once() noexcept { return LUMLogLimit(Kind::once, 0); }
+  static constexpr LUMLogLimit once() noexcept { return {Kind::once, 0}; }
 
   /// Allows the first time, and then each `count`-th. A `count` of 0 counts as 1, which allows always.
   static constexpr LUMLogLimit everyNth(std::uint64_t count) noexcept {
-    return LUMLogLimit(Kind::everyNth, count != 0 ? count : 1);
+    return {Kind::everyNth, count != 0 ? count : 1};
   }
 
   /// Allows the first time, and then once `seconds` have passed since the last time that it allowed. A number
   /// below 0 counts as 0, and one above a hundred years as that.
   static constexpr LUMLogLimit onePer(double seconds) noexcept {
     constexpr double kLongest = 100.0 * 366 * 24 * 60 * 60;
-    const double limited = seconds > kLongest ? kLongest : seconds > 0 ? seconds : 0;
-    return LUMLogLimit(Kind::onePer, static_cast<std::uint64_t>(limited * 1e9));
+    const double limited = seconds > 0 ? std::min(seconds, kLongest) : 0;
+    return {Kind::onePer, static_cast<std::uint64_t>(limited * 1e9)};
   }
 
   LUMLogLimit(const LUMLogLimit&) = delete;

@@ -18,8 +18,8 @@
 #include <cstdlib>
 #include <functional>
 #include <limits>
+#include <memory>
 #include <new>
-#include <optional>
 #include <set>
 #include <stdexcept>
 #include <string>
@@ -64,7 +64,7 @@ class LUMSystemLoggerTest : public testing::Test {
  protected:
   void SetUp() override {
     if (!PrivateJournal::entered()) GTEST_SKIP() << refusal;
-    journal_.emplace();
+    journal_ = std::make_unique<PrivateJournal>();
     journal_->start();
     rt::Bundle::setMainIdentifier("com.example.host"_s);
   }
@@ -98,7 +98,7 @@ class LUMSystemLoggerTest : public testing::Test {
     EXPECT_EQ(status, 0);
   }
 
-  std::optional<PrivateJournal> journal_;
+  std::unique_ptr<PrivateJournal> journal_;
 };
 
 TEST_F(LUMSystemLoggerTest, WritesEachLevelWithItsPriority) {

@@ -30,6 +30,8 @@ AllocationFailure::~AllocationFailure() {
   left.store(kNever);
 }
 
+// Not static, since it tells about this object.
+// NOLINTNEXTLINE(readability-convert-member-functions-to-static)
 bool AllocationFailure::hasHappened() const noexcept {
   return left.load() < 0;
 }

@@ -89,7 +89,7 @@ class ClassicSocket {
   }
 
   // Reads and returns the packets that have arrived.
-  std::vector<std::string> packets() {
+  std::vector<std::string> packets() const {
     std::vector<std::string> all;
     std::string buffer(65536, '\0');
     for (ssize_t length; (length = recv(descriptor_, buffer.data(), buffer.size(), MSG_DONTWAIT)) >= 0;) {

@@ -14,7 +14,7 @@
 namespace {
 
 constexpr std::int64_t kMillisecond = 1'000'000;
-constexpr std::int64_t kHour = 3600 * 1000 * kMillisecond;
+constexpr std::int64_t kHour = 3'600'000 * kMillisecond;
 
 std::int64_t systemTime() {
   timespec now{};

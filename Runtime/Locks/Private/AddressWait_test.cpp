@@ -102,7 +102,7 @@ TEST(AddressWait, WorksInTheChildOfAFork) {
   for (int i = 0; i < 4; ++i) {
     threads.emplace_back([&] {
       while (!isEnding) {
-        for (Word& word : words) wakeAllAtAddress(&word);
+        for (const Word& word : words) wakeAllAtAddress(&word);
       }
     });
   }
@@ -110,7 +110,7 @@ TEST(AddressWait, WorksInTheChildOfAFork) {
   for (int i = 0; i < 100; ++i) {
     EXPECT_EQ(statusOfChild([&] {
                 const std::chrono::nanoseconds timeout = std::chrono::microseconds(1);
-                for (Word& word : words) {
+                for (const Word& word : words) {
                   waitAtAddress(word, 0, &timeout);
                   wakeAtAddress(&word);
                 }

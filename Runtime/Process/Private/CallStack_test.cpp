@@ -15,13 +15,16 @@
 #include <iterator>
 #include <random>
 #include <regex>
+#include <span>
 #include <thread>
+#include <vector>
 
 #include "tests/support/AllocationCount.h"
 #include "tests/support/Process.h"
 
 // The test program exports these functions, so that symbols() can name them. Each does something after its
 // call. So no call is a tail call, and each function has a frame.
+// NOLINTBEGIN(misc-use-internal-linkage)
 #define EXPORTED [[gnu::visibility("default"), gnu::noinline]]
 
 namespace call_stack_test {
@@ -45,6 +48,7 @@ EXPORTED std::size_t recursive(std::span<std::uint64_t> addresses, int depth) {
   asm volatile("");
   return count;
 }
+// NOLINTEND(misc-use-internal-linkage)
 
 // The unwind tables of this function are wrong: they lead to the same frame again and again.
 #if defined(__x86_64__) && defined(__linux__)
@@ -108,22 +112,20 @@ TEST(CallStack, HasAFrameForEachCall) {
 }
 
 TEST(CallStack, FindsTheCallersThatTheCLibraryFinds) {
-  Addresses own{};
-  const auto ownEnd = own.begin() + static_cast<std::ptrdiff_t>(middle(own));
+  Addresses addresses{};
+  const std::span own = std::span(addresses).first(middle(addresses));
   std::array<void*, 512> pointers{};
   const int count = backtrace(pointers.data(), pointers.size());
-  Addresses systems{};
-  std::transform(pointers.begin(), pointers.end(), systems.begin(),
-                 [](void* pointer) { return reinterpret_cast<std::uint64_t>(pointer); });
-  const auto systemsEnd = systems.begin() + count;
+  std::vector<std::uint64_t> systems;
+  for (void* pointer : std::span(pointers).first(static_cast<std::size_t>(count)))
+    systems.push_back(reinterpret_cast<std::uint64_t>(pointer));
   // This function made both calls, at different places. The two stacks agree from its caller on. Sanitizers
   // add inner frames of their own.
-  const auto caller = own.begin() + 3;
-  ASSERT_LT(caller, ownEnd);
-  const auto systemsCaller = std::find(systems.begin(), systemsEnd, *caller);
-  ASSERT_NE(systemsCaller, systemsEnd);
+  ASSERT_GT(own.size(), 3U);
+  const auto systemsCaller = std::ranges::find(systems, own[3]);
+  ASSERT_NE(systemsCaller, systems.end());
   EXPECT_LE(systemsCaller - systems.begin(), 2);
-  EXPECT_TRUE(std::equal(caller, ownEnd, systemsCaller, systemsEnd));
+  EXPECT_TRUE(std::ranges::equal(own.subspan(3), std::ranges::subrange(systemsCaller, systems.end())));
 }
 
 // The rest of the array used to be filled with one address.

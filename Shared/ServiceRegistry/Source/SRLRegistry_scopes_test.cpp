@@ -379,7 +379,7 @@ TEST_F(SRLRegistryByIdentifier, DoesNotRetainTagsAfterTheRequest) {
 Ref<SRLScopeTagSetCodableWrapper> onlyTags;
 const Ref<SRLScopeTagSetCodableWrapper>& newTags(std::size_t count = 1) {
   std::vector<Ref<rt::Object>> tags;
-  while (tags.size() < count) tags.push_back(rt::String::fromUTF8("tag, and only here").object());
+  while (tags.size() < count) tags.emplace_back(rt::String::fromUTF8("tag, and only here").object());
   onlyTags = SRLScopeTagSetCodableWrapper::initWithTags(rt::make<rt::Array>(std::move(tags)));
   return onlyTags;
 }

@@ -105,8 +105,8 @@ class Program {
   Program(unsigned seed, Way way) : random_(seed), ways_(seed + 1), way_(way) {
     running = this;
     for (const char* text : {"account", "window", "thread"}) {
-      tags_.push_back(rt::String::fromUTF8(text).object());
-      tags_.push_back(rt::String::fromUTF8(text).object());
+      tags_.emplace_back(rt::String::fromUTF8(text).object());
+      tags_.emplace_back(rt::String::fromUTF8(text).object());
     }
     for (std::size_t api = 0; api < kAPIs; ++api) bind(api);
   }
@@ -159,6 +159,17 @@ class Program {
  private:
   std::uint32_t upTo(std::uint32_t count) { return static_cast<std::uint32_t>(random_() % count); }
 
+  // Returns the scope of an implementation for `api`. Most are a part of the API's scope.
+  SRLScopeType scopeFor(const SRLAPIRegistrationData& api) {
+    if (upTo(8) == 0) return upTo(16);
+    return upTo(2) == 0 ? api.scopeType : api.scopeType & upTo(16);
+  }
+
+  Wish wishFor(const SRLAPIRegistrationData& api) {
+    if (api.isMultibound != 0) return Wish::kMany;
+    return upTo(2) == 0 ? Wish::kOptional : Wish::kRequired;
+  }
+
   // Returns an implementation for an API. Most fit the API. Some are those of another API.
   const SRLImplementationRegistrationData* implement(std::size_t api) {
     if (records_.size() == kMostRecords || (!records_.empty() && upTo(6) == 0)) {
@@ -174,15 +185,14 @@ class Program {
     if (habit == Habit::kAsks && api == 0) habit = Habit::kMakes;
     habits_.push_back(habit);
     targets_.push_back(api == 0 ? 0 : upTo(static_cast<std::uint32_t>(api)));
-    const SRLScopeType scope = upTo(8) == 0   ? upTo(16)
-                               : upTo(2) == 0 ? apis_[api].scopeType
-                                              : apis_[api].scopeType & upTo(16);
+    const SRLScopeType scope = scopeFor(apis_[api]);
     names_.push_back("Implementation" + std::to_string(record));
-    return &records_.emplace_back(SRLImplementationRegistrationData{.identifier = names_.back().c_str(),
-                                                                    .instanceType = {.className = "Product"},
-                                                                    .factory = kFactories[record],
-                                                                    .scopeType = scope,
-                                                                    .lifetime = upTo(3) == 0});
+    return &records_.emplace_back(
+        SRLImplementationRegistrationData{.identifier = names_.back().c_str(),
+                                          .instanceType = {.className = "Product"},
+                                          .factory = kFactories[record],
+                                          .scopeType = scope,
+                                          .lifetime = static_cast<std::uint32_t>(upTo(3) == 0)});
   }
 
   void bind(std::size_t api) {
@@ -193,7 +203,7 @@ class Program {
                      .instanceType = {.names = {.protocolName = nullptr, .className = "Product"}},
                      .scopeType = upTo(16),
                      .identifierLength = static_cast<std::uint16_t>(name.size()),
-                     .isMultibound = isMany});
+                     .isMultibound = static_cast<std::uint16_t>(isMany)});
     if (api >= kAPIs - kByHand) return;
     auto& list = lists_.emplace_back();
     for (std::uint32_t count = isMany ? upTo(6) : (upTo(8) + 6) / 7; count > 0; --count) {
@@ -227,12 +237,14 @@ class Program {
   void step() {
     switch (upTo(16)) {
       case 0:
-        return endScopes();
+        endScopes();
+        break;
       case 1:
-        return share();
+        share();
+        break;
       case 2:
         registries_[1] = registries_[0]->duplicate();
-        return;
+        break;
       default:
         ask(upTo(2), upTo(kAPIs));
     }
@@ -254,7 +266,7 @@ class Program {
     const std::uint32_t count =
         upTo(10) == 0 ? upTo(5) : static_cast<std::uint32_t>(std::popcount(api.scopeType));
     for (std::uint32_t i = 0; i < count; ++i) tags.tags[i] = tags_[upTo(6)].get();
-    const Wish wish = api.isMultibound != 0 ? Wish::kMany : upTo(2) == 0 ? Wish::kOptional : Wish::kRequired;
+    const Wish wish = wishFor(api);
     const Ref<OpenRegistry> registry = registries_[of];
     if (!registry) return;
     requests_.push_back(++lastRequest_);
@@ -278,7 +290,10 @@ class Program {
     if (wish == Wish::kMany) {
       const Ref<rt::Array> instances = registry.internalMultiBoundService(&api, tags);
       noteReports();
-      if (!instances) return trace_.emplace_back("none"), void();
+      if (!instances) {
+        trace_.emplace_back("none");
+        return;
+      }
       for (const Ref<rt::Object>& instance : *instances) note(instance, isNew(instance));
       return;
     }
@@ -293,7 +308,10 @@ class Program {
     if (wish == Wish::kMany) {
       const Ref<rt::Set> implementations = registry.manyBoundTo(api);
       noteReports();
-      if (!implementations) return trace_.emplace_back("none"), void();
+      if (!implementations) {
+        trace_.emplace_back("none");
+        return;
+      }
       std::vector<std::pair<Ref<rt::Object>, bool>> instances;
       for (const Ref<rt::Object>& element : *implementations) {
         const auto& implementation = static_cast<const SRLImplementation&>(*element);

@@ -34,6 +34,14 @@ class Place {
   refuse("%s has the %s opcode 0x%x", image.path().c_str(), kind, byte);
 }
 
+// Reads a count and a gap, and calls `step` with the gap as often as the count says.
+template <class Step>
+void repeatWithGaps(Reader& reader, const Step& step) {
+  const std::uint64_t count = reader.number();
+  const std::uint64_t gap = reader.number();
+  for (std::uint64_t left = count; left != 0; --left) step(gap);
+}
+
 void rebase(const Image& image, FileBytes program) {
   enum : unsigned {
     kDone = 0x00,
@@ -79,12 +87,9 @@ void rebase(const Image& image, FileBytes program) {
       case kRebaseAndMove:
         rebaseOnce(reader.number());
         break;
-      case kRebaseCountedWithGaps: {
-        const std::uint64_t count = reader.number();
-        const std::uint64_t gap = reader.number();
-        for (std::uint64_t left = count; left != 0; --left) rebaseOnce(gap);
+      case kRebaseCountedWithGaps:
+        repeatWithGaps(reader, rebaseOnce);
         break;
-      }
       default:
         refuseOpcode(image, "rebase", byte);
     }
@@ -166,12 +171,9 @@ void bind(const Image& image, FileBytes program, Binding binding, const Resolve&
       case kBindAndMoveByPointers:
         bindOnce(immediate * kPointer);
         break;
-      case kBindCountedWithGaps: {
-        const std::uint64_t count = reader.number();
-        const std::uint64_t gap = reader.number();
-        for (std::uint64_t left = count; left != 0; --left) bindOnce(gap);
+      case kBindCountedWithGaps:
+        repeatWithGaps(reader, bindOnce);
         break;
-      }
       default:
         refuseOpcode(image, "bind", byte);
     }

@@ -33,8 +33,8 @@ TEST(SRLMemoizingScopeThreads, MakeDifferentInstancesAtTheSameTime) {
     bothRun.arrive_and_wait();
     return makeInstance();
   };
-  std::thread other([&] { scope->instanceForIdentifier(&places[1], nullptr, factory); });
-  EXPECT_TRUE(scope->instanceForIdentifier(&places[0], nullptr, factory));
+  std::thread other([&] { scope->instanceForIdentifier(&places.back(), nullptr, factory); });
+  EXPECT_TRUE(scope->instanceForIdentifier(&places.front(), nullptr, factory));
   other.join();
   EXPECT_EQ(scope->instances()->count(), 2U);
 }
@@ -139,7 +139,7 @@ class Workshop {
 
   static void makeMany() {
     std::vector<Ref<rt::Object>> many;
-    for (int i = 0; i < 100; ++i) many.push_back(rt::make<Instance>());
+    for (int i = 0; i < 100; ++i) many.emplace_back(rt::make<Instance>());
   }
 
   const std::array<Ref<SRLMemoizingScope>, 2> scopes_ = {SRLMemoizingScope::init(),

@@ -89,7 +89,7 @@ TEST(SRLBindingsModuleData, PlacesItsFields) {
   // Not by std::bit_cast, which need not keep the bytes between the fields.
   std::memcpy(bytes.data(), &module, sizeof module);
   EXPECT_EQ(valueAt(bytes, 0), reinterpret_cast<std::uintptr_t>(&bindings[0]));
-  EXPECT_EQ(valueAt(bytes, 8), reinterpret_cast<std::uintptr_t>(&bindings[0]) + 2 * 16);
+  EXPECT_EQ(valueAt(bytes, 8), reinterpret_cast<std::uintptr_t>(&bindings[0]) + 2UL * 16);
   EXPECT_EQ(valueAt(bytes, 16), reinterpret_cast<std::uintptr_t>(&addConfigurationFactories));
   EXPECT_EQ(bytes[24], 0x12U);
   EXPECT_EQ(bytes[25], 0x34U);

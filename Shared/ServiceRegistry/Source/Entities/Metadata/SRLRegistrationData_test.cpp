@@ -179,7 +179,7 @@ TEST(SRLRegistrationDataLayout, PlacesTheBitFieldsOfAnImplementation) {
 TEST(SRLRegistrationDataLayout, PlacesTheFieldsOfABinding) {
   ASSERT_EQ(sizeof(_SRLBindingRegistrationData), 16U);
   EXPECT_EQ(valueAt(bytesOf(clockBinding), 0, 8), addressOf(&clockAPI));
-  EXPECT_EQ(valueAt(bytesOf(clockBinding), 8, 8), addressOf(clockViews));
+  EXPECT_EQ(valueAt(bytesOf(clockBinding), 8, 8), addressOf(&clockViews));
   EXPECT_EQ(clockBinding.implementations[0], &clockView);
   EXPECT_EQ(clockBinding.implementations[1], nullptr);
   // An empty list still names the API.

@@ -42,7 +42,7 @@ using Tags = std::vector<Ref<rt::Object>>;
 
 Tags tagsWith(std::initializer_list<std::uint64_t> hashes) {
   Tags tags;
-  for (const std::uint64_t hash : hashes) tags.push_back(rt::make<Tag>(hash));
+  for (const std::uint64_t hash : hashes) tags.emplace_back(rt::make<Tag>(hash));
   return tags;
 }
 
@@ -231,14 +231,14 @@ TEST(SRLScopeTagSetEqual, ComparesSlotBySlot) {
   const Tags same = tagsWith({1, 2, 3, 4});
   EXPECT_TRUE(SRLScopeTagSetEqual({}, {}));
   for (std::ptrdiff_t count = 1; count <= 4; ++count) {
-    const SRLScopeTagSet first = setOf({tags.begin(), tags.begin() + count});
-    const SRLScopeTagSet second = setOf({same.begin(), same.begin() + count});
+    const SRLScopeTagSet set = setOf({tags.begin(), tags.begin() + count});
+    const SRLScopeTagSet equal = setOf({same.begin(), same.begin() + count});
     const SRLScopeTagSet shorter = setOf({same.begin(), same.begin() + count - 1});
-    EXPECT_TRUE(SRLScopeTagSetEqual(first, first));
-    EXPECT_TRUE(SRLScopeTagSetEqual(first, second));
-    EXPECT_EQ(SRLScopeTagSetHash(first), SRLScopeTagSetHash(second));
-    EXPECT_FALSE(SRLScopeTagSetEqual(first, shorter));
-    EXPECT_FALSE(SRLScopeTagSetEqual(shorter, first));
+    EXPECT_TRUE(SRLScopeTagSetEqual(set, set));
+    EXPECT_TRUE(SRLScopeTagSetEqual(set, equal));
+    EXPECT_EQ(SRLScopeTagSetHash(set), SRLScopeTagSetHash(equal));
+    EXPECT_FALSE(SRLScopeTagSetEqual(set, shorter));
+    EXPECT_FALSE(SRLScopeTagSetEqual(shorter, set));
   }
   EXPECT_FALSE(SRLScopeTagSetEqual(setOf(tags), setOf({tags[0], tags[1], tags[2], tags[2]})));
   EXPECT_FALSE(SRLScopeTagSetEqual(setOf({tags[0], tags[1]}), setOf({tags[1], tags[0]})));
@@ -283,7 +283,7 @@ TEST(SRLScopeTagSetRetain, KeepsTheTagsUntilRelease) {
     std::vector<rt::Weak<rt::Object>> weak;
     SRLScopeTagSet set;
     for (std::size_t i = 0; i < count; ++i) {
-      tags.push_back(rt::make<Tag>(i));
+      tags.emplace_back(rt::make<Tag>(i));
       weak.emplace_back(tags[i]);
       set.tags[i] = tags[i].get();
     }

@@ -5,6 +5,7 @@
 #include <unistd.h>
 
 #include <atomic>
+#include <cstdint>
 #include <cstdlib>
 #include <thread>
 #include <utility>
@@ -59,7 +60,7 @@ TEST(SRLPProfilingMeasurementLifetime, StacksExistWhenLoadHooksRun) {
 }
 
 // The steps of the program that exits, in order.
-enum Step : int {
+enum Step : std::uint8_t {
   kNothing,
   kMeasuring,  // the thread has begun to make something
   kExited,     // all static objects have been destroyed

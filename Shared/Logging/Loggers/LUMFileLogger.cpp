@@ -52,11 +52,11 @@ LUMFileLogger::LUMFileLogger(const rt::String& path, const LUMFileLoggerOptions&
       formatter_(formatterOf(options)),
       lineFormatter_(rt::cast<LUMLogLineFormatter>(formatter_.get())),
       buffer_(rt::make<LUMLogFileBuffer>(std::string(path.view()), options)) {
-  if (options.bufferSize > 0) LUMLogFlusher::shared().add(buffer_);
+  if (buffer_->isBuffered()) LUMLogFlusher::shared().add(buffer_);
 }
 
 LUMFileLogger::~LUMFileLogger() {
-  LUMLogFlusher::shared().remove(buffer_.get());
+  if (buffer_->isBuffered()) LUMLogFlusher::shared().remove(buffer_.get());
   buffer_->flush(~std::uint32_t{0});
 }
 

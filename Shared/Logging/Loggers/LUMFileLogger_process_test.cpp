@@ -168,6 +168,33 @@ TEST_F(LUMFileLoggerTest, WritesWhatIsBufferedInASignalHandler) {
   EXPECT_EQ(content(), "before\ncrash\n");
 }
 
+TEST_F(LUMFileLoggerTest, WritesABufferAfterADelayAlsoAfterASignalHandler) {
+  options_.bufferSize = 1000;
+  options_.longestDelayInMilliseconds = 1;
+  const rt::Ref<LUMFileLogger> file = logger();
+  std::string expected;
+  for (int round = 0; round < 20; ++round) {
+    log(file, "before");
+    file->logInSignalHandler(*message("handler"));
+    log(file, "after");
+    expected += "before\nhandler\nafter\n";
+    while (content() != expected) std::this_thread::yield();
+  }
+}
+
+TEST_F(LUMFileLoggerTest, CountsTheLinesThatEachProcessHasLost) {
+  if (!fs::exists("/dev/full")) GTEST_SKIP() << "no /dev/full";
+  const rt::Ref<LUMFileLogger> file = LUMFileLogger::initWithPath("/dev/full"_s);
+  log(file, "parent");
+  EXPECT_EQ(statusOfChild([&] {
+              log(file, "child");
+              log(file, "child");
+              return static_cast<int>(file->droppedCount());
+            }),
+            2);
+  EXPECT_EQ(file->droppedCount(), 1U);
+}
+
 TEST_F(LUMFileLoggerTest, CutsALongLineInASignalHandler) {
   const rt::Ref<LUMFileLogger> file = logger();
   file->logInSignalHandler(*message(std::string(10'000, 'x')));

@@ -31,7 +31,7 @@ LUMLogFileBuffer::LUMLogFileBuffer(std::string path, const LUMFileLoggerOptions&
       followInterval_(options.pathCheckIntervalInMilliseconds * kMillisecond),
       place_(capacity_ > 0 ? std::make_unique_for_overwrite<char[]>(capacity_) : nullptr),
       file_(std::move(path), options.mode, options.keptFileCount),
-      forkCount_(LUMLogFlusher::forkCount()),
+      forkCount_(LUMLogFlusher::beginToCountForks()),
       rotationSize_(options.rotationSize) {}
 
 LUMLogFileBuffer::~LUMLogFileBuffer() {
@@ -175,6 +175,7 @@ void LUMLogFileBuffer::writeInSignalHandler(std::string_view line) noexcept {
   if (lock_.tryLock()) {
     if (forkCount_ == LUMLogFlusher::forkCount()) {
       file_.write({place_.get(), std::exchange(length_, 0)});
+      deadline_.store(kNever, std::memory_order_relaxed);
     }
     file_.write(line);
     lock_.unlock();

@@ -50,6 +50,8 @@ class LUMLogFileBuffer final : public rt::Implements<LUMLogFileBuffer, rt::Objec
   /// Writes the lines that wait, if the lock is free, and `line`.
   void writeInSignalHandler(std::string_view line) noexcept RT_EXCLUDES(lock_);
 
+  bool isBuffered() const noexcept { return capacity_ > 0; }
+
   /// Returns how many lines were lost.
   std::uint64_t droppedCount() const noexcept { return droppedCount_.load(std::memory_order_relaxed); }
 

@@ -32,9 +32,17 @@ LUMLogFlusher& LUMLogFlusher::shared() {
   return *flusher.get([] { return new LUMLogFlusher(); });
 }
 
+std::uint32_t LUMLogFlusher::beginToCountForks() {
+  static constinit rt::Lazy<bool> isRegistered;
+  isRegistered.get([] {
+    const auto count = [] { forkCount_.fetch_add(1, std::memory_order_relaxed); };
+    return pthread_atfork(nullptr, nullptr, count) == 0;
+  });
+  return forkCount();
+}
+
 LUMLogFlusher::LUMLogFlusher()
     : queue_(rt::make<rt::Queue>("LUMLogFlusher"_s, rt::QualityOfService::kUtility)) {
-  pthread_atfork(nullptr, nullptr, [] { forkCount_.fetch_add(1, std::memory_order_relaxed); });
   // The first task of a program arranges that tasks run at exit. What is registered after that runs before
   // it, so that the task does not keep the program from ending.
   queue_->async([] {});

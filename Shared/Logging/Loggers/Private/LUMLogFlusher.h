@@ -40,8 +40,9 @@ class LUMLogFlusher {
   /// Returns whether the process exits. Lines must then not wait any more.
   static bool isExiting() noexcept { return isExiting_.load(std::memory_order_relaxed); }
 
-  /// Returns a number that is another one in the child of a fork.
+  /// Returns a number that is another one in the child of a fork, once counting has begun.
   static std::uint32_t forkCount() noexcept { return forkCount_.load(std::memory_order_relaxed); }
+  static std::uint32_t beginToCountForks();
 
  private:
   void flushInTime() noexcept RT_EXCLUDES(lock_);

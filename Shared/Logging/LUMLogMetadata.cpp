@@ -8,8 +8,9 @@ constexpr rt::String LUMLogMetadata::kComponentKey = "LUMLogMetadataComponent"_s
 constexpr rt::String LUMLogMetadata::kCategoryKey = "LUMLogMetadataCategory"_s;
 constexpr rt::String LUMLogMetadata::kCauseKey = "LUMLogMetadataCause"_s;
 
-bool LUMLogMetadata::isPredefinedKey(const rt::String& key) noexcept {
-  return key == kObfuscatedKiriIDKey || key == kComponentKey || key == kCategoryKey || key == kCauseKey;
+bool LUMLogMetadata::isPredefinedKey(std::string_view key) noexcept {
+  return key.starts_with("LUMLogMetadata") &&
+         (kObfuscatedKiriIDKey == key || kComponentKey == key || kCategoryKey == key || kCauseKey == key);
 }
 
 rt::Ref<LUMLogMetadata> LUMLogMetadata::initWithProperties(const rt::Ref<rt::Dictionary>& properties) {

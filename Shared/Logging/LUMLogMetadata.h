@@ -15,6 +15,7 @@
 #include <atomic>
 #include <cstdint>
 #include <span>
+#include <string_view>
 #include <utility>
 
 #include "Runtime/Base/Visibility.h"
@@ -33,7 +34,7 @@ class RT_VISIBLE LUMLogMetadata : public rt::Implements<LUMLogMetadata, rt::Obje
   static const rt::String kCauseKey;             // "LUMLogMetadataCause"
 
   /// Returns whether `key` is one of these.
-  static bool isPredefinedKey(const rt::String& key) noexcept;
+  static bool isPredefinedKey(std::string_view key) noexcept;
 
   /// Makes metadata of `properties`, whose keys are strings. Null counts as empty. Like every function that
   /// makes metadata, it throws what copying a value throws, and std::bad_alloc.

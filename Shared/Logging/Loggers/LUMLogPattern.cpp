@@ -177,8 +177,14 @@ void appendValue(LUMLogLine& line, std::string_view text) {
   line.append('"');
 }
 
+// The identifiers and times of spans (Shared/Logging/LUMLogSpan.h) are for programs.
+bool isOfSpan(std::string_view name) noexcept {
+  return name.starts_with("span.") || name == "trace.id";
+}
+
 [[gnu::noinline]] void appendFields(LUMLogLine& line, std::string_view before, const LUMLogMessage& message) {
   for (LUMLogFields fields(message.logMetadata().get()); !fields.isAtEnd(); fields.advance()) {
+    if (isOfSpan(fields.name())) continue;
     line.append(std::exchange(before, " "));
     appendValue(line, fields.name());
     line.append('=');

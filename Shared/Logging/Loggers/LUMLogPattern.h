@@ -28,8 +28,8 @@
 ///
 /// "{fields}" is like "bytes=42 user=ann", sorted by name. A value with spaces, quotes or "=", and an empty
 /// one, is in quotes. There, a quote and a backslash have a backslash before them. The four predefined
-/// properties (LUMLogMetadata.h) are left out. If there are no such properties, or no call stack, the space
-/// before "{fields}" or "{stack}" is left out, too.
+/// properties (LUMLogMetadata.h) and the identifiers and times of spans (LUMLogSpan.h) are left out. If there
+/// are no such properties, or no call stack, the space before "{fields}" or "{stack}" is left out, too.
 ///
 /// A change of the time zone takes effect at the next quarter of an hour.
 ///

@@ -20,7 +20,10 @@
 #include "Runtime/Values/Array.h"
 #include "Runtime/Values/Dictionary.h"
 #include "Runtime/Values/Number.h"
+#include "Shared/Logging/LUMLog.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
+#include "Shared/Logging/LUMLogSpan.h"
+#include "Shared/Logging/Loggers/LUMLogCapture.h"
 #include "tests/support/AllocationCount.h"
 #include "tests/support/ClockHook.h"
 #include "tests/support/ForkTest.h"
@@ -544,6 +547,19 @@ TEST(LUMLogPattern, HasAUsualPattern) {
   const rt::Ref<LUMLogMessage> given = message(parts);
   const std::string line(LUMLogPattern::init()->formattedLogMessage(*given).view());
   EXPECT_EQ(line, lineOf("{time}", *given) + " info  [Importer] main Importer.cpp:42 text user=ann");
+}
+
+TEST(LUMLogPattern, LeavesTheIdentifiersAndTimesOfSpansToPrograms) {
+  const LUMLogCapture capture;
+  {
+    const LUMLogSpan span(LUMLogLevelError, "import"_s, LUMLogField("span", "import"_s), LUMLogField("n", 1));
+    LUMLogAt(LUMLogLevelError, "text"_s);
+  }
+  const std::vector<rt::Ref<LUMLogMessage>> messages = capture.messages();
+  ASSERT_EQ(messages.size(), 2U);
+  const rt::Ref<LUMLogPattern> pattern = LUMLogPattern::initWithPattern("{level} {fields}"_s);
+  for (const rt::Ref<LUMLogMessage>& message : messages)
+    EXPECT_EQ(pattern->formattedLogMessage(*message), "error n=1 span=import");
 }
 
 }  // namespace

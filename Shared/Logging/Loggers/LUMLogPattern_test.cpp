@@ -330,6 +330,39 @@ TEST(LUMLogPattern, UsesTheLastOffsetInASignalHandler) {
   tzset();
 }
 
+// A pattern keeps the text of a second.
+TEST(LUMLogPattern, HasTheRightTimeWhateverTheOrderOfTheSeconds) {
+  const rt::Ref<LUMLogPattern> used = pattern("{utc} {time} {utc:%S} {time:%H%M%9f}");
+  constexpr std::int64_t kStart = 1'650'000'000;
+  for (const int distance : {0, 0, 1, 0, 1, 2, 1, 59, 3600, 0, -1, 86'400}) {
+    for (const long nanosecond : {0, 999'999'999}) {
+      const Time time(kStart + distance, nanosecond);
+      const rt::Ref<LUMLogMessage> given = message();
+      EXPECT_EQ(used->formattedLogMessage(*given).view(),
+                lineOf("{utc} {time} {utc:%S} {time:%H%M%9f}", *given));
+    }
+  }
+}
+
+TEST(LUMLogPattern, KeepsNoTimeOfASignalHandler) {
+  setenv("TZ", "AAA-1", 1);
+  const rt::Ref<LUMLogPattern> used = pattern("{time:%z}");
+  {
+    const Time time(1'210'000'000);
+    EXPECT_EQ(used->formattedLogMessage(*message()), "+0100");
+  }
+  setenv("TZ", "BBB-2", 1);
+  const Time time(1'310'000'000);
+  const rt::Ref<LUMLogMessage> given = message();
+  std::array<char, 16> place{};
+  LUMLogLine line(place, LUMLogLine::Caller::kSignalHandler);
+  used->appendLine(line, *given);
+  EXPECT_EQ(line.text(), "+0100");
+  EXPECT_EQ(used->formattedLogMessage(*given), "+0200");
+  unsetenv("TZ");
+  tzset();
+}
+
 TEST(LUMLogPattern, HasDescriptionsOfObjectsExceptInASignalHandler) {
   Parts parts;
   const rt::Ref<rt::Array> array = rt::Array::of("a"_s);

@@ -213,7 +213,7 @@ TEST(LUMTerminalLogger, CountsLinesThatFindNoRoomAndTellsOfThem) {
     const Ends ends = Ends::pipe();
     if (!blocks) fcntl(ends.writer(), F_SETFL, O_NONBLOCK);
     const rt::Ref<LUMTerminalLogger> terminal = logger(ends);
-    const std::string text(999, 'x');
+    const std::string text(9999, 'x');  // longer than what a pipe takes in one piece
     std::uint64_t count = 0;
     while (terminal->droppedCount() < 3) {
       terminal->logWithMessage(message(text));

@@ -143,6 +143,17 @@ std::string described(const char* what, bool isNegated, const Matcher& matcher) 
          testing::DescribeMatcher<Type>(matcher);
 }
 
+// Returns whether `value` matches, and says what it is: a test that fails says which part did not match.
+template <class Matcher, class Value>
+bool explained(const std::string& what, const Matcher& matcher, const Value& value,
+               testing::MatchResultListener* listener) {
+  testing::StringMatchResultListener reason;
+  const bool isMatch = testing::ExplainMatchResult(matcher, value, &reason);
+  *listener << "whose " << what << " is " << testing::PrintToString(value);
+  if (!reason.str().empty()) *listener << ", " << reason.str();
+  return isMatch;
+}
+
 }  // namespace LUMLogMatchersDetail
 
 namespace LUMLogMatchers {
@@ -151,7 +162,8 @@ namespace LUMLogMatchers {
 MATCHER_P(HasText, matcher, LUMLogMatchersDetail::described<std::string>("text", negation, matcher)) {
   const rt::String& text = arg->formattedString();
   if (text) {
-    return testing::ExplainMatchResult(matcher, LUMLogMatchersDetail::textOf(text), result_listener);
+    return LUMLogMatchersDetail::explained("text", matcher, LUMLogMatchersDetail::textOf(text),
+                                           result_listener);
   }
   *result_listener << "which has no text";
   return false;
@@ -159,7 +171,7 @@ MATCHER_P(HasText, matcher, LUMLogMatchersDetail::described<std::string>("text",
 
 /// Matches a message whose level matches.
 MATCHER_P(HasLevel, matcher, LUMLogMatchersDetail::described<LUMLogLevel>("level", negation, matcher)) {
-  return testing::ExplainMatchResult(matcher, arg->level(), result_listener);
+  return LUMLogMatchersDetail::explained("level", matcher, arg->level(), result_listener);
 }
 
 /// Matches a message whose component matches. Does not match one without a component.
@@ -167,7 +179,8 @@ MATCHER_P(HasComponent, matcher,
           LUMLogMatchersDetail::described<std::string>("component", negation, matcher)) {
   const rt::String component = LUMLogMatchersDetail::componentOf(*arg);
   if (component) {
-    return testing::ExplainMatchResult(matcher, LUMLogMatchersDetail::textOf(component), result_listener);
+    return LUMLogMatchersDetail::explained("component", matcher, LUMLogMatchersDetail::textOf(component),
+                                           result_listener);
   }
   *result_listener << "which has no component";
   return false;
@@ -179,20 +192,22 @@ MATCHER_P2(HasField, name, matcher,
            LUMLogMatchersDetail::described<LUMLogMatchersDetail::FieldMatched<matcher_type>>(
                ("field \"" + std::string(name) + '"').c_str(), negation,
                LUMLogMatchersDetail::fieldMatcher(matcher))) {
+  const std::string field = "field \"" + std::string(name) + '"';
   const rt::Object* const object = LUMLogMatchersDetail::fieldOf(*arg, name);
   if (object == nullptr) {
-    *result_listener << "which has no field \"" << name << '"';
+    *result_listener << "which has no " << field;
     return false;
   }
   const LUMLogMatchersDetail::FieldValue value(*object);
   if constexpr (LUMLogMatchersDetail::matchesOnlyReals<matcher_type>) {
-    if (!value.isNumber()) {
-      *result_listener << "whose field \"" << name << "\" is not a number";
-      return false;
+    if (value.isNumber()) {
+      return LUMLogMatchersDetail::explained(field, matcher, static_cast<double>(value), result_listener);
     }
-    return testing::ExplainMatchResult(matcher, static_cast<double>(value), result_listener);
+    *result_listener << "whose " << field << " is not a number";
+    return false;
   } else {
-    return testing::ExplainMatchResult(LUMLogMatchersDetail::fieldMatcher(matcher), value, result_listener);
+    return LUMLogMatchersDetail::explained(field, LUMLogMatchersDetail::fieldMatcher(matcher), value,
+                                           result_listener);
   }
 }
 

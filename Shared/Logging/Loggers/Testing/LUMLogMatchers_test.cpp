@@ -137,6 +137,17 @@ TEST(LUMLogMatchers, SayWhatIsMissing) {
             R"(whose field "user" is not a number)");
 }
 
+TEST(LUMLogMatchers, SayWhichPartDoesNotMatch) {
+  EXPECT_EQ(explanation(message(), HasText("a")), R"(whose text is "no route to \"a\"")");
+  EXPECT_EQ(explanation(message(), HasLevel(4)), "whose level is 3");
+  EXPECT_EQ(explanation(message(), HasComponent("a")), R"(whose component is "Importer")");
+  EXPECT_EQ(explanation(message(), HasField("user", "bob")), R"(whose field "user" is "ann")");
+  EXPECT_EQ(explanation(message(), HasField("ratio", DoubleNear(1, 0.1))),
+            R"(whose field "ratio" is 0.1, which is -0.9 from 1)");
+  EXPECT_EQ(explanation(message(), AllOf(HasLevel(3), HasField("tries", Gt(5)))),
+            R"(whose field "tries" is 3)");
+}
+
 TEST(LUMLogMatchers, PrintAMessage) {
   EXPECT_EQ(PrintToString(message()), R"-(error [Importer] "no route to \"a\"" {again: 1, list: ()-"
                                       "\n"

@@ -43,7 +43,7 @@ class RT_VISIBLE LUMLogSpan {
  public:
   /// A name, with the source location of the span.
   struct Name {
-    Name(std::convertible_to<rt::String> auto const& name,
+    Name(std::convertible_to<rt::String> auto const& name,  // NOLINT(modernize-pass-by-value): of any type
          std::source_location callSite = std::source_location::current())
         : text(name), location(callSite) {}
 

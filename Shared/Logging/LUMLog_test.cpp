@@ -6,6 +6,7 @@
 #include <cstdarg>
 #include <cstdint>
 #include <latch>
+#include <memory>
 #include <optional>
 #include <stdexcept>
 #include <string>
@@ -63,7 +64,7 @@ class LUMLogTest : public testing::Test {
   }
 
   const rt::Ref<LUMLogMultiplexer>& multiplexer_ = LUMLogMultiplexer::sharedInstance();
-  std::optional<LUMLogCapture> capture_{std::in_place};
+  std::unique_ptr<LUMLogCapture> capture_ = std::make_unique<LUMLogCapture>();
 };
 
 rt::Object* object(const rt::Ref<rt::Object>& ref) {

@@ -77,6 +77,7 @@ inline void log(const rt::Ref<LUMFileLogger>& logger, const std::string& text,
 
 // Makes lines of different lengths.
 inline std::string filling(int number) {
+  // NOLINTNEXTLINE(modernize-return-braced-init-list): braces would make a string of two characters
   return std::string(static_cast<std::size_t>(number % 60), 'x');
 }
 

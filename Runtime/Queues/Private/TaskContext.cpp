@@ -6,18 +6,18 @@ namespace rt {
 
 namespace {
 
-constinit thread_local Object* context [[gnu::tls_model("initial-exec")]] = nullptr;
+constinit thread_local Object* ofThread [[gnu::tls_model("initial-exec")]] = nullptr;
 
 }  // namespace
 
 Object* TaskContext::current() noexcept {
-  return context;
+  return ofThread;
 }
 
-TaskContext::Scope::Scope(Object* given) noexcept : outer_(std::exchange(context, given)) {}
+TaskContext::Scope::Scope(Object* context) noexcept : outer_(std::exchange(ofThread, context)) {}
 
 TaskContext::Scope::~Scope() {
-  context = outer_;
+  ofThread = outer_;
 }
 
 }  // namespace rt

@@ -497,7 +497,7 @@ TEST_F(LUMBoundedLoggerDeathTest, WritesAtExitWhatWaits) {
 TEST_F(LUMBoundedLoggerDeathTest, WritesWhatStaticDestructorsLog) {
   EXPECT_EXIT(
       {
-        static rt::Ref<LUMBoundedLogger>& logger = *new rt::Ref<LUMBoundedLogger>(toStandardError());
+        static const rt::Ref<LUMBoundedLogger>& logger = *new rt::Ref<LUMBoundedLogger>(toStandardError());
         struct Static {
           ~Static() { logger->logWithMessage(messageWith(LUMLogLevelInfo, "last words"_s)); }
         };

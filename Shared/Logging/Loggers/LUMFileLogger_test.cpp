@@ -219,7 +219,7 @@ TEST_F(LUMFileLoggerTest, RotatesAtLocalMidnight) {
   file->logWithMessage(messageAt(kLocalMidnight + 1, "second"));
   EXPECT_EQ(content("log.1"), "first of a day\nlast of the day\n");
   EXPECT_EQ(content(), "first of the next day\nlate\nsecond\n");
-  file->logWithMessage(messageAt(kLocalMidnight + (3 * 86'400), "days later"));
+  file->logWithMessage(messageAt(kLocalMidnight + (3L * 86'400), "days later"));
   EXPECT_EQ(content(), "days later\n");
   EXPECT_EQ(names(), (Names{"log", "log.1", "log.2"}));
   unsetenv("TZ");

@@ -682,7 +682,7 @@ TEST(LUMLogCrash, InTheChildOfAFork) {
 [[gnu::constructor]] void crashBeforeMain() {
   const char* const descriptor = std::getenv("LUM_LOG_CRASH_TEST_FILE");
   if (descriptor == nullptr) return;
-  file = std::atoi(descriptor);
+  file = std::stoi(descriptor);
   LUMLogCrash::install();
   log(*keep(LUMRingLogger::initWithLogger(rt::make<Output>())), 0, 3);
   std::abort();

@@ -497,6 +497,7 @@ TEST(LUMLogJSON, IsWhatJqReads) {
   const Lines lines(kRandomLines);
   const ProcessResult result = runProcess(
       {"jq", "-r", "-s",
+       // NOLINTNEXTLINE(bugprone-suspicious-missing-comma): one argument on three lines
        R"(map(select((.Timestamp | type) == "string" and .SeverityText == "info" and )"
        R"(.SeverityNumber == 9 and (.Body | type) == "string" and (.Attributes | has("thread.id")) )"
        R"(and .Resource."service.name" == "com.example.host")) | length)",

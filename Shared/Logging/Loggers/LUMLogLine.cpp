@@ -90,9 +90,11 @@ void LUMLogLine::appendUnsigned(std::uint64_t value, std::size_t width) noexcept
 
 void LUMLogLine::withText(const rt::Object* object, void (*use)(void* given, std::string_view text),
                           void* given) const {
-  if (object == nullptr) return use(given, "(null)");
-  if (const auto* string = rt::cast<rt::StringObject>(object)) return use(given, string->view());
-  if (caller_ == Caller::kSignalHandler) {
+  if (object == nullptr) {
+    use(given, "(null)");
+  } else if (const auto* string = rt::cast<rt::StringObject>(object)) {
+    use(given, string->view());
+  } else if (caller_ == Caller::kSignalHandler) {
     std::array<char, 64> place{};
     LUMLogLine text(place, caller_);
     if (const auto* number = rt::cast<rt::Number>(object)) {
@@ -103,7 +105,8 @@ void LUMLogLine::withText(const rt::Object* object, void (*use)(void* given, std
         case rt::Number::Kind::kReal: {
           // `to_chars` without a precision needs no memory.
           const auto end = std::to_chars(place.data(), place.data() + place.size(), number->realValue());
-          return use(given, {place.data(), end.ptr});
+          use(given, {place.data(), end.ptr});
+          return;
         }
         case rt::Number::Kind::kBoolean:
         case rt::Number::Kind::kSigned:
@@ -115,7 +118,8 @@ void LUMLogLine::withText(const rt::Object* object, void (*use)(void* given, std
       text.append(object->classInfo().name);
       text.append(']');
     }
-    return use(given, text.text());
+    use(given, text.text());
+  } else {
+    use(given, LUMLogDescriptionOf(*object));
   }
-  use(given, LUMLogDescriptionOf(*object));
 }

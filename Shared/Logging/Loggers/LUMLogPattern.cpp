@@ -164,7 +164,10 @@ void appendThread(LUMLogLine& line, const LUMLogMessage& message) {
 }
 
 void appendValue(LUMLogLine& line, std::string_view text) {
-  if (!text.empty() && text.find_first_of(" \"=") == std::string_view::npos) return line.appendEscaped(text);
+  if (!text.empty() && text.find_first_of(" \"=") == std::string_view::npos) {
+    line.appendEscaped(text);
+    return;
+  }
   line.append('"');
   while (!text.empty()) {
     const std::size_t plain = std::min(text.find_first_of("\"\\"), text.size());
@@ -204,37 +207,51 @@ void appendField(LUMLogLine& line, const Step& step, const LUMLogMessage& messag
       break;
     case Kind::kTime:
     case Kind::kUtc:
-      return appendTime(line, step, message.time(), times[step.timeIndex]);
+      appendTime(line, step, message.time(), times[step.timeIndex]);
+      break;
     case Kind::kLevel:
-      return appendLevel(line, message.level());
+      appendLevel(line, message.level());
+      break;
     case Kind::kComponent:
-      return appendProperty(line, message, LUMLogMetadata::kComponentKey);
+      appendProperty(line, message, LUMLogMetadata::kComponentKey);
+      break;
     case Kind::kCategory:
-      return appendProperty(line, message, LUMLogMetadata::kCategoryKey);
+      appendProperty(line, message, LUMLogMetadata::kCategoryKey);
+      break;
     case Kind::kThread:
-      return appendThread(line, message);
+      appendThread(line, message);
+      break;
     case Kind::kTid:
-      return line.appendUnsigned(message.threadIdentifier());
+      line.appendUnsigned(message.threadIdentifier());
+      break;
     case Kind::kQueue:
-      return line.appendEscaped(message.dispatchQueueLabel().view());
+      line.appendEscaped(message.dispatchQueueLabel().view());
+      break;
     case Kind::kFile: {
       const std::string_view path = message.file().view();
       std::size_t begin = path.size();
       while (begin > 0 && path[begin - 1] != '/') --begin;
-      return line.appendEscaped(path.substr(begin));
+      line.appendEscaped(path.substr(begin));
+      break;
     }
     case Kind::kPath:
-      return line.appendEscaped(message.file().view());
+      line.appendEscaped(message.file().view());
+      break;
     case Kind::kLine:
-      return line.appendUnsigned(message.line());
+      line.appendUnsigned(message.line());
+      break;
     case Kind::kFunction:
-      return line.appendEscaped(message.function().view());
+      line.appendEscaped(message.function().view());
+      break;
     case Kind::kText:
-      return line.appendEscaped(message.formattedString().view());
+      line.appendEscaped(message.formattedString().view());
+      break;
     case Kind::kFields:
-      return appendFields(line, step.text, message);
+      appendFields(line, step.text, message);
+      break;
     case Kind::kStack:
-      return appendStack(line, step.text, message);
+      appendStack(line, step.text, message);
+      break;
   }
 }
 
@@ -245,7 +262,10 @@ void appendAligned(LUMLogLine& line, const Step& step, const LUMLogMessage& mess
       place;  // NOLINT(cppcoreguidelines-pro-type-member-init): as above
   LUMLogLine field(place, line.caller());
   appendField(field, step, message, nullptr);
-  if (!field.isComplete()) return appendField(line, step, message, nullptr);
+  if (!field.isComplete()) {
+    appendField(line, step, message, nullptr);
+    return;
+  }
   const auto characters = static_cast<std::size_t>(std::ranges::count_if(
       field.text(), [](char byte) { return (static_cast<unsigned char>(byte) & 0xC0U) != 0x80; }));
   const std::size_t spaces = characters < step.width ? step.width - characters : 0;

@@ -52,7 +52,7 @@ class LoggersFaultsTest : public testing::Test {
     std::ifstream file(folder_ / name);
     for (std::string line; std::getline(file, line);) {
       const std::size_t at = line.find(before);
-      if (at != std::string::npos) ++numbers[std::atoi(line.c_str() + at + before.size())];
+      if (at != std::string::npos) ++numbers[std::stoi(line.substr(at + before.size()))];
     }
     return numbers;
   }

@@ -29,7 +29,7 @@ class Strings : public rt::Implements<Strings, rt::Object, LUMLogFormatter> {
   }
 };
 
-rt::Ref<LUMLogMessage> messageOf(rt::String text) {
+rt::Ref<LUMLogMessage> messageOf(const rt::String& text) {
   return LUMLogMessage::initWithLevel(LUMLogLevelInfo, text, text, nullptr, nullptr, 0, ""_s, ""_s, nullptr,
                                       nullptr, nullptr);
 }

@@ -26,6 +26,8 @@
 #include "Shared/Logging/LUMLogDropAllFilter.h"
 #include "Shared/Logging/LUMLogMinimumLevelFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
+#include "tests/support/AllocationCount.h"
+#include "tests/support/AllocationFailure.h"
 #include "tests/support/ForkTest.h"
 #include "tests/support/Sanitizers.h"
 #include "tests/support/TestLoggers.h"
@@ -469,6 +471,38 @@ TEST(LUMBoundedLogger, ReleasesItsMessages) {
     }
     EXPECT_EQ(count, 0);
   }
+}
+
+// Memory.
+
+TEST(LUMBoundedLogger, AllocatesNothingWhileItsTaskIsAwake) {
+  if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
+  const Bounded bounded;
+  bounded.hold();
+  const rt::Ref<LUMLogMessage> message = messageWith(LUMLogLevelInfo, "a"_s);
+  {
+    const AllocationCount count;
+    for (int i = 0; i < 100; ++i) bounded.logger_->logWithMessage(message);
+    EXPECT_EQ(count.allocations(), 0);
+  }
+  EXPECT_EQ(bounded.written().size(), 101U);
+}
+
+TEST(LUMBoundedLogger, WritesOnTheCallersThreadWithoutMemoryForATask) {
+  if (!AllocationFailure::isSupported()) GTEST_SKIP() << "no way to make allocations fail here";
+  std::atomic<std::thread::id> thread;
+  const auto target = rt::make<TestSyncLogger>([&](const auto&) { thread = std::this_thread::get_id(); });
+  const auto logger = LUMBoundedLogger::initWithLogger(target);
+  const rt::Ref<LUMLogMessage> message = messageWith(LUMLogLevelInfo, "a"_s);
+  {
+    const AllocationFailure failure(1);
+    logger->logWithMessage(message);
+    EXPECT_TRUE(failure.hasHappened());
+  }
+  EXPECT_EQ(thread.load(), std::this_thread::get_id());
+  logger->logWithMessage(message);
+  EXPECT_TRUE(logger->flush(kLong));
+  EXPECT_NE(thread.load(), std::this_thread::get_id());
 }
 
 // Exit and fork. The target writes to standard error, which the parent of a death test reads.

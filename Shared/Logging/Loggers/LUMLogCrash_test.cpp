@@ -35,6 +35,7 @@
 #include "Shared/Logging/LUMAsyncLogger.h"
 #include "Shared/Logging/LUMLogMetadata.h"
 #include "Shared/Logging/Loggers/LUMBoundedLogger.h"
+#include "Shared/Logging/Loggers/LUMLogCrashOutput.h"
 #include "Shared/Logging/Loggers/LUMLogLine.h"
 #include "Shared/Logging/Loggers/LUMRingLogger.h"
 #include "tests/support/Sanitizers.h"
@@ -604,6 +605,32 @@ TEST(LUMLogCrash, IsReportedOnceToEachOutput) {
       },
       lines);
   EXPECT_THAT(lines, ElementsAre("crash:", MatchesRegex("SIGABRT.*")));
+}
+
+// An output that nobody else writes to, and one that a ring writes to, get one line each.
+TEST(LUMLogCrash, IsReportedToOutputsThatAskForIt) {
+  std::vector<std::string> lines;
+  statusAndLines(
+      [] {
+        class Asking final : public rt::Implements<Asking, LUMLogOutput> {
+         public:
+          Asking() : Implements(nullptr) {}
+          void logWithMessage(const rt::Ref<LUMLogMessage>& /*message*/) override {}
+          void logInSignalHandler(const LUMLogMessage& message) noexcept override {
+            writeLine("buffered");
+            writeLine(message.formattedString().view().substr(0, 7));
+          }
+
+         private:
+          const LUMLogCrashOutput crashOutput_{*this};
+        };
+        static_cast<void>(rt::make<Asking>());
+        keep(LUMRingLogger::initWithLogger(keep(rt::make<Asking>())));
+        keep(rt::make<Asking>());
+        std::abort();
+      },
+      lines);
+  EXPECT_THAT(lines, ElementsAre("buffered", "SIGABRT", "buffered", "SIGABRT"));
 }
 
 TEST(LUMLogCrash, LeavesOutLoggersThatAreGone) {

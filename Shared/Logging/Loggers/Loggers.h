@@ -11,6 +11,7 @@
 // IWYU pragma: begin_exports
 #include "Shared/Logging/Loggers/LUMBoundedLogger.h"
 #include "Shared/Logging/Loggers/LUMLogCrash.h"
+#include "Shared/Logging/Loggers/LUMLogCrashOutput.h"
 #include "Shared/Logging/Loggers/LUMLogLine.h"
 #include "Shared/Logging/Loggers/LUMLogLineFormatter.h"
 #include "Shared/Logging/Loggers/LUMLogOutput.h"

@@ -135,7 +135,8 @@ class RT_VISIBLE LUMBoundedLogger : public rt::Implements<LUMBoundedLogger, LUML
   bool writeBatch(bool isRefused) noexcept;
   bool writeNext(bool isRefused) noexcept;
   void write(const rt::Ref<LUMLogMessage>& message, bool isRefused) noexcept;
-  void reportDropped(std::uint64_t count) noexcept;
+  rt::Ref<LUMLogMessage> reportOf(std::uint64_t count) const;
+  void reportDropped(std::uint64_t count, bool isRefused) noexcept;
   void wakeWaiters(bool isMore) noexcept;
 
   const LUMLogOutput* crashSelf() const noexcept override { return this; }

@@ -357,11 +357,24 @@ TEST(LUMBoundedLogger, WritesAtOnceWhatAnAsynchronousTargetWantsAtOnce) {
 }
 
 TEST(LUMBoundedLogger, CountsMessagesForATargetWithoutAQueue) {
-  const auto target = rt::make<TestAsyncLogger>(nullptr, [](const auto&) { FAIL(); });
-  const auto logger = LUMBoundedLogger::initWithLogger(target);
+  const auto queue = rt::make<rt::Queue>("target"_s);
+  std::latch isAsked(1);
+  std::latch mayAnswer(1);
+  const auto target = rt::make<TestAsyncLogger>(queue, [](const auto&) { FAIL(); });
+  target->operationQueue_ = [&]() -> rt::Ref<rt::Queue> {
+    if (!isAsked.try_wait()) isAsked.count_down();
+    mayAnswer.wait();
+    return nullptr;
+  };
+  const auto logger =
+      LUMBoundedLogger::initWithLogger(target, {.capacity = 1, .whenFull = LUMLogWhenFull::kDropNewest});
   logger->logWithMessage(messageWith(LUMLogLevelInfo));
+  isAsked.wait();
+  logger->logWithMessage(messageWith(LUMLogLevelInfo));
+  mayAnswer.count_down();
   EXPECT_TRUE(logger->flush(kLong));
   EXPECT_EQ(logger->failedCount(), 1U);
+  EXPECT_EQ(logger->droppedCount(), 1U);  // The target gets no report either.
 }
 
 // Against a model: one thread, a task that writes when the test lets it.

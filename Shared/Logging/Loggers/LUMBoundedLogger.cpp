@@ -98,8 +98,8 @@ LUMBoundedLogger::LUMBoundedLogger(const rt::Ref<LUMLogger>& target, LUMBoundedL
 
 LUMBoundedLogger::~LUMBoundedLogger() {
   leave();
-  // Empty, unless there was no memory for a task.
-  writeAll();
+  // Nothing waits, unless there was no memory for a task.
+  if (hasWork()) writeAll();
 }
 
 LUMLogLevel LUMBoundedLogger::lowestLevel(const rt::String* component) const noexcept {

@@ -377,6 +377,18 @@ TEST(LUMBoundedLogger, CountsMessagesForATargetWithoutAQueue) {
   EXPECT_EQ(logger->droppedCount(), 1U);  // The target gets no report either.
 }
 
+// Regression: the destructor asked the target for its queue, and used it, although nothing waited.
+TEST(LUMBoundedLogger, IsDestroyedWithoutItsTarget) {
+  const auto target = rt::make<TestAsyncLogger>(nullptr, [](const auto&) {});
+  bool isAsked = false;
+  target->operationQueue_ = [&]() -> rt::Ref<rt::Queue> {
+    isAsked = true;
+    return nullptr;
+  };
+  static_cast<void>(LUMBoundedLogger::initWithLogger(target));
+  EXPECT_FALSE(isAsked);
+}
+
 // Against a model: one thread, a task that writes when the test lets it.
 
 class LUMBoundedLoggerModel : public testing::TestWithParam<LUMLogWhenFull> {};

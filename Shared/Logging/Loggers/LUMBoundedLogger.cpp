@@ -98,8 +98,8 @@ LUMBoundedLogger::LUMBoundedLogger(const rt::Ref<LUMLogger>& target, LUMBoundedL
 
 LUMBoundedLogger::~LUMBoundedLogger() {
   leave();
-  // Empty, unless there was no memory for a task.
-  writeAll();
+  // Nothing waits, unless there was no memory for a task.
+  if (hasWork()) writeAll();
 }
 
 LUMLogLevel LUMBoundedLogger::lowestLevel(const rt::String* component) const noexcept {
@@ -338,11 +338,12 @@ bool LUMBoundedLogger::writeNext(bool isRefused) noexcept {
       sched_yield();  // The thread that logs the next message is not done.
       return false;
     }
-    reportDropped(head - std::exchange(expected_, head) + unreported_.exchange(0));
+    reportDropped(head - std::exchange(expected_, head) + unreported_.exchange(0), isRefused);
     finished_.store(std::max(finished_.load(), head));
     return false;
   }
-  reportDropped(taken.position - std::exchange(expected_, taken.position + 1) + taken.droppedBefore);
+  reportDropped(taken.position - std::exchange(expected_, taken.position + 1) + taken.droppedBefore,
+                isRefused);
   {
     const rt::Ref<LUMLogMessage> message = rt::Ref<LUMLogMessage>::adopt(taken.message);
     write(message, isRefused);
@@ -365,15 +366,19 @@ void LUMBoundedLogger::write(const rt::Ref<LUMLogMessage>& message, bool isRefus
   failedCount_.fetch_add(1);
 }
 
-void LUMBoundedLogger::reportDropped(std::uint64_t count) noexcept {
+rt::Ref<LUMLogMessage> LUMBoundedLogger::reportOf(std::uint64_t count) const {
+  const rt::String text =
+      rt::format("%llu %s dropped: the queue of %@ was full", static_cast<unsigned long long>(count),
+                 count == 1 ? "message was" : "messages were", target_->asObject()->classInfo().name);
+  return LUMLogMessage::initWithLevel(LUMLogLevelError, text, text, nullptr, nullptr, 0, nullptr, nullptr,
+                                      nullptr, nullptr,
+                                      LUMLogMetadata::metadataWithComponent("LUMBoundedLogger"_s));
+}
+
+void LUMBoundedLogger::reportDropped(std::uint64_t count, bool isRefused) noexcept {
   if (count == 0) return;
   try {
-    const rt::String text =
-        rt::format("%llu %s dropped: the queue of %@ was full", static_cast<unsigned long long>(count),
-                   count == 1 ? "message was" : "messages were", target_->asObject()->classInfo().name);
-    target_->logWithMessage(LUMLogMessage::initWithLevel(
-        LUMLogLevelError, text, text, nullptr, nullptr, 0, nullptr, nullptr, nullptr, nullptr,
-        LUMLogMetadata::metadataWithComponent("LUMBoundedLogger"_s)));
+    if (!isRefused) target_->logWithMessage(reportOf(count));
   } catch (...) {  // NOLINT(bugprone-empty-catch): the count can still be read
   }
   reportedCount_.fetch_add(count);

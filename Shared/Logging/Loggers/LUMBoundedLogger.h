@@ -3,7 +3,7 @@
 /// Makes any logger asynchronous, with a queue of limited length. The thread that logs puts a reference to
 /// the message into the queue and goes on. A task writes the messages to the target, in order.
 ///
-///     const rt::Ref<LUMLogger> target = rt::make<FileLogger>("/var/log/host.log"_s);
+///     const rt::Ref<LUMLogger> target = rt::make<FileLogger>("/var/log/host.log");
 ///     const rt::Ref<LUMBoundedLogger> logger = LUMBoundedLogger::initWithLogger(target, {.capacity = 1024});
 ///     LUMLogMultiplexer::sharedInstance()->addSyncLogger(logger);
 ///     ...
@@ -135,7 +135,8 @@ class RT_VISIBLE LUMBoundedLogger : public rt::Implements<LUMBoundedLogger, LUML
   bool writeBatch(bool isRefused) noexcept;
   bool writeNext(bool isRefused) noexcept;
   void write(const rt::Ref<LUMLogMessage>& message, bool isRefused) noexcept;
-  void reportDropped(std::uint64_t count) noexcept;
+  rt::Ref<LUMLogMessage> reportOf(std::uint64_t count) const;
+  void reportDropped(std::uint64_t count, bool isRefused) noexcept;
   void wakeWaiters(bool isMore) noexcept;
 
   const LUMLogOutput* crashSelf() const noexcept override { return this; }

@@ -26,6 +26,8 @@
 #include "Shared/Logging/LUMLogDropAllFilter.h"
 #include "Shared/Logging/LUMLogMinimumLevelFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
+#include "tests/support/AllocationCount.h"
+#include "tests/support/AllocationFailure.h"
 #include "tests/support/ForkTest.h"
 #include "tests/support/Sanitizers.h"
 #include "tests/support/TestLoggers.h"
@@ -355,11 +357,36 @@ TEST(LUMBoundedLogger, WritesAtOnceWhatAnAsynchronousTargetWantsAtOnce) {
 }
 
 TEST(LUMBoundedLogger, CountsMessagesForATargetWithoutAQueue) {
-  const auto target = rt::make<TestAsyncLogger>(nullptr, [](const auto&) { FAIL(); });
-  const auto logger = LUMBoundedLogger::initWithLogger(target);
+  const auto queue = rt::make<rt::Queue>("target"_s);
+  std::latch isAsked(1);
+  std::latch mayAnswer(1);
+  const auto target = rt::make<TestAsyncLogger>(queue, [](const auto&) { FAIL(); });
+  target->operationQueue_ = [&]() -> rt::Ref<rt::Queue> {
+    if (!isAsked.try_wait()) isAsked.count_down();
+    mayAnswer.wait();
+    return nullptr;
+  };
+  const auto logger =
+      LUMBoundedLogger::initWithLogger(target, {.capacity = 1, .whenFull = LUMLogWhenFull::kDropNewest});
   logger->logWithMessage(messageWith(LUMLogLevelInfo));
+  isAsked.wait();
+  logger->logWithMessage(messageWith(LUMLogLevelInfo));
+  mayAnswer.count_down();
   EXPECT_TRUE(logger->flush(kLong));
   EXPECT_EQ(logger->failedCount(), 1U);
+  EXPECT_EQ(logger->droppedCount(), 1U);  // The target gets no report either.
+}
+
+// Regression: the destructor asked the target for its queue, and used it, although nothing waited.
+TEST(LUMBoundedLogger, IsDestroyedWithoutItsTarget) {
+  const auto target = rt::make<TestAsyncLogger>(nullptr, [](const auto&) {});
+  bool isAsked = false;
+  target->operationQueue_ = [&]() -> rt::Ref<rt::Queue> {
+    isAsked = true;
+    return nullptr;
+  };
+  static_cast<void>(LUMBoundedLogger::initWithLogger(target));
+  EXPECT_FALSE(isAsked);
 }
 
 // Against a model: one thread, a task that writes when the test lets it.
@@ -469,6 +496,38 @@ TEST(LUMBoundedLogger, ReleasesItsMessages) {
     }
     EXPECT_EQ(count, 0);
   }
+}
+
+// Memory.
+
+TEST(LUMBoundedLogger, AllocatesNothingWhileItsTaskIsAwake) {
+  if (!AllocationCount::isSupported()) GTEST_SKIP() << "no way to count allocations here";
+  const Bounded bounded;
+  bounded.hold();
+  const rt::Ref<LUMLogMessage> message = messageWith(LUMLogLevelInfo, "a"_s);
+  {
+    const AllocationCount count;
+    for (int i = 0; i < 100; ++i) bounded.logger_->logWithMessage(message);
+    EXPECT_EQ(count.allocations(), 0);
+  }
+  EXPECT_EQ(bounded.written().size(), 101U);
+}
+
+TEST(LUMBoundedLogger, WritesOnTheCallersThreadWithoutMemoryForATask) {
+  if (!AllocationFailure::isSupported()) GTEST_SKIP() << "no way to make allocations fail here";
+  std::atomic<std::thread::id> thread;
+  const auto target = rt::make<TestSyncLogger>([&](const auto&) { thread = std::this_thread::get_id(); });
+  const auto logger = LUMBoundedLogger::initWithLogger(target);
+  const rt::Ref<LUMLogMessage> message = messageWith(LUMLogLevelInfo, "a"_s);
+  {
+    const AllocationFailure failure(1);
+    logger->logWithMessage(message);
+    EXPECT_TRUE(failure.hasHappened());
+  }
+  EXPECT_EQ(thread.load(), std::this_thread::get_id());
+  logger->logWithMessage(message);
+  EXPECT_TRUE(logger->flush(kLong));
+  EXPECT_NE(thread.load(), std::this_thread::get_id());
 }
 
 // Exit and fork. The target writes to standard error, which the parent of a death test reads.

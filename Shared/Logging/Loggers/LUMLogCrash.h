@@ -4,7 +4,7 @@
 ///
 ///     int main() {
 ///       LUMLogCrash::install();
-///       const auto logger = LUMBoundedLogger::initWithLogger(rt::make<FileLogger>("/var/log/host.log"_s));
+///       const auto logger = LUMBoundedLogger::initWithLogger(rt::make<FileLogger>("/var/log/host.log"));
 ///       LUMLogMultiplexer::sharedInstance()->addSyncLogger(logger);
 ///       ...
 ///     }
@@ -15,7 +15,7 @@
 /// the signal, of level fault and component "LUMLogCrash":
 ///
 ///     | SIGSEGV at address 0x10 in thread 4711
-///     | SIGTERM-like signals name their sender: SIGABRT from process 12 in thread 4711
+///     | SIGABRT from process 12 in thread 4711
 ///     | std::terminate in thread 4711: an exception of type St13runtime_error: no such file
 ///
 /// If there is no target, the line goes to standard error. It says how many messages could not be written:

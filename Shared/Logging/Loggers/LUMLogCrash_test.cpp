@@ -35,6 +35,7 @@
 #include "Shared/Logging/LUMAsyncLogger.h"
 #include "Shared/Logging/LUMLogMetadata.h"
 #include "Shared/Logging/Loggers/LUMBoundedLogger.h"
+#include "Shared/Logging/Loggers/LUMLogCrashOutput.h"
 #include "Shared/Logging/Loggers/LUMLogLine.h"
 #include "Shared/Logging/Loggers/LUMRingLogger.h"
 #include "tests/support/Sanitizers.h"
@@ -606,6 +607,32 @@ TEST(LUMLogCrash, IsReportedOnceToEachOutput) {
   EXPECT_THAT(lines, ElementsAre("crash:", MatchesRegex("SIGABRT.*")));
 }
 
+// An output that nobody else writes to, and one that a ring writes to, get one line each.
+TEST(LUMLogCrash, IsReportedToOutputsThatAskForIt) {
+  std::vector<std::string> lines;
+  statusAndLines(
+      [] {
+        class Asking final : public rt::Implements<Asking, LUMLogOutput> {
+         public:
+          Asking() : Implements(nullptr) {}
+          void logWithMessage(const rt::Ref<LUMLogMessage>& /*message*/) override {}
+          void logInSignalHandler(const LUMLogMessage& message) noexcept override {
+            writeLine("buffered");
+            writeLine(message.formattedString().view().substr(0, 7));
+          }
+
+         private:
+          const LUMLogCrashOutput crashOutput_{*this};
+        };
+        static_cast<void>(rt::make<Asking>());
+        keep(LUMRingLogger::initWithLogger(keep(rt::make<Asking>())));
+        keep(rt::make<Asking>());
+        std::abort();
+      },
+      lines);
+  EXPECT_THAT(lines, ElementsAre("buffered", "SIGABRT", "buffered", "SIGABRT"));
+}
+
 TEST(LUMLogCrash, LeavesOutLoggersThatAreGone) {
   std::vector<std::string> lines;
   statusAndLines(
@@ -620,6 +647,49 @@ TEST(LUMLogCrash, LeavesOutLoggersThatAreGone) {
       },
       lines);
   EXPECT_THAT(lines, ElementsAre("7", "crash:", MatchesRegex("SIGABRT.*")));
+}
+
+// Without a stack of its own, the handler does not run.
+TEST(LUMLogCrash, EndsTheProgramAfterAnOverflowOnAThreadWithoutAStack) {
+  if (kIsSanitized) GTEST_SKIP() << "the sanitizer handles this signal and exits";
+  std::vector<std::string> lines;
+  const int status = statusAndLines(
+      [] {
+        waiting(3);
+        inThread([] { overflow(0); });
+      },
+      lines);
+  EXPECT_EQ(WTERMSIG(status), SIGSEGV);
+  EXPECT_TRUE(lines.empty());
+}
+
+// The signal may interrupt the thread anywhere: in the lock of the ring, in a queue, in `malloc`. What it was
+// logging may then be lost, but the program ends and says why.
+TEST(LUMLogCrash, MayInterruptAThreadThatLogs) {
+  if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer does not interrupt a thread anywhere";
+  for (int round = 0; round < 30; ++round) {
+    std::vector<std::string> lines;
+    const int status = crashChild(
+        [round] {
+          LUMLogCrash::install();
+          auto& ring = keep(LUMRingLogger::initWithLogger(rt::make<Output>(), {.capacity = 4}));
+          auto& bounded = keep(LUMBoundedLogger::initWithLogger(
+              rt::Ref<LUMSyncLogger>(rt::make<Output>()),
+              {.capacity = 4, .whenFull = static_cast<LUMLogWhenFull>(round % 3)}));
+          const pthread_t self = pthread_self();
+          std::thread([self, round] {
+            for (int i = 0; i < round; ++i) std::this_thread::yield();
+            pthread_kill(self, SIGABRT);
+          }).detach();
+          for (;;) {
+            log(*ring, 0, 1);
+            log(*bounded, 0, 1);
+          }
+        },
+        lines);
+    ASSERT_EQ(WTERMSIG(status), SIGABRT);
+    ASSERT_EQ(std::ranges::count(lines, "crash:"), 2);
+  }
 }
 
 // A crash in the handler.
@@ -689,6 +759,7 @@ TEST(LUMLogCrash, InTheChildOfAFork) {
 }
 
 TEST(LUMLogCrash, BeforeMain) {
+  if (access("/proc/self/exe", X_OK) != 0) GTEST_SKIP() << "no way to start this program again here";
   std::vector<std::string> lines;
   const int status = crashChild(
       [] {

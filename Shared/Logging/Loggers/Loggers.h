@@ -13,6 +13,7 @@
 #include "Shared/Logging/Loggers/LUMFileLogger.h"
 #include "Shared/Logging/Loggers/LUMLogCapture.h"
 #include "Shared/Logging/Loggers/LUMLogCrash.h"
+#include "Shared/Logging/Loggers/LUMLogCrashOutput.h"
 #include "Shared/Logging/Loggers/LUMLogJSON.h"
 #include "Shared/Logging/Loggers/LUMLogLine.h"
 #include "Shared/Logging/Loggers/LUMLogLineFormatter.h"

@@ -5,14 +5,18 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
+#include <memory>
 #include <string_view>
 #include <utility>
+#include <vector>
 
 #include "Runtime/Objects/StringObject.h"
 #include "Runtime/Values/Dictionary.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/Loggers/Private/LUMLogFields.h"
 #include "Shared/Logging/Loggers/Private/LUMLogLocalOffset.h"
+#include "Shared/Logging/Loggers/Private/LUMLogPatternStep.h"
+#include "Shared/Logging/Loggers/Private/LUMLogTimeCache.h"
 
 namespace {
 
@@ -259,11 +263,24 @@ std::unique_ptr<LUMLogTimeCache[]> cachesFor(const std::vector<Step>& steps) {
 
 }  // namespace
 
-LUMLogPattern::LUMLogPattern(std::vector<LUMLogPatternStep> steps)
-    : steps_(std::move(steps)), times_(cachesFor(steps_)) {}
+class LUMLogPatternProgram final : public rt::Implements<LUMLogPatternProgram, rt::Object> {
+ public:
+  static constexpr std::string_view kClassName = "LUMLogPatternProgram";
+
+  explicit LUMLogPatternProgram(std::string_view pattern)
+      : steps(LUMLogPatternSteps(pattern)), times(cachesFor(steps)) {}
+
+  const std::vector<Step> steps;
+  const std::unique_ptr<LUMLogTimeCache[]> times;  // one for each time among the steps
+};
+
+LUMLogPattern::LUMLogPattern(const rt::String& pattern)
+    : program_(rt::make<LUMLogPatternProgram>(pattern.view())) {}
+
+LUMLogPattern::~LUMLogPattern() = default;
 
 rt::Ref<LUMLogPattern> LUMLogPattern::initWithPattern(const rt::String& pattern) {
-  return rt::Ref<LUMLogPattern>::adopt(new LUMLogPattern(LUMLogPatternSteps(pattern.view())));
+  return rt::Ref<LUMLogPattern>::adopt(new LUMLogPattern(pattern));
 }
 
 rt::Ref<LUMLogPattern> LUMLogPattern::init() {
@@ -271,11 +288,11 @@ rt::Ref<LUMLogPattern> LUMLogPattern::init() {
 }
 
 void LUMLogPattern::appendLine(LUMLogLine& line, const LUMLogMessage& message) const {
-  for (const LUMLogPatternStep& step : steps_) {
+  for (const Step& step : program_->steps) {
     if (step.kind == Kind::kLiteral) {
       line.append(step.text);
     } else if (step.width == 0) {
-      appendField(line, step, message, times_.get());
+      appendField(line, step, message, program_->times.get());
     } else {
       appendAligned(line, step, message);
     }

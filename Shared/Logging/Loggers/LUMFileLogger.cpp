@@ -34,7 +34,8 @@ rt::Ref<LUMLogFormatter> formatterOf(const LUMFileLoggerOptions& options) {
 
 }  // namespace
 
-rt::Ref<LUMFileLogger> LUMFileLogger::initWithPath(const rt::String& path, LUMFileLoggerOptions options) {
+rt::Ref<LUMFileLogger> LUMFileLogger::initWithPath(const rt::String& path,
+                                                   const LUMFileLoggerOptions& options) {
   check(options);
   return rt::Ref<LUMFileLogger>::adopt(new LUMFileLogger(path, options));
 }
@@ -44,7 +45,7 @@ rt::Ref<LUMFileLogger> LUMFileLogger::initWithPath(const rt::String& path, rt::R
   LUMFileLoggerOptions options;
   options.formatter = std::move(formatter);
   options.filter = std::move(filter);
-  return initWithPath(path, std::move(options));
+  return initWithPath(path, options);
 }
 
 LUMFileLogger::LUMFileLogger(const rt::String& path, const LUMFileLoggerOptions& options)

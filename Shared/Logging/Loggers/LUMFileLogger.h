@@ -88,7 +88,7 @@ class RT_VISIBLE LUMFileLogger final : public rt::Implements<LUMFileLogger, LUML
   ///
   /// Errors: throws std::system_error that names the path if the file cannot be opened, std::invalid_argument
   /// if the path is null, empty or has a NUL, or an option is out of range, and std::bad_alloc.
-  static rt::Ref<LUMFileLogger> initWithPath(const rt::String& path, LUMFileLoggerOptions options);
+  static rt::Ref<LUMFileLogger> initWithPath(const rt::String& path, const LUMFileLoggerOptions& options);
 
   /// Same as above, with a formatter and a filter, which may be null, and otherwise the default options.
   static rt::Ref<LUMFileLogger> initWithPath(const rt::String& path,

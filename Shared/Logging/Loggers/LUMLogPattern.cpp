@@ -168,7 +168,10 @@ void appendThread(LUMLogLine& line, const LUMLogMessage& message) {
 }
 
 void appendValue(LUMLogLine& line, std::string_view text) {
-  if (!text.empty() && text.find_first_of(" \"=") == std::string_view::npos) return line.appendEscaped(text);
+  if (!text.empty() && text.find_first_of(" \"=") == std::string_view::npos) {
+    line.appendEscaped(text);
+    return;
+  }
   line.append('"');
   while (!text.empty()) {
     const std::size_t plain = std::min(text.find_first_of("\"\\"), text.size());
@@ -202,48 +205,65 @@ void appendField(LUMLogLine& line, const Step& step, const LUMLogMessage& messag
       break;
     case Kind::kTime:
     case Kind::kUtc:
-      return appendTime(line, step, message.time(), times[step.timeIndex]);
+      appendTime(line, step, message.time(), times[step.timeIndex]);
+      break;
     case Kind::kLevel:
-      return appendLevel(line, message.level());
+      appendLevel(line, message.level());
+      break;
     case Kind::kComponent:
-      return appendProperty(line, message, LUMLogMetadata::kComponentKey);
+      appendProperty(line, message, LUMLogMetadata::kComponentKey);
+      break;
     case Kind::kCategory:
-      return appendProperty(line, message, LUMLogMetadata::kCategoryKey);
+      appendProperty(line, message, LUMLogMetadata::kCategoryKey);
+      break;
     case Kind::kThread:
-      return appendThread(line, message);
+      appendThread(line, message);
+      break;
     case Kind::kTid:
-      return line.appendUnsigned(message.threadIdentifier());
+      line.appendUnsigned(message.threadIdentifier());
+      break;
     case Kind::kQueue:
-      return line.appendEscaped(message.dispatchQueueLabel().view());
+      line.appendEscaped(message.dispatchQueueLabel().view());
+      break;
     case Kind::kFile: {
       const std::string_view path = message.file().view();
       std::size_t begin = path.size();
       while (begin > 0 && path[begin - 1] != '/') --begin;
-      return line.appendEscaped(path.substr(begin));
+      line.appendEscaped(path.substr(begin));
+      break;
     }
     case Kind::kPath:
-      return line.appendEscaped(message.file().view());
+      line.appendEscaped(message.file().view());
+      break;
     case Kind::kLine:
-      return line.appendUnsigned(message.line());
+      line.appendUnsigned(message.line());
+      break;
     case Kind::kFunction:
-      return line.appendEscaped(message.function().view());
+      line.appendEscaped(message.function().view());
+      break;
     case Kind::kText:
-      return line.appendEscaped(message.formattedString().view());
+      line.appendEscaped(message.formattedString().view());
+      break;
     case Kind::kFields:
-      return appendFields(line, step.text, message);
+      appendFields(line, step.text, message);
+      break;
     case Kind::kStack:
-      return appendStack(line, step.text, message);
+      appendStack(line, step.text, message);
+      break;
   }
 }
 
-// Appends a field of at least `step.width` characters. A time has no width.
-void appendAligned(LUMLogLine& line, const Step& step, const LUMLogMessage& message) {
+// Appends a field of at least `step.width` characters.
+void appendAligned(LUMLogLine& line, const Step& step, const LUMLogMessage& message, LUMLogTimeCache* times) {
   // A text that does not fit here needs no spaces: a character has at most four bytes.
   std::array<char, 4 * Step::kLargestWidth>
       place;  // NOLINT(cppcoreguidelines-pro-type-member-init): as above
   LUMLogLine field(place, line.caller());
-  appendField(field, step, message, nullptr);
-  if (!field.isComplete()) return appendField(line, step, message, nullptr);
+  appendField(field, step, message, times);
+  if (!field.isComplete()) {
+    appendField(line, step, message, times);
+    return;
+  }
   const auto characters = static_cast<std::size_t>(std::ranges::count_if(
       field.text(), [](char byte) { return (static_cast<unsigned char>(byte) & 0xC0U) != 0x80; }));
   const std::size_t spaces = characters < step.width ? step.width - characters : 0;
@@ -294,7 +314,7 @@ void LUMLogPattern::appendLine(LUMLogLine& line, const LUMLogMessage& message) c
     } else if (step.width == 0) {
       appendField(line, step, message, program_->times.get());
     } else {
-      appendAligned(line, step, message);
+      appendAligned(line, step, message, program_->times.get());
     }
   }
 }

@@ -55,7 +55,7 @@ bool replace(int kept, int fresh) noexcept {
 
 }  // namespace
 
-LUMLogFile::LUMLogFile(std::string path, mode_t mode, std::uint32_t keptFileCount)
+LUMLogFile::LUMLogFile(const std::string& path, mode_t mode, std::uint32_t keptFileCount)
     : path_(absolutePath(path)), mode_(mode), keptFileCount_(keptFileCount) {
   descriptor_ = open();
   if (descriptor_ < 0) {

@@ -114,6 +114,6 @@ BENCHMARK_CAPTURE(lineOurs, , std::size_t{0})->Name("FileLogger/line at once/our
 BENCHMARK_CAPTURE(lineLocked, , true)->Name("FileLogger/line at once/spdlog-mt");
 BENCHMARK(patternOurs)->Name("FileLogger/pattern/ours");
 
-const Bound lineBound("FileLogger/line", "spdlog-mt", 0.9);
+const Bound lineBound("FileLogger/line, 64 KB", "spdlog-mt", 1.1);
 
 }  // namespace

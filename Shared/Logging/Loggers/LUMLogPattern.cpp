@@ -5,14 +5,18 @@
 #include <cstddef>
 #include <cstdint>
 #include <cstring>
+#include <memory>
 #include <string_view>
 #include <utility>
+#include <vector>
 
 #include "Runtime/Objects/StringObject.h"
 #include "Runtime/Values/Dictionary.h"
 #include "Shared/Logging/LUMLogAddressCallstack.h"
 #include "Shared/Logging/Loggers/Private/LUMLogFields.h"
 #include "Shared/Logging/Loggers/Private/LUMLogLocalOffset.h"
+#include "Shared/Logging/Loggers/Private/LUMLogPatternStep.h"
+#include "Shared/Logging/Loggers/Private/LUMLogTimeCache.h"
 
 namespace {
 
@@ -255,15 +259,15 @@ void appendField(LUMLogLine& line, const Step& step, const LUMLogMessage& messag
   }
 }
 
-// Appends a field of at least `step.width` characters. A time has no width.
-void appendAligned(LUMLogLine& line, const Step& step, const LUMLogMessage& message) {
+// Appends a field of at least `step.width` characters.
+void appendAligned(LUMLogLine& line, const Step& step, const LUMLogMessage& message, LUMLogTimeCache* times) {
   // A text that does not fit here needs no spaces: a character has at most four bytes.
   std::array<char, 4 * Step::kLargestWidth>
       place;  // NOLINT(cppcoreguidelines-pro-type-member-init): as above
   LUMLogLine field(place, line.caller());
-  appendField(field, step, message, nullptr);
+  appendField(field, step, message, times);
   if (!field.isComplete()) {
-    appendField(line, step, message, nullptr);
+    appendField(line, step, message, times);
     return;
   }
   const auto characters = static_cast<std::size_t>(std::ranges::count_if(
@@ -285,11 +289,24 @@ std::unique_ptr<LUMLogTimeCache[]> cachesFor(const std::vector<Step>& steps) {
 
 }  // namespace
 
-LUMLogPattern::LUMLogPattern(std::vector<LUMLogPatternStep> steps)
-    : steps_(std::move(steps)), times_(cachesFor(steps_)) {}
+class LUMLogPatternProgram final : public rt::Implements<LUMLogPatternProgram, rt::Object> {
+ public:
+  static constexpr std::string_view kClassName = "LUMLogPatternProgram";
+
+  explicit LUMLogPatternProgram(std::string_view pattern)
+      : steps(LUMLogPatternSteps(pattern)), times(cachesFor(steps)) {}
+
+  const std::vector<Step> steps;
+  const std::unique_ptr<LUMLogTimeCache[]> times;  // one for each time among the steps
+};
+
+LUMLogPattern::LUMLogPattern(const rt::String& pattern)
+    : program_(rt::make<LUMLogPatternProgram>(pattern.view())) {}
+
+LUMLogPattern::~LUMLogPattern() = default;
 
 rt::Ref<LUMLogPattern> LUMLogPattern::initWithPattern(const rt::String& pattern) {
-  return rt::Ref<LUMLogPattern>::adopt(new LUMLogPattern(LUMLogPatternSteps(pattern.view())));
+  return rt::Ref<LUMLogPattern>::adopt(new LUMLogPattern(pattern));
 }
 
 rt::Ref<LUMLogPattern> LUMLogPattern::init() {
@@ -297,13 +314,13 @@ rt::Ref<LUMLogPattern> LUMLogPattern::init() {
 }
 
 void LUMLogPattern::appendLine(LUMLogLine& line, const LUMLogMessage& message) const {
-  for (const LUMLogPatternStep& step : steps_) {
+  for (const Step& step : program_->steps) {
     if (step.kind == Kind::kLiteral) {
       line.append(step.text);
     } else if (step.width == 0) {
-      appendField(line, step, message, times_.get());
+      appendField(line, step, message, program_->times.get());
     } else {
-      appendAligned(line, step, message);
+      appendAligned(line, step, message, program_->times.get());
     }
   }
 }

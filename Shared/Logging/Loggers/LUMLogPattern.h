@@ -2,10 +2,8 @@
 
 /// A formatter that writes lines by a pattern, which is checked when it is made.
 ///
-///     multiplexer->addSyncLogger(LUMFileLogger::initWithPath(
-///         "/var/log/host.log"_s,
-///         LUMLogPattern::initWithPattern("{time:%H:%M:%S.%3f} {level:<5} [{component}] {text}
-///         {fields}"_s)));
+///     const auto pattern = LUMLogPattern::initWithPattern("{time:%H:%M:%S} {level:<5} {text} {fields}"_s);
+///     multiplexer->addSyncLogger(LUMFileLogger::initWithPath("/var/log/host.log"_s, pattern));
 ///
 /// A field is a name in braces. "{{" and "}}" stand for braces. The fields:
 ///
@@ -37,9 +35,6 @@
 ///
 /// Not for: lines that programs read.
 
-#include <memory>
-#include <vector>
-
 #include "Runtime/Base/Visibility.h"
 #include "Runtime/Objects/Class.h"
 #include "Runtime/Objects/Object.h"
@@ -48,7 +43,8 @@
 #include "Shared/Logging/LUMLogMessage.h"
 #include "Shared/Logging/Loggers/LUMLogLine.h"
 #include "Shared/Logging/Loggers/LUMLogLineFormatter.h"
-#include "Shared/Logging/Loggers/Private/LUMLogPatternStep.h"
+
+class LUMLogPatternProgram;
 
 class RT_VISIBLE LUMLogPattern final : public rt::Implements<LUMLogPattern, rt::Object, LUMLogLineFormatter> {
  public:
@@ -68,9 +64,9 @@ class RT_VISIBLE LUMLogPattern final : public rt::Implements<LUMLogPattern, rt::
   void appendLine(LUMLogLine& line, const LUMLogMessage& message) const override;
 
  protected:
-  explicit LUMLogPattern(std::vector<LUMLogPatternStep> steps);
+  explicit LUMLogPattern(const rt::String& pattern);
+  ~LUMLogPattern() override;
 
  private:
-  const std::vector<LUMLogPatternStep> steps_;
-  const std::unique_ptr<LUMLogTimeCache[]> times_;  // one for each time among the steps
+  const rt::Ref<LUMLogPatternProgram> program_;
 };

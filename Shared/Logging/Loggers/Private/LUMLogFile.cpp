@@ -55,13 +55,14 @@ bool replace(int kept, int fresh) noexcept {
 
 }  // namespace
 
-LUMLogFile::LUMLogFile(std::string path, mode_t mode, std::uint32_t keptFileCount)
+LUMLogFile::LUMLogFile(const std::string& path, mode_t mode, std::uint32_t keptFileCount)
     : path_(absolutePath(path)), mode_(mode), keptFileCount_(keptFileCount) {
   descriptor_ = open();
   if (descriptor_ < 0) {
     throw std::system_error(errno, std::generic_category(), "cannot open the log file " + path_);
   }
   refresh();
+  isCut_ = endsWithinLine();
 }
 
 LUMLogFile::~LUMLogFile() {
@@ -85,10 +86,11 @@ void LUMLogFile::refresh() noexcept {
   inode_ = status.st_ino;
   size_ = isRegular_ ? static_cast<std::uint64_t>(status.st_size) : 0;
   changeTime_ = status.st_mtime;
-  isCut_ = endsWithinLine();
+  isCut_ = false;
 }
 
-// Another run of the program may have left half a line behind, when the disk was full.
+// Another run of the program may have left half a line behind, when the disk was full. While another process
+// appends, its line may look like half a one for a moment, so this is asked only when the program begins.
 bool LUMLogFile::endsWithinLine() const noexcept {
   if (size_ == 0) return false;
   const rt::FileDescriptor reader(::open(path_.c_str(), O_RDONLY | O_CLOEXEC | O_NONBLOCK | O_NOCTTY));

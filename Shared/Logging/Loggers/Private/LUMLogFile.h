@@ -17,7 +17,7 @@ class LUMLogFile {
  public:
   /// Opens the file at `path`, and makes it with `mode` if there is none. Rotating keeps `keptFileCount`
   /// files. Throws std::system_error that names the path, std::invalid_argument and std::bad_alloc.
-  LUMLogFile(std::string path, mode_t mode, std::uint32_t keptFileCount);
+  LUMLogFile(const std::string& path, mode_t mode, std::uint32_t keptFileCount);
   ~LUMLogFile();
   LUMLogFile(const LUMLogFile&) = delete;
   LUMLogFile& operator=(const LUMLogFile&) = delete;

@@ -23,14 +23,14 @@ std::int64_t dayAt(std::int64_t second) noexcept {
 
 }  // namespace
 
-LUMLogFileBuffer::LUMLogFileBuffer(std::string path, const LUMFileLoggerOptions& options)
+LUMLogFileBuffer::LUMLogFileBuffer(const std::string& path, const LUMFileLoggerOptions& options)
     : largestSize_(options.rotationSize),
       rotatesDaily_(options.rotatesDaily),
       capacity_(options.bufferSize),
       longestDelay_(options.longestDelayInMilliseconds * static_cast<std::uint64_t>(kMillisecond)),
       followInterval_(options.pathCheckIntervalInMilliseconds * kMillisecond),
       place_(capacity_ > 0 ? std::make_unique_for_overwrite<char[]>(capacity_) : nullptr),
-      file_(std::move(path), options.mode, options.keptFileCount),
+      file_(path, options.mode, options.keptFileCount),
       forkCount_(LUMLogFlusher::beginToCountForks()),
       rotationSize_(options.rotationSize) {}
 
@@ -98,7 +98,10 @@ void LUMLogFileBuffer::put(std::string_view line, std::uint64_t toldCount) noexc
     toldCount_ = toldCount;
     noticeEnd_ = end;
   }
-  if (line.size() > capacity_) return send(line);
+  if (line.size() > capacity_) {
+    send(line);
+    return;
+  }
   std::memcpy(place_.get() + length_, line.data(), line.size());
   const bool isFirst = length_ == 0;
   length_ = end;

@@ -26,7 +26,7 @@ class LUMLogFileBuffer final : public rt::Implements<LUMLogFileBuffer, rt::Objec
   static constexpr std::string_view kClassName = "LUMLogFileBuffer";
 
   /// Opens the file. Throws what LUMLogFile's constructor throws.
-  LUMLogFileBuffer(std::string path, const LUMFileLoggerOptions& options);
+  LUMLogFileBuffer(const std::string& path, const LUMFileLoggerOptions& options);
   ~LUMLogFileBuffer() override;
 
   /// Appends `line`, which ends with a line feed, of a message that was made at `time`. If it is urgent,

@@ -28,8 +28,8 @@ constinit std::atomic<std::uint32_t> LUMLogFlusher::events_ = 0;
 constinit std::atomic<std::uint64_t> LUMLogFlusher::wakeTime_ = LUMLogFileBuffer::kNever;
 
 LUMLogFlusher& LUMLogFlusher::shared() {
-  static constinit rt::Lazy<LUMLogFlusher*> flusher;
-  return *flusher.get([] { return new LUMLogFlusher(); });
+  static constinit rt::Lazy<LUMLogFlusher> flusher;
+  return flusher.get([] { return LUMLogFlusher(); });
 }
 
 std::uint32_t LUMLogFlusher::beginToCountForks() {

@@ -2,7 +2,7 @@
 
 // The distance of local time from UTC, cheap enough for each line of a log. Internal to the loggers.
 //
-//     const std::int64_t local = second + LUMLogLocalOffset::secondsAt(second, line.caller());
+//     | const std::int64_t local = second + LUMLogLocalOffset::secondsAt(second, line.caller());
 //
 // The process knows one offset at a time, that of a quarter of an hour. Time zones change their offset at the
 // start of a quarter. So a line costs one load, and one line a quarter asks the system.

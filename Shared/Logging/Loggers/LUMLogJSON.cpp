@@ -63,29 +63,37 @@ void appendInteger(LUMLogLine& line, bool isNegative, std::uint64_t magnitude) n
 }
 
 void appendReal(LUMLogLine& line, double value) noexcept {
-  if (std::isnan(value)) return line.append("\"NaN\"");
-  if (std::isinf(value)) return line.append(value > 0 ? "\"Infinity\"" : "\"-Infinity\"");
-  std::array<char, 32> place{};
-  // `to_chars` without a precision needs no memory.
-  const char* const end = std::to_chars(place.data(), place.data() + place.size(), value).ptr;
-  const std::string_view digits(place.data(), static_cast<std::size_t>(end - place.data()));
-  line.append(digits);
-  if (digits.find_first_of(".e") == std::string_view::npos) line.append(".0");
+  if (std::isnan(value)) {
+    line.append("\"NaN\"");
+  } else if (std::isinf(value)) {
+    line.append(value > 0 ? "\"Infinity\"" : "\"-Infinity\"");
+  } else {
+    std::array<char, 32> place{};
+    // `to_chars` without a precision needs no memory.
+    const char* const end = std::to_chars(place.data(), place.data() + place.size(), value).ptr;
+    const std::string_view digits(place.data(), static_cast<std::size_t>(end - place.data()));
+    line.append(digits);
+    if (digits.find_first_of(".e") == std::string_view::npos) line.append(".0");
+  }
 }
 
 void appendNumber(LUMLogLine& line, const rt::Number& number) noexcept {
   switch (number.kind()) {
     case rt::Number::Kind::kBoolean:
-      return line.append(number.booleanValue() ? "true" : "false");
+      line.append(number.booleanValue() ? "true" : "false");
+      break;
     case rt::Number::Kind::kSigned: {
       const std::int64_t value = number.integerValue();
       const auto bits = static_cast<std::uint64_t>(value);
-      return appendInteger(line, value < 0, value < 0 ? 0 - bits : bits);
+      appendInteger(line, value < 0, value < 0 ? 0 - bits : bits);
+      break;
     }
     case rt::Number::Kind::kUnsigned:
-      return appendInteger(line, false, number.unsignedValue());
+      appendInteger(line, false, number.unsignedValue());
+      break;
     case rt::Number::Kind::kReal:
-      return appendReal(line, number.realValue());
+      appendReal(line, number.realValue());
+      break;
   }
 }
 
@@ -96,10 +104,13 @@ void appendString(LUMLogLine& line, std::string_view text) noexcept {
 }
 
 void appendValue(LUMLogLine& line, const rt::Object& value) {
-  if (const auto* const string = rt::cast<rt::StringObject>(&value))
-    return appendString(line, string->view());
-  if (const auto* const number = rt::cast<rt::Number>(&value)) return appendNumber(line, *number);
-  line.withTextOf(&value, [&](std::string_view text) { appendString(line, text); });
+  if (const auto* const string = rt::cast<rt::StringObject>(&value)) {
+    appendString(line, string->view());
+  } else if (const auto* const number = rt::cast<rt::Number>(&value)) {
+    appendNumber(line, *number);
+  } else {
+    line.withTextOf(&value, [&](std::string_view text) { appendString(line, text); });
+  }
 }
 
 void appendStack(LUMLogLine& line, const LUMLogCallstack& stack) {
@@ -181,7 +192,9 @@ class Attributes {
   }
 
   bool isOfSpan(std::string_view name, const rt::Object& value) noexcept {
-    std::string_view* const place = name == "trace.id" ? &trace_ : name == "span.id" ? &span_ : nullptr;
+    std::string_view* place = nullptr;
+    if (name == "trace.id") place = &trace_;
+    if (name == "span.id") place = &span_;
     if (place == nullptr) return false;
     *place = identifierOf(value, place == &trace_ ? 32 : 16);
     return !place->empty();
@@ -197,13 +210,17 @@ class Attributes {
 void appendSeverity(LUMLogLine& line, LUMLogLevel level) noexcept {
   switch (level) {
     case LUMLogLevelDebug:
-      return line.append(R"("debug","SeverityNumber":5)");
+      line.append(R"("debug","SeverityNumber":5)");
+      break;
     case LUMLogLevelInfo:
-      return line.append(R"("info","SeverityNumber":9)");
+      line.append(R"("info","SeverityNumber":9)");
+      break;
     case LUMLogLevelError:
-      return line.append(R"("error","SeverityNumber":17)");
+      line.append(R"("error","SeverityNumber":17)");
+      break;
     case LUMLogLevelFault:
-      return line.append(R"("fault","SeverityNumber":21)");
+      line.append(R"("fault","SeverityNumber":21)");
+      break;
     default:
       line.append('"');
       line.appendUnsigned(level);
@@ -278,10 +295,10 @@ rt::String asJSONText(const rt::String& text) {
 rt::Ref<LUMLogJSON> LUMLogJSON::init() {
   rt::String name = rt::Bundle::mainIdentifier();
   if (name.isEmpty()) name = "unknown_service:"_s + rt::Process::name();
-  return rt::Ref<LUMLogJSON>::adopt(new LUMLogJSON(std::move(name)));
+  return rt::Ref<LUMLogJSON>::adopt(new LUMLogJSON(name));
 }
 
-LUMLogJSON::LUMLogJSON(rt::String serviceName) : serviceName_(asJSONText(serviceName)) {
+LUMLogJSON::LUMLogJSON(const rt::String& serviceName) : serviceName_(asJSONText(serviceName)) {
   watchForks();
 }
 

@@ -69,7 +69,7 @@ class RT_VISIBLE LUMLogJSON : public rt::Implements<LUMLogJSON, rt::Object, LUML
   void appendLine(LUMLogLine& line, const LUMLogMessage& message) const override;
 
  protected:
-  explicit LUMLogJSON(rt::String serviceName);
+  explicit LUMLogJSON(const rt::String& serviceName);
 
  private:
   void appendWhole(LUMLogLine& line, const LUMLogMessage& message) const;

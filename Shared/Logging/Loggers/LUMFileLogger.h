@@ -52,6 +52,7 @@
 #include "Shared/Logging/LUMLogFilter.h"
 #include "Shared/Logging/LUMLogFormatter.h"
 #include "Shared/Logging/LUMLogMessage.h"
+#include "Shared/Logging/Loggers/LUMLogCrashOutput.h"
 #include "Shared/Logging/Loggers/LUMLogOutput.h"
 
 class LUMLogFileBuffer;
@@ -122,4 +123,6 @@ class RT_VISIBLE LUMFileLogger final : public rt::Implements<LUMFileLogger, LUML
   const rt::Ref<LUMLogFormatter> formatter_;
   const LUMLogLineFormatter* const lineFormatter_;  // the same, or null
   const rt::Ref<LUMLogFileBuffer> buffer_;
+  // Last, so that it goes first.
+  const LUMLogCrashOutput crashOutput_{*this};
 };

@@ -63,17 +63,18 @@ void appendInteger(LUMLogLine& line, bool isNegative, std::uint64_t magnitude) n
 }
 
 void appendReal(LUMLogLine& line, double value) noexcept {
-  if (!std::isfinite(value)) {
-    const std::string_view infinity = value > 0 ? "\"Infinity\"" : "\"-Infinity\"";
-    line.append(std::isnan(value) ? "\"NaN\"" : infinity);
-    return;
+  if (std::isnan(value)) {
+    line.append("\"NaN\"");
+  } else if (std::isinf(value)) {
+    line.append(value > 0 ? "\"Infinity\"" : "\"-Infinity\"");
+  } else {
+    std::array<char, 32> place{};
+    // `to_chars` without a precision needs no memory.
+    const char* const end = std::to_chars(place.data(), place.data() + place.size(), value).ptr;
+    const std::string_view digits(place.data(), static_cast<std::size_t>(end - place.data()));
+    line.append(digits);
+    if (digits.find_first_of(".e") == std::string_view::npos) line.append(".0");
   }
-  std::array<char, 32> place{};
-  // `to_chars` without a precision needs no memory.
-  const char* const end = std::to_chars(place.data(), place.data() + place.size(), value).ptr;
-  const std::string_view digits(place.data(), static_cast<std::size_t>(end - place.data()));
-  line.append(digits);
-  if (digits.find_first_of(".e") == std::string_view::npos) line.append(".0");
 }
 
 void appendNumber(LUMLogLine& line, const rt::Number& number) noexcept {
@@ -191,7 +192,9 @@ class Attributes {
   }
 
   bool isOfSpan(std::string_view name, const rt::Object& value) noexcept {
-    std::string_view* const place = name == "trace.id" ? &trace_ : name == "span.id" ? &span_ : nullptr;
+    std::string_view* place = nullptr;
+    if (name == "trace.id") place = &trace_;
+    if (name == "span.id") place = &span_;
     if (place == nullptr) return false;
     *place = identifierOf(value, place == &trace_ ? 32 : 16);
     return !place->empty();

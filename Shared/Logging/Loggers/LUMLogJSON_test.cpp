@@ -493,15 +493,16 @@ TEST(LUMLogJSON, IsWhatPythonReadsBack) {
   EXPECT_EQ(result.standardOutput, std::to_string(kRandomLines) + "\n");
 }
 
+// Counts the lines that have what each of them must have.
+constexpr const char* kProgram = R"(
+map(select((.Timestamp | type) == "string" and .SeverityText == "info" and .SeverityNumber == 9 and
+           (.Body | type) == "string" and (.Attributes | has("thread.id")) and
+           .Resource."service.name" == "com.example.host")) | length
+)";
+
 TEST(LUMLogJSON, IsWhatJqReads) {
   const Lines lines(kRandomLines);
-  const ProcessResult result = runProcess(
-      {"jq", "-r", "-s",
-       // NOLINTNEXTLINE(bugprone-suspicious-missing-comma): one argument on three lines
-       R"(map(select((.Timestamp | type) == "string" and .SeverityText == "info" and )"
-       R"(.SeverityNumber == 9 and (.Body | type) == "string" and (.Attributes | has("thread.id")) )"
-       R"(and .Resource."service.name" == "com.example.host")) | length)",
-       lines.lines()});
+  const ProcessResult result = runProcess({"jq", "-r", "-s", kProgram, lines.lines()});
   if (result.exitStatus == 127) GTEST_SKIP() << "jq is not installed";
   EXPECT_EQ(result.standardError, "");
   EXPECT_EQ(result.standardOutput, std::to_string(kRandomLines) + "\n");

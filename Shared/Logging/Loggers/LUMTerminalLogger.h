@@ -31,6 +31,7 @@
 #include "Shared/Logging/LUMLogFilter.h"
 #include "Shared/Logging/LUMLogFormatter.h"
 #include "Shared/Logging/LUMLogMessage.h"
+#include "Shared/Logging/Loggers/LUMLogCrashOutput.h"
 #include "Shared/Logging/Loggers/LUMLogOutput.h"
 
 struct LUMLogLineFormatter;
@@ -83,4 +84,6 @@ class RT_VISIBLE LUMTerminalLogger final : public rt::Implements<LUMTerminalLogg
   std::atomic<int> error_ = 0;
   std::atomic<std::uint64_t> droppedCount_ = 0;
   std::atomic<std::uint64_t> untoldCount_ = 0;
+  // Last, so that it goes first.
+  const LUMLogCrashOutput crashOutput_{*this};
 };

@@ -2,6 +2,8 @@
 
 /// Appends a text to a line in the form that it has between the quotes of a JSON string.
 ///
+///     std::array<char, 64> place;
+///     LUMLogLine line(place);
 ///     appendJSONText(line, "3 \"entries\"\n");   // 3 \"entries\"\n
 ///
 /// The result is valid JSON whatever the bytes of the text are. It has no control character, not even those

@@ -54,8 +54,8 @@ TEST(LUMLogJSONText, FindsEachSpecialByteAtEachPlace) {
 TEST(LUMLogJSONText, EscapesWhatControlsTerminalsOrEndsLines) {
   EXPECT_EQ(written("\x7F"), R"(\u007f)");
   EXPECT_EQ(written("\xC2\x80\xC2\x85\xC2\x9F\xC2\xA0"), "\\u0080\\u0085\\u009f\xC2\xA0");
-  EXPECT_EQ(written("\xE2\x80\xA7\xE2\x80\xA8\xE2\x80\xA9\xE2\x80\xAA"),
-            "\xE2\x80\xA7\\u2028\\u2029\xE2\x80\xAA");
+  EXPECT_EQ(written("\xE2\x80\xA7\xE2\x80\xA8\xE2\x80\xA9\xE2\x80\xAF"),
+            "\xE2\x80\xA7\\u2028\\u2029\xE2\x80\xAF");
 }
 
 TEST(LUMLogJSONText, ReplacesWhatIsNotUTF8) {

@@ -23,7 +23,6 @@ using testing::Ge;
 using testing::Gt;
 using testing::HasSubstr;
 using testing::Lt;
-using testing::Matches;
 using testing::Not;
 using testing::PrintToString;
 using testing::StartsWith;

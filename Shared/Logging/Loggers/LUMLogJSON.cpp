@@ -191,7 +191,9 @@ class Attributes {
   }
 
   bool isOfSpan(std::string_view name, const rt::Object& value) noexcept {
-    std::string_view* const place = name == "trace.id" ? &trace_ : name == "span.id" ? &span_ : nullptr;
+    std::string_view* place = nullptr;
+    if (name == "trace.id") place = &trace_;
+    if (name == "span.id") place = &span_;
     if (place == nullptr) return false;
     *place = identifierOf(value, place == &trace_ ? 32 : 16);
     return !place->empty();

@@ -249,15 +249,15 @@ void appendField(LUMLogLine& line, const Step& step, const LUMLogMessage& messag
   }
 }
 
-// Appends a field of at least `step.width` characters. A time has no width.
-void appendAligned(LUMLogLine& line, const Step& step, const LUMLogMessage& message) {
+// Appends a field of at least `step.width` characters.
+void appendAligned(LUMLogLine& line, const Step& step, const LUMLogMessage& message, LUMLogTimeCache* times) {
   // A text that does not fit here needs no spaces: a character has at most four bytes.
   std::array<char, 4 * Step::kLargestWidth>
       place;  // NOLINT(cppcoreguidelines-pro-type-member-init): as above
   LUMLogLine field(place, line.caller());
-  appendField(field, step, message, nullptr);
+  appendField(field, step, message, times);
   if (!field.isComplete()) {
-    appendField(line, step, message, nullptr);
+    appendField(line, step, message, times);
     return;
   }
   const auto characters = static_cast<std::size_t>(std::ranges::count_if(
@@ -297,7 +297,7 @@ void LUMLogPattern::appendLine(LUMLogLine& line, const LUMLogMessage& message) c
     } else if (step.width == 0) {
       appendField(line, step, message, times_.get());
     } else {
-      appendAligned(line, step, message);
+      appendAligned(line, step, message, times_.get());
     }
   }
 }

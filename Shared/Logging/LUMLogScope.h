@@ -2,10 +2,10 @@
 
 /// Metadata that accompanies every message that a thread logs while the scope lives.
 ///
-///     void serve(const Request& request) {
-///       const LUMLogScope scope(LUMLogField("request", request.number), LUMLogField("user", request.user));
+///     void serve(int number, const rt::String& user, rt::Queue& queue) {
+///       const LUMLogScope scope(LUMLogField("request", number), LUMLogField("user", user));
 ///       LUMLogAt(LUMLogLevelInfo, "begun"_s);              // carries `request` and `user`
-///       queue->async([] { LUMLogAt(LUMLogLevelInfo, "done"_s); });             // and so does this
+///       queue.async([] { LUMLogAt(LUMLogLevelInfo, "done"_s); });              // and so does this
 ///     }
 ///
 /// Scopes nest. An inner scope adds to the metadata of the outer ones, and the metadata of a call adds to

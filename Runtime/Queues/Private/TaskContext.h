@@ -2,8 +2,10 @@
 
 /// An object that belongs to what a thread is doing, and that goes along to the tasks that this queues.
 ///
-///     const rt::TaskContext::Scope scope(request);          // for the calling thread, until the scope ends
-///     queue->async([] { handle(rt::TaskContext::current()); });                 // gets `request`, too
+///     rt::Object* work(rt::Object* request, rt::Queue& queue) {
+///       const rt::TaskContext::Scope scope(request);        // for the calling thread, until the scope ends
+///       return queue.sync([] { return rt::TaskContext::current(); });           // `request`
+///     }
 ///
 /// A thread has one context. Structured logging keeps the metadata of its scopes there.
 ///

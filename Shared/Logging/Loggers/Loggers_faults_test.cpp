@@ -17,6 +17,7 @@
 
 #include "Runtime/Text/Format.h"
 #include "Shared/Logging/Loggers/Loggers.h"
+#include "tests/support/Sanitizers.h"
 
 namespace {
 
@@ -93,6 +94,7 @@ TEST_F(LoggersFaultsTest, LosesNothingOfTenThousandShortLivedThreads) {
 
 // The parent's lines wait while it forks. The child must neither write nor lose them, and logs for itself.
 TEST_F(LoggersFaultsTest, LosesNothingAndRepeatsNothingAtForks) {
+  if (RT_TEST_THREAD_SANITIZER) GTEST_SKIP() << "the sanitizer allows no new threads after a fork";
   constexpr int kForks = 20;
   constexpr int kLines = 50;
   const Ref<LUMBoundedLogger> logger =

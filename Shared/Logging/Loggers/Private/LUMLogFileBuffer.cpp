@@ -30,7 +30,7 @@ LUMLogFileBuffer::LUMLogFileBuffer(const std::string& path, const LUMFileLoggerO
       longestDelay_(options.longestDelayInMilliseconds * static_cast<std::uint64_t>(kMillisecond)),
       followInterval_(options.pathCheckIntervalInMilliseconds * kMillisecond),
       place_(capacity_ > 0 ? std::make_unique_for_overwrite<char[]>(capacity_) : nullptr),
-      file_(path, options.mode, options.keptFileCount),
+      file_(path, static_cast<mode_t>(options.mode), options.keptFileCount),
       forkCount_(LUMLogFlusher::beginToCountForks()),
       rotationSize_(options.rotationSize) {}
 

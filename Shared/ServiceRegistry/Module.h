@@ -4,10 +4,10 @@
 ///
 ///     #include "Shared/ServiceRegistry/Module.h"
 ///
-///     struct App : srl::Module<App, srl::Bind<Clock, SystemClock>> {};
-///     template struct srl::Linked<App>;
+///     struct Tools : srl::Module<Tools, srl::Bind<Clock, SystemClock>> {};
+///     template struct srl::Linked<Tools>;                   // outside any namespace, in one source file
 ///
-///     rt::Ref<Clock> clock = App::get<Clock>();
+///     rt::Ref<Clock> clock = Tools::get<Clock>();
 
 // IWYU pragma: begin_exports
 #include "Shared/ServiceRegistry/Source/Front/All.h"

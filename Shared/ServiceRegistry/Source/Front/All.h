@@ -2,6 +2,7 @@
 
 /// The instances of a service that many implementations are bound to, as a range.
 ///
+///     const srl::All<Importer> importers = srl::all<Importer>();
 ///     for (Importer& importer : importers) importer.run();
 ///
 /// As a parameter of a constructor in a module's wiring, it asks for all of them when the object is made.

@@ -11,9 +11,9 @@
 ///
 /// A factory is a service whose `make` takes arguments from the caller. Its objects are new each time:
 ///
-///     Bind<Factory<Draft(rt::String)>, TextDraft(Clock, Given<rt::String>)>
-///     ...
-///     rt::Ref<Draft> draft = App::get<Factory<Draft(rt::String)>>()->make("Letter"_s);
+///     | Bind<Factory<Draft(rt::String)>, TextDraft(Clock, Given<rt::String>)>
+///     | ...
+///     | rt::Ref<Draft> draft = App::get<Factory<Draft(rt::String)>>()->make("Letter"_s);
 ///
 /// Threads: any thread may call `make`.
 

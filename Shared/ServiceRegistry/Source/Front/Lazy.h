@@ -2,10 +2,14 @@
 
 /// A service that is asked for when it is used.
 ///
-///     class DiskStore final : public rt::Implements<DiskStore, rt::Object, Store> {
+///     class DiskStore final : public rt::Implements<DiskStore, rt::Object> {
 ///      public:
 ///       explicit DiskStore(srl::Lazy<Preferences> preferences) : preferences_(std::move(preferences)) {}
-///       void save() override { preferences_.get()->... }
+///       rt::String place() const { return preferences_.get()->folder(); }
+///
+///      private:
+///       const srl::Lazy<Preferences> preferences_;
+///     };
 ///
 /// As a parameter of a constructor in a module's wiring, it makes nothing when the object is made. So two
 /// services may need each other if one of them is lazy.

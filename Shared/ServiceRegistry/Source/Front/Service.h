@@ -2,10 +2,12 @@
 
 /// Services: an interface with the dimensions of its scope, written like a function.
 ///
-///     Clock                                        // one instance for the program
-///     Session(User, Window)                        // one for each user and window
+///     | Clock                                      one instance for the program
+///     | Preferences(User)                          one for each user
 ///
-///     rt::Ref<Session> session = srl::get<Session(User, Window)>(ann, left);
+///     struct User : srl::Tag<User, rt::String> {};
+///
+///     rt::Ref<Preferences> preferences = srl::get<Preferences(User)>(User{"ann"_s});
 ///     for (Importer& importer : srl::all<Importer>()) importer.run();
 ///
 /// The interface is a protocol or a class of the runtime (Runtime/Objects/Class.h). It knows nothing of the

@@ -61,6 +61,8 @@ struct Graph {
 
   std::array<ServiceData, serviceCount> services{};
   std::array<bool, serviceCount> isExpected{};
+  // The index of the declaration that each service comes from.
+  std::array<std::size_t, serviceCount> declarations{};
   std::array<Maker, makerCount> makers{};
   // The indices of the services, sorted by their names.
   std::array<std::size_t, serviceCount> sorted{};

@@ -47,10 +47,10 @@ namespace srl {
 template <class Self, class... Declarations>
 class Module {
  public:
-  using Lines = decltype((detail::Types<>() + ... + typename detail::LinesOf<Declarations>::Lines()));
-  static constexpr auto kGraph = detail::graphOf(Lines());
+  using DeclarationList = detail::Types<Declarations...>;
+  static constexpr auto kGraph = detail::graphOf<Declarations...>();
   static constexpr auto kMistake = kGraph.mistake();
-  static_assert(detail::explain<kMistake, Lines>());
+  static_assert(detail::explain<kMistake, Declarations...>());
 
   /// Like the functions of Service.h. Each takes one tag of each dimension of the interface, in any order.
   template <class Interface, class... Tags>
@@ -73,17 +73,29 @@ class Module {
 
 namespace detail {
 
-template <class M, class... Lines>
-consteval auto bindingsOf(Types<Lines...>) {
-  constexpr std::size_t kCount = (std::size_t{0} + ... + std::size_t{!Lines::kIsExpected});
-  const std::array<const SRLImplementationRegistrationData* const*, sizeof...(Lines)> implementations{
-      ImplementationRecords<M, Lines>::records...};
+// What a declaration binds. Null if it binds nothing.
+template <class M, class Declaration>
+inline constexpr const SRLImplementationRegistrationData* const* kImplementations =
+    ImplementationRecords<M, NthOf<0, typename LinesOf<Declaration>::List>>::records;
+template <class M, class... Services>
+inline constexpr const SRLImplementationRegistrationData* const* kImplementations<M, Expects<Services...>> =
+    nullptr;
+
+template <class M, class... Declarations>
+consteval auto bindingsOf(Types<Declarations...>) {
+  constexpr std::size_t kCount = [] {
+    std::size_t count = 0;
+    for (const bool isExpected : M::kGraph.isExpected) count += isExpected ? 0 : 1;
+    return count;
+  }();
+  const std::array<const SRLImplementationRegistrationData* const*, sizeof...(Declarations)> implementations{
+      kImplementations<M, Declarations>...};
   std::array<_SRLBindingRegistrationData, kCount> bindings;
   std::size_t next = 0;
   for (const std::size_t service : M::kGraph.sorted) {
-    if (!M::kGraph.isExpected[service])
-      bindings[next++] =
-          _SRLBindingRegistrationData{M::kGraph.services[service].api, implementations[service]};
+    if (M::kGraph.isExpected[service]) continue;
+    bindings[next++] = _SRLBindingRegistrationData{M::kGraph.services[service].api,
+                                                   implementations[M::kGraph.declarations[service]]};
   }
   return bindings;
 }
@@ -102,7 +114,7 @@ struct [[gnu::visibility("default")]] Linked {
   static const SRLBindingsModuleData* module() { return &kModule; }
 
  private:
-  static constexpr auto kBindings = detail::bindingsOf<M>(typename M::Lines());
+  static constexpr auto kBindings = detail::bindingsOf<M>(typename M::DeclarationList());
   static constexpr SRLBindingsModuleData kModule{.bindingsBegin = kBindings.data(),
                                                  .bindingsEnd = kBindings.data() + kBindings.size(),
                                                  .allowsMultipleModules = 1};

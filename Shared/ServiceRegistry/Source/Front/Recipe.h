@@ -32,6 +32,13 @@ struct Wired {
       kIndex != M::kGraph.kNone ? M::kGraph.services[kIndex] : ServiceData{};
 };
 
+// Returns those tags of a service that another one has, which it needs.
+inline SRLScopeTagSet partOf(const SRLScopeTagSet& tags, const Places& places, std::size_t count) {
+  SRLScopeTagSet part;
+  for (std::size_t index = 0; index < count; ++index) part.tags[index] = tags.tags[places.places[index]];
+  return part;
+}
+
 // What is passed to the constructor for one parameter of the kind `Parameter`.
 template <class M, class Owner, class Parameter>
 struct Argument {
@@ -47,26 +54,19 @@ struct Argument {
     }
   }
 
-  // Returns those of the owner's tags that the needed service has.
-  static SRLScopeTagSet part(const SRLScopeTagSet& tags) {
-    constexpr Dimensions kScope = service().scope;
-    constexpr Places kPlaces = placesIn(kScope, Wired<M, Owner>::kService.scope);
-    SRLScopeTagSet part;
-    for (std::size_t index = 0; index < kScope.count; ++index)
-      part.tags[index] = tags.tags[kPlaces.places[index]];
-    return part;
-  }
-
-  static auto get(const SRLScopeTagSet& tags) {
+  [[gnu::always_inline]] static auto get(const SRLScopeTagSet& tags) {
     constexpr const SRLAPIRegistrationData* kAPI = service().api;
+    constexpr std::size_t kCount = service().scope.count;
+    constexpr Places kPlaces = placesIn(service().scope, Wired<M, Owner>::kService.scope);
+    const SRLScopeTagSet part = partOf(tags, kPlaces, kCount);
     if constexpr (kKind == NeedKind::kLazy) {
-      return Lazy<I>(kAPI, part(tags));
+      return Lazy<I>(kAPI, part);
     } else if constexpr (kKind == NeedKind::kAll) {
-      return All<I>(SRLRegistry::sharedInstance()->internalMultiBoundService(kAPI, part(tags)));
+      return allOf<I>(kAPI, part);
     } else if constexpr (kKind == NeedKind::kMaybe) {
-      return rt::cast<I>(SRLRegistry::sharedInstance()->internalOptionalService(kAPI, part(tags)));
+      return oneOrNull<I>(kAPI, part);
     } else {
-      return rt::cast<I>(SRLRegistry::sharedInstance()->internalService(kAPI, part(tags)));
+      return one<I>(kAPI, part);
     }
   }
 };

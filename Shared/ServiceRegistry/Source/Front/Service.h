@@ -216,6 +216,20 @@ SRLScopeTagSet tagSet(const Tags&... tags) {
   return set;
 }
 
+// The look-ups of an interface by its record. There is one function for each interface, whoever asks.
+template <class I>
+rt::Ref<I> one(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) {
+  return rt::cast<I>(SRLRegistry::sharedInstance()->internalService(api, tags));
+}
+template <class I>
+rt::Ref<I> oneOrNull(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) {
+  return rt::cast<I>(SRLRegistry::sharedInstance()->internalOptionalService(api, tags));
+}
+template <class I>
+All<I> allOf(const SRLAPIRegistrationData* api, const SRLScopeTagSet& tags) {
+  return All<I>(SRLRegistry::sharedInstance()->internalMultiBoundService(api, tags));
+}
+
 // The look-ups of the interface `I`. `Source::kService` describes the service.
 template <class I, class Source>
 struct LookUp {
@@ -223,21 +237,19 @@ struct LookUp {
   static rt::Ref<I> get(const Tags&... tags) {
     static_assert(!Source::kService.isMany,
                   "one instance is asked for of a service that many are bound to; use all");
-    return rt::cast<I>(SRLRegistry::sharedInstance()->internalService(Source::kService.api, set(tags...)));
+    return one<I>(Source::kService.api, set(tags...));
   }
   template <class... Tags>
   static rt::Ref<I> maybe(const Tags&... tags) {
     static_assert(!Source::kService.isMany,
                   "one instance is asked for of a service that many are bound to; use all");
-    return rt::cast<I>(
-        SRLRegistry::sharedInstance()->internalOptionalService(Source::kService.api, set(tags...)));
+    return oneOrNull<I>(Source::kService.api, set(tags...));
   }
   template <class... Tags>
   static All<I> all(const Tags&... tags) {
     static_assert(Source::kService.isMany,
                   "all instances are asked for of a service that only one is bound to; use get");
-    return All<I>(
-        SRLRegistry::sharedInstance()->internalMultiBoundService(Source::kService.api, set(tags...)));
+    return allOf<I>(Source::kService.api, set(tags...));
   }
   template <class... Tags>
   static Lazy<I> lazy(const Tags&... tags) {

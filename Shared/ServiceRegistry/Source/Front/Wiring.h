@@ -16,6 +16,7 @@
 
 #include <array>
 #include <cstddef>
+#include <span>
 #include <type_traits>
 #include <utility>
 
@@ -55,49 +56,64 @@ template <class... Parameter>
 inline constexpr std::array<Need, sizeof...(Parameter) + 1> kNeeds<Types<Parameter...>>{
     NeedOf<Parameter>::need()...};
 
-// What one line of a module says.
-template <bool isMany_, bool isNew_, bool isExpected_, class Service, class... Implementations>
+// What one line of a module says, as plain data.
+struct MakerData {
+  const Need* needs = nullptr;
+  std::size_t needCount = 0;
+};
+struct LineData {
+  ServiceData service;
+  const MakerData* makers = nullptr;
+  std::size_t makerCount = 0;
+  bool isDeferred = false;
+  bool isExpected = false;
+};
+
+template <bool isMany, bool isNew, bool isExpected, class Service, class... Implementations>
 struct Line {
   using Interface = typename SignatureOf<Service>::Interface;
   using Makers = Types<Implementations...>;
-  static constexpr bool kIsMany = isMany_;
-  static constexpr bool kIsNew = isNew_;
-  static constexpr bool kIsExpected = isExpected_;
-  static constexpr std::size_t kMakers = sizeof...(Implementations);
+  static constexpr bool kIsNew = isNew;
 
-  static consteval ServiceData service() { return SignatureOf<Service>::template service<isMany_>(); }
+  // There is one element more, since an array is never empty.
+  static constexpr std::array<MakerData, sizeof...(Implementations) + 1> kMakers{
+      MakerData{kNeeds<typename MadeBy<Implementations>::Parameters>.data(),
+                kNeeds<typename MadeBy<Implementations>::Parameters>.size() - 1}...};
+
+  static consteval LineData data() {
+    return {SignatureOf<Service>::template service<isMany>(), kMakers.data(), sizeof...(Implementations),
+            kIsFactory<Interface>, isExpected};
+  }
+};
+
+template <class... Line>
+struct Lines {
+  using List = Types<Line...>;
+  static constexpr std::array<LineData, sizeof...(Line)> kData{Line::data()...};
 };
 
 // The lines of each kind of declaration.
 template <class Declaration>
-struct LinesOf {
+struct LinesOf : Lines<> {
   static_assert(mistake::kNever<Declaration>, "a module consists of Bind, New, Many and Expects");
-  using Lines = Types<>;
 };
 template <class Service, class Implementation>
-struct LinesOf<Bind<Service, Implementation>> {
-  using Lines = Types<Line<false, false, false, Service, Implementation>>;
-};
+struct LinesOf<Bind<Service, Implementation>> : Lines<Line<false, false, false, Service, Implementation>> {};
 template <class Service, class Implementation>
-struct LinesOf<New<Service, Implementation>> {
-  using Lines = Types<Line<false, true, false, Service, Implementation>>;
-};
+struct LinesOf<New<Service, Implementation>> : Lines<Line<false, true, false, Service, Implementation>> {};
 template <class Service, class... Implementations>
-struct LinesOf<Many<Service, Implementations...>> {
-  using Lines = Types<Line<true, false, false, Service, Implementations...>>;
-};
+struct LinesOf<Many<Service, Implementations...>>
+    : Lines<Line<true, false, false, Service, Implementations...>> {};
 template <class Service>
 struct ExpectedLine {
-  using Line = detail::Line<false, false, true, Service>;
+  using Type = Line<false, false, true, Service>;
 };
 template <class Service>
 struct ExpectedLine<Many<Service>> {
-  using Line = detail::Line<true, false, true, Service>;
+  using Type = Line<true, false, true, Service>;
 };
 template <class... Services>
-struct LinesOf<Expects<Services...>> {
-  using Lines = Types<typename ExpectedLine<Services>::Line...>;
-};
+struct LinesOf<Expects<Services...>> : Lines<typename ExpectedLine<Services>::Type...> {};
 
 template <class... Each, class... More>
 Types<Each..., More...> operator+(Types<Each...>, Types<More...>);
@@ -124,21 +140,32 @@ auto nth(Types<T...>)
 template <std::size_t index, class List>
 using NthOf = typename decltype(nth<index>(List()))::Type;
 
-template <class... Lines>
-consteval auto graphOf(Types<Lines...>) {
-  Graph<sizeof...(Lines), (std::size_t{0} + ... + Lines::kMakers)> graph;
+// Reads the lines as data, so that the compiler makes no type for each step.
+template <class... Declarations>
+consteval auto graphOf() {
+  constexpr auto makersIn = [](std::span<const LineData> lines) {
+    std::size_t count = 0;
+    for (const LineData& line : lines) count += line.makerCount;
+    return count;
+  };
+  Graph<(std::size_t{0} + ... + LinesOf<Declarations>::kData.size()),
+        (std::size_t{0} + ... + makersIn(LinesOf<Declarations>::kData))>
+      graph;
+  const std::array<std::span<const LineData>, sizeof...(Declarations)> all{LinesOf<Declarations>::kData...};
   std::size_t service = 0;
   std::size_t maker = 0;
-  const auto addMakers = [&]<class... Implementations>(Types<Implementations...>,
-                                                       [[maybe_unused]] bool isDeferred) {
-    ((graph.makers[maker++] =
-          Maker{service, kNeeds<typename MadeBy<Implementations>::Parameters>.data(),
-                kNeeds<typename MadeBy<Implementations>::Parameters>.size() - 1, isDeferred}),
-     ...);
-  };
-  ((graph.services[service] = Lines::service(), graph.isExpected[service] = Lines::kIsExpected,
-    addMakers(typename Lines::Makers(), kIsFactory<typename Lines::Interface>), ++service),
-   ...);
+  for (std::size_t declaration = 0; declaration < all.size(); ++declaration) {
+    for (const LineData& line : all[declaration]) {
+      graph.services[service] = line.service;
+      graph.isExpected[service] = line.isExpected;
+      graph.declarations[service] = declaration;
+      for (std::size_t index = 0; index < line.makerCount; ++index) {
+        graph.makers[maker++] = {service, line.makers[index].needs, line.makers[index].needCount,
+                                 line.isDeferred};
+      }
+      ++service;
+    }
+  }
   graph.sort();
   return graph;
 }
@@ -164,11 +191,9 @@ consteval std::size_t explainCycle(std::index_sequence<step...>) {
 
 // Instantiates the type that explains the mistake.
 template <const auto& found, class Lines>
-consteval bool explain() {
+consteval bool explainIn() {
   using enum MistakeKind;
-  if constexpr (found.kind == kNone) {
-    return true;
-  } else if constexpr (found.kind == kCycle) {
+  if constexpr (found.kind == kCycle) {
     return explainCycle<found, Lines>(std::make_index_sequence<found.pathLength>()) == 0;
   } else {
     using Service = InterfaceAt<found.service, Lines>;
@@ -188,6 +213,15 @@ consteval bool explain() {
       if constexpr (found.kind == kNarrowerScope)
         return sizeof(mistake::KeepsNarrowerScope<Service, Needed>) == 0;
     }
+  }
+}
+
+template <const auto& found, class... Declarations>
+consteval bool explain() {
+  if constexpr (found.kind == MistakeKind::kNone) {
+    return true;
+  } else {
+    return explainIn<found, decltype((Types<>() + ... + typename LinesOf<Declarations>::List()))>();
   }
 }
 

@@ -28,8 +28,8 @@ template <class M, class I>
 struct Wired {
   static constexpr std::size_t kIndex = M::kGraph.find(kName<I>.view(), &kIdentity<I>);
   static_assert(kIndex != M::kGraph.kNone, "the module neither binds nor expects this interface");
-  static constexpr ServiceData kService =
-      kIndex != M::kGraph.kNone ? M::kGraph.services[kIndex] : ServiceData{};
+  // A reference, since a copy would make the compiler copy the whole graph.
+  static constexpr const ServiceData& kService = M::kGraph.services[kIndex != M::kGraph.kNone ? kIndex : 0];
 };
 
 // Returns those tags of a service that another one has, which it needs.
@@ -45,7 +45,7 @@ struct Argument {
   using I = typename NeedOf<Parameter>::Type;
   static constexpr NeedKind kKind = NeedOf<Parameter>::need().kind;
 
-  static consteval ServiceData service() {
+  static consteval const ServiceData& service() {
     if constexpr (kKind == NeedKind::kMaybe &&
                   M::kGraph.find(kName<I>.view(), &kIdentity<I>) == M::kGraph.kNone) {
       return Stated<I, false>::kService;
@@ -179,7 +179,7 @@ struct Recipe<M, I, Implementation(Parameters...)> {
     } else {
       static_assert((!kIsGiven<Parameters> && ...), "only a Factory has arguments from its caller");
       constexpr bool kFits =
-          std::constructible_from<Class, decltype(Argument<M, I, Parameters>::get(tags))...>;
+          std::is_constructible_v<Class, decltype(Argument<M, I, Parameters>::get(tags))...>;
       static_assert(kFits, "the class has no constructor that takes what its line lists");
       if constexpr (kFits) return rt::make<Class>(Argument<M, I, Parameters>::get(tags)...);
     }

@@ -143,15 +143,22 @@ using NthOf = typename decltype(nth<index>(List()))::Type;
 // Reads the lines as data, so that the compiler makes no type for each step.
 template <class... Declarations>
 consteval auto graphOf() {
-  constexpr auto makersIn = [](std::span<const LineData> lines) {
+  using All = std::array<std::span<const LineData>, sizeof...(Declarations)>;
+  // Loops, since clang limits the length of fold expressions.
+  constexpr auto lineCount = [](const All& all) {
     std::size_t count = 0;
-    for (const LineData& line : lines) count += line.makerCount;
+    for (const std::span<const LineData> lines : all) count += lines.size();
     return count;
   };
-  Graph<(std::size_t{0} + ... + LinesOf<Declarations>::kData.size()),
-        (std::size_t{0} + ... + makersIn(LinesOf<Declarations>::kData))>
-      graph;
-  const std::array<std::span<const LineData>, sizeof...(Declarations)> all{LinesOf<Declarations>::kData...};
+  constexpr auto makerCount = [](const All& all) {
+    std::size_t count = 0;
+    for (const std::span<const LineData> lines : all) {
+      for (const LineData& line : lines) count += line.makerCount;
+    }
+    return count;
+  };
+  constexpr All all{LinesOf<Declarations>::kData...};
+  Graph<lineCount(all), makerCount(all)> graph;
   std::size_t service = 0;
   std::size_t maker = 0;
   for (std::size_t declaration = 0; declaration < all.size(); ++declaration) {

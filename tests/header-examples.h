@@ -41,6 +41,7 @@
 #include "Shared/Logging/LUMLogFormatter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
 #include "Shared/Logging/LUMSyncLogger.h"
+#include "Shared/ServiceRegistry/Module.h"
 #include "Shared/ServiceRegistry/ServiceRegistry.h"
 #include "Shared/ServiceRegistry/Source/Profiling/Private/SRLPProfilingMeasurement.h"
 
@@ -198,6 +199,33 @@ struct Clock : rt::Protocol<Clock> {
 class SystemClock : public rt::Implements<SystemClock, rt::Object, Clock> {
  public:
   Time now() const override;
+};
+
+struct Preferences : rt::Protocol<Preferences> {
+  virtual rt::String folder() const = 0;
+
+ protected:
+  ~Preferences() = default;
+};
+class FilePreferences : public rt::Implements<FilePreferences, rt::Object, Preferences> {
+ public:
+  FilePreferences(rt::String user, rt::Ref<Clock> clock);
+  rt::String folder() const override;
+};
+
+struct Importer : rt::Protocol<Importer> {
+  virtual void run() = 0;
+
+ protected:
+  ~Importer() = default;
+};
+class CsvImporter : public rt::Implements<CsvImporter, rt::Object, Importer> {
+ public:
+  void run() override;
+};
+class JsonImporter : public rt::Implements<JsonImporter, rt::Object, Importer> {
+ public:
+  void run() override;
 };
 
 class View : public rt::Implements<View, rt::Object> {};

@@ -93,11 +93,12 @@ void announce(ClassMethodEntry& entry) noexcept;
 /// Adds `function` to the methods of `Class` under `selector`. Instantiate it explicitly, as above.
 template <ClassType Class, detail::StringLiteral selector, auto function>
 struct [[gnu::visibility("default")]] AddedClassMethod {
+  // Never called. It exists so that what it mentions is instantiated. A template that adds a method mentions
+  // this function.
+  static void mention() { static_cast<void>(&detail::AnnouncedOnLoading<entry_>::run); }
+
  private:
   static ClassMethod method() { return {selector.view(), function}; }
-
-  // Never called. It exists so that what it mentions is instantiated.
-  static void mention() { static_cast<void>(&detail::AnnouncedOnLoading<entry_>::run); }
 
   static constinit detail::ClassMethodEntry entry_;
 };

@@ -52,12 +52,12 @@ class PECReportTest : public testing::Test {
     PECErrorHandler::resetAfterTest();
   }
 
-  const LUMLogMessage& message() const { return *capture_.messages().at(0); }
+  Ref<LUMLogMessage> message() const { return capture_.messages().at(0); }
 
   // Returns the safe parameter at an index, cast to its class.
   template <class Parameter>
   const Parameter* parameterAt(std::int32_t place) const {
-    return rt::cast<Parameter>(message().safeParameters()->objectForKey(rt::Number::of(place).get()));
+    return rt::cast<Parameter>(message()->safeParameters()->objectForKey(rt::Number::of(place).get()));
   }
 
   LUMLogCapture capture_;
@@ -67,13 +67,13 @@ class PECReportTest : public testing::Test {
 TEST_F(PECReportTest, LogsAFaultFromItsSite) {
   PECReport({kFile, "-[Registry add:]", 70}, "nothing to add"_s);
   EXPECT_THAT(capture_.messages(), ElementsAre(HasLevel(LUMLogLevelFault)));
-  EXPECT_EQ(message().file(), kFile);
-  EXPECT_EQ(message().function(), "-[Registry add:]");
-  EXPECT_EQ(message().line(), 70U);
-  EXPECT_EQ(message().format(), "nothing to add");
-  EXPECT_EQ(message().formattedString(), "nothing to add");
-  EXPECT_EQ(message().logMetadata(), nullptr);
-  EXPECT_EQ(message().safeParameters(), nullptr);
+  EXPECT_EQ(message()->file(), kFile);
+  EXPECT_EQ(message()->function(), "-[Registry add:]");
+  EXPECT_EQ(message()->line(), 70U);
+  EXPECT_EQ(message()->format(), "nothing to add");
+  EXPECT_EQ(message()->formattedString(), "nothing to add");
+  EXPECT_EQ(message()->logMetadata(), nullptr);
+  EXPECT_EQ(message()->safeParameters(), nullptr);
 }
 
 TEST_F(PECReportTest, ReachesTheErrorHandler) {
@@ -100,8 +100,8 @@ TEST_F(PECReportTest, RecordsItsLine) {
 TEST_F(PECReportTest, KeepsEveryParameterAsASafeParameterOfTypeOne) {
   const rt::String name = rt::String::fromUTF8("Clock");
   PECReport({kFile, "f"}, "%@ of %@ and %@"_s, name, 4, "literal"_s);
-  EXPECT_EQ(message().formattedString(), "Clock of 4 and literal");
-  ASSERT_EQ(message().safeParameters()->count(), 3U);
+  EXPECT_EQ(message()->formattedString(), "Clock of 4 and literal");
+  ASSERT_EQ(message()->safeParameters()->count(), 3U);
   ASSERT_NE(parameterAt<LUMSafeStringParameter>(0), nullptr);
   EXPECT_EQ(parameterAt<LUMSafeStringParameter>(0)->stringValue(), "Clock");
   EXPECT_EQ(parameterAt<LUMSafeStringParameter>(0)->type(), 1U);
@@ -115,20 +115,20 @@ TEST_F(PECReportTest, KeepsEveryParameterAsASafeParameterOfTypeOne) {
 TEST_F(PECReportTest, PrintsAnyIntegerInFull) {
   PECReport({kFile, "f"}, "%@ %@ %@ %@ %@"_s, std::numeric_limits<std::uint64_t>::max(),
             std::numeric_limits<std::int64_t>::min(), -1, std::uint8_t{200}, std::size_t{7});
-  EXPECT_EQ(message().formattedString(), "18446744073709551615 -9223372036854775808 -1 200 7");
+  EXPECT_EQ(message()->formattedString(), "18446744073709551615 -9223372036854775808 -1 200 7");
 }
 
 TEST_F(PECReportTest, PrintsNullText) {
   PECReport({kFile, "f"}, "no %@, and %@"_s, rt::String(), ""_s);
-  EXPECT_EQ(message().formattedString(), "no (null), and ");
-  EXPECT_EQ(message().safeParameters()->count(), 2U);
+  EXPECT_EQ(message()->formattedString(), "no (null), and ");
+  EXPECT_EQ(message()->safeParameters()->count(), 2U);
 }
 
 // Directives in a parameter are printed unchanged.
 TEST_F(PECReportTest, PrintsDirectivesInParametersUnchanged) {
   PECReport({kFile, "f"}, "100 %% of %@"_s, "%@%s%n"_s);
-  EXPECT_EQ(message().formattedString(), "100 % of %@%s%n");
-  EXPECT_EQ(message().format(), "100 %% of %@");
+  EXPECT_EQ(message()->formattedString(), "100 % of %@%s%n");
+  EXPECT_EQ(message()->format(), "100 %% of %@");
 }
 
 // Reporting is the last thing that these functions do.

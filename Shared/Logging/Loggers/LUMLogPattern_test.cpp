@@ -39,7 +39,7 @@ class Time {
     second_ = second;
     nanosecond_ = nanosecond;
     clockHook = [](clockid_t clock, timespec& time) {
-      if (clock == CLOCK_REALTIME || clock == CLOCK_REALTIME_COARSE) time = {second_, nanosecond_};
+      if (clock == CLOCK_REALTIME) time = {second_, nanosecond_};
     };
   }
   Time(const Time&) = delete;

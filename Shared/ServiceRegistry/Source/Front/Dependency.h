@@ -26,7 +26,7 @@
 #include "Runtime/Objects/Ref.h"
 #include "Shared/ServiceRegistry/Source/Front/All.h"
 #include "Shared/ServiceRegistry/Source/Front/Lazy.h"
-#include "Shared/ServiceRegistry/Source/Front/Name.h"
+#include "Shared/ServiceRegistry/Source/Front/Private/Name.h"
 #include "Shared/ServiceRegistry/Source/Front/Service.h"
 #include "Shared/ServiceRegistry/Source/Front/Tag.h"
 

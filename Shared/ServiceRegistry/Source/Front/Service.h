@@ -35,7 +35,7 @@
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTagSet.h"
 #include "Shared/ServiceRegistry/Source/Front/All.h"
 #include "Shared/ServiceRegistry/Source/Front/Lazy.h"
-#include "Shared/ServiceRegistry/Source/Front/Name.h"
+#include "Shared/ServiceRegistry/Source/Front/Private/Name.h"
 #include "Shared/ServiceRegistry/Source/Front/Tag.h"
 #include "Shared/ServiceRegistry/Source/SRLRegistry.h"
 

@@ -30,7 +30,7 @@
 #include "Runtime/Objects/Ref.h"
 #include "Runtime/Objects/String.h"
 #include "Shared/ServiceRegistry/Source/Entities/Metadata/SRLScopeTag.h"
-#include "Shared/ServiceRegistry/Source/Front/Name.h"
+#include "Shared/ServiceRegistry/Source/Front/Private/Name.h"
 
 namespace srl {
 

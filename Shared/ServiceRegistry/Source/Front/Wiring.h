@@ -21,8 +21,8 @@
 #include <utility>
 
 #include "Shared/ServiceRegistry/Source/Front/Dependency.h"
-#include "Shared/ServiceRegistry/Source/Front/Graph.h"
-#include "Shared/ServiceRegistry/Source/Front/Mistakes.h"
+#include "Shared/ServiceRegistry/Source/Front/Private/Graph.h"
+#include "Shared/ServiceRegistry/Source/Front/Private/Mistakes.h"
 #include "Shared/ServiceRegistry/Source/Front/Service.h"
 
 namespace srl {

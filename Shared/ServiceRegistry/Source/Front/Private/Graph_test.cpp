@@ -1,7 +1,7 @@
 // What the compiler finds out about a module's wiring, here at run time on random wiring, and compared with
 // plainer algorithms.
 
-#include "Shared/ServiceRegistry/Source/Front/Graph.h"
+#include "Shared/ServiceRegistry/Source/Front/Private/Graph.h"
 
 #include <gtest/gtest.h>
 

@@ -33,6 +33,7 @@ class LoggingExampleTest : public testing::Test {
  protected:
   void SetUp() override {
     if (!PrivateJournal::entered()) GTEST_SKIP() << refusal;
+    unsetenv("LUM_LOG");
     journal_.emplace();
     journal_->start();
     std::string name = testing::TempDir() + "logging.XXXXXX";

@@ -62,7 +62,8 @@ class RT_VISIBLE LUMLogMessage : public rt::Implements<LUMLogMessage, rt::Object
   /// all arguments, a number from 0. Null if there are none.
   const rt::Ref<rt::Dictionary>& safeParameters() const noexcept { return safeParameters_; }
 
-  /// Returns the metadata that the caller gave, or null.
+  /// Returns the metadata of the call, together with that of the scopes (LUMLogScope.h). Null if there is
+  /// none.
   const rt::Ref<LUMLogMetadata>& logMetadata() const noexcept { return logMetadata_; }
 
   /// Returns when the message was made, in nanoseconds since the start of 1970, in UTC.

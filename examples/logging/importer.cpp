@@ -1,5 +1,4 @@
 // Adds up the numbers in lists that have one on each line. This is how a program logs that an operator runs:
-//
 //     $ LUM_LOG='info,Parser=debug' logging-importer FOLDER LIST...
 //
 // Its lines go to the terminal and to the system's log, to FOLDER/importer.log, which is rotated, and to

@@ -20,6 +20,7 @@
 
 #include "Runtime/Base/Private/MonotonicClock.h"
 #include "Runtime/Locks/Private/AddressWait.h"
+#include "Runtime/Queues/Private/TaskContext.h"
 #include "Runtime/Text/Format.h"
 #include "Shared/Logging/LUMLogInterest.h"
 #include "Shared/Logging/LUMLogMetadata.h"
@@ -135,7 +136,7 @@ bool LUMBoundedLogger::push(LUMLogMessage& message) noexcept {
   endPause();
   switch (whenFull_) {
     case LUMLogWhenFull::kBlock:
-      return writing == nullptr && waitForRoom(message);
+      return !wouldWaitForItself() && waitForRoom(message);
     case LUMLogWhenFull::kDropOldest:
       for (int i = 0; i < kTries; ++i) {
         LUMLogMessageQueue::Taken oldest;
@@ -154,6 +155,18 @@ bool LUMBoundedLogger::push(LUMLogMessage& message) noexcept {
       break;
   }
   return false;
+}
+
+// Returns whether the messages cannot be written before the calling thread goes on.
+bool LUMBoundedLogger::wouldWaitForItself() const noexcept {
+  if (writing != nullptr) return true;
+  if (asyncTarget_ == nullptr) return false;
+  try {
+    const rt::Ref<rt::Queue> queue = asyncTarget_->operationQueue();
+    return queue && queue->isCurrent();
+  } catch (...) {
+    return false;
+  }
 }
 
 bool LUMBoundedLogger::waitForRoom(LUMLogMessage& message) {
@@ -201,6 +214,8 @@ bool LUMBoundedLogger::isWrittenAtOnce(const rt::Ref<LUMLogMessage>& message) {
 void LUMBoundedLogger::wake() {
   std::uint32_t idle = kIdle;
   if (!state_.compare_exchange_strong(idle, kAwake)) return;
+  // The task writes messages of all threads. What the target logs must not have the metadata of this one.
+  const rt::TaskContext::Scope none(nullptr);
   try {
     taskQueue_->async([self = rt::Ref<LUMBoundedLogger>(this)] { self->run(true); });
     endPausesAtExit();
@@ -347,8 +362,11 @@ bool LUMBoundedLogger::writeNext(bool isRefused) noexcept {
   {
     const rt::Ref<LUMLogMessage> message = rt::Ref<LUMLogMessage>::adopt(taken.message);
     write(message, isRefused);
-    claim_.message.store(nullptr, std::memory_order_release);
-    claim_.next.store(0, std::memory_order_release);
+    claim_.message.store(nullptr, std::memory_order_seq_cst);
+    claim_.next.store(0, std::memory_order_seq_cst);
+    // A handler that has grown tired of waiting may be writing this message.
+    if (isCrashing()) [[unlikely]]
+      waitForWriter();
   }
   finished_.store(std::max(finished_.load(std::memory_order_relaxed), taken.position + 1),
                   std::memory_order_release);

@@ -3,7 +3,7 @@
 /// Makes any logger asynchronous, with a queue of limited length. The thread that logs puts a reference to
 /// the message into the queue and goes on. A task writes the messages to the target, in order.
 ///
-///     const rt::Ref<LUMLogger> target = rt::make<FileLogger>("/var/log/host.log");
+///     const rt::Ref<LUMFileLogger> target = LUMFileLogger::initWithPath("/var/log/host.log");
 ///     const rt::Ref<LUMBoundedLogger> logger = LUMBoundedLogger::initWithLogger(target, {.capacity = 1024});
 ///     LUMLogMultiplexer::sharedInstance()->addSyncLogger(logger);
 ///     ...
@@ -11,8 +11,8 @@
 ///
 /// Each message that the target's filter lets pass is written, dropped or failed, and counted as such. When a
 /// full queue has room again, the target gets an error in place of the dropped messages. Its component is
-/// "LUMBoundedLogger", its text "3 messages were dropped: the queue of FileLogger was full". It does not pass
-/// the target's filter.
+/// "LUMBoundedLogger", its text "3 messages were dropped: the queue of LUMFileLogger was full". It does not
+/// pass the target's filter.
 ///
 /// The target runs on one thread at a time. If it is a LUMAsyncLogger, it runs on its `operationQueue`. A
 /// message that such a target wants at once is written before `logWithMessage` returns, and may overtake
@@ -25,8 +25,8 @@
 /// since threads may wait for room.
 ///
 /// Blocking: with kBlock, a thread that logs waits for room. It must not hold a lock that the target takes. A
-/// thread that writes to a target of any LUMBoundedLogger never waits: its message is dropped and counted, if
-/// the queue is full.
+/// thread that writes to a target of any LUMBoundedLogger never waits, and neither does one that runs a task
+/// of the target's `operationQueue`: its message is dropped and counted, if the queue is full.
 ///
 /// Errors: a message for which the target throws counts as failed, and so does one for a LUMAsyncLogger
 /// without a queue. The program goes on. `logWithMessage` throws what `dispatchModeForMessage` throws, and
@@ -120,6 +120,7 @@ class RT_VISIBLE LUMBoundedLogger : public rt::Implements<LUMBoundedLogger, LUML
 
   bool push(LUMLogMessage& message) noexcept;
   bool pushOnceThereIsRoom(LUMLogMessage& message);
+  bool wouldWaitForItself() const noexcept;
   bool waitForRoom(LUMLogMessage& message);
   void drop(LUMLogMessage& message) noexcept;
   bool isWrittenAtOnce(const rt::Ref<LUMLogMessage>& message);

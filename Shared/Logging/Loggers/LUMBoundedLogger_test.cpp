@@ -24,8 +24,10 @@
 #include <vector>
 
 #include "Shared/Logging/LUMLogDropAllFilter.h"
+#include "Shared/Logging/LUMLogMetadata.h"
 #include "Shared/Logging/LUMLogMinimumLevelFilter.h"
 #include "Shared/Logging/LUMLogMultiplexer.h"
+#include "Shared/Logging/LUMLogScope.h"
 #include "tests/support/AllocationCount.h"
 #include "tests/support/AllocationFailure.h"
 #include "tests/support/ForkTest.h"
@@ -354,6 +356,36 @@ TEST(LUMBoundedLogger, WritesAtOnceWhatAnAsynchronousTargetWantsAtOnce) {
   });
   EXPECT_TRUE(logger->flush(kLong));
   EXPECT_THAT(trace.events(), ElementsAre("inner"));
+}
+
+// Regression: a task of the target's queue waited for room, which only that queue could make.
+TEST(LUMBoundedLogger, DropsWhatATaskOfTheTargetsQueueHasNoRoomFor) {
+  const auto queue = rt::make<rt::Queue>("target"_s);
+  std::atomic<std::uint64_t> written = 0;
+  const auto target = rt::make<TestAsyncLogger>(queue, [&](const rt::Ref<LUMLogMessage>& message) {
+    if (message->level() == LUMLogLevelInfo) ++written;
+  });
+  const auto logger = LUMBoundedLogger::initWithLogger(target, {.capacity = 1});
+  constexpr std::uint64_t kCount = 10;
+  queue->sync([&] {
+    for (std::uint64_t i = 0; i < kCount; ++i) logger->logWithMessage(messageWith(LUMLogLevelInfo));
+  });
+  EXPECT_TRUE(logger->flush(kLong));
+  EXPECT_EQ(written + logger->droppedCount(), kCount);
+  EXPECT_GT(logger->droppedCount(), 0U);
+}
+
+// Regression: what a target logged had the metadata of the thread that had started the task.
+TEST(LUMBoundedLogger, WritesOutsideOfTheScopesOfThreads) {
+  rt::Ref<LUMLogMetadata> metadata = LUMLogMetadata::init();
+  const auto logger = LUMBoundedLogger::initWithLogger(
+      rt::make<TestSyncLogger>([&](const auto&) { metadata = LUMLogScope::current(); }));
+  {
+    const LUMLogScope scope(LUMLogField("request", 7));
+    logger->logWithMessage(messageWith(LUMLogLevelInfo));
+  }
+  EXPECT_TRUE(logger->flush(kLong));
+  EXPECT_FALSE(metadata);
 }
 
 TEST(LUMBoundedLogger, CountsMessagesForATargetWithoutAQueue) {

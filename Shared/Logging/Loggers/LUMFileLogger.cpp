@@ -76,6 +76,10 @@ void LUMFileLogger::tellLoss() {
   try {
     const rt::Ref<LUMLogMessage> loss = LUMLogLossMessage(count, buffer_->error());
     const LUMLogRenderedLine notice(*formatter_, *loss, "\n");
+    if (notice.text().empty()) {
+      buffer_->giveBackUntoldCount(count);
+      return;
+    }
     buffer_->appendNotice(notice.text(), count, loss->time());
   } catch (...) {
     buffer_->giveBackUntoldCount(count);

@@ -4,7 +4,8 @@
 ///
 ///     int main() {
 ///       LUMLogCrash::install();
-///       const auto logger = LUMBoundedLogger::initWithLogger(rt::make<FileLogger>("/var/log/host.log"));
+///       const auto logger =
+///       LUMBoundedLogger::initWithLogger(LUMFileLogger::initWithPath("/var/log/host.log"));
 ///       LUMLogMultiplexer::sharedInstance()->addSyncLogger(logger);
 ///       ...
 ///     }
@@ -17,6 +18,8 @@
 ///     | SIGSEGV at address 0x10 in thread 4711
 ///     | SIGABRT from process 12 in thread 4711
 ///     | std::terminate in thread 4711: an exception of type St13runtime_error: no such file
+///
+/// `std::terminate` has a line of its own, before that of the SIGABRT which it usually ends with.
 ///
 /// If there is no target, the line goes to standard error. It says how many messages could not be written:
 /// those whose target is no LUMLogOutput, and those that full queues had dropped without a report.
@@ -32,6 +35,7 @@
 ///
 /// - If several threads crash, the first one writes. Others wait for two seconds at most.
 /// - A crash while messages are written ends the program by its signal. The remaining messages are lost.
+/// - Messages that a ring is handing on at that moment are lost.
 /// - An output that blocks for ever keeps the program from ending.
 ///
 /// Stacks: a handler needs a stack of its own after an overflow. `install` gives one to the calling thread,

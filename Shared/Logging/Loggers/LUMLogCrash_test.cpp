@@ -386,7 +386,7 @@ int crashChild(Body body, std::vector<std::string>& lines) {
   file = open(path.c_str(), O_CREAT | O_TRUNC | O_WRONLY | O_APPEND | O_CLOEXEC, 0600);
   const pid_t child = fork();
   if (child == 0) {
-    alarm(20);
+    alarm(300);
     const rlimit none{};
     setrlimit(RLIMIT_CORE, &none);
     dup2(open("/dev/null", O_WRONLY | O_CLOEXEC), STDERR_FILENO);

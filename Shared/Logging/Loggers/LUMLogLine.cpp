@@ -11,14 +11,22 @@
 
 namespace {
 
-bool isControl(char character) noexcept {
-  const auto code = static_cast<unsigned char>(character);
+// The first byte of U+0080 to U+00BF, of which those up to U+009F are control characters, too.
+constexpr unsigned char kLatin = 0xC2;
+
+unsigned char codeAt(std::string_view text, std::size_t place) noexcept {
+  return place < text.size() ? static_cast<unsigned char>(text[place]) : 0;
+}
+
+bool isControlAt(std::string_view text, std::size_t place) noexcept {
+  const unsigned char code = codeAt(text, place);
+  if (code == kLatin) return codeAt(text, place + 1) >= 0x80 && codeAt(text, place + 1) < 0xA0;
   return code < 0x20 || code == 0x7F;
 }
 
 using Word = std::uint64_t;
 
-// Returns whether one of the eight bytes at `bytes` is a control character.
+// Returns whether one of the eight bytes at `bytes` may begin a control character.
 bool hasControl(const char* bytes) noexcept {
   constexpr Word kOnes = 0x0101010101010101;
   constexpr Word kHighBits = 0x80 * kOnes;
@@ -26,7 +34,9 @@ bool hasControl(const char* bytes) noexcept {
   std::memcpy(&word, bytes, sizeof(Word));
   const Word deletes = word ^ (0x7F * kOnes);
   // Subtracting a limit sets the highest bit of a byte below it, and then perhaps that of bytes behind it.
-  const Word found = ((word - (0x20 * kOnes)) & ~word) | ((deletes - kOnes) & ~deletes);
+  const Word latins = word ^ (kLatin * kOnes);
+  const Word found =
+      ((word - (0x20 * kOnes)) & ~word) | ((deletes - kOnes) & ~deletes) | ((latins - kOnes) & ~latins);
   return (found & kHighBits) != 0;
 }
 
@@ -39,7 +49,7 @@ std::size_t plainLength(std::string_view text) noexcept {
       !hasControl(text.data() + text.size() - sizeof(Word))) {
     return text.size();
   }
-  while (length < text.size() && !isControl(text[length])) ++length;
+  while (length < text.size() && !isControlAt(text, length)) ++length;
   return length;
 }
 
@@ -58,7 +68,9 @@ void LUMLogLine::appendEscaped(std::string_view text) noexcept {
     const std::size_t plain = plainLength(text);
     append(text.substr(0, plain));
     if (plain == text.size()) return;
-    const auto code = static_cast<unsigned char>(text[plain]);
+    // The control characters beyond ASCII have two bytes, the second of which is their code.
+    const std::size_t last = codeAt(text, plain) == kLatin ? plain + 1 : plain;
+    const unsigned char code = codeAt(text, last);
     if (code == '\n') {
       append("\\n");
     } else if (code == '\t') {
@@ -68,7 +80,7 @@ void LUMLogLine::appendEscaped(std::string_view text) noexcept {
       append(kDigits[code >> 4U]);
       append(kDigits[code & 0xFU]);
     }
-    text.remove_prefix(plain + 1);
+    text.remove_prefix(last + 1);
   }
 }
 

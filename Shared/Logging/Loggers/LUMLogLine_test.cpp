@@ -85,10 +85,23 @@ TEST(LUMLogLine, EscapesControlCharacters) {
   EXPECT_EQ(escaped(std::string_view("\0", 1)), "\\x00");
 }
 
+// A terminal takes U+009B for the beginning of a command.
+TEST(LUMLogLine, EscapesControlCharactersBeyondASCII) {
+  EXPECT_EQ(escaped("a\xC2\x9B"
+                    "31m\xC2\x80\xC2\x9F"),
+            "a\\x9b31m\\x80\\x9f");
+  EXPECT_EQ(escaped("\xC2\xA0 \xC2\xA9 2026"), "\xC2\xA0 \xC2\xA9 2026");
+  EXPECT_EQ(escaped("\xC2"), "\xC2");
+  for (std::size_t before = 0; before < 20; ++before) {
+    const std::string text = std::string(before, 'x') + "\xC2\x9B" + std::string(9, 'y');
+    EXPECT_EQ(escaped(text), std::string(before, 'x') + "\\x9b" + std::string(9, 'y'));
+  }
+}
+
 TEST(LUMLogLine, FindsControlCharactersWhereverTheyAre) {
   constexpr std::size_t kLength = 19;
   for (int code = 0; code < 256; ++code) {
-    for (const char around : {'a', ' ', '~', '\xC3', '\x80'}) {
+    for (const char around : {'a', ' ', '~', '\xC3', '\xA0'}) {
       std::string expected(1, static_cast<char>(code));
       if (code < 0x20 || code == 0x7F) {
         expected = code == '\n' ? "\\n" : "\\t";

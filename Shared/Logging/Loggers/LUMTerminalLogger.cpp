@@ -99,6 +99,7 @@ bool LUMTerminalLogger::writeMessage(const LUMLogMessage& message) {
 }
 
 bool LUMTerminalLogger::write(std::string_view line) noexcept {
+  if (line.empty()) return true;
   const rt::LockGuard guard(lock_);
   const std::chrono::milliseconds wait = isStuck_ ? std::chrono::milliseconds(0) : kLongestWait;
   if (isCut_) isCut_ = rt::StandardError::writeTo(descriptor_, "\n", wait) == 0;
@@ -127,6 +128,11 @@ void LUMTerminalLogger::logInSignalHandler(const LUMLogMessage& message) noexcep
   LUMLogLine end(all.subspan(length), LUMLogLine::Caller::kSignalHandler);
   if (!colour.empty()) end.append(kUncoloured);
   end.append('\n');
-  rt::StandardError::writeTo(descriptor_, {place.data(), length + end.length()}, kLongestWait);
+  // Many messages may wait, so only the first that finds no room waits for it.
+  const std::chrono::milliseconds wait =
+      isStuckInHandler_.load(std::memory_order_relaxed) ? std::chrono::milliseconds(0) : kLongestWait;
+  const std::size_t size = length + end.length();
+  const bool isStuck = rt::StandardError::writeTo(descriptor_, {place.data(), size}, wait) < size;
+  isStuckInHandler_.store(isStuck, std::memory_order_relaxed);
   errno = error;
 }

@@ -81,6 +81,7 @@ class RT_VISIBLE LUMTerminalLogger final : public rt::Implements<LUMTerminalLogg
   rt::LongLock lock_;
   bool isCut_ RT_GUARDED_BY(lock_) = false;    // the last line has no end
   bool isStuck_ RT_GUARDED_BY(lock_) = false;  // the last line was lost
+  std::atomic<bool> isStuckInHandler_ = false;
   std::atomic<int> error_ = 0;
   std::atomic<std::uint64_t> droppedCount_ = 0;
   std::atomic<std::uint64_t> untoldCount_ = 0;

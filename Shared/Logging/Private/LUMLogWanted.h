@@ -22,11 +22,10 @@ class RT_VISIBLE LUMLogWanted {
   /// Returns whether somebody may want a message of this level. `metadata` may be null.
   [[gnu::always_inline]] static bool isWanted(LUMLogLevel level,
                                               const rt::Ref<LUMLogMetadata>& metadata) noexcept {
-    if (!metadata) {
-      return level >= lowestWithoutMetadata_.load(std::memory_order_relaxed) ||
-             (isWanted(level) && isWantedInScope(level));
-    }
-    return isWanted(level) && (isWantedOf(*metadata, level) || isWantedInScope(level));
+    if (!isWanted(level)) return false;
+    const bool isOfCall = metadata ? isWantedOf(*metadata, level)
+                                   : level >= lowestWithoutMetadata_.load(std::memory_order_relaxed);
+    return isOfCall || isWantedInScope(level);
   }
 
   /// Returns whether somebody may want a message of this level and any component.

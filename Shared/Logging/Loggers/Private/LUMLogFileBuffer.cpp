@@ -174,8 +174,17 @@ void LUMLogFileBuffer::rotate() noexcept {
 }
 
 void LUMLogFileBuffer::writeInSignalHandler(std::string_view line) noexcept {
+  constexpr int kLooks = 100;
   const int error = errno;
-  if (lock_.tryLock()) {
+  bool isTaken = lock_.tryLock();
+  // The thread that has the lock may be the one that has crashed, so later lines do not wait any more.
+  for (int look = 0; look < kLooks && !isTaken && !isLockGivenUp_; ++look) {
+    const timespec moment{.tv_sec = 0, .tv_nsec = kMillisecond};
+    nanosleep(&moment, nullptr);
+    isTaken = lock_.tryLock();
+  }
+  isLockGivenUp_ = !isTaken;
+  if (isTaken) {
     if (forkCount_ == LUMLogFlusher::forkCount()) {
       file_.write({place_.get(), std::exchange(length_, 0)});
       deadline_.store(kNever, std::memory_order_relaxed);

@@ -56,9 +56,11 @@ class LUMLogFileBuffer final : public rt::Implements<LUMLogFileBuffer, rt::Objec
   std::uint64_t droppedCount() const noexcept { return droppedCount_.load(std::memory_order_relaxed); }
 
   /// Returns how many lines were lost that no notice tells of, and counts them as told.
-  std::uint64_t takeUntoldCount() noexcept {
+  std::uint64_t takeUntoldCount() noexcept RT_EXCLUDES(lock_) {
     if (untoldCount_.load(std::memory_order_relaxed) == 0) [[likely]]
       return 0;
+    const rt::LockGuard guard(lock_);
+    beginUse();
     return untoldCount_.exchange(0, std::memory_order_relaxed);
   }
   /// Gives back a count that no notice was made for.
@@ -94,6 +96,8 @@ class LUMLogFileBuffer final : public rt::Implements<LUMLogFileBuffer, rt::Objec
 
   rt::LongLock lock_;
   LUMLogFile file_ RT_GUARDED_BY(lock_);
+  // Whether a signal handler has waited for the lock in vain.
+  std::atomic<bool> isLockGivenUp_ = false;
   std::uint32_t forkCount_ RT_GUARDED_BY(lock_);
   std::size_t length_ RT_GUARDED_BY(lock_) = 0;
   // A notice in the buffer, or in the text that is sent, ends here and tells of so many lines.

@@ -12,6 +12,7 @@
 #include "Runtime/Locks/Private/AddressWait.h"
 #include "Runtime/Locks/Private/Lazy.h"
 #include "Runtime/Objects/String.h"
+#include "Runtime/Queues/Private/TaskContext.h"
 #include "Shared/Logging/Loggers/Private/LUMLogFileBuffer.h"
 
 namespace {
@@ -73,6 +74,8 @@ void LUMLogFlusher::run() noexcept {
     isRunning_ = true;
     runningForkCount_ = forkCount();
   }
+  // The task is nobody's: it must not keep the metadata of the thread that happens to start it.
+  const rt::TaskContext::Scope none(nullptr);
   try {
     queue_->async([this] { flushInTime(); });
   } catch (const std::bad_alloc&) {
@@ -88,10 +91,16 @@ void LUMLogFlusher::wakeBefore(std::uint64_t deadline) noexcept {
   rt::detail::wakeAllAtAddress(&events_);
 }
 
-rt::Ref<LUMLogFileBuffer> LUMLogFlusher::mostUrgent() const noexcept {
-  const auto buffer =
-      std::ranges::min_element(buffers_, {}, [](const auto& each) { return each->deadline(); });
-  return buffer != buffers_.end() ? *buffer : nullptr;
+// Returns the buffer with the earliest deadline, and that deadline: the buffer may get a later one meanwhile.
+rt::Ref<LUMLogFileBuffer> LUMLogFlusher::mostUrgent(std::uint64_t& deadline) const noexcept {
+  rt::Ref<LUMLogFileBuffer> buffer;
+  for (const rt::Ref<LUMLogFileBuffer>& each : buffers_) {
+    const std::uint64_t other = each->deadline();
+    if (buffer != nullptr && other >= deadline) continue;
+    buffer = each;
+    deadline = other;
+  }
+  return buffer;
 }
 
 void LUMLogFlusher::flushInTime() noexcept {
@@ -99,15 +108,15 @@ void LUMLogFlusher::flushInTime() noexcept {
     const std::uint32_t event = events_.load(std::memory_order_acquire);
     wakeTime_.store(LUMLogFileBuffer::kNever, std::memory_order_seq_cst);
     rt::Ref<LUMLogFileBuffer> buffer;
+    std::uint64_t deadline = LUMLogFileBuffer::kNever;
     {
       const rt::LockGuard guard(lock_);
-      buffer = mostUrgent();
+      buffer = mostUrgent(deadline);
       if (buffer == nullptr || isExiting()) {
         isRunning_ = false;
         return;
       }
     }
-    const std::uint64_t deadline = buffer->deadline();
     const std::uint64_t now = rt::MonotonicClock::nanoseconds();
     if (deadline <= now) {
       buffer->flush(~std::uint32_t{0});

@@ -47,7 +47,7 @@ class LUMLogFlusher {
  private:
   void flushInTime() noexcept RT_EXCLUDES(lock_);
   static void flushAtExit();
-  rt::Ref<LUMLogFileBuffer> mostUrgent() const noexcept RT_REQUIRES(lock_);
+  rt::Ref<LUMLogFileBuffer> mostUrgent(std::uint64_t& deadline) const noexcept RT_REQUIRES(lock_);
 
   static constinit std::atomic<std::uint32_t> forkCount_;
   static constinit std::atomic<bool> isExiting_;

@@ -106,7 +106,8 @@ class Parser {
     const std::string_view option = hasOption ? field.substr(nameLength + 1) : std::string_view();
 
     const Kind kind = kindOf(field.substr(0, nameLength), start);
-    std::string before = kind == Kind::kFields || kind == Kind::kStack ? takeSpace() : std::string();
+    const bool mayTakeSpace = (kind == Kind::kFields || kind == Kind::kStack) && !hasOption;
+    std::string before = mayTakeSpace ? takeSpace() : std::string();
     Step& step = steps_.emplace_back();
     step.kind = kind;
     step.text = std::move(before);

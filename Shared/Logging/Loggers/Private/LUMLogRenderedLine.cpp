@@ -1,5 +1,6 @@
 #include "Shared/Logging/Loggers/Private/LUMLogRenderedLine.h"
 
+#include <algorithm>
 #include <span>
 
 #include "Shared/Logging/Loggers/LUMLogLine.h"
@@ -23,6 +24,9 @@ LUMLogRenderedLine::LUMLogRenderedLine(const LUMLogFormatter& formatter, const L
     }
     line.append(end);
     text_ = line.text();
+    if (!line.isComplete() && place.size() >= end.size()) {
+      std::ranges::copy(end, place.last(end.size()).begin());
+    }
     return line.length();
   };
   std::size_t length = render(place_);

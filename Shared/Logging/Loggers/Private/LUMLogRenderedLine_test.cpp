@@ -29,6 +29,19 @@ class Strings : public rt::Implements<Strings, rt::Object, LUMLogFormatter> {
   }
 };
 
+// Its line is longer each time.
+class Growing : public rt::Implements<Growing, rt::Object, LUMLogLineFormatter> {
+ public:
+  static constexpr std::string_view kClassName = "Growing";
+  void appendLine(LUMLogLine& line, const LUMLogMessage& /*message*/) const override {
+    length_ += 3000;
+    line.append(length_, 'x');
+  }
+
+ private:
+  mutable std::size_t length_ = 0;
+};
+
 rt::Ref<LUMLogMessage> messageOf(const rt::String& text) {
   return LUMLogMessage::initWithLevel(LUMLogLevelInfo, text, text, nullptr, nullptr, 0, ""_s, ""_s, nullptr,
                                       nullptr, nullptr);
@@ -53,6 +66,13 @@ TEST(LUMLogRenderedLine, MayBeLong) {
     EXPECT_EQ(LUMLogRenderedLine(Text(), *message, "\n").text(), text + "\n");
     EXPECT_EQ(LUMLogRenderedLine(Strings(), *message, "\n").text(), text + "\n");
   }
+}
+
+// The second rendering, for which there is room as for the first, is longer.
+TEST(LUMLogRenderedLine, EndsAlsoIfTheLineGrowsMeanwhile) {
+  const LUMLogRenderedLine line(Growing(), *messageOf("text"_s), "\n");
+  EXPECT_EQ(line.text().size(), 3001U);
+  EXPECT_TRUE(line.text().ends_with("x\n"));
 }
 
 TEST(LUMLogRenderedLine, AllocatesNothingForAShortLine) {

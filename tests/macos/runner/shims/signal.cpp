@@ -3,6 +3,7 @@
 #include <array>
 #include <atomic>
 #include <csignal>
+#include <cstddef>
 
 #include "tests/macos/runner/Shims.h"
 #include "tests/macos/runner/shims/Signals.h"
@@ -124,6 +125,32 @@ int sendSignalToThread(pthread_t thread, int signal) {
   return darwinError(pthread_kill(thread, linuxSignal(signal)));
 }
 
+// stack_t of macOS
+struct Stack {
+  void* begin;
+  std::size_t size;
+  int flags;
+};
+
+// SS_ONSTACK is 1 on both systems.
+constexpr int kDarwinDisable = 4;
+
+int changeStack(const Stack* given, Stack* previous) {
+  stack_t next{};
+  stack_t before{};
+  if (given != nullptr) {
+    next = {.ss_sp = given->begin,
+            .ss_flags = (given->flags & kDarwinDisable) != 0 ? SS_DISABLE : 0,
+            .ss_size = given->size};
+  }
+  const int result = sigaltstack(given == nullptr ? nullptr : &next, &before);
+  if (result == 0 && previous != nullptr) {
+    const int disabled = (before.ss_flags & SS_DISABLE) != 0 ? kDarwinDisable : 0;
+    *previous = {before.ss_sp, before.ss_size, disabled | (before.ss_flags & SS_ONSTACK)};
+  }
+  return converted(result);
+}
+
 }  // namespace
 
 int darwinSignal(int signal) {
@@ -164,15 +191,11 @@ DarwinSignals darwinSignals(const sigset_t& signals) {
 
 shims::Table shims::signal() {
   static const Shim table[] = {
-      shim("sigaction", &changeAction),
-      shim("signal", &setHandler),
-      shim("sigprocmask", &changeMask),
-      shim("pthread_sigmask", &changeMaskWith),
-      shim("sigpending", &pending),
-      shim("sigwait", &waitFor),
-      shim("raise", &raiseSignal),
-      shim("kill", &sendSignal),
-      shim("pthread_kill", &sendSignalToThread),
+      shim("sigaction", &changeAction), shim("signal", &setHandler),
+      shim("sigprocmask", &changeMask), shim("pthread_sigmask", &changeMaskWith),
+      shim("sigpending", &pending),     shim("sigwait", &waitFor),
+      shim("raise", &raiseSignal),      shim("sigaltstack", &changeStack),
+      shim("kill", &sendSignal),        shim("pthread_kill", &sendSignalToThread),
   };
   return table;
 }

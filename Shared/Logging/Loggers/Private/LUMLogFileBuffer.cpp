@@ -173,9 +173,9 @@ void LUMLogFileBuffer::rotate() noexcept {
   rotationSize_ = file_.size() + largestSize_;
 }
 
-void LUMLogFileBuffer::writeInSignalHandler(std::string_view line) noexcept {
+// Not analysed: it takes the lock in a loop.
+bool LUMLogFileBuffer::tryLockInSignalHandler() noexcept RT_NO_THREAD_SAFETY_ANALYSIS {
   constexpr int kLooks = 100;
-  const int error = errno;
   bool isTaken = lock_.tryLock();
   // The thread that has the lock may be the one that has crashed, so later lines do not wait any more.
   for (int look = 0; look < kLooks && !isTaken && !isLockGivenUp_; ++look) {
@@ -184,7 +184,12 @@ void LUMLogFileBuffer::writeInSignalHandler(std::string_view line) noexcept {
     isTaken = lock_.tryLock();
   }
   isLockGivenUp_ = !isTaken;
-  if (isTaken) {
+  return isTaken;
+}
+
+void LUMLogFileBuffer::writeInSignalHandler(std::string_view line) noexcept {
+  const int error = errno;
+  if (tryLockInSignalHandler()) {
     if (forkCount_ == LUMLogFlusher::forkCount()) {
       file_.write({place_.get(), std::exchange(length_, 0)});
       deadline_.store(kNever, std::memory_order_relaxed);

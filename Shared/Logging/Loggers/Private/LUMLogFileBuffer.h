@@ -84,6 +84,7 @@ class LUMLogFileBuffer final : public rt::Implements<LUMLogFileBuffer, rt::Objec
   void send(std::string_view text) noexcept RT_REQUIRES(lock_);
   void follow() noexcept RT_REQUIRES(lock_);
   void followSometimes() noexcept RT_REQUIRES(lock_);
+  bool tryLockInSignalHandler() noexcept RT_TRY_ACQUIRE(true, lock_);
   void writeWithoutLock(std::string_view line) const noexcept RT_NO_THREAD_SAFETY_ANALYSIS;
   bool isNewDay() noexcept RT_REQUIRES(lock_);
 

@@ -3,7 +3,7 @@
 /// Makes any logger asynchronous, with a queue of limited length. The thread that logs puts a reference to
 /// the message into the queue and goes on. A task writes the messages to the target, in order.
 ///
-///     const rt::Ref<LUMFileLogger> target = LUMFileLogger::initWithPath("/var/log/host.log");
+///     const rt::Ref<LUMFileLogger> target = LUMFileLogger::initWithPath("/var/log/host.log"_s);
 ///     const rt::Ref<LUMBoundedLogger> logger = LUMBoundedLogger::initWithLogger(target, {.capacity = 1024});
 ///     LUMLogMultiplexer::sharedInstance()->addSyncLogger(logger);
 ///     ...

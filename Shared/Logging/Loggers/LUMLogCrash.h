@@ -5,7 +5,7 @@
 ///     int main() {
 ///       LUMLogCrash::install();
 ///       const auto logger =
-///       LUMBoundedLogger::initWithLogger(LUMFileLogger::initWithPath("/var/log/host.log"));
+///       LUMBoundedLogger::initWithLogger(LUMFileLogger::initWithPath("/var/log/host.log"_s));
 ///       LUMLogMultiplexer::sharedInstance()->addSyncLogger(logger);
 ///       ...
 ///     }

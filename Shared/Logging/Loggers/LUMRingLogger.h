@@ -3,7 +3,8 @@
 /// Keeps the last messages of all levels in memory. When an error comes, it hands them on to a logger: first
 /// the kept messages in order, then the error. So a log is short, and yet shows what led to an error.
 ///
-///     const auto file = LUMBoundedLogger::initWithLogger(LUMFileLogger::initWithPath("/var/log/host.log"));
+///     const auto file =
+///     LUMBoundedLogger::initWithLogger(LUMFileLogger::initWithPath("/var/log/host.log"_s));
 ///     LUMLogMultiplexer::sharedInstance()->addSyncLogger(LUMRingLogger::initWithLogger(file));
 ///
 /// It wants the messages of all levels. So LUMLogAt makes all messages, also those that no other logger

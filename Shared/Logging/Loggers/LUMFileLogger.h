@@ -87,8 +87,9 @@ class RT_VISIBLE LUMFileLogger final : public rt::Implements<LUMFileLogger, LUML
   /// Makes a logger that appends to the file at `path`. Makes the file, but not its folders. A relative path
   /// counts from the folder that is current now.
   ///
-  /// Errors: throws std::system_error that names the path if the file cannot be opened, std::invalid_argument
-  /// if the path is null, empty or has a NUL, or an option is out of range, and std::bad_alloc.
+  /// Errors: throws std::system_error that names the path if the file cannot be opened. Throws
+  /// std::invalid_argument if the path is null, empty or has a NUL, or if an option is out of range. Throws
+  /// std::bad_alloc.
   static rt::Ref<LUMFileLogger> initWithPath(const rt::String& path, const LUMFileLoggerOptions& options);
 
   /// Same as above, with a formatter and a filter, which may be null, and otherwise the default options.

@@ -40,7 +40,7 @@ namespace {
 using namespace rt::literals;
 
 constexpr std::size_t kLongestText = 400;
-constexpr std::size_t kStackSize = 64 * 1024;
+constexpr std::size_t kStackSize = std::size_t{64} * 1024;
 
 struct Signal {
   int number;
@@ -228,7 +228,7 @@ void installHandlers() {
 }
 
 // The stack for handlers on one thread, below a page that catches an overflow.
-constexpr std::size_t kGuardSize = 64 * 1024;
+constexpr std::size_t kGuardSize = std::size_t{64} * 1024;
 
 void removeStack(void* memory) {
   stack_t none{};

@@ -30,7 +30,10 @@ void LUMLogEntryFields::addNumber(std::string_view name, std::uint64_t value) no
 }
 
 void LUMLogEntryFields::addProperty(const rt::String& key, const rt::Object& value) {
-  if (const auto* string = rt::cast<rt::StringObject>(&value)) return add(key, string->view());
+  if (const auto* string = rt::cast<rt::StringObject>(&value)) {
+    add(key, string->view());
+    return;
+  }
   rt::String& description = descriptions_[count_];
   description = LUMLogDescriptionOf(value);
   add(key, description);

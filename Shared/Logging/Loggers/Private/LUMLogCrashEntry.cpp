@@ -6,6 +6,7 @@
 #include <array>
 #include <cerrno>
 #include <ctime>
+#include <span>
 
 #include "Runtime/Locks/Private/ThreadIdentifier.h"
 #include "Shared/Logging/Loggers/LUMLogOutput.h"
@@ -71,8 +72,8 @@ bool LUMLogCrashEntry::writeAll(void (*report)(LUMLogOutput* output, const Losse
   std::size_t count = 0;
   for (LUMLogCrashEntry* each = first_.load(); each != nullptr; each = each->next_.load()) {
     LUMLogOutput* const output = each->crashTarget();
-    const auto end = reported.begin() + static_cast<std::ptrdiff_t>(count);
-    if (output == nullptr || isEntry(output) || std::find(reported.begin(), end, output) != end) continue;
+    const std::span known = std::span(reported).first(count);
+    if (output == nullptr || isEntry(output) || std::ranges::find(known, output) != known.end()) continue;
     if (count < reported.size()) reported[count++] = output;
     report(output, losses);
   }

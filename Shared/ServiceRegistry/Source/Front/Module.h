@@ -13,9 +13,9 @@
 ///     ...
 ///     rt::Ref<Preferences> preferences = App::get<Preferences>(User{"ann"_s});
 ///
-/// Wiring.h says what a module consists of. Some modules do not compile (Private/Mistakes.h): those in which
-/// something that a service needs is missing, those in which services need each other in a cycle, and those
-/// in which a service keeps one of a narrower scope.
+/// Wiring.h says what a module consists of. A module does not compile if something that a service needs is
+/// missing. Nor does it if services need each other in a cycle, or if a service keeps one of a narrower
+/// scope. Private/Mistakes.h lists all such mistakes.
 ///
 /// Where the module is declared, its implementations may be incomplete. Where it is linked, they are
 /// complete. Linking hands the module to the registry, like a generated one (SRLBindingsModuleData.h), when
